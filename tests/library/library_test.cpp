@@ -1,0 +1,239 @@
+// What the product is from outside: its symbols, what it needs, how it compiles.
+#include <gmock/gmock.h>
+#include <gtest/gtest.h>
+
+#include <array>
+#include <cstdio>
+#include <cstdlib>
+#include <filesystem>
+#include <fstream>
+#include <memory>
+#include <regex>
+#include <sstream>
+#include <string>
+#include <sys/wait.h>
+#include <unistd.h>
+#include <utility>
+#include <vector>
+
+namespace fs = std::filesystem;
+
+namespace
+{
+
+using ::testing::HasSubstr;
+using ::testing::UnorderedElementsAre;
+using Words = std::vector<std::string>;
+
+const std::string kSource = QUILLMARK_SOURCE_DIR;
+
+struct Outcome {
+    int status = -1;
+    std::string output; // both streams
+};
+
+Outcome run(const std::string &command)
+{
+    Outcome outcome;
+    FILE *pipe = popen(("( " + command + " ) 2>&1").c_str(), "r");
+    std::array<char, 4096> buffer{};
+    while (fgets(buffer.data(), buffer.size(), pipe) != nullptr) {
+        outcome.output += buffer.data();
+    }
+    const int status = pclose(pipe);
+    outcome.status = WIFEXITED(status) ? WEXITSTATUS(status) : -1;
+    return outcome;
+}
+
+// The last words of the lines that match.
+Words last_words(const std::string &text, const std::string &pattern)
+{
+    Words words;
+    std::istringstream lines(text);
+    const std::regex wanted(pattern);
+    for (std::string line; std::getline(lines, line);) {
+        if (std::regex_search(line, wanted)) {
+            words.push_back(line.substr(line.find_last_of(" [") + 1));
+        }
+    }
+    return words;
+}
+
+Words exports_of(const std::string &library)
+{
+    const Outcome listing = run("nm --dynamic --defined-only " + library);
+    EXPECT_EQ(listing.status, 0) << listing.output;
+    return last_words(listing.output, ".");
+}
+
+Words needs_of(const std::string &library)
+{
+    const Outcome listing = run("readelf --dynamic --wide " + library);
+    EXPECT_EQ(listing.status, 0) << listing.output;
+    return last_words(listing.output, "NEEDED");
+}
+
+class Directory
+{
+  public:
+    Directory()
+    {
+        char name[] = "/tmp/quillmark-library-XXXXXX";
+        path_ = mkdtemp(name);
+    }
+    ~Directory()
+    {
+        fs::remove_all(path_);
+    }
+    Directory(const Directory &) = delete;
+    Directory &operator=(const Directory &) = delete;
+
+    std::string write(const std::string &name, const std::string &text) const
+    {
+        const fs::path file = path_ / name;
+        fs::create_directories(file.parent_path());
+        std::ofstream(file) << text;
+        return file;
+    }
+    [[nodiscard]] std::string path() const
+    {
+        return path_;
+    }
+
+  private:
+    fs::path path_;
+};
+
+TEST(Library, ExportsTheFourFunctionsAndTheVariableAndNothingElse)
+{
+    EXPECT_THAT(exports_of(QUILLMARK_LIBRARY),
+                UnorderedElementsAre("FPTEST_RunTestCmd", "FPTEST_SetTransation",
+                                     "FPTEST_ExtractResultMsg", "FPTEST_SuspendItemExecute",
+                                     "g_TestCmdTree"));
+}
+
+TEST(Library, NeedsTheCLibraryMiniXmlAndTheMakersLibraryAlone)
+{
+    EXPECT_THAT(needs_of(QUILLMARK_LIBRARY),
+                UnorderedElementsAre("libmxml.so.1]", "libvorlane.so]", "libc.so.6]"));
+}
+
+TEST(Library, OfTheMakerExportsItsInterfacesAndNothingElse)
+{
+    EXPECT_THAT(exports_of(VORLANE_LIBRARY),
+                UnorderedElementsAre("Accept", "Bind", "Setsockopt", "get_node_value",
+                                     "mxmlSetLoneWhitespaceOff", "vr_log_printf"));
+    EXPECT_THAT(needs_of(VORLANE_LIBRARY), UnorderedElementsAre("libmxml.so.1]", "libc.so.6]"));
+}
+
+// --- the source -----------------------------------------------------------
+
+class ModuleSource : public ::testing::TestWithParam<const char *>
+{
+};
+
+TEST_P(ModuleSource, CompilesWithoutAWarning)
+{
+    const std::string compiler = GetParam();
+    for (const char *options : {"-O0", "-Os -DNDEBUG", "-O2", "-O3 -DNDEBUG"}) {
+        const Outcome compiled =
+            run(compiler + " -std=c++20 " + options +
+                " -Wall -Wextra -Wpedantic -Wconversion -Wshadow -Werror -fPIC -fno-exceptions"
+                " -fno-rtti -I" +
+                kSource + "/vorlane -c -o /dev/null " + kSource + "/src/quillmark.cpp");
+        EXPECT_EQ(compiled.status, 0) << compiler << " " << options << "\n" << compiled.output;
+    }
+}
+
+INSTANTIATE_TEST_SUITE_P(Compilers, ModuleSource, ::testing::Values("g++", "clang++"),
+                         [](const auto &compiler) {
+                             return std::string(compiler.param) == "g++" ? "Gcc" : "Clang";
+                         });
+
+TEST(ModuleSource, IncludesHeadersOfTheCLibraryAlone)
+{
+    const std::string own =
+        R"re(quillmark\.h|mxml_whitespace\.h|sockwrap\.h|sysparm\.h|vr_log\.h)re";
+    const std::regex wanted(R"re(#include (<(mxml|[a-z_]+|sys/[a-z]+|netinet/in)\.h>|"()re" + own +
+                            ")\")( .*)?");
+    int includes = 0;
+    for (const char *file : {"/src/quillmark.cpp", "/src/quillmark.h"}) {
+        std::ifstream source(kSource + file);
+        for (std::string line; std::getline(source, line);) {
+            if (line.starts_with("#include")) {
+                ++includes;
+                EXPECT_TRUE(std::regex_match(line, wanted)) << file << ": " << line;
+            }
+        }
+    }
+    EXPECT_GT(includes, 10);
+}
+
+TEST(PublicHeader, IsUsableByItselfFromC11AndCpp)
+{
+    const Directory directory;
+    const std::string text = "#include \"quillmark.h\"\n"
+                             "int use(void);\n"
+                             "int use(void)\n"
+                             "{\n"
+                             "    char reply[64];\n"
+                             "    fpTest_TestMsg_t message;\n"
+                             "    mxml_node_t *tree = g_TestCmdTree;\n"
+                             "    FPTEST_ExtractResultMsg(reply, (int)sizeof reply);\n"
+                             "    message.testMsgHead[0] = reply[0];\n"
+                             "    return FPTEST_RunTestCmd(\"pingtest\", reply, 64)\n"
+                             "        + FPTEST_SetTransation(\"g\", \"i\", 1, 0, 0)\n"
+                             "        + FPTEST_SuspendItemExecute() + message.testMsgHead[0]\n"
+                             "        + (tree != 0);\n"
+                             "}\n";
+    const std::pair<const char *, const char *> ways[] = {{"gcc -std=c11", "use.c"},
+                                                          {"clang -std=c11", "use.c"},
+                                                          {"g++ -std=c++11", "use.cpp"},
+                                                          {"clang++ -std=c++20", "use.cpp"}};
+    for (const auto &[compiler, name] : ways) {
+        const Outcome compiled =
+            run(std::string(compiler) + " -Wall -Wextra -Wpedantic -Werror -I" + kSource +
+                "/src -c -o /dev/null " + directory.write(name, text));
+        EXPECT_EQ(compiled.status, 0) << compiler << "\n" << compiled.output;
+    }
+}
+
+// --- Mini-XML's version ---------------------------------------------------
+
+Outcome configure_with(const Directory &directory, const std::string &major,
+                       const std::string &minor)
+{
+    directory.write("mxml.h", "#  define MXML_MAJOR_VERSION " + major +
+                                  "\n#  define MXML_MINOR_VERSION " + minor + "\n");
+    directory.write("libmxml.so", "");
+    directory.write("CMakeLists.txt", "cmake_minimum_required(VERSION 3.25)\n"
+                                      "project(version NONE)\n"
+                                      "include(" +
+                                          kSource + "/cmake/MiniXml.cmake)\n");
+    const std::string place = directory.path();
+    return run("cmake -S " + place + " -B " + place + "/build -DMINIXML_INCLUDE_DIR=" + place +
+               " -DMINIXML_LIBRARY=" + place + "/libmxml.so");
+}
+
+TEST(MiniXmlVersion, From2Point7To3IsTaken)
+{
+    const Directory directory;
+    for (const auto &[major, minor] : {std::pair("2", "7"), {"2", "12"}, {"3", "0"}, {"3", "3"}}) {
+        EXPECT_EQ(configure_with(directory, major, minor).status, 0) << major << "." << minor;
+    }
+}
+
+TEST(MiniXmlVersion, AnyOtherIsRefusedWithTheReason)
+{
+    const Directory directory;
+    for (const auto &[major, minor] : {std::pair("2", "6"), {"4", "0"}}) {
+        const Outcome outcome = configure_with(directory, major, minor);
+        EXPECT_NE(outcome.status, 0);
+        const std::string said = std::regex_replace(outcome.output, std::regex("\\s+"), " ");
+        EXPECT_THAT(said, HasSubstr(std::string("is Mini-XML ") + major + "." + minor +
+                                    ", but Quillmark uses the interface of 2.7 to 3.x: install "
+                                    "libmxml-dev 3.3.1"));
+    }
+}
+
+} // namespace

@@ -1,0 +1,745 @@
+// The command entry: parsing, the three heads, storing a test plan.
+#include "unit_test.h"
+
+#include <algorithm>
+#include <cerrno>
+#include <cstddef>
+#include <cstring>
+
+using platform::events;
+using platform::gives;
+using platform::left_open;
+using platform::limit;
+using platform::log_lines;
+using platform::plan_steps;
+
+namespace
+{
+
+class CommandEntry : public ModuleTest
+{
+  protected:
+    static constexpr std::size_t kBehind = 8; // bytes that nobody may touch
+
+    // What a command leaves in a reply buffer of that length, which was full of
+    // 'x', and in the bytes behind it.
+    static std::string reply_to(const std::string &command, int length)
+    {
+        std::string buffer = untouched(length);
+        EXPECT_EQ(FPTEST_RunTestCmd(command.c_str(), buffer.data(), length), 0);
+        return buffer;
+    }
+    static std::string untouched(int length)
+    {
+        return std::string(static_cast<std::size_t>(length) + kBehind, 'x');
+    }
+    static std::string filled(std::string text, int length)
+    {
+        text.resize(static_cast<std::size_t>(length), '\0');
+        return text + std::string(kBehind, 'x');
+    }
+
+    // A whole buffer after ExtractString with that length.
+    static std::string extracted(std::string buffer, int length)
+    {
+        module::ExtractString(buffer.data(), length);
+        return buffer;
+    }
+    static std::string zeros(std::size_t count)
+    {
+        return std::string(count, '\0');
+    }
+
+    // A record full of 'x', for what is written into it.
+    static fpTest_TestMsg_t full_message()
+    {
+        fpTest_TestMsg_t message;
+        std::memset(&message, 'x', sizeof message);
+        return message;
+    }
+    static std::string head(const fpTest_TestMsg_t &message)
+    {
+        return {message.testMsgHead, sizeof message.testMsgHead};
+    }
+    static std::string name(const fpTest_TestMsg_t &message)
+    {
+        return {message.testMsgName, sizeof message.testMsgName};
+    }
+    static std::string args(const fpTest_TestMsg_t &message)
+    {
+        return {message.testMsgArgs, sizeof message.testMsgArgs};
+    }
+    static std::string field(std::string text, std::size_t capacity)
+    {
+        text.resize(capacity, '\0');
+        return text;
+    }
+
+    static Lines parsed(const std::string &first)
+    {
+        return {"fptest_ParseCmdLine| testHead is : " + first + "\n"};
+    }
+    static Lines parsed(const std::string &first, const std::string &second)
+    {
+        return joined({parsed(first), {"fptest_ParseCmdLine| testName is : " + second + "\n"}});
+    }
+    static Lines parsed(const std::string &first, const std::string &second,
+                        const std::string &third)
+    {
+        return joined(
+            {parsed(first, second), {"fptest_ParseCmdLine| testArgs is : " + third + "\n"}});
+    }
+
+    static std::string opened(const std::string &descriptor)
+    {
+        return "open(/data/vorlane/src1.xml, O_RDWR|O_CREAT, 0666) = " + descriptor;
+    }
+    // The events of a store that goes well, its parsing left out.
+    static Lines stored(const std::string &text, int which = 1, int removed = 0)
+    {
+        const std::string plan = "plan#" + std::to_string(which);
+        const std::string size = std::to_string(text.size());
+        return {
+            "remove(/data/vorlane/src1.xml) = " + std::to_string(removed),
+            opened(plan),
+            "write(" + plan + ", \"" + text + "\", " + size + ") = " + size,
+            kSaved,
+        };
+    }
+
+    static constexpr char kPing[] = "FPTEST_RunTestCmd| Get ping reply success!\n";
+    static constexpr char kSaved[] = "FPTEST_RunTestCmd| Save source xml file success!\n";
+    static constexpr char kOpenFailed[] = "saveRecvFile| OPEN FILE FAIL!\n";
+    static constexpr char kWriteFailed[] = "saveRecvFile| WRITE DATA FAIL!\n";
+    static constexpr char kOnePlan[] =
+        "<P><CmdGroup name='g'><Cmd name='a' args='1'/></CmdGroup></P>";
+    static constexpr char kOtherPlan[] = "<P><CmdGroup name='g'/></P>";
+
+    // Loads a plan into the cache, by way of a lookup.
+    static void cache_plan(const std::string &text)
+    {
+        platform::write_plan(text);
+        ASSERT_GE(module::get_node_length("g", 2), 0);
+        ASSERT_NE(g_TestCmdTree, nullptr);
+        events();
+    }
+
+    // Tells when the cached tree is deleted, and how the plan file looked then.
+    struct Deletion {
+        int count = 0;
+        std::string plan_then;
+    };
+    static void watch_cached_tree(Deletion &deletion)
+    {
+        mxmlNewCustom(g_TestCmdTree, &deletion, [](void *data) {
+            auto *watched = static_cast<Deletion *>(data);
+            ++watched->count;
+            watched->plan_then = platform::plan_exists() ? platform::plan_text() : "(none)";
+        });
+    }
+
+    // Leaves other calls' bytes where the next one has its variables.
+    [[gnu::noinline]] static void dirty_stack()
+    {
+        volatile char bytes[16384];
+        for (volatile char &byte : bytes) {
+            byte = 'x';
+        }
+    }
+};
+
+// --- cutting a text ------------------------------------------------------
+
+TEST_F(CommandEntry, TextIsCutAtItsFirstTab)
+{
+    EXPECT_EQ(extracted("ab\tcd\tefg", 8), "ab" + zeros(6) + "g");
+}
+
+TEST_F(CommandEntry, TextIsCutAtItsFirstLineFeed)
+{
+    EXPECT_EQ(extracted("ab\ncd\nefg", 8), "ab" + zeros(6) + "g");
+}
+
+TEST_F(CommandEntry, TextIsCutAtWhicheverOfTabAndLineFeedComesFirst)
+{
+    EXPECT_EQ(extracted("abc\td\nef", 8), "abc" + zeros(5));
+    EXPECT_EQ(extracted("abc\nd\tef", 8), "abc" + zeros(5));
+    EXPECT_EQ(extracted("\tabcdefg", 8), zeros(8));
+    EXPECT_EQ(extracted("\nabcdefg", 8), zeros(8));
+}
+
+TEST_F(CommandEntry, TextIsNotCutAtOtherWhiteSpace)
+{
+    const std::string text = " a b\rc\vd\fe\x08\x0e";
+    EXPECT_EQ(extracted(field(text, 20), 20), field(text, 20));
+}
+
+TEST_F(CommandEntry, TextIsCutToOneLessThanTheLength)
+{
+    EXPECT_EQ(extracted(field("abcdefg", 10), 8), field("abcdefg", 10));
+    EXPECT_EQ(extracted(field("abcdefgh", 10), 8), field("abcdefg", 10));
+    EXPECT_EQ(extracted(field("abcdefghi", 10), 8), "abcdefg" + zeros(1) + "i" + zeros(1));
+    EXPECT_EQ(extracted("a", 1), zeros(1));
+}
+
+TEST_F(CommandEntry, TextIsZeroFilledUpToItsLengthAndNoFurther)
+{
+    EXPECT_EQ(extracted("ab" + zeros(1) + "old bytes", 8), "ab" + zeros(6) + "ytes");
+    EXPECT_EQ(extracted(zeros(1) + "old bytes", 8), zeros(8) + "es");
+}
+
+TEST_F(CommandEntry, TextBeyondItsLengthLosesEveryTabAndLineFeed)
+{
+    EXPECT_EQ(extracted("a\tcdef\tgh\nij", 4),
+              "a" + zeros(3) + "ef" + zeros(1) + "gh" + zeros(1) + "ij");
+    EXPECT_EQ(extracted("abcdef\tgh\nij", 4),
+              "abc" + zeros(1) + "ef" + zeros(1) + "gh" + zeros(1) + "ij");
+}
+
+TEST_F(CommandEntry, TextIsCutToWhatTheWorkingCopyHolds)
+{
+    EXPECT_EQ(extracted(field(std::string(4096, 'a'), 5000), 5000),
+              field(std::string(4096, 'a'), 5000));
+    EXPECT_EQ(extracted(field(std::string(4097, 'a'), 5000), 5000),
+              field(std::string(4096, 'a'), 5000));
+}
+
+// --- parsing -------------------------------------------------------------
+
+TEST_F(CommandEntry, MessageHasThreeFieldsOfTheirSizesInOrder)
+{
+    static_assert(offsetof(fpTest_TestMsg_t, testMsgHead) == 0);
+    static_assert(offsetof(fpTest_TestMsg_t, testMsgName) == 32);
+    static_assert(offsetof(fpTest_TestMsg_t, testMsgArgs) == 32 + 2049);
+    static_assert(sizeof(fpTest_TestMsg_t) == 32 + 2049 + 1024);
+
+    fpTest_TestMsg_t message = full_message();
+    module::TestMsgInit(&message);
+    EXPECT_EQ(head(message), zeros(32));
+    EXPECT_EQ(name(message), zeros(2049));
+    EXPECT_EQ(args(message), zeros(1024));
+    EXPECT_THAT(events(), IsEmpty());
+}
+
+TEST_F(CommandEntry, FieldsAreSplitLoggedAndZeroFilled)
+{
+    fpTest_TestMsg_t message = full_message();
+    module::ParseCmdLine("head::the name::the args", &message);
+
+    EXPECT_EQ(head(message), field("head", 32));
+    EXPECT_EQ(name(message), field("the name", 2049));
+    EXPECT_EQ(args(message), field("the args", 1024));
+    EXPECT_EQ(events(), parsed("head", "the name", "the args"));
+}
+
+TEST_F(CommandEntry, AnyRunOfColonsSeparatesTwoFields)
+{
+    for (const char *command :
+         {"h:n:a", "h::n::a", "h::::n:::a", ":h:n:a", "::h::n::a", "h::n::a:", ":::h:n::::a::"}) {
+        fpTest_TestMsg_t message = full_message();
+        module::ParseCmdLine(command, &message);
+        EXPECT_EQ(head(message), field("h", 32)) << command;
+        EXPECT_EQ(name(message), field("n", 2049)) << command;
+        EXPECT_EQ(args(message), field("a", 1024)) << command;
+        EXPECT_EQ(events(), parsed("h", "n", "a")) << command;
+    }
+}
+
+TEST_F(CommandEntry, NothingButColonsSeparates)
+{
+    fpTest_TestMsg_t message = full_message();
+    module::ParseCmdLine(" h;\t/ : n,\n. : a|", &message);
+
+    EXPECT_EQ(head(message), field(" h;\t/ ", 32));
+    EXPECT_EQ(name(message), field(" n,\n. ", 2049));
+    EXPECT_EQ(args(message), field(" a|", 1024));
+    EXPECT_EQ(events(), parsed(" h;\t/ ", " n,\n. ", " a|"));
+}
+
+TEST_F(CommandEntry, FourthAndLaterFieldsAreIgnored)
+{
+    fpTest_TestMsg_t message = full_message();
+    module::ParseCmdLine("h::n::a::fourth::fifth", &message);
+
+    EXPECT_EQ(head(message), field("h", 32));
+    EXPECT_EQ(name(message), field("n", 2049));
+    EXPECT_EQ(args(message), field("a", 1024));
+    EXPECT_EQ(events(), parsed("h", "n", "a"));
+}
+
+TEST_F(CommandEntry, MissingFieldsStayEmpty)
+{
+    fpTest_TestMsg_t message;
+    module::TestMsgInit(&message);
+    module::ParseCmdLine("h", &message);
+    EXPECT_EQ(head(message), field("h", 32));
+    EXPECT_EQ(name(message), zeros(2049));
+    EXPECT_EQ(args(message), zeros(1024));
+    EXPECT_EQ(events(), parsed("h"));
+
+    module::TestMsgInit(&message);
+    module::ParseCmdLine("h::n", &message);
+    EXPECT_EQ(name(message), field("n", 2049));
+    EXPECT_EQ(args(message), zeros(1024));
+    EXPECT_EQ(events(), parsed("h", "n"));
+}
+
+TEST_F(CommandEntry, CommandWithoutAFieldDoesNothing)
+{
+    for (const char *command : {"", ":", "::::", static_cast<const char *>(nullptr)}) {
+        std::string reply = untouched(8);
+        EXPECT_EQ(FPTEST_RunTestCmd(command, reply.data(), 8), 0);
+        EXPECT_EQ(reply, untouched(8));
+        EXPECT_THAT(events(), IsEmpty());
+    }
+}
+
+TEST_F(CommandEntry, CommandThatCannotBeCopiedDoesNothing)
+{
+    plan_steps("strdup", {gives(0, ENOMEM)});
+    EXPECT_EQ(reply_to("pingtest", 8), untouched(8));
+    EXPECT_THAT(events(), IsEmpty());
+    EXPECT_EQ(module::ping_mask(), 0);
+}
+
+TEST_F(CommandEntry, FieldsAreCutToTheirBoundsAndLoggedWhole)
+{
+    struct Sizes {
+        std::size_t head, name, args;
+    };
+    for (const Sizes sizes : {Sizes{30, 2047, 1022}, Sizes{31, 2048, 1023}, Sizes{32, 2049, 1024},
+                              Sizes{33, 2050, 1025}, Sizes{300, 5000, 4000}}) {
+        const std::string first(sizes.head, 'h');
+        const std::string second(sizes.name, 'n');
+        const std::string third(sizes.args, 'a');
+        fpTest_TestMsg_t message = full_message();
+        module::ParseCmdLine((first + "::" + second + "::" + third).c_str(), &message);
+
+        EXPECT_EQ(head(message), field(first.substr(0, 31), 32));
+        EXPECT_EQ(name(message), field(second.substr(0, 2048), 2049));
+        EXPECT_EQ(args(message), field(third.substr(0, 1023), 1024));
+        EXPECT_EQ(events(), parsed(first, second, third));
+    }
+}
+
+TEST_F(CommandEntry, CommandStringIsNotModified)
+{
+    for (const char *text : {"pingtest::a::b", "XMLFile::<P/>::b", "XMLNodePath::r/g/i\tx::b"}) {
+        const std::string command = text;
+        std::string given = command;
+        FPTEST_RunTestCmd(given.data(), nullptr, 0);
+        EXPECT_EQ(given, command);
+    }
+}
+
+// --- ping ----------------------------------------------------------------
+
+TEST_F(CommandEntry, FirstPingIsAnswered)
+{
+    EXPECT_EQ(reply_to("pingtest", 64), filled("Ping Success!", 64));
+
+    EXPECT_EQ(module::ping_mask(), 1);
+    EXPECT_EQ(events(), joined({parsed("pingtest"), {kPing}}));
+    EXPECT_THAT(left_open(), IsEmpty());
+}
+
+TEST_F(CommandEntry, LaterPingsAreNotAnswered)
+{
+    reply_to("pingtest", 64);
+    events();
+    for (int again = 0; again < 3; ++again) {
+        EXPECT_EQ(reply_to("pingtest", 64), untouched(64));
+        EXPECT_EQ(events(), parsed("pingtest"));
+        EXPECT_EQ(module::ping_mask(), 1);
+    }
+}
+
+TEST_F(CommandEntry, FirstPingWithoutAReplyBufferStillUsesUpThePing)
+{
+    EXPECT_EQ(FPTEST_RunTestCmd("pingtest", nullptr, 64), 0);
+    EXPECT_EQ(events(), joined({parsed("pingtest"), {kPing}}));
+    EXPECT_EQ(module::ping_mask(), 1);
+
+    EXPECT_EQ(reply_to("pingtest", 64), untouched(64));
+    EXPECT_EQ(events(), parsed("pingtest"));
+}
+
+TEST_F(CommandEntry, PingReplyIsCutToTheBufferAndZeroFilled)
+{
+    const std::string text = "Ping Success!";
+    for (const int length : {1, 2, 5, 12, 13, 14, 15, 100}) {
+        module::reset();
+        const auto kept = std::min(text.size(), static_cast<std::size_t>(length) - 1);
+        EXPECT_EQ(reply_to("pingtest", length), filled(text.substr(0, kept), length)) << length;
+    }
+}
+
+TEST_F(CommandEntry, HeadThatGoesOnBehindPingtestIsAPing)
+{
+    EXPECT_EQ(reply_to("pingtest2 and more", 16), filled("Ping Success!", 16));
+    EXPECT_EQ(events(), joined({parsed("pingtest2 and more"), {kPing}}));
+}
+
+TEST_F(CommandEntry, PingWithMoreFieldsIsAnswered)
+{
+    EXPECT_EQ(reply_to("pingtest::XMLFile::XMLNodePath", 16), filled("Ping Success!", 16));
+    EXPECT_EQ(events(), joined({parsed("pingtest", "XMLFile", "XMLNodePath"), {kPing}}));
+}
+
+TEST_F(CommandEntry, PingLeavesThePlanAlone)
+{
+    cache_plan(kOnePlan);
+    mxml_node_t *const tree = g_TestCmdTree;
+    reply_to("pingtest", 64);
+    EXPECT_EQ(g_TestCmdTree, tree);
+    EXPECT_EQ(platform::plan_text(), kOnePlan);
+}
+
+TEST_F(CommandEntry, OtherCommandsNeitherUseUpThePingNorNeedIt)
+{
+    reply_to("XMLFile::<P/>", 16);
+    reply_to("XMLNodePath::r", 16);
+    reply_to("unknown", 16);
+    EXPECT_EQ(module::ping_mask(), 0);
+    EXPECT_EQ(reply_to("pingtest", 16), filled("Ping Success!", 16));
+    events();
+
+    reply_to("XMLFile::<Q/>", 16);
+    EXPECT_EQ(platform::plan_text(), "<Q/>");
+    EXPECT_EQ(reply_to("XMLNodePath::r", 16), filled("", 16));
+    EXPECT_EQ(module::ping_mask(), 1);
+}
+
+// --- unknown heads -------------------------------------------------------
+
+TEST_F(CommandEntry, UnknownHeadDoesNothing)
+{
+    cache_plan(kOnePlan);
+    mxml_node_t *const tree = g_TestCmdTree;
+    for (const char *unknown :
+         {"unknown", "pingtes", "pingTest", "Pingtest", " pingtest", "xpingtest", "XMLFil",
+          "XMLfile", " XMLFile", "xXMLFile", "XMLNodePat", "XMLNodepath", " XMLNodePath",
+          "xXMLNodePath", "XML"}) {
+        const std::string text = unknown;
+        EXPECT_EQ(reply_to(text + "::name::args", 16), untouched(16)) << text;
+        EXPECT_EQ(events(), parsed(text, "name", "args"));
+    }
+    EXPECT_EQ(module::ping_mask(), 0);
+    EXPECT_EQ(g_TestCmdTree, tree);
+    EXPECT_EQ(platform::plan_text(), kOnePlan);
+}
+
+// --- storing a plan ------------------------------------------------------
+
+TEST_F(CommandEntry, StoringRemovesCreatesAndWritesAndLeavesTheDescriptorOpen)
+{
+    platform::write_plan("the old plan, longer than the new one");
+    EXPECT_EQ(FPTEST_RunTestCmd("XMLFile::<P/>", nullptr, 0), 0);
+
+    EXPECT_THAT(events(), ElementsAre("fptest_ParseCmdLine| testHead is : XMLFile\n",
+                                      "fptest_ParseCmdLine| testName is : <P/>\n",
+                                      "remove(/data/vorlane/src1.xml) = 0",
+                                      "open(/data/vorlane/src1.xml, O_RDWR|O_CREAT, 0666) = plan#1",
+                                      "write(plan#1, \"<P/>\", 4) = 4",
+                                      "FPTEST_RunTestCmd| Save source xml file success!\n"));
+    EXPECT_EQ(platform::plan_text(), "<P/>");
+    EXPECT_THAT(left_open(), ElementsAre("plan#1"));
+}
+
+TEST_F(CommandEntry, StoringWithoutAnOldPlanCreatesTheFile)
+{
+    EXPECT_EQ(FPTEST_RunTestCmd("XMLFile::<P/>", nullptr, 0), 0);
+    EXPECT_EQ(events(), joined({parsed("XMLFile", "<P/>"), stored("<P/>", 1, -1)}));
+    EXPECT_EQ(platform::plan_text(), "<P/>");
+}
+
+TEST_F(CommandEntry, HeadThatGoesOnBehindXMLFileStores)
+{
+    reply_to("XMLFiles and more::<P/>", 16);
+    EXPECT_EQ(events(), joined({parsed("XMLFiles and more", "<P/>"), stored("<P/>", 1, -1)}));
+
+    const std::string longer = "XMLFile" + std::string(50, 'x');
+    reply_to(longer + "::<Q/>", 16);
+    EXPECT_EQ(events(), joined({parsed(longer, "<Q/>"), stored("<Q/>", 2)}));
+    EXPECT_EQ(platform::plan_text(), "<Q/>");
+}
+
+TEST_F(CommandEntry, StoringLeavesTheReplyUntouched)
+{
+    EXPECT_EQ(reply_to("XMLFile::<P/>", 100), untouched(100));
+    plan_steps("open", {gives(-1, EACCES)});
+    EXPECT_EQ(reply_to("XMLFile::<P/>", 100), untouched(100));
+}
+
+TEST_F(CommandEntry, EveryStoreLeavesOneMoreDescriptorOpen)
+{
+    for (int which = 1; which <= 3; ++which) {
+        run_quietly("XMLFile::<P/>");
+        EXPECT_EQ(left_open().size(), static_cast<std::size_t>(which));
+    }
+    EXPECT_THAT(left_open(), ElementsAre("plan#1", "plan#2", "plan#3"));
+}
+
+TEST_F(CommandEntry, PlanIsStoredByteForByte)
+{
+    const std::string plan =
+        "<?xml version=\"1.0\"?>\r\n<P>\n\t<A b='c' />\n\n</P> \xc3\xa9\x01/\n";
+    run_quietly("XMLFile::" + plan);
+    EXPECT_EQ(platform::plan_text(), plan);
+}
+
+TEST_F(CommandEntry, PlanIsCutToItsFirst2048Characters)
+{
+    std::string plan;
+    while (plan.size() < 3000) {
+        plan += std::to_string(plan.size()) + " ";
+    }
+    for (const std::size_t size : {2047U, 2048U, 2049U, 3000U}) {
+        const std::string sent = plan.substr(0, size);
+        const std::string kept = plan.substr(0, std::min<std::size_t>(size, 2048));
+        EXPECT_EQ(FPTEST_RunTestCmd(("XMLFile::" + sent).c_str(), nullptr, 0), 0);
+        EXPECT_EQ(platform::plan_text(), kept);
+        const Lines seen = events();
+        ASSERT_EQ(seen.size(), 6U);
+        EXPECT_EQ(seen[1], parsed("", sent)[1]);
+        EXPECT_EQ(seen[4].substr(seen[4].rfind('"')),
+                  "\", " + std::to_string(kept.size()) + ") = " + std::to_string(kept.size()));
+    }
+}
+
+TEST_F(CommandEntry, PlanIsCutAtItsFirstColon)
+{
+    run_quietly("XMLFile::<P>a:b::c</P>");
+    EXPECT_EQ(platform::plan_text(), "<P>a");
+}
+
+TEST_F(CommandEntry, TextBehindThePlansFirstColonIsTheArgumentField)
+{
+    FPTEST_RunTestCmd("XMLFile::<P>a:b::c:d</P>", nullptr, 0);
+    EXPECT_EQ(events(), joined({parsed("XMLFile", "<P>a", "b"), stored("<P>a", 1, -1)}));
+}
+
+TEST_F(CommandEntry, ColonsInFrontAndInRunsDoNotChangeAStore)
+{
+    FPTEST_RunTestCmd(":::XMLFile::::<P/>", nullptr, 0);
+    EXPECT_EQ(events(), joined({parsed("XMLFile", "<P/>"), stored("<P/>", 1, -1)}));
+}
+
+TEST_F(CommandEntry, StoringWithoutANameFieldLeavesAnEmptyFileAndNoCache)
+{
+    cache_plan(kOnePlan);
+    dirty_stack();
+    EXPECT_EQ(FPTEST_RunTestCmd("XMLFile", nullptr, 0), 0);
+
+    EXPECT_EQ(events(), joined({parsed("XMLFile"), stored("", 2)}));
+    EXPECT_EQ(platform::plan_text(), "");
+    EXPECT_EQ(g_TestCmdTree, nullptr);
+    EXPECT_THAT(left_open(), ElementsAre("plan#2"));
+}
+
+TEST_F(CommandEntry, StoringDeletesTheCachedTreeOnceBetweenOpenAndWrite)
+{
+    cache_plan(kOnePlan);
+    Deletion deletion;
+    watch_cached_tree(deletion);
+    run_quietly(std::string("XMLFile::") + kOtherPlan);
+
+    EXPECT_EQ(g_TestCmdTree, nullptr);
+    EXPECT_EQ(deletion.count, 1);
+    EXPECT_EQ(deletion.plan_then, "");
+}
+
+TEST_F(CommandEntry, LookupAfterAStoreSeesTheNewPlan)
+{
+    cache_plan(kOnePlan);
+    EXPECT_EQ(module::get_node_length("g", 2), 1);
+    run_quietly(std::string("XMLFile::") + kOtherPlan);
+    EXPECT_EQ(module::get_node_length("g", 2), 0);
+}
+
+TEST_F(CommandEntry, StoringTakesDescriptorZero)
+{
+    cache_plan(kOnePlan);
+    platform::free_descriptor_zero();
+    EXPECT_EQ(FPTEST_RunTestCmd("XMLFile::<P/>", nullptr, 0), 0);
+
+    EXPECT_EQ(events(), joined({parsed("XMLFile", "<P/>"), stored("<P/>", 2)}));
+    EXPECT_EQ(platform::plan_text(), "<P/>");
+    EXPECT_EQ(g_TestCmdTree, nullptr);
+    EXPECT_THAT(left_open(), ElementsAre("plan#2"));
+}
+
+TEST_F(CommandEntry, StoringThatCannotOpenLosesTheFileAndKeepsTheCache)
+{
+    cache_plan(kOnePlan);
+    mxml_node_t *const tree = g_TestCmdTree;
+    Deletion deletion;
+    watch_cached_tree(deletion);
+    plan_steps("open", {gives(-1, EACCES)});
+    EXPECT_EQ(FPTEST_RunTestCmd("XMLFile::<P/>", nullptr, 0), 0);
+
+    EXPECT_EQ(events(),
+              joined({parsed("XMLFile", "<P/>"),
+                      {"remove(/data/vorlane/src1.xml) = 0", opened("-1"), kOpenFailed, kSaved}}));
+    EXPECT_FALSE(platform::plan_exists());
+    EXPECT_EQ(deletion.count, 0);
+    ASSERT_EQ(g_TestCmdTree, tree);
+    EXPECT_EQ(module::get_node_index("g", "a", 3), 0);
+    EXPECT_THAT(left_open(), IsEmpty());
+    run_quietly("XMLFile::<P/>");
+    EXPECT_EQ(g_TestCmdTree, nullptr);
+}
+
+TEST_F(CommandEntry, ShortWriteIsLoggedAndNotRetried)
+{
+    cache_plan(kOnePlan);
+    plan_steps("write", {limit(3)});
+    EXPECT_EQ(FPTEST_RunTestCmd("XMLFile::<P/>", nullptr, 0), 0);
+
+    EXPECT_EQ(events(), joined({parsed("XMLFile", "<P/>"),
+                                {"remove(/data/vorlane/src1.xml) = 0", opened("plan#2"),
+                                 "write(plan#2, \"<P/>\", 4) = 3", kWriteFailed, kSaved}}));
+    EXPECT_EQ(platform::plan_text(), "<P/");
+    EXPECT_EQ(g_TestCmdTree, nullptr);
+    EXPECT_THAT(left_open(), ElementsAre("plan#2"));
+}
+
+TEST_F(CommandEntry, FailedWriteIsLoggedAfterTheCacheIsDropped)
+{
+    cache_plan(kOnePlan);
+    plan_steps("write", {gives(-1, ENOSPC)});
+    EXPECT_EQ(FPTEST_RunTestCmd("XMLFile::<P/>", nullptr, 0), 0);
+
+    EXPECT_EQ(events(), joined({parsed("XMLFile", "<P/>"),
+                                {"remove(/data/vorlane/src1.xml) = 0", opened("plan#2"),
+                                 "write(plan#2, \"<P/>\", 4) = -1", kWriteFailed, kSaved}}));
+    EXPECT_EQ(platform::plan_text(), "");
+    EXPECT_EQ(g_TestCmdTree, nullptr);
+    EXPECT_THAT(left_open(), ElementsAre("plan#2"));
+}
+
+TEST_F(CommandEntry, AnyOtherWrittenCountIsAFailure)
+{
+    for (const long count : {0L, 5L}) {
+        plan_steps("write", {gives(count)});
+        FPTEST_RunTestCmd("XMLFile::<P/>", nullptr, 0);
+        EXPECT_THAT(log_lines(),
+                    ElementsAreArray(joined({parsed("XMLFile", "<P/>"), {kWriteFailed, kSaved}})))
+            << count;
+    }
+}
+
+TEST_F(CommandEntry, FailedRemovalIsIgnoredAndTheFileIsNotTruncated)
+{
+    platform::write_plan("the old plan");
+    plan_steps("remove", {gives(-1, EPERM)});
+    FPTEST_RunTestCmd("XMLFile::<P/>", nullptr, 0);
+
+    EXPECT_EQ(events(), joined({parsed("XMLFile", "<P/>"), stored("<P/>", 1, -1)}));
+    EXPECT_EQ(platform::plan_text(), "<P/>old plan");
+}
+
+TEST_F(CommandEntry, StoringReportsItsFailuresToItsCaller)
+{
+    plan_steps("open", {gives(-1, EACCES)});
+    EXPECT_EQ(module::saveRecvFile("/data/vorlane/other.xml", "<P/>", 4), -1);
+    EXPECT_EQ(events(),
+              (Lines{"remove(/data/vorlane/other.xml) = -1",
+                     "open(/data/vorlane/other.xml, O_RDWR|O_CREAT, 0666) = -1", kOpenFailed}));
+
+    plan_steps("write", {gives(-1, EIO)});
+    EXPECT_EQ(module::saveRecvFile("/data/vorlane/other.xml", "<P/>", 2), -1);
+    EXPECT_EQ(events(), (Lines{"remove(/data/vorlane/other.xml) = -1",
+                               "open(/data/vorlane/other.xml, O_RDWR|O_CREAT, 0666) = plan#1",
+                               "write(plan#1, \"<P\", 2) = -1", kWriteFailed}));
+}
+
+// --- node paths ----------------------------------------------------------
+
+TEST_F(CommandEntry, RunOfAGroupRepliesWithZerosAfterTheItems)
+{
+    platform::write_plan(kOnePlan);
+    std::string reply = untouched(100);
+    int runs = 0;
+    platform::on_system([&](const std::string & /*command*/) {
+        ++runs;
+        EXPECT_EQ(reply, untouched(100));
+    });
+    EXPECT_EQ(FPTEST_RunTestCmd("XMLNodePath::P/g", reply.data(), 100), 0);
+
+    EXPECT_EQ(runs, 1);
+    EXPECT_EQ(reply, filled("", 100));
+}
+
+TEST_F(CommandEntry, RunRepliesWithZerosWhateverItFinds)
+{
+    for (const char *path : {"P", "P/g", "P/g/a", "/", ""}) {
+        for (const int length : {1, 2, 1025, 3000}) {
+            dirty_stack();
+            EXPECT_EQ(reply_to(std::string("XMLNodePath::") + path, length), filled("", length))
+                << path << " " << length;
+        }
+    }
+}
+
+TEST_F(CommandEntry, RunNeedsNoReplyBuffer)
+{
+    platform::write_plan(kOnePlan);
+    int runs = 0;
+    platform::on_system([&](const std::string & /*command*/) { ++runs; });
+    EXPECT_EQ(FPTEST_RunTestCmd("XMLNodePath::P/g", nullptr, 100), 0);
+    EXPECT_EQ(runs, 1);
+}
+
+TEST_F(CommandEntry, HeadThatGoesOnBehindXMLNodePathRuns)
+{
+    EXPECT_EQ(reply_to("XMLNodePaths and more::r", 16), filled("", 16));
+    EXPECT_EQ(events(),
+              joined({parsed("XMLNodePaths and more", "r"),
+                      {"fptest_ItemsTest| Input cmdline : r\n", "get_node_level| level = 1\n",
+                       "get_node_level| node name = \n"}}));
+}
+
+TEST_F(CommandEntry, NodePathIsCutAtItsFirstTabOrLineFeed)
+{
+    for (const char *path : {"root\t/g/a", "root\n/g/a", "root\n/g\t/a", "root\t/g\n/a"}) {
+        FPTEST_RunTestCmd((std::string("XMLNodePath::") + path).c_str(), nullptr, 0);
+        EXPECT_EQ(events(),
+                  joined({parsed("XMLNodePath", path),
+                          {"fptest_ItemsTest| Input cmdline : root\n",
+                           "get_node_level| level = 1\n", "get_node_level| node name = \n"}}));
+    }
+}
+
+TEST_F(CommandEntry, NodePathIsCutTo2047Characters)
+{
+    for (const std::size_t size : {2046U, 2047U, 2048U, 2049U, 3000U}) {
+        const std::string path(size, 'r');
+        FPTEST_RunTestCmd(("XMLNodePath::" + path).c_str(), nullptr, 0);
+        const Lines seen = events();
+        ASSERT_EQ(seen.size(), 5U);
+        EXPECT_EQ(seen[1], parsed("", path)[1]);
+        EXPECT_EQ(seen[2], "fptest_ItemsTest| Input cmdline : " + path.substr(0, 2047) + "\n");
+    }
+}
+
+TEST_F(CommandEntry, NodePathIsCutAtAColonAndItsArgumentsAreNotUsed)
+{
+    FPTEST_RunTestCmd("XMLNodePath::r:g/a::more", nullptr, 0);
+    EXPECT_EQ(events(),
+              joined({parsed("XMLNodePath", "r", "g/a"),
+                      {"fptest_ItemsTest| Input cmdline : r\n", "get_node_level| level = 1\n",
+                       "get_node_level| node name = \n"}}));
+}
+
+TEST_F(CommandEntry, MissingNodePathIsAnEmptyOne)
+{
+    dirty_stack();
+    EXPECT_EQ(FPTEST_RunTestCmd("XMLNodePath", nullptr, 0), 0);
+    EXPECT_EQ(events(),
+              joined({parsed("XMLNodePath"),
+                      {"fptest_ItemsTest| Input cmdline : \n", "get_node_level| level = 1\n",
+                       "get_node_level| node name = \n"}}));
+}
+
+} // namespace

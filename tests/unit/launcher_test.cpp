@@ -1,0 +1,128 @@
+// The launcher: a shell command that nobody waits for.
+#include "sequences.h"
+#include "unit_test.h"
+
+#include <cerrno>
+
+using platform::events;
+using platform::gives;
+using platform::plan_steps;
+using sequences::failed_launch;
+using sequences::launch;
+using sequences::launched;
+
+namespace
+{
+
+// Status words as the kernel gives them.
+constexpr int kExited127 = 127 << 8;
+constexpr int kKilledBy9 = 9;
+
+class Launcher : public ModuleTest
+{
+  protected:
+    // What the child does with a command when the shell cannot be started.
+    static Lines child(const std::string &command)
+    {
+        plan_steps("vfork", {gives(0)});
+        platform::run_child([&command] { module::mysystem(command.c_str()); });
+        return events();
+    }
+};
+
+TEST_F(Launcher, NullCommandYieldsOneAndTouchesNothing)
+{
+    EXPECT_EQ(module::mysystem(nullptr), 1);
+    EXPECT_THAT(events(), IsEmpty());
+}
+
+TEST_F(Launcher, ParentLooksOnceWithoutWaitingAndRestoresSignals)
+{
+    module::mysystem("sleep 1000");
+    EXPECT_THAT(events(), ElementsAreArray(launch()));
+    EXPECT_THAT(platform::left_open(), IsEmpty());
+}
+
+TEST_F(Launcher, ChildStillRunningYieldsZero)
+{
+    platform::set_wait_status(kExited127); // of a child that has not ended: not stored
+    EXPECT_EQ(module::mysystem("sleep 1000"), 0);
+}
+
+TEST_F(Launcher, ChildAlreadyEndedYieldsItsRawStatus)
+{
+    for (const int status : {0, kExited127, kKilledBy9, 1 << 8}) {
+        SCOPED_TRACE(status);
+        platform::reset();
+        plan_steps("waitpid", {gives(100)});
+        platform::set_wait_status(status);
+
+        EXPECT_EQ(module::mysystem("true"), status);
+        EXPECT_THAT(events(), ElementsAreArray(launch(100)));
+    }
+}
+
+TEST_F(Launcher, FailedLookIsNotRepeatedAndYieldsMinusOneWithSignalsRestored)
+{
+    for (const int error : {ECHILD, EINTR}) {
+        SCOPED_TRACE(error);
+        platform::reset();
+        plan_steps("waitpid", {gives(-1, error)});
+
+        EXPECT_EQ(module::mysystem("true"), -1);
+        EXPECT_THAT(events(), ElementsAreArray(launch(-1)));
+    }
+}
+
+TEST_F(Launcher, FailedForkRestoresTheMaskAloneAndYieldsMinusOne)
+{
+    plan_steps("vfork", {gives(-1, EAGAIN)});
+
+    EXPECT_EQ(module::mysystem("true"), -1);
+    EXPECT_THAT(events(), ElementsAreArray(failed_launch()));
+}
+
+TEST_F(Launcher, ChildRestoresTheMaskRunsTheShellAndExitsWhenThatFails)
+{
+    EXPECT_THAT(child("/system/bin/SensorProbe -t 5"),
+                ElementsAreArray(launched("/system/bin/SensorProbe -t 5")));
+}
+
+TEST_F(Launcher, CommandReachesTheShellUnchanged)
+{
+    const std::string quoted = "  a 'b c' \"$d\" | e > f; g\n\th % %s \\ ";
+    EXPECT_THAT(child(quoted), ElementsAreArray(launched(quoted)));
+
+    platform::reset();
+    const std::string lengthy(20000, 'c');
+    EXPECT_THAT(child(lengthy), ElementsAreArray(launched(lengthy)));
+}
+
+TEST_F(Launcher, EmptyCommandStillStartsAShell)
+{
+    EXPECT_THAT(child(""), ElementsAreArray(launched("")));
+
+    platform::reset();
+    module::mysystem("");
+    EXPECT_THAT(events(), ElementsAreArray(launch()));
+}
+
+TEST_F(Launcher, NextLaunchStartsAnew)
+{
+    plan_steps("waitpid", {gives(100), gives(0)});
+    platform::set_wait_status(kExited127);
+    EXPECT_EQ(module::mysystem("first"), kExited127);
+    EXPECT_EQ(module::mysystem("second"), 0);
+
+    EXPECT_THAT(events(), ElementsAreArray(joined({launch(100), launch()})));
+    EXPECT_THAT(child("third"), ElementsAreArray(launched("third")));
+}
+
+TEST_F(Launcher, LooksAtTheChildThatItStarted)
+{
+    plan_steps("vfork", {gives(77)});
+    module::mysystem("true");
+    EXPECT_THAT(events(), ::testing::Contains("waitpid(77, WNOHANG) = 0").Times(1));
+}
+
+} // namespace

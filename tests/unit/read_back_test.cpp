@@ -1,0 +1,394 @@
+// The read-back: the plan's file, byte by byte, in the caller's buffer.
+#include "unit_test.h"
+
+#include <cerrno>
+#include <climits>
+#include <csignal>
+#include <cstdio>
+#include <unistd.h>
+
+using platform::events;
+using platform::gives;
+using platform::left_open;
+using platform::limit;
+using platform::pass;
+using platform::plan_steps;
+using platform::write_plan;
+using ::testing::AllOf;
+using ::testing::ExitedWithCode;
+using ::testing::HasSubstr;
+using ::testing::KilledBySignal;
+using ::testing::Not;
+
+namespace
+{
+
+constexpr char kGuard = '\x7e';
+constexpr std::size_t kBehind = 64;
+
+// Standard output's descriptor is free meanwhile.
+class FreedOutput
+{
+  public:
+    FreedOutput()
+    {
+        std::fflush(stdout);
+        kept_ = dup(STDOUT_FILENO);
+        close(STDOUT_FILENO);
+    }
+    ~FreedOutput()
+    {
+        dup2(kept_, STDOUT_FILENO);
+        close(kept_);
+    }
+    FreedOutput(const FreedOutput &) = delete;
+    FreedOutput &operator=(const FreedOutput &) = delete;
+
+  private:
+    int kept_ = -1;
+};
+
+class ReadBack : public ModuleTest
+{
+  protected:
+    // Bytes of every kind, none like its neighbour or the guard.
+    static std::string bytes(std::size_t count)
+    {
+        std::string text;
+        for (std::size_t at = 0; at < count; ++at) {
+            text += static_cast<char>(at % 100);
+        }
+        return text;
+    }
+
+    // The buffer after a read-back, with what is behind its capacity.
+    static std::string read_back(int capacity)
+    {
+        std::string buffer(static_cast<std::size_t>(capacity) + kBehind, kGuard);
+        FPTEST_ExtractResultMsg(buffer.data(), capacity);
+        return buffer;
+    }
+    // The same, where only so many bytes came.
+    static std::string filled(int capacity, const std::string &text)
+    {
+        return text +
+               std::string(static_cast<std::size_t>(capacity) + kBehind - text.size(), kGuard);
+    }
+
+    static Lines line(const std::string &text)
+    {
+        return {"FPTEST_ExtractResultMsg| " + text};
+    }
+    // From the call to the last offset, for a file of that size.
+    static Lines begun(std::size_t size)
+    {
+        const std::string end = std::to_string(size);
+        return joined({line("enter... !\n"),
+                       {"open(/data/vorlane/src1.xml, O_RDONLY) = plan#1"},
+                       {"lseek(plan#1, 0, SEEK_CUR) = 0"},
+                       line("offset = 0"),
+                       {"lseek(plan#1, 0, SEEK_END) = " + end},
+                       line("offset = " + end),
+                       {"lseek(plan#1, 0, SEEK_SET) = 0"},
+                       line("offset = 0")});
+    }
+    static Lines read_call(int asked, int result)
+    {
+        return {"read(plan#1, " + std::to_string(asked) + ") = " + std::to_string(result)};
+    }
+    static Lines piece(int asked, int got)
+    {
+        return joined({read_call(asked, got),
+                       line("read file unfinish, continue... n = " + std::to_string(got) + " \n")});
+    }
+    static Lines failure(int asked)
+    {
+        return joined({read_call(asked, -1), line("FPTEST_ExtractResultMsg[]:read file failed\n")});
+    }
+    static Lines ended(int asked, int total)
+    {
+        return joined({read_call(asked, 0),
+                       line("reach the end of file\n"),
+                       line("read byte count = " + std::to_string(total) + "\n"),
+                       {"close(plan#1)"},
+                       line("leave...\n")});
+    }
+    static Lines not_opened(const std::string &descriptor)
+    {
+        return joined({line("enter... !\n"),
+                       {"open(/data/vorlane/src1.xml, O_RDONLY) = " + descriptor},
+                       line("Open /data/vorlane/src1.xml file failed!\n")});
+    }
+};
+
+// In a process of its own: the assertion's report, with the log before it.
+class ReadBackAssertion : public ReadBack
+{
+  protected:
+    static void read_back_aloud(int capacity)
+    {
+        platform::on_log([](const std::string &event) { std::fputs(event.c_str(), stderr); });
+        char buffer[16];
+        FPTEST_ExtractResultMsg(buffer, capacity);
+    }
+    static auto asserted()
+    {
+        return AllOf(HasSubstr("FPTEST_ExtractResultMsg| offset = "),
+                     ::testing::ContainsRegex(
+                         "quillmark.cpp:[0-9]+: .*FPTEST_ExtractResultMsg.*Assertion `0' failed"),
+                     Not(HasSubstr("unfinish")), Not(HasSubstr("reach the end")));
+    }
+};
+
+TEST_F(ReadBack, FileShorterThanTheBufferIsReadWholeWithNothingBehindIt)
+{
+    write_plan(bytes(300));
+    EXPECT_EQ(read_back(1000), filled(1000, bytes(300)));
+
+    EXPECT_THAT(events(),
+                ElementsAreArray(joined({begun(300), piece(1000, 300), ended(700, 300)})));
+    EXPECT_THAT(left_open(), IsEmpty());
+}
+
+TEST_F(ReadBack, EmptyFileLeavesTheBufferUntouched)
+{
+    write_plan("");
+    EXPECT_EQ(read_back(100), filled(100, ""));
+    EXPECT_THAT(events(), ElementsAreArray(joined({begun(0), ended(100, 0)})));
+    EXPECT_THAT(left_open(), IsEmpty());
+}
+
+TEST_F(ReadBack, NoCapacityReadsNothing)
+{
+    write_plan(bytes(300));
+    EXPECT_EQ(read_back(0), filled(0, ""));
+    EXPECT_THAT(events(), ElementsAreArray(joined({begun(300), ended(0, 0)})));
+}
+
+TEST_F(ReadBack, FileOfTheBuffersSizeFillsItWithNoZeroBehind)
+{
+    write_plan(bytes(300));
+    EXPECT_EQ(read_back(300), filled(300, bytes(300)));
+    EXPECT_THAT(events(), ElementsAreArray(joined({begun(300), piece(300, 300), ended(0, 300)})));
+}
+
+TEST_F(ReadBack, FileOneByteShorterOrLongerThanTheBuffer)
+{
+    write_plan(bytes(300));
+    EXPECT_EQ(read_back(301), filled(301, bytes(300)));
+    EXPECT_THAT(events(), ElementsAreArray(joined({begun(300), piece(301, 300), ended(1, 300)})));
+
+    platform::reset();
+    write_plan(bytes(300));
+    EXPECT_EQ(read_back(299), filled(299, bytes(299)));
+    EXPECT_THAT(events(), ElementsAreArray(joined({begun(300), piece(299, 299), ended(0, 299)})));
+}
+
+TEST_F(ReadBack, LongerFileIsCutAtTheBuffersSizeAndOnlyTheOffsetTells)
+{
+    write_plan(bytes(600));
+    EXPECT_EQ(read_back(500), filled(500, bytes(500)));
+    EXPECT_THAT(events(), ElementsAreArray(joined({begun(600), piece(500, 500), ended(0, 500)})));
+}
+
+TEST_F(ReadBack, LargeFileIsReadWhole)
+{
+    write_plan(bytes(200000));
+    EXPECT_EQ(read_back(300000), filled(300000, bytes(200000)));
+    EXPECT_THAT(events(), ElementsAreArray(joined(
+                              {begun(200000), piece(300000, 200000), ended(100000, 200000)})));
+}
+
+TEST_F(ReadBack, EachPieceLandsBehindTheLastAndIsLogged)
+{
+    write_plan(bytes(300));
+    plan_steps("read", {limit(1), limit(150), limit(100)});
+    EXPECT_EQ(read_back(400), filled(400, bytes(300)));
+
+    EXPECT_THAT(events(),
+                ElementsAreArray(joined({begun(300), piece(400, 1), piece(399, 150),
+                                         piece(249, 100), piece(149, 49), ended(100, 300)})));
+}
+
+TEST_F(ReadBack, PiecesFillTheBufferUpToItsSize)
+{
+    write_plan(bytes(300));
+    plan_steps("read", {limit(60), limit(39)});
+    EXPECT_EQ(read_back(100), filled(100, bytes(100)));
+
+    EXPECT_THAT(events(), ElementsAreArray(joined({begun(300), piece(100, 60), piece(40, 39),
+                                                   piece(1, 1), ended(0, 100)})));
+}
+
+TEST_F(ReadBack, FailedReadIsLoggedAndTriedAgainWhateverTheError)
+{
+    write_plan(bytes(300));
+    plan_steps("read", {gives(-1, EINTR), gives(-1, EIO), gives(-1, EBADF)});
+    EXPECT_EQ(read_back(400), filled(400, bytes(300)));
+
+    EXPECT_THAT(events(),
+                ElementsAreArray(joined({begun(300), failure(400), failure(400), failure(400),
+                                         piece(400, 300), ended(100, 300)})));
+    EXPECT_THAT(left_open(), IsEmpty());
+}
+
+TEST_F(ReadBack, FailedReadBetweenPiecesIsTriedAgainAtTheSamePlace)
+{
+    write_plan(bytes(300));
+    plan_steps("read", {limit(100), gives(-1, EIO), gives(-1, EIO), pass(), gives(-1, EIO)});
+    EXPECT_EQ(read_back(400), filled(400, bytes(300)));
+
+    EXPECT_THAT(events(),
+                ElementsAreArray(joined({begun(300), piece(400, 100), failure(300), failure(300),
+                                         piece(300, 200), failure(100), ended(100, 300)})));
+}
+
+TEST_F(ReadBack, LastingReadErrorIsTriedAgainWithoutALimit)
+{
+    constexpr int kFailures = 20000;
+    write_plan("x");
+    plan_steps("read", std::vector(kFailures, gives(-1, EIO)));
+    EXPECT_EQ(read_back(10), filled(10, "x"));
+
+    auto expected = begun(1);
+    for (int count = 0; count < kFailures; ++count) {
+        const auto again = failure(10);
+        expected.insert(expected.end(), again.begin(), again.end());
+    }
+    EXPECT_EQ(events(), joined({expected, piece(10, 1), ended(9, 1)}));
+}
+
+TEST_F(ReadBack, OffsetsAreOnlyLogged)
+{
+    write_plan(bytes(300));
+    plan_steps("lseek", {gives(-1, ESPIPE), gives(7), gives(12)});
+    EXPECT_EQ(read_back(400), filled(400, bytes(300)));
+
+    EXPECT_THAT(events(),
+                ElementsAreArray(joined({line("enter... !\n"),
+                                         {"open(/data/vorlane/src1.xml, O_RDONLY) = plan#1"},
+                                         {"lseek(plan#1, 0, SEEK_CUR) = -1"},
+                                         line("offset = -1"),
+                                         {"lseek(plan#1, 0, SEEK_END) = 7"},
+                                         line("offset = 7"),
+                                         {"lseek(plan#1, 0, SEEK_SET) = 12"},
+                                         line("offset = 12"),
+                                         piece(400, 300),
+                                         ended(100, 300)})));
+}
+
+TEST_F(ReadBack, FileIsReadNotThePlanInMemory)
+{
+    write_plan("<P><CmdGroup name=\"g\"><Cmd name=\"a\"/></CmdGroup></P>");
+    ASSERT_NE(module::load_configs_file("/data/vorlane/src1.xml"), nullptr);
+    const mxml_node_t *tree = g_TestCmdTree;
+    write_plan("not a plan: \t\r\n <");
+
+    EXPECT_EQ(read_back(100), filled(100, "not a plan: \t\r\n <"));
+    EXPECT_EQ(g_TestCmdTree, tree);
+}
+
+TEST_F(ReadBack, FileThatDoesNotParseIsReadAndNotLoaded)
+{
+    write_plan("<P><");
+    EXPECT_EQ(read_back(100), filled(100, "<P><"));
+    EXPECT_EQ(g_TestCmdTree, nullptr);
+}
+
+TEST_F(ReadBack, MissingFileLeavesTheBufferUntouchedWithNoLeaveLine)
+{
+    EXPECT_EQ(read_back(100), filled(100, ""));
+    EXPECT_THAT(events(), ElementsAreArray(not_opened("-1")));
+    EXPECT_FALSE(platform::plan_exists());
+}
+
+TEST_F(ReadBack, DescriptorZeroIsAFailureAndStaysOpen)
+{
+    write_plan(bytes(300));
+    platform::free_descriptor_zero();
+    EXPECT_EQ(read_back(100), filled(100, ""));
+    EXPECT_THAT(events(), ElementsAreArray(not_opened("plan#1")));
+    EXPECT_THAT(left_open(), ElementsAre("plan#1"));
+}
+
+TEST_F(ReadBack, DescriptorOneIsASuccess)
+{
+    write_plan(bytes(300));
+    std::string got;
+    {
+        const FreedOutput freed;
+        got = read_back(400);
+    }
+    EXPECT_EQ(got, filled(400, bytes(300)));
+    EXPECT_THAT(events(), ElementsAreArray(joined({begun(300), piece(400, 300), ended(100, 300)})));
+    EXPECT_THAT(left_open(), IsEmpty());
+}
+
+TEST_F(ReadBack, PieceIsComparedWithTheWholeCapacity)
+{
+    // no kernel gives more than it was asked for; only the comparison is looked at
+    write_plan(bytes(300));
+    plan_steps("read", {limit(60), gives(80), gives(0)});
+    read_back(100);
+    EXPECT_THAT(platform::log_lines(),
+                ::testing::IsSupersetOf(
+                    {"FPTEST_ExtractResultMsg| read file unfinish, continue... n = 80 \n",
+                     "FPTEST_ExtractResultMsg| read byte count = 140\n"}));
+}
+
+TEST_F(ReadBack, NegativeCapacityReadsAnEmptyFileAsAnyOther)
+{
+    for (const int capacity : {-1, -4096, INT_MIN}) {
+        SCOPED_TRACE(capacity);
+        platform::reset();
+        write_plan("");
+        std::string buffer(kBehind, kGuard);
+        FPTEST_ExtractResultMsg(buffer.data(), capacity);
+
+        EXPECT_EQ(buffer, std::string(kBehind, kGuard));
+        auto lines = joined({begun(0), ended(0, 0)});
+        std::erase_if(lines, [](const auto &event) { return event.starts_with("read("); });
+        auto seen = events();
+        EXPECT_EQ(std::erase_if(seen, [](const auto &event) { return event.starts_with("read("); }),
+                  1U);
+        EXPECT_EQ(seen, lines);
+    }
+}
+
+TEST_F(ReadBackAssertion, NegativeCapacityEndsTheProcessAtTheFirstByte)
+{
+    for (const std::size_t size : {1U, 300U}) {
+        for (const int capacity : {-1, -4096, INT_MIN}) {
+            SCOPED_TRACE(capacity);
+            write_plan(bytes(size));
+            EXPECT_EXIT(read_back_aloud(capacity), KilledBySignal(SIGABRT), asserted());
+        }
+    }
+}
+
+TEST_F(ReadBackAssertion, NegativeCapacityRetriesAFailedReadFirst)
+{
+    write_plan("x");
+    plan_steps("read", {gives(-1, EIO)});
+    EXPECT_EXIT(read_back_aloud(-1), KilledBySignal(SIGABRT),
+                AllOf(asserted(), HasSubstr("FPTEST_ExtractResultMsg[]:read file failed\n")));
+}
+
+TEST_F(ReadBackAssertion, OnlyMoreThanTheCapacityEndsTheProcess)
+{
+    write_plan("x");
+    plan_steps("read", {gives(11)});
+    EXPECT_EXIT(read_back_aloud(10), KilledBySignal(SIGABRT), asserted());
+
+    platform::reset();
+    write_plan("x");
+    EXPECT_EXIT(
+        {
+            platform::plan_steps("read", {gives(10), gives(0)});
+            read_back_aloud(10);
+            ::_exit(0); // the directory stays
+        },
+        ExitedWithCode(0), HasSubstr("read byte count = 10\n"));
+}
+
+} // namespace

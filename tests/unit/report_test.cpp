@@ -1,0 +1,500 @@
+// Reports: what an item says of its progress and its end goes into the plan.
+#include "sequences.h"
+#include "unit_test.h"
+
+#include <cerrno>
+#include <climits>
+#include <cstring>
+
+using platform::events;
+using platform::gives;
+using platform::left_open;
+using platform::plan_steps;
+using platform::plan_text;
+using platform::write_plan;
+using sequences::failed_load;
+using sequences::load;
+using ::testing::Contains;
+
+namespace
+{
+
+const std::string kReason = "(" + std::to_string(EACCES) + "),Permission denied";
+
+class Report : public ModuleTest
+{
+  protected:
+    // A plan as the module saves it: items "a" and "b" in the group "first", "b"
+    // and "c" in the group "second", with what stands behind the names of a, of
+    // the first b, and of c.
+    static std::string plan(const std::string &a = "", const std::string &b = "",
+                            const std::string &c = "")
+    {
+        return "<?xml version=\"1.0\"?>\n<P>\n"
+               "\t<CmdGroup name=\"first\">\n" +
+               item("a", a) + item("b", b) + "</CmdGroup>\n\t<CmdGroup name=\"second\">\n" +
+               item("b", "") + item("c", c) + "</CmdGroup>\n</P>\n";
+    }
+    static std::string item(const std::string &name, const std::string &rest)
+    {
+        return "\t\t<Cmd name=\"" + name + "\"" + rest + " />\n";
+    }
+
+    // With the line that the XML library has broken put together again.
+    static std::string unwrapped(std::string text)
+    {
+        const auto at = text.find("\ndescription");
+        return at != std::string::npos ? text.replace(at, 1, " ") : text;
+    }
+
+    // A report on the item a, whose answer is always the same.
+    static void report(int progress, int result, const char *description)
+    {
+        EXPECT_EQ(FPTEST_SetTransation("first", "a", progress, result, description), 0);
+    }
+    // The plan is read, and stays in memory.
+    static void load_plan(const std::string &text = plan())
+    {
+        write_plan(text);
+        ASSERT_NE(module::load_configs_file("/data/vorlane/src1.xml"), nullptr);
+        events();
+    }
+    static const char *attribute(const char *group, const char *name, const char *attribute_name)
+    {
+        auto *found =
+            mxmlFindElement(g_TestCmdTree, g_TestCmdTree, "CmdGroup", "name", group, MXML_DESCEND);
+        auto *element = mxmlFindElement(found, g_TestCmdTree, "Cmd", "name", name, MXML_DESCEND);
+        return mxmlElementGetAttr(element, attribute_name);
+    }
+
+    // The events of a report, piece by piece.
+    static Lines begun(const std::string &name)
+    {
+        return {"FPTEST_SetTransation| enter...\n",
+                "FPTEST_SetTransation| input node name = " + name + "\n",
+                "get_node_index| enter...\n"};
+    }
+    static Lines told(int index, int progress, int result, const std::string &description)
+    {
+        const std::string code = "iResult = " + std::to_string(result) + "\n";
+        return {"FPTEST_SetTransation| " + code,
+                "FPTEST_SetTransation| index=" + std::to_string(index) +
+                    " - iResult=" + std::to_string(result) +
+                    " - iProgress=" + std::to_string(progress) + " - iDesc=" + description + "\n",
+                "updateSrcXmlFile| enter... !\n"};
+    }
+    static Lines updated(const std::string &name)
+    {
+        return {"updateSrcXmlFile| curernt node name is: " + name + "\n",
+                "updateSrcXmlFile| start update progress!\n",
+                "updateSrcXmlFile| start update result!\n",
+                "updateSrcXmlFile| start update description!\n",
+                "updateSrcXmlFile| start save xml!\n",
+                "save_XmlFile| enter...\n"};
+    }
+    static std::string opened(const std::string &descriptor)
+    {
+        return "open(/data/vorlane/src1.xml, O_RDWR|O_CREAT|O_TRUNC|O_SYNC, 0666) = " + descriptor;
+    }
+    static Lines saved(const std::string &plan_file)
+    {
+        return {opened(plan_file), "close(" + plan_file + ")", "save_XmlFile| leave...\n"};
+    }
+    static Lines unsaved(const std::string &descriptor)
+    {
+        return {opened(descriptor),
+                "save_XmlFile| Open /data/vorlane/src1.xml file failed" + kReason + "\n"};
+    }
+    static Lines success()
+    {
+        return {"updateSrcXmlFile| update Src Xml File success . leave...\n"};
+    }
+    static Lines left()
+    {
+        return {"FPTEST_SetTransation| leave...\n"};
+    }
+    static Lines failed(const std::string &function, const std::string &text)
+    {
+        return {function + "| " + function + "[]:" + text + "\n"};
+    }
+    // A report, with the plan in memory, on what is not in it.
+    static Lines not_found(const std::string &name)
+    {
+        return joined({begun(name), failed("get_node_index", "mxml Find Path failed"),
+                       told(-1, 5, 0, "d"), failed("updateSrcXmlFile", "mxml Find Path failed"),
+                       left()});
+    }
+    static void expect_not_found(const char *group, const char *name)
+    {
+        SCOPED_TRACE(std::string(group) + "/" + name);
+        EXPECT_EQ(FPTEST_SetTransation(group, name, 5, 0, "d"), 0);
+        EXPECT_THAT(events(), ElementsAreArray(not_found(name)));
+        EXPECT_EQ(plan_text(), plan());
+
+        // nor has anything changed that the next report would save
+        report(1, 0, "x");
+        EXPECT_EQ(plan_text(), plan(" progress=\"1\" result=\"0\" description=\"x\""));
+        module::reset();
+        load_plan();
+    }
+};
+
+TEST_F(Report, FirstReportLoadsThePlanSetsTheValuesAndSavesThem)
+{
+    write_plan(plan());
+    report(50, 0, "half");
+
+    EXPECT_THAT(events(),
+                ElementsAreArray(joined({begun("a"), load(), told(0, 50, 0, "half"), updated("a"),
+                                         saved("plan#2"), success(), left()})));
+    EXPECT_EQ(plan_text(), plan(" progress=\"50\" result=\"0\" description=\"half\""));
+    EXPECT_THAT(left_open(), IsEmpty());
+}
+
+TEST_F(Report, LaterReportUsesThePlanInMemory)
+{
+    load_plan();
+    write_plan("<Other/>");
+    EXPECT_EQ(FPTEST_SetTransation("first", "b", -1, 1, "bad"), 0);
+
+    EXPECT_THAT(events(), ElementsAreArray(joined({begun("b"), told(1, -1, 1, "bad"), updated("b"),
+                                                   saved("plan#2"), success(), left()})));
+    EXPECT_EQ(plan_text(), plan("", " progress=\"-1\" result=\"1\" description=\"bad\""));
+}
+
+TEST_F(Report, EachValueIsSetBehindItsOwnLineAndBeforeTheNext)
+{
+    load_plan(plan(" progress=\"1\" result=\"1\" description=\"old\""));
+    Lines seen;
+    platform::on_log([&seen](const std::string &event) {
+        if (event.starts_with("updateSrcXmlFile| ")) {
+            seen.push_back(std::string(attribute("first", "a", "progress")) + " " +
+                           attribute("first", "a", "result") + " " +
+                           attribute("first", "a", "description"));
+        }
+    });
+    report(2, -2, "new");
+
+    EXPECT_THAT(seen, ElementsAre("1 1 old", "1 1 old", "1 1 old", "2 1 old", "2 -2 old",
+                                  "2 -2 new", "2 -2 new"));
+}
+
+TEST_F(Report, FileIsRewrittenBetweenTheSaveLineAndTheSuccessLine)
+{
+    load_plan();
+    Lines seen;
+    platform::on_log([&seen](const std::string &event) {
+        if (event.starts_with("updateSrcXmlFile| ") || event.starts_with("save_XmlFile| ")) {
+            seen.push_back(plan_text() == plan() ? "old" : "new");
+        }
+    });
+    report(2, 0, "");
+
+    EXPECT_THAT(seen, ElementsAre("old", "old", "old", "old", "old", "old", "old", "new", "new"));
+}
+
+TEST_F(Report, ProgressIsWrittenByItsFirstNineCharacters)
+{
+    const std::pair<int, const char *> cases[] = {
+        {0, "0"},
+        {7, "7"},
+        {-1, "-1"},
+        {12345678, "12345678"},
+        {123456789, "123456789"},
+        {999999999, "999999999"},
+        {1000000000, "100000000"},
+        {1234567890, "123456789"},
+        {INT_MAX, "214748364"},
+        {-12345678, "-12345678"},
+        {-123456789, "-12345678"},
+        {INT_MIN, "-21474836"},
+    };
+    load_plan();
+    for (const auto &[progress, text] : cases) {
+        SCOPED_TRACE(progress);
+        events();
+        report(progress, 0, "");
+        EXPECT_STREQ(attribute("first", "a", "progress"), text);
+        EXPECT_EQ(unwrapped(plan_text()),
+                  plan(std::string(" progress=\"") + text + "\" result=\"0\" description=\"\""));
+        EXPECT_THAT(events(), Contains(told(0, progress, 0, "")[1]));
+    }
+}
+
+TEST_F(Report, KnownResultsAreWrittenAsTheyAre)
+{
+    load_plan();
+    for (const int result : {0, 1, -2}) {
+        SCOPED_TRACE(result);
+        report(1, result, "");
+        EXPECT_EQ(plan_text(), plan(" progress=\"1\" result=\"" + std::to_string(result) +
+                                    "\" description=\"\""));
+    }
+}
+
+TEST_F(Report, AnyOtherResultLeavesTheAttributeWithoutAValue)
+{
+    for (const int result : {2, -1, -3, 3, 10, 256, INT_MAX, INT_MIN}) {
+        SCOPED_TRACE(result);
+        SetUp();
+        load_plan(plan(" result=\"1\""));
+        report(1, result, "d");
+        EXPECT_THAT(events(),
+                    ElementsAreArray(joined({begun("a"), told(0, 1, result, "d"), updated("a"),
+                                             saved("plan#2"), success(), left()})));
+        EXPECT_EQ(plan_text(), plan(" result progress=\"1\" description=\"d\""));
+    }
+}
+
+TEST_F(Report, ResultWithoutAValueIsAddedWhereThereWasNone)
+{
+    load_plan();
+    report(1, 2, "d");
+    EXPECT_EQ(plan_text(), plan(" progress=\"1\" result description=\"d\""));
+}
+
+TEST_F(Report, NullDescriptionLeavesTheAttributeWithoutAValue)
+{
+    load_plan(plan(" description=\"old\""));
+    report(1, 0, nullptr);
+
+    EXPECT_THAT(events(),
+                ElementsAreArray(joined({begun("a"), told(0, 1, 0, "(null)"), updated("a"),
+                                         saved("plan#2"), success(), left()})));
+    EXPECT_EQ(plan_text(), plan(" description progress=\"1\" result=\"0\""));
+}
+
+TEST_F(Report, EmptyDescriptionIsWrittenAsAnEmptyValue)
+{
+    load_plan();
+    report(1, 0, "");
+
+    EXPECT_THAT(events(), ElementsAreArray(joined({begun("a"), told(0, 1, 0, ""), updated("a"),
+                                                   saved("plan#2"), success(), left()})));
+    EXPECT_EQ(plan_text(), plan(" progress=\"1\" result=\"0\" description=\"\""));
+}
+
+TEST_F(Report, DescriptionIsKeptUnchangedWhateverItsLengthAndCharacters)
+{
+    for (const std::string &description :
+         {std::string(5000, 'd'), std::string(" a: %s %d\t\n\"<&>' \xc3\xa4 \\ ")}) {
+        SetUp();
+        load_plan();
+        report(1, 0, description.c_str());
+        EXPECT_EQ(attribute("first", "a", "description"), description);
+        EXPECT_THAT(events(), Contains(told(0, 1, 0, description)[1]));
+
+        // and is still the same for who loads the file
+        module::reset();
+        ASSERT_NE(module::load_configs_file("/data/vorlane/src1.xml"), nullptr);
+        EXPECT_EQ(attribute("first", "a", "description"), description);
+    }
+}
+
+TEST_F(Report, DescriptionIsCopied)
+{
+    load_plan();
+    char description[] = "before";
+    report(1, 0, description);
+    std::strcpy(description, "after");
+    EXPECT_STREQ(attribute("first", "a", "description"), "before");
+}
+
+TEST_F(Report, LongAttributesWrapAsTheXmlLibraryDoesByDefault)
+{
+    load_plan();
+    report(100, 0, "this is beyond the usual width");
+    EXPECT_EQ(plan_text(), plan(" progress=\"100\" result=\"0\"\n"
+                                "description=\"this is beyond the usual width\""));
+}
+
+TEST_F(Report, SecondReportOnAnItemReplacesTheFirst)
+{
+    load_plan();
+    report(10, 1, "first");
+    report(90, 0, "last");
+    EXPECT_EQ(plan_text(), plan(" progress=\"90\" result=\"0\" description=\"last\""));
+}
+
+TEST_F(Report, OtherAttributesStay)
+{
+    load_plan(plan(" args=\"-t 5\" x=\"y\""));
+    report(1, 0, "");
+    EXPECT_EQ(plan_text(),
+              plan(" args=\"-t 5\" x=\"y\" progress=\"1\" result=\"0\"\ndescription=\"\""));
+}
+
+TEST_F(Report, UnknownGroupChangesNothing)
+{
+    load_plan();
+    expect_not_found("third", "a");
+    expect_not_found("First", "a");
+    expect_not_found("firs", "a");
+    expect_not_found("", "a");
+}
+
+TEST_F(Report, UnknownItemChangesNothing)
+{
+    load_plan();
+    expect_not_found("first", "d");
+    expect_not_found("first", "A");
+    expect_not_found("first", "aa");
+    expect_not_found("second", "");
+}
+
+TEST_F(Report, ItemOfAnEarlierGroupIsNotFound)
+{
+    load_plan();
+    expect_not_found("second", "a");
+}
+
+TEST_F(Report, ItemThatTheGroupLacksIsTakenFromALaterGroup)
+{
+    load_plan();
+    EXPECT_EQ(FPTEST_SetTransation("first", "c", 5, 0, "d"), 0);
+
+    EXPECT_THAT(events(), ElementsAreArray(joined({begun("c"), told(1, 5, 0, "d"), updated("c"),
+                                                   saved("plan#2"), success(), left()})));
+    EXPECT_EQ(plan_text(), plan("", "", " progress=\"5\" result=\"0\" description=\"d\""));
+}
+
+TEST_F(Report, ItemOfTheGroupItselfComesBeforeItsNamesakes)
+{
+    load_plan();
+    FPTEST_SetTransation("second", "b", 5, 0, "d");
+    EXPECT_EQ(attribute("first", "b", "progress"), nullptr);
+    EXPECT_STREQ(attribute("second", "b", "progress"), "5");
+
+    FPTEST_SetTransation("first", "b", 6, 0, "d");
+    EXPECT_STREQ(attribute("first", "b", "progress"), "6");
+    EXPECT_STREQ(attribute("second", "b", "progress"), "5");
+}
+
+TEST_F(Report, FirstOfSameNamedGroupsAndItemsIsUpdated)
+{
+    const std::string before = "<?xml version=\"1.0\"?>\n<P>\n\t<CmdGroup name=\"first\">\n";
+    const std::string behind = "\t\t<Cmd name=\"a\" />\n</CmdGroup>\n\t<CmdGroup name=\"first\">\n"
+                               "\t\t<Cmd name=\"a\" />\n</CmdGroup>\n</P>\n";
+    load_plan(before + item("a", "") + behind);
+    report(5, 0, "d");
+    EXPECT_EQ(plan_text(),
+              before + item("a", " progress=\"5\" result=\"0\" description=\"d\"") + behind);
+}
+
+TEST_F(Report, ItemBelowANestedElementIsFound)
+{
+    load_plan("<P><CmdGroup name=\"first\"><Cmd name=\"x\"/><Block><Cmd name=\"y\"/>"
+              "<Cmd name=\"a\"/></Block></CmdGroup></P>");
+    report(5, 0, "d");
+
+    EXPECT_THAT(events(), Contains(told(1, 5, 0, "d")[1]));
+    EXPECT_EQ(plan_text(), "<P>\n<CmdGroup name=\"first\">\n\t<Cmd name=\"x\" />\n\t<Block>\n"
+                           "\t\t<Cmd name=\"y\" />\n"
+                           "\t\t<Cmd name=\"a\" progress=\"5\" result=\"0\" description=\"d\" />\n"
+                           "</Block>\n</CmdGroup>\n</P>\n");
+}
+
+TEST_F(Report, MissingPlanIsToldTwiceAndChangesNothing)
+{
+    report(5, 0, "d");
+
+    const std::string reason = "(" + std::to_string(ENOENT) + "),No such file or directory";
+    EXPECT_THAT(events(), ElementsAreArray(joined(
+                              {begun("a"), failed_load("-1", reason),
+                               failed("get_node_index", "load config file failed"),
+                               told(-1, 5, 0, "d"), failed_load("-1", reason),
+                               failed("updateSrcXmlFile", "load config file failed"), left()})));
+    EXPECT_FALSE(platform::plan_exists());
+    EXPECT_EQ(g_TestCmdTree, nullptr);
+}
+
+TEST_F(Report, ReportAfterAMissingPlanLoadsTheOneThatCame)
+{
+    report(5, 0, "d");
+    events();
+    write_plan(plan());
+    report(6, 1, "e");
+
+    EXPECT_THAT(events(),
+                ElementsAreArray(joined({begun("a"), load(), told(0, 6, 1, "e"), updated("a"),
+                                         saved("plan#2"), success(), left()})));
+    EXPECT_EQ(plan_text(), plan(" progress=\"6\" result=\"1\" description=\"e\""));
+}
+
+TEST_F(Report, PlanOnDescriptorZeroIsAFailureToLoad)
+{
+    write_plan(plan());
+    plan_steps("open", {gives(0, EACCES), gives(0, EACCES)});
+    report(5, 0, "d");
+
+    EXPECT_THAT(events(), ElementsAreArray(joined(
+                              {begun("a"), failed_load("0", kReason),
+                               failed("get_node_index", "load config file failed"),
+                               told(-1, 5, 0, "d"), failed_load("0", kReason),
+                               failed("updateSrcXmlFile", "load config file failed"), left()})));
+    EXPECT_EQ(plan_text(), plan());
+}
+
+TEST_F(Report, PlanThatLoadsOnlyAtTheSecondAttemptIsUpdatedAllTheSame)
+{
+    write_plan(plan());
+    plan_steps("open", {gives(-1, EACCES)});
+    report(5, 0, "d");
+
+    EXPECT_THAT(events(),
+                ElementsAreArray(joined({begun("a"), failed_load("-1", kReason),
+                                         failed("get_node_index", "load config file failed"),
+                                         told(-1, 5, 0, "d"), load(), updated("a"), saved("plan#2"),
+                                         success(), left()})));
+    EXPECT_EQ(plan_text(), plan(" progress=\"5\" result=\"0\" description=\"d\""));
+}
+
+TEST_F(Report, PlanThatDoesNotParseHasNoLineOfItsOwn)
+{
+    write_plan("<?xml version=\"1.0\"?><P><CmdGroup name=\"first\"><Cmd name=\"a\"");
+    report(5, 0, "d");
+
+    EXPECT_THAT(events(),
+                ElementsAreArray(
+                    joined({begun("a"), load(), failed("get_node_index", "load config file failed"),
+                            told(-1, 5, 0, "d"), load("plan#2"),
+                            failed("updateSrcXmlFile", "load config file failed"), left()})));
+}
+
+TEST_F(Report, FailedSaveIsStillFollowedByTheSuccessLine)
+{
+    for (const int descriptor : {-1, 0}) {
+        SCOPED_TRACE(descriptor);
+        SetUp();
+        load_plan();
+        plan_steps("open", {gives(descriptor, EACCES)});
+        report(5, 0, "d");
+
+        EXPECT_THAT(events(), ElementsAreArray(joined({begun("a"), told(0, 5, 0, "d"), updated("a"),
+                                                       unsaved(std::to_string(descriptor)),
+                                                       success(), left()})));
+        EXPECT_EQ(plan_text(), plan());
+        EXPECT_STREQ(attribute("first", "a", "progress"), "5");
+        EXPECT_STREQ(attribute("first", "a", "result"), "0");
+        EXPECT_STREQ(attribute("first", "a", "description"), "d");
+    }
+}
+
+TEST_F(Report, NextSaveWritesTheChangesOfAFailedOneToo)
+{
+    load_plan();
+    plan_steps("open", {gives(-1, EROFS)});
+    report(5, 1, "lost");
+    EXPECT_EQ(FPTEST_SetTransation("second", "c", 6, -2, "it"), 0);
+
+    EXPECT_EQ(plan_text(), plan(" progress=\"5\" result=\"1\" description=\"lost\"", "",
+                                " progress=\"6\" result=\"-2\" description=\"it\""));
+}
+
+TEST_F(Report, NullItemNameIsLoggedAsSuch)
+{
+    EXPECT_EQ(FPTEST_SetTransation("first", nullptr, 5, 0, "d"), 0);
+    EXPECT_EQ(events()[1], "FPTEST_SetTransation| input node name = (null)\n");
+}
+
+} // namespace

@@ -1,0 +1,302 @@
+// The suspension: the item last started is looked up in the process list and
+// killed.
+#include "sequences.h"
+#include "unit_test.h"
+
+#include <cerrno>
+
+using platform::events;
+using platform::gives;
+using platform::left_open;
+using platform::plan_steps;
+using sequences::failed_launch;
+using sequences::launch;
+using sequences::launched;
+
+namespace
+{
+
+constexpr char kHeader[] = "USER     PID   PPID  VSIZE  RSS     WCHAN    PC         NAME\n";
+constexpr char kProcess[] = "root     4711  1     123456 789     ffffffff 00000000 S item\n";
+
+class Suspension : public ModuleTest
+{
+  protected:
+    // Makes the item with that name the one last started.
+    static void start_item(const std::string &name)
+    {
+        platform::write_plan("<?xml version=\"1.0\"?><P><CmdGroup name=\"g\"><Cmd name=\"" + name +
+                             "\"/></CmdGroup></P>");
+        plan_steps("popen", {gives(0)}); // no presence query: the next stream is the first
+        run_quietly("XMLNodePath::P/g");
+    }
+
+    static Lines popened(const std::string &name)
+    {
+        return {"FPTEST_SuspendItemExecute| enter... !\n", "popen(ps " + name + ", r) = stream#1"};
+    }
+    static std::string line_read(const std::string &line)
+    {
+        return "fgets(stream#1, 513) = \"" + line + "\"";
+    }
+    static Lines listed(const std::string &name, const std::string &process)
+    {
+        return joined({popened(name), {line_read(kHeader), line_read(process)}});
+    }
+    static Lines found(const std::string &pid)
+    {
+        return {"FPTEST_SuspendItemExecute| pid = " + pid + "\n"};
+    }
+
+    // What becomes of a listing in the launcher's child, which shows the command.
+    static Lines child(const std::string &listing)
+    {
+        platform::plan_output({listing});
+        plan_steps("vfork", {gives(0)});
+        platform::run_child([] { FPTEST_SuspendItemExecute(); });
+        return events();
+    }
+    // For a process line that names a process id, and the command's part of it.
+    static void expect_killed(const std::string &process, const std::string &pid,
+                              const std::string &killed)
+    {
+        platform::reset();
+        EXPECT_THAT(child(kHeader + process),
+                    ElementsAreArray(
+                        joined({listed("", process), found(pid), launched("kill 9 " + killed)})));
+    }
+    // For a process line that names none.
+    static void expect_killed_null(const std::string &process)
+    {
+        platform::reset();
+        EXPECT_THAT(child(kHeader + process),
+                    ElementsAreArray(joined({listed("", process), launched("kill 9 (null)")})));
+    }
+    // The name that reaches the process listing.
+    static std::string listed_name(const std::string &item)
+    {
+        start_item(item);
+        FPTEST_SuspendItemExecute();
+        const std::string call = events()[1];
+        const std::string start = "popen(ps ";
+        EXPECT_EQ(call.substr(0, start.size()), start);
+        return call.substr(start.size(), call.find(", r) =") - start.size());
+    }
+};
+
+TEST_F(Suspension, FirstListedProcessOfTheItemIsKilledInTheBackground)
+{
+    start_item("item");
+    platform::plan_output({std::string(kHeader) + kProcess});
+
+    EXPECT_EQ(FPTEST_SuspendItemExecute(), 0);
+    EXPECT_THAT(events(),
+                ElementsAreArray(joined({listed("item", kProcess), found("4711"), launch()})));
+    EXPECT_THAT(left_open(), ElementsAre("stream#1"));
+}
+
+TEST_F(Suspension, KillCommandNamesNineAndTheProcess)
+{
+    start_item("item");
+    EXPECT_THAT(child(std::string(kHeader) + kProcess),
+                ElementsAreArray(
+                    joined({listed("item", kProcess), found("4711"), launched("kill 9 4711")})));
+}
+
+TEST_F(Suspension, OnlyTheFirstOfSeveralProcessesIsReadAndKilled)
+{
+    start_item("item");
+    EXPECT_THAT(child(std::string(kHeader) + kProcess + "root 4712 1 item\nroot 4713 1 item\n"),
+                ElementsAreArray(
+                    joined({listed("item", kProcess), found("4711"), launched("kill 9 4711")})));
+}
+
+TEST_F(Suspension, BeforeAnyItemTheFirstProcessOfAllIsTheOne)
+{
+    expect_killed("root 1 0 /init\n", "1", "1");
+}
+
+TEST_F(Suspension, NameOfUpToTwentyEightCharactersIsListedWhole)
+{
+    EXPECT_EQ(listed_name("a"), "a");
+    for (const std::size_t length : {27U, 28U}) {
+        SCOPED_TRACE(length);
+        SetUp();
+        EXPECT_EQ(listed_name(std::string(length, 'n')), std::string(length, 'n'));
+    }
+}
+
+TEST_F(Suspension, LongerNameIsListedByItsFirstTwentyEightCharacters)
+{
+    const std::string name = "abcdefghijklmnopqrstuvwxyz01";
+    for (const std::size_t more : {1U, 36U, 72U}) {
+        SCOPED_TRACE(more);
+        SetUp();
+        EXPECT_EQ(listed_name(name + std::string(more, 'n')), name);
+    }
+}
+
+TEST_F(Suspension, NameIsListedWithoutTheVendorsSuffix)
+{
+    platform::set_vendor("1");
+    EXPECT_EQ(listed_name("item"), "item");
+    SetUp();
+    platform::set_vendor("2");
+    EXPECT_EQ(listed_name("SensorProbe"), "SensorProbe");
+}
+
+TEST_F(Suspension, ListingThatCannotBeStartedIsAFailure)
+{
+    start_item("item");
+    plan_steps("popen", {gives(0, EMFILE)});
+
+    EXPECT_EQ(FPTEST_SuspendItemExecute(), -1);
+    EXPECT_THAT(events(),
+                ElementsAre("FPTEST_SuspendItemExecute| enter... !\n", "popen(ps item, r) = null",
+                            "FPTEST_SuspendItemExecute| popen error!\n"));
+    EXPECT_THAT(left_open(), IsEmpty());
+}
+
+TEST_F(Suspension, EmptyListingIsAFailureAndStaysOpen)
+{
+    start_item("item");
+
+    EXPECT_EQ(FPTEST_SuspendItemExecute(), -1);
+    EXPECT_THAT(events(), ElementsAreArray(joined(
+                              {popened("item"),
+                               {"fgets(stream#1, 513) = null",
+                                "FPTEST_SuspendItemExecute| target process not exist!\n"}})));
+    EXPECT_THAT(left_open(), ElementsAre("stream#1"));
+}
+
+TEST_F(Suspension, ListingOfAHeaderAloneIsAFailureAndStaysOpen)
+{
+    start_item("item");
+    platform::plan_output({kHeader});
+
+    EXPECT_EQ(FPTEST_SuspendItemExecute(), -1);
+    EXPECT_THAT(events(), ElementsAreArray(joined(
+                              {popened("item"),
+                               {line_read(kHeader), "fgets(stream#1, 513) = null",
+                                "FPTEST_SuspendItemExecute| target process not exist!\n"}})));
+    EXPECT_THAT(left_open(), ElementsAre("stream#1"));
+}
+
+TEST_F(Suspension, ColumnsAreSeparatedByAnyNumberOfBlanks)
+{
+    expect_killed("root 42 1 item\n", "42", "42");
+    expect_killed("   root      42      1 item\n", "42", "42");
+    expect_killed("root 42", "42", "42");
+}
+
+TEST_F(Suspension, NothingButABlankSeparatesColumns)
+{
+    expect_killed("ro\tot 42\t1 item\n", "42\t1", "42\t1");
+    expect_killed("root 42\n", "42\n", "42\n");
+    expect_killed("root,1;2:3 word item\n", "word", "word");
+}
+
+TEST_F(Suspension, ProcessLineWithoutASecondColumnKillsNull)
+{
+    expect_killed_null("     ");
+    expect_killed_null("     \n");
+    expect_killed_null("\n");
+    expect_killed_null("root");
+    expect_killed_null("root\n");
+    expect_killed_null("   root   ");
+}
+
+TEST_F(Suspension, ProcessLineWithoutASecondColumnIsNoFailure)
+{
+    platform::plan_output({std::string(kHeader) + "root\n"});
+    EXPECT_EQ(FPTEST_SuspendItemExecute(), 0);
+    EXPECT_THAT(events(), ElementsAreArray(joined({listed("", "root\n"), launch()})));
+    EXPECT_THAT(left_open(), ElementsAre("stream#1"));
+}
+
+TEST_F(Suspension, KillCommandHoldsTwentyFourCharactersOfTheId)
+{
+    const std::string digits = "123456789012345678901234";
+    expect_killed("u " + digits.substr(1) + " x\n", digits.substr(1), digits.substr(1));
+    expect_killed("u " + digits + " x\n", digits, digits);
+    expect_killed("u " + digits + "5 x\n", digits + "5", digits);
+}
+
+TEST_F(Suspension, LineOfTheListingIsReadUpToFiveHundredTwelveCharacters)
+{
+    // the header just fits; the process line is cut within its id
+    const std::string header = std::string(511, 'H') + "\n";
+    const std::string cut = std::string(508, 'u') + " 123";
+    EXPECT_THAT(child(header + cut + "45 1 item\n"),
+                ElementsAreArray(joined({popened(""),
+                                         {line_read(header), line_read(cut)},
+                                         found("123"),
+                                         launched("kill 9 123")})));
+
+    // what a header has beyond that is taken for the process line
+    platform::reset();
+    const std::string longer(512, 'H');
+    EXPECT_THAT(child(longer + " root 42 1\nroot 43 1 item\n"),
+                ElementsAreArray(joined({popened(""),
+                                         {line_read(longer), line_read(" root 42 1\n")},
+                                         found("42"),
+                                         launched("kill 9 42")})));
+}
+
+TEST_F(Suspension, FailedKillIsNoFailure)
+{
+    platform::plan_output({std::string(kHeader) + kProcess, std::string(kHeader) + kProcess});
+    plan_steps("vfork", {gives(-1, EAGAIN)});
+    EXPECT_EQ(FPTEST_SuspendItemExecute(), 0);
+    EXPECT_THAT(events(),
+                ElementsAreArray(joined({listed("", kProcess), found("4711"), failed_launch()})));
+
+    plan_steps("waitpid", {gives(-1, ECHILD)});
+    EXPECT_EQ(FPTEST_SuspendItemExecute(), 0);
+}
+
+TEST_F(Suspension, EachCallLeavesOneMoreListingOpen)
+{
+    start_item("item");
+    platform::plan_output({std::string(kHeader) + kProcess, kHeader, ""});
+    EXPECT_EQ(FPTEST_SuspendItemExecute(), 0);
+    EXPECT_EQ(FPTEST_SuspendItemExecute(), -1);
+    EXPECT_EQ(FPTEST_SuspendItemExecute(), -1);
+    EXPECT_THAT(left_open(), ElementsAre("stream#1", "stream#2", "stream#3"));
+}
+
+TEST_F(Suspension, NameOfTheItemStaysForTheNextCall)
+{
+    start_item("item");
+    const std::string before(module::command_name(), module::command_name_size);
+    platform::plan_output({std::string(kHeader) + kProcess});
+    FPTEST_SuspendItemExecute();
+
+    EXPECT_EQ(std::string(module::command_name(), module::command_name_size), before);
+    FPTEST_SuspendItemExecute();
+    EXPECT_THAT(events(), ::testing::Contains("popen(ps item, r) = stream#2"));
+}
+
+TEST_F(Suspension, ItemThatIsRunningCanBeStoppedAndTheGroupGoesOn)
+{
+    platform::write_plan("<?xml version=\"1.0\"?><P><CmdGroup name=\"g\"><Cmd name=\"one\"/>"
+                         "<Cmd name=\"two\"/></CmdGroup></P>");
+    plan_steps("popen", {gives(0), platform::pass(), gives(0), platform::pass()});
+    platform::plan_output({std::string(kHeader) + kProcess, kHeader});
+    std::vector<int> results;
+    platform::on_system(
+        [&results](const std::string &) { results.push_back(FPTEST_SuspendItemExecute()); });
+    EXPECT_EQ(FPTEST_RunTestCmd("XMLNodePath::P/g", nullptr, 0), 0);
+
+    EXPECT_THAT(results, ElementsAre(0, -1));
+    auto calls = platform::calls();
+    std::erase_if(calls, [](const std::string &call) {
+        return !call.starts_with("system(") && !call.starts_with("popen(ps ");
+    });
+    const std::string query = "popen(ps | grep /system/bin/SensorProbe, r) = null";
+    EXPECT_THAT(
+        calls, ElementsAre(query, "system(/system/bin/one (null))", "popen(ps one, r) = stream#1",
+                           query, "system(/system/bin/two (null))", "popen(ps two, r) = stream#2"));
+}
+
+} // namespace
