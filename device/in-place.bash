@@ -1,0 +1,142 @@
+# shellcheck shell=bash disable=SC2154
+#
+# The in-place way of device/run, which sources this file: the root of this
+# container becomes the device for the time of one run and is put back after
+# it. Takes fail, leave_terminal_signals_to_command, device, mksh, program, data
+# and vendor from there.
+
+# What an interrupted run leaves to be undone by the next one: run (its mark),
+# made (the directories it made, in order) and sh (the former /bin/sh). On the
+# disk that holds /bin, so that a restarted container has both or neither.
+keep=/var/lib/quillmark-device
+
+# ---- undoing -----------------------------------------------------------------
+
+# The processes left behind by the run with mark $1: those that carry the mark in
+# their environment, and those started from /system/bin by their full name.
+left_behind()
+{
+	local path name
+
+	grep -lzsxF "QUILLMARK_DEVICE_RUN=$1" /proc/[0-9]*/environ | cut -d/ -f3
+	for path in /proc/[0-9]*; do
+		name=''
+		{ IFS= read -r -d '' name <"$path/cmdline"; } 2>/dev/null
+		[[ $name = /system/bin/* ]] && echo "${path##*/}"
+	done
+}
+
+# Asks them to end, waits for a second, then insists.
+stop_left_behind()
+{
+	local pids tries
+
+	mapfile -t pids < <(left_behind "$1")
+	((${#pids[@]} > 0)) && kill -TERM "${pids[@]}" 2>/dev/null
+	for ((tries = 0; tries < 50 && ${#pids[@]} > 0; tries++)); do
+		sleep 0.02
+		mapfile -t pids < <(left_behind "$1")
+	done
+	((${#pids[@]} > 0)) && kill -KILL "${pids[@]}" 2>/dev/null
+}
+
+put_shell_back()
+{
+	[[ -e $keep/sh || -L $keep/sh ]] || return 0
+	cp -P --preserve=all "$keep/sh" /bin/.sh-quillmark && mv -fT /bin/.sh-quillmark /bin/sh
+}
+
+# Undoes what this run, or an interrupted one before it, has done.
+put_back()
+{
+	local path mark=''
+
+	[[ -d $keep ]] || return
+	trap '' TERM HUP
+	read -r mark 2>/dev/null <"$keep/run"
+	stop_left_behind "$mark"
+	if ! put_shell_back; then
+		printf 'device/run: in place: /bin/sh cannot be put back; it is kept in %s\n' "$keep" >&2
+		return
+	fi
+	while read -r path; do
+		case $path in
+		/system/bin | /data/vorlane | /etc/vorlane) rm -rf -- "$path" ;;
+		*) rmdir -- "$path" 2>/dev/null ;;
+		esac
+	done < <(tac -- "$keep/made" 2>/dev/null)
+	rm -rf -- "$keep"
+}
+
+# ---- making the device -------------------------------------------------------
+
+take_the_container()
+{
+	exec {lock}</
+	if ! flock --nonblock "$lock"; then
+		echo 'device/run: in place: waiting for the run that has this container' >&2
+		flock "$lock"
+	fi
+}
+
+# Notes a path before it is made, so that an interruption leaves none unnoted.
+make_directory()
+{
+	[[ -d $1 ]] || { echo "$1" >>"$keep/made" && mkdir -- "$1"; }
+}
+
+# One process makes all the links; with ln it would be one for each.
+fill_system_bin()
+{
+	local name links=()
+
+	for name in "${!program[@]}"; do
+		[[ $name = sh ]] || links+=("${program[$name]}" "/system/bin/$name")
+	done
+	perl -e 'while (@ARGV) { symlink(shift, shift) or die "/system/bin: $!\n" }' -- "${links[@]}" &&
+		install -m 755 -- "$device/guard" /system/bin/sh
+}
+
+point_shell_at_mksh()
+{
+	cp -P --preserve=all /bin/sh "$keep/sh-new" && mv -T "$keep/sh-new" "$keep/sh" &&
+		ln -sfT -- "$mksh" /bin/.sh-quillmark && mv -fT /bin/.sh-quillmark /bin/sh
+}
+
+lay_out_container()
+{
+	mkdir -- "$keep" && echo "$run_mark" >"$keep/run" &&
+		make_directory /system && make_directory /system/bin && make_directory /data &&
+		make_directory /etc/vorlane && make_directory /etc/vorlane/sysparms || return
+	if [[ -n $data ]]; then
+		echo /data/vorlane >>"$keep/made" && ln -s -- "$data" /data/vorlane || return
+	else
+		make_directory /data/vorlane || return
+	fi
+	fill_system_bin && point_shell_at_mksh
+}
+
+be_the_device()
+{
+	local path complaint run_mark="$$-$EPOCHREALTIME"
+
+	take_the_container
+	leave_terminal_signals_to_command
+	put_back
+	for path in /system/bin /data/vorlane /etc/vorlane; do
+		[[ -e $path || -L $path ]] && fail "in place: $path exists already; move it away first"
+	done
+
+	trap put_back EXIT
+	trap 'exit 129' HUP
+	trap 'exit 143' TERM
+	complaint=$(lay_out_container 2>&1) || fail "in place: ${complaint%%$'\n'*}"
+
+	# Without this script nothing would put the container back while COMMAND
+	# went on; so COMMAND ends with it.
+	PATH=/system/bin TMPDIR=/tmp QUILLMARK_DEVICE=in-place QUILLMARK_DEVICE_RUN=$run_mark \
+		/usr/bin/setpriv --pdeathsig KILL -- \
+		"$mksh" "$device/start" "$vendor" "$default_signals" "$@" <&0 {lock}<&- &
+	wait $!
+	exit
+}

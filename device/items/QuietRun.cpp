@@ -1,0 +1,12 @@
+// A sample item that runs, passes and never reports.
+
+#include "item.h"
+
+int main(int argc, char **argv)
+{
+    using namespace std::chrono_literals;
+    const Item item(argc, argv, "Runs and never reports.", 300ms);
+
+    item.work(1);
+    return 0;
+}
