@@ -254,6 +254,10 @@ TEST_F(CommandEntry, NothingButColonsSeparates)
     EXPECT_EQ(name(message), field(" n,\n. ", 2049));
     EXPECT_EQ(args(message), field(" a|", 1024));
     EXPECT_EQ(events(), parsed(" h;\t/ ", " n,\n. ", " a|"));
+
+    const std::string text = every_character_but(":");
+    module::ParseCmdLine((text + ":" + text + ":" + text).c_str(), &message);
+    EXPECT_EQ(events(), parsed(text, text, text));
 }
 
 TEST_F(CommandEntry, FourthAndLaterFieldsAreIgnored)

@@ -274,6 +274,20 @@ TEST_F(NodePath, ComponentsAreSplitInPlaceLoggedAndZeroFilled)
     EXPECT_STREQ(path.c_str() + 6, "g g");
 }
 
+TEST_F(NodePath, NothingButSlashesSeparates)
+{
+    const std::string name = every_character_but("/");
+    std::string path = name + "/" + name + "/" + name;
+    std::string last(64, 'x');
+    EXPECT_EQ(module::get_node_level(path.c_str(), last.data(), 64), 3);
+    events();
+
+    std::string group(64, 'x');
+    std::string item(64, 'x');
+    module::get_node_name(path.data(), group.data(), 64, item.data(), 64);
+    EXPECT_EQ(events(), split(name, name, name));
+}
+
 TEST_F(NodePath, MissingComponentLeavesItsBufferAsItWas)
 {
     const struct {

@@ -194,6 +194,8 @@ TEST_F(Suspension, NothingButABlankSeparatesColumns)
     expect_killed("ro\tot 42\t1 item\n", "42\t1", "42\t1");
     expect_killed("root 42\n", "42\n", "42\n");
     expect_killed("root,1;2:3 word item\n", "word", "word");
+    const std::string text = every_character_but(" \n");
+    expect_killed(text + " " + text, text, text.substr(0, 24));
 }
 
 TEST_F(Suspension, ProcessLineWithoutASecondColumnKillsNull)

@@ -23,6 +23,19 @@ inline Lines joined(std::initializer_list<Lines> parts)
     return all;
 }
 
+// Every character that a string can hold, except those.
+inline std::string every_character_but(const std::string &these)
+{
+    std::string text;
+    for (int code = 1; code < 256; ++code) {
+        const char character = static_cast<char>(code);
+        if (these.find(character) == std::string::npos) {
+            text += character;
+        }
+    }
+    return text;
+}
+
 // The module as at load time, on a platform without a test plan.
 class ModuleTest : public ::testing::Test
 {
