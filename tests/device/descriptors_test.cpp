@@ -1,0 +1,166 @@
+// What the calls leave in the host's descriptor table, and descriptor 0.
+#include "device_test.h"
+
+#include <fcntl.h>
+#include <set>
+#include <unistd.h>
+
+using namespace device;
+
+namespace
+{
+
+class Descriptors : public DeviceTest
+{
+  protected:
+    void SetUp() override
+    {
+        DeviceTest::SetUp();
+        FPTEST_RunTestCmd("unknown", nullptr, 0); // the log opens its file
+        opened();
+        log_lines();
+    }
+
+    // What has been opened since the last call and is open still.
+    Lines opened()
+    {
+        Lines targets;
+        for (const auto &[descriptor, target] : descriptors()) {
+            if (known_.insert(descriptor).second) {
+                targets.push_back(target);
+            }
+        }
+        return targets;
+    }
+
+  private:
+    std::set<int> known_;
+};
+
+// Standard input's place is free while this lives.
+class FreeDescriptorZero
+{
+  public:
+    FreeDescriptorZero() : kept_(dup(STDIN_FILENO))
+    {
+        close(STDIN_FILENO);
+    }
+    ~FreeDescriptorZero()
+    {
+        dup2(kept_, STDIN_FILENO);
+        close(kept_);
+    }
+    FreeDescriptorZero(const FreeDescriptorZero &) = delete;
+    FreeDescriptorZero &operator=(const FreeDescriptorZero &) = delete;
+
+  private:
+    int kept_;
+};
+
+std::string target_of(int descriptor)
+{
+    for (const auto &[number, target] : descriptors()) {
+        if (number == descriptor) {
+            return target;
+        }
+    }
+    return "closed";
+}
+
+TEST_F(Descriptors, EveryStoredPlanLeavesOneOpen)
+{
+    for (int plan = 0; plan < 3; ++plan) {
+        store("<P/>");
+    }
+    // each names the file that the next one has removed
+    EXPECT_THAT(opened(), ElementsAre("/data/vorlane/src1.xml (deleted)",
+                                      "/data/vorlane/src1.xml (deleted)", kPlanFile));
+}
+
+TEST_F(Descriptors, RunsReportsAndReadBacksLeaveNoneOpen)
+{
+    store(plan_of({{"G", {{"Note", ""}}}}));
+    opened();
+    for (int round = 0; round < 3; ++round) {
+        run_path("P/G");
+        run_path("P/G/Note");
+        FPTEST_SetTransation("G", "Note", 100, 0, "done");
+        read_back();
+    }
+    EXPECT_THAT(opened(), IsEmpty());
+}
+
+TEST_F(Descriptors, ZeroIsASuccessForStoring)
+{
+    const FreeDescriptorZero free;
+    store("<P/>");
+
+    EXPECT_EQ(target_of(0), kPlanFile);
+    EXPECT_EQ(read_file(kPlanFile), "<P/>");
+    EXPECT_THAT(log_lines(), ElementsAre("fptest_ParseCmdLine| testHead is : XMLFile",
+                                         "fptest_ParseCmdLine| testName is : <P/>",
+                                         "FPTEST_RunTestCmd| Save source xml file success!"));
+}
+
+TEST_F(Descriptors, ZeroIsAFailureForLoadingAndStaysOpen)
+{
+    write_file(kPlanFile, plan_of({{"G", {{"Note", ""}}}}));
+    const FreeDescriptorZero free;
+    run_path("P/G");
+
+    EXPECT_EQ(target_of(0), kPlanFile);
+    EXPECT_THAT(log_lines(), ::testing::Contains(::testing::StartsWith(
+                                 "load_configs_file| Open /data/vorlane/src1.xml file failed(")));
+    EXPECT_THAT(ran(), IsEmpty());
+
+    run_path("P/G"); // now that 0 is taken
+    EXPECT_THAT(ran(), ElementsAre("/system/bin/Note"));
+}
+
+TEST_F(Descriptors, ZeroIsAFailureForSavingAndHasEmptiedTheFile)
+{
+    store(plan_of({{"G", {{"Note", ""}}}}));
+    run_path("P/G");
+    log_lines();
+    const FreeDescriptorZero free;
+    FPTEST_SetTransation("G", "Note", 1, 0, "first");
+
+    EXPECT_EQ(target_of(0), kPlanFile);
+    EXPECT_EQ(read_file(kPlanFile), "");
+    const Lines lines = log_lines();
+    ASSERT_GE(lines.size(), 3U);
+    EXPECT_THAT(lines.end()[-3],
+                ::testing::StartsWith("save_XmlFile| Open /data/vorlane/src1.xml file failed("));
+    EXPECT_EQ(lines.end()[-2], "updateSrcXmlFile| update Src Xml File success . leave...");
+
+    // the change has stayed in the cache and goes out with the next report
+    write_file(kPlanFile, "");
+    FPTEST_SetTransation("G", "Note", 2, 1, "second");
+    EXPECT_THAT(read_file(kPlanFile), HasSubstr("description=\"second\""));
+}
+
+TEST_F(Descriptors, ZeroIsAFailureForReadingBackAndStaysOpen)
+{
+    write_file(kPlanFile, "text");
+    const FreeDescriptorZero free;
+    char buffer[8] = "-------";
+    FPTEST_ExtractResultMsg(buffer, 4);
+
+    EXPECT_STREQ(buffer, "-------");
+    EXPECT_EQ(target_of(0), kPlanFile);
+    EXPECT_THAT(log_lines(),
+                ElementsAre("FPTEST_ExtractResultMsg| enter... !",
+                            "FPTEST_ExtractResultMsg| Open /data/vorlane/src1.xml file failed!"));
+}
+
+TEST_F(Descriptors, PlanFileIsCreatedForEveryoneToReadAndWriteLessTheUmask)
+{
+    umask(0027);
+    store("<P/>");
+    struct stat status {
+    };
+    ASSERT_EQ(stat(kPlanFile, &status), 0);
+    EXPECT_EQ(status.st_mode & 07777, 0640U);
+}
+
+} // namespace

@@ -1,0 +1,101 @@
+// What the tests on the virtual device share. They link the libraries as they
+// are shipped; each runs in a process and a device of its own.
+#pragma once
+
+#include "quillmark.h"
+
+#include <gmock/gmock.h>
+#include <gtest/gtest.h>
+
+#include <functional>
+#include <string>
+#include <sys/types.h>
+#include <utility>
+#include <vector>
+
+namespace device
+{
+
+inline constexpr char kPlanFile[] = "/data/vorlane/src1.xml";
+inline constexpr char kParameterFile[] = "/etc/vorlane/sysparms/vr_common_cfg.xml";
+inline constexpr char kLogFile[] = "/tmp/vr.log";
+inline constexpr unsigned short kTriggerPort = 34952;
+
+using Lines = std::vector<std::string>;
+
+// --- plans and commands ----------------------------------------------------
+
+struct PlanItem {
+    std::string name;
+    std::string args;
+};
+
+// A plan of one group after another, without a declaration and without white
+// space, so that many items fit into what a command can carry.
+std::string plan_of(const std::vector<std::pair<std::string, std::vector<PlanItem>>> &groups);
+
+void store(const std::string &plan);
+
+// Sends "XMLNodePath::PATH" and expects the empty reply.
+void run_path(const std::string &path);
+
+std::string read_back(int room = 64 * 1024);
+
+// --- files -----------------------------------------------------------------
+
+std::string read_file(const std::string &path);
+void write_file(const std::string &path, const std::string &text);
+
+// The parameter file, with this text for the vendor selector.
+void set_vendor(const std::string &text);
+
+// What the test items have noted of themselves: "PROGRAM|ARG|ARG" a line.
+Lines ran();
+
+// --- log -------------------------------------------------------------------
+
+// The log lines since the last call, of this process or of the one named, as
+// "FUNCTION| TEXT"; a place "FUNCTION[line]" is written "FUNCTION[]". Other tags
+// are "TAG: TEXT".
+Lines log_lines();
+Lines log_lines(pid_t process);
+
+// --- processes and descriptors ---------------------------------------------
+
+struct Process {
+    pid_t pid = 0;
+    pid_t parent = 0;
+    char state = '?';
+    std::string name; // argv[0], or the kernel's name
+};
+
+std::vector<Process> processes();
+
+// Those of them with exactly that name.
+std::vector<Process> processes_named(const std::string &name);
+
+// A field of /proc/PID/status, as it stands there.
+std::string status_field(pid_t pid, const std::string &field);
+
+// Descriptors of this process with what they refer to; the log's is left out.
+std::vector<std::pair<int, std::string>> descriptors();
+
+// Starts a program by its whole path, and expects that it is there.
+pid_t start_program(const std::vector<std::string> &arguments);
+
+bool wait_for(const std::function<bool()> &condition, double seconds = 10);
+
+} // namespace device
+
+// The log goes to a file, SIGPIPE is ignored as hosts should, and what a test
+// has left running is ended with it.
+class DeviceTest : public ::testing::Test
+{
+  protected:
+    void SetUp() override;
+    void TearDown() override;
+};
+
+using ::testing::ElementsAre;
+using ::testing::HasSubstr;
+using ::testing::IsEmpty;

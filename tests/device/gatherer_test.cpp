@@ -1,0 +1,301 @@
+// The gatherer: started in the background only if none runs, and told to gather
+// over one real connection for each command.
+#include "device_test.h"
+#include "network.h"
+
+#include <algorithm>
+#include <cerrno>
+#include <csignal>
+#include <sys/resource.h>
+#include <sys/socket.h>
+#include <thread>
+#include <unistd.h>
+
+using namespace device;
+
+namespace
+{
+
+constexpr char kProbe[] = "/system/bin/SensorProbe";
+// Its name holds the gatherer's, so that it counts as one; it connects nowhere.
+constexpr char kHolder[] = "/system/bin/SensorProbeHolder";
+
+class Gatherer : public DeviceTest
+{
+  protected:
+    static void store_plan(const std::string &args = "--group G")
+    {
+        store(plan_of({{"G", {{"SensorProbe", args}, {"Note", "x"}}}}));
+    }
+
+    // Runs the command in its own thread while a client of ours is triggered.
+    static std::string trigger_own_client(unsigned short port = kTriggerPort)
+    {
+        std::thread command([] { run_path("P/G/SensorProbe"); });
+        const Socket client = connect_to(port);
+        command.join();
+        return receive(client);
+    }
+
+    static std::size_t count_open(const std::string &kind)
+    {
+        const auto open = descriptors();
+        return static_cast<std::size_t>(
+            std::count_if(open.begin(), open.end(), [&](const auto &descriptor) {
+                return descriptor.second.starts_with(kind);
+            }));
+    }
+};
+
+TEST_F(Gatherer, FirstCommandStartsItAndTriggersIt)
+{
+    store_plan();
+    run_path("P/G/SensorProbe");
+
+    EXPECT_EQ(processes_named(kProbe).size(), 1U);
+    EXPECT_TRUE(wait_for([] { return read_back().find("result=\"0\"") != std::string::npos; }));
+    EXPECT_THAT(log_lines(), ::testing::IsSupersetOf(
+                                 {"ResourceReduce| target process not exist!",
+                                  "SingleItemExecute| tpCmd:/system/bin/SensorProbe --group G",
+                                  "SingleItemExecute| \nrow=0", "Sock_Init1| retWri=13",
+                                  "Sock_Init1| retWri success", "SingleItemExecute| leave... !"}));
+}
+
+TEST_F(Gatherer, SecondCommandStartsNoOtherAndLogsNoLeaveLine)
+{
+    store_plan();
+    run_path("P/G/SensorProbe");
+    const auto first = processes_named(kProbe);
+    log_lines();
+    run_path("P/G/SensorProbe");
+
+    const auto second = processes_named(kProbe);
+    ASSERT_EQ(first.size(), 1U);
+    // a report may be made by a child of the same name at this moment
+    EXPECT_TRUE(std::any_of(second.begin(), second.end(),
+                            [&](const Process &process) { return process.pid == first[0].pid; }));
+    for (const Process &process : second) {
+        EXPECT_TRUE(process.pid == first[0].pid || process.parent == first[0].pid);
+    }
+    const Lines lines = log_lines();
+    ASSERT_GE(lines.size(), 3U);
+    EXPECT_EQ(lines.end()[-3], "SingleItemExecute| \nrow=1");
+    EXPECT_EQ(lines.end()[-2], "Sock_Init1| retWri=13");
+    EXPECT_EQ(lines.end()[-1], "Sock_Init1| retWri success");
+}
+
+TEST_F(Gatherer, RunsAsItsVariantUnderVendorOne)
+{
+    set_vendor("1");
+    store_plan();
+    run_path("P/G/SensorProbe");
+
+    EXPECT_EQ(processes_named("/system/bin/SensorProbe_ca").size(), 1U);
+    EXPECT_THAT(processes_named(kProbe), IsEmpty());
+    EXPECT_THAT(
+        log_lines(),
+        ::testing::IsSupersetOf({"SingleItemExecute| tLine:SensorProbe_ca",
+                                 "SingleItemExecute| tpCmd:/system/bin/SensorProbe_ca --group G"}));
+}
+
+TEST_F(Gatherer, VariantThatRunsCountsAsRunningUnderEveryVendor)
+{
+    set_vendor("1");
+    store_plan();
+    run_path("P/G/SensorProbe");
+    set_vendor("0");
+    log_lines();
+    run_path("P/G/SensorProbe");
+
+    EXPECT_THAT(processes_named(kProbe), IsEmpty());
+    EXPECT_THAT(log_lines(), ::testing::IsSupersetOf(
+                                 {"SingleItemExecute| tpCmd:/system/bin/SensorProbe --group G",
+                                  "SingleItemExecute| \nrow=1"}));
+}
+
+TEST_F(Gatherer, IsAnOrdinaryItemUnderVendorTwo)
+{
+    set_vendor("2");
+    store_plan();
+    run_path("P/G/SensorProbe");
+
+    // it has run and ended, untriggered
+    EXPECT_THAT(processes_named("/system/bin/SensorProbe_ca_qsee"), IsEmpty());
+    EXPECT_THAT(read_back(), HasSubstr("result=\"0\""));
+    const Lines lines = log_lines();
+    EXPECT_THAT(lines, ::testing::Contains(
+                           "SingleItemExecute| tpCmd:/system/bin/SensorProbe_ca_qsee --group G"));
+    EXPECT_THAT(lines, ::testing::Each(::testing::Not(::testing::StartsWith("Sock_Init1"))));
+}
+
+TEST_F(Gatherer, ClientGetsThirteenBytesAndTheConnectionStaysOpen)
+{
+    start_program({kHolder, "--sleep", "60"});
+    store_plan();
+
+    EXPECT_EQ(trigger_own_client(), "gather again!");
+    EXPECT_THAT(processes_named(kProbe), IsEmpty());
+}
+
+TEST_F(Gatherer, EachCommandLeavesOneConnectionAndNoListener)
+{
+    start_program({kHolder, "--sleep", "60"});
+    store_plan();
+    const std::size_t before = count_open("socket:");
+    for (std::size_t round = 1; round <= 3; ++round) {
+        EXPECT_EQ(trigger_own_client(), "gather again!");
+        EXPECT_EQ(count_open("socket:"), before + round);
+        EXPECT_THAT(listeners(), IsEmpty());
+    }
+}
+
+TEST_F(Gatherer, IsAwaitedOnEveryLocalAddressForAsLongAsItTakes)
+{
+    start_program({kHolder, "--sleep", "60"});
+    store_plan();
+    bool returned = false;
+    std::thread command([&] {
+        run_path("P/G/SensorProbe");
+        returned = true;
+    });
+    EXPECT_TRUE(wait_for([] { return !listeners().empty(); }));
+    EXPECT_THAT(listeners(), ElementsAre("00000000:8888"));
+    std::this_thread::sleep_for(std::chrono::milliseconds(500));
+    EXPECT_FALSE(returned);
+
+    connect_to(kTriggerPort);
+    command.join();
+    EXPECT_TRUE(returned);
+}
+
+TEST_F(Gatherer, ItemsBehindItInAGroupRunOnceItIsTriggered)
+{
+    store_plan();
+    run_path("P/G");
+    EXPECT_THAT(ran(), ElementsAre("/system/bin/Note|x"));
+}
+
+TEST_F(Gatherer, TakenPortGoesUnnoticedAndTheCommandWaitsElsewhere)
+{
+    start_program({kHolder, "--sleep", "60"});
+    store_plan();
+    const Socket other(socket(AF_INET, SOCK_STREAM, 0));
+    sockaddr_in address = loopback(kTriggerPort);
+    ASSERT_EQ(bind(other.get(), reinterpret_cast<sockaddr *>(&address), sizeof address), 0);
+    ASSERT_EQ(listen(other.get(), 1), 0);
+    log_lines();
+
+    std::thread command([] { run_path("P/G/SensorProbe"); });
+    Lines found;
+    EXPECT_TRUE(wait_for([&] {
+        found = listeners();
+        std::erase(found, "0100007F:8888");
+        return !found.empty();
+    }));
+    ASSERT_EQ(found.size(), 1U);
+    ASSERT_TRUE(found[0].starts_with("00000000:")) << found[0];
+    const auto port = static_cast<unsigned short>(std::stoul(found[0].substr(9), nullptr, 16));
+    const Socket client = connect_to(port);
+    command.join();
+
+    EXPECT_EQ(receive(client), "gather again!");
+    EXPECT_THAT(log_lines(),
+                ::testing::IsSupersetOf({"VRSOCK: bind failed(98),Address already in use",
+                                         "Sock_Init1| retWri=13", "Sock_Init1| retWri success"}));
+}
+
+// The process may open so many descriptors more, and no other.
+class DescriptorLimit
+{
+  public:
+    explicit DescriptorLimit(rlim_t more)
+    {
+        getrlimit(RLIMIT_NOFILE, &before_);
+        const int next = dup(STDIN_FILENO);
+        close(next);
+        const rlimit tight{static_cast<rlim_t>(next) + more, before_.rlim_max};
+        EXPECT_EQ(setrlimit(RLIMIT_NOFILE, &tight), 0);
+    }
+    ~DescriptorLimit()
+    {
+        setrlimit(RLIMIT_NOFILE, &before_);
+    }
+    DescriptorLimit(const DescriptorLimit &) = delete;
+    DescriptorLimit &operator=(const DescriptorLimit &) = delete;
+
+  private:
+    rlimit before_{};
+};
+
+TEST_F(Gatherer, IsStartedWhenTheQueryCannotBeAndAFailedAcceptLeavesItsListenerOpen)
+{
+    store_plan();
+    run_path("P/G/Note"); // loads the plan
+    log_lines();
+    {
+        // enough for the listening socket, but for no pipe and no connection
+        const DescriptorLimit limit(1);
+        run_path("P/G/SensorProbe");
+    }
+    const Lines lines = log_lines();
+    ASSERT_GE(lines.size(), 6U);
+    EXPECT_THAT(Lines(lines.end() - 6, lines.end()),
+                ElementsAre("ResourceReduce| popen error!",
+                            "SingleItemExecute| tpCmd:/system/bin/SensorProbe --group G",
+                            "SingleItemExecute| \nrow=-1", "Sock_Init1| accept error!",
+                            "Sock_Init1| errno=" + std::to_string(EMFILE),
+                            "SingleItemExecute| leave... !"));
+    EXPECT_THAT(listeners(), ElementsAre("00000000:8888"));
+}
+
+TEST_F(Gatherer, StartedInTheBackgroundItStaysUnreapedWhenItEnds)
+{
+    store_plan();
+    run_path("P/G/SensorProbe");
+    const auto running = processes_named(kProbe);
+    ASSERT_EQ(running.size(), 1U);
+
+    kill(running[0].pid, SIGKILL);
+    const auto is_zombie = [](const Process &process) {
+        return process.parent == getpid() && process.state == 'Z';
+    };
+    EXPECT_TRUE(wait_for([&] {
+        const auto all = processes();
+        return std::any_of(all.begin(), all.end(), is_zombie);
+    }));
+    run_path("P"); // nothing later reaps it
+    const auto all = processes();
+    EXPECT_EQ(std::count_if(all.begin(), all.end(), is_zombie), 1);
+}
+
+void host_handler(int /*signal*/)
+{
+}
+
+TEST_F(Gatherer, LauncherPutsTheHostsSignalsBackAndTheChildIgnoresNone)
+{
+    sigset_t mask;
+    sigset_t before;
+    sigset_t after;
+    sigemptyset(&mask);
+    sigaddset(&mask, SIGUSR2);
+    sigprocmask(SIG_BLOCK, &mask, &before);
+    std::signal(SIGINT, host_handler);
+    std::signal(SIGQUIT, host_handler);
+    store_plan();
+    run_path("P/G/SensorProbe");
+
+    EXPECT_EQ(std::signal(SIGINT, SIG_DFL), host_handler);
+    EXPECT_EQ(std::signal(SIGQUIT, SIG_DFL), host_handler);
+    sigprocmask(SIG_SETMASK, &before, &after);
+    EXPECT_EQ(sigismember(&after, SIGUSR2), 1);
+    EXPECT_EQ(sigismember(&after, SIGCHLD), 0);
+
+    const auto running = processes_named(kProbe);
+    ASSERT_EQ(running.size(), 1U);
+    const auto ignored = std::stoull(status_field(running[0].pid, "SigIgn"), nullptr, 16);
+    const auto bit = [](int signal) { return 1ULL << (signal - 1); };
+    EXPECT_EQ(ignored & (bit(SIGINT) | bit(SIGQUIT)), 0U);
+}
+
+} // namespace

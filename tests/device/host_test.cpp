@@ -1,0 +1,68 @@
+// Hosts of other kinds, and what the library needs of its surroundings.
+#include "device_test.h"
+
+#include <array>
+#include <cstdio>
+#include <cstdlib>
+#include <memory>
+
+using namespace device;
+
+namespace
+{
+
+class Host : public DeviceTest
+{
+};
+
+std::string output_of(const std::string &command)
+{
+    std::string output;
+    const std::unique_ptr<FILE, int (*)(FILE *)> pipe(popen(command.c_str(), "r"), &pclose);
+    std::array<char, 256> buffer{};
+    while (fgets(buffer.data(), buffer.size(), pipe.get()) != nullptr) {
+        output += buffer.data();
+    }
+    return output;
+}
+
+constexpr char kTests[] = QUILLMARK_BINARY_DIR "/tests/device/";
+
+TEST_F(Host, InCGetsItsPingOnce)
+{
+    EXPECT_EQ(output_of(std::string(kTests) + "c_host"),
+              "0 <Ping Success!> <> 32 2049 1024 no plan\n");
+}
+
+TEST_F(Host, MakersLibraryIsReplacedAtLoadTime)
+{
+    unsetenv("VR_LOG_FILE");
+    EXPECT_EQ(
+        output_of("LD_PRELOAD=" + std::string(kTests) + "libother_vorlane.so " + kTests + "c_host"),
+        "other log: 4 VRCODE => testHead is : %s\n"
+        "other log: 4 VRCODE => Get ping reply success!\n"
+        "other log: 4 VRCODE => testHead is : %s\n"
+        "0 <Ping Success!> <> 32 2049 1024 no plan\n");
+}
+
+TEST_F(Host, FirstPingOfTheProcessIsAnsweredAndNoOther)
+{
+    std::array<char, 64> reply{};
+    EXPECT_EQ(FPTEST_RunTestCmd("pingtest::x", nullptr, 0), 0);
+    EXPECT_EQ(FPTEST_RunTestCmd("pingtest", reply.data(), reply.size()), 0);
+    EXPECT_STREQ(reply.data(), "");
+}
+
+TEST_F(Host, SeesTheCachedPlanThroughTheExportedVariable)
+{
+    EXPECT_EQ(g_TestCmdTree, nullptr);
+    store(plan_of({{"G", {{"Note", ""}}}}));
+    EXPECT_EQ(g_TestCmdTree, nullptr);
+    run_path("P/G");
+    ASSERT_NE(g_TestCmdTree, nullptr);
+    EXPECT_STREQ(mxmlGetElement(g_TestCmdTree), "P");
+    store("<P/>");
+    EXPECT_EQ(g_TestCmdTree, nullptr);
+}
+
+} // namespace

@@ -1,0 +1,68 @@
+// These tests run on the virtual device. Started anywhere else, the program
+// starts itself again there, so that it never touches the machine it is on.
+#include <gtest/gtest.h>
+
+#include <cstdio>
+#include <cstdlib>
+#include <string>
+#include <string_view>
+#include <sys/wait.h>
+#include <unistd.h>
+#include <vector>
+
+namespace
+{
+
+constexpr int kDeviceFailed = 125; // device/run's own failure
+constexpr int kSkipped = 77;       // known to CTest
+
+int run_on_device(const std::vector<std::string> &arguments)
+{
+    const pid_t pid = fork();
+    if (pid == 0) {
+        std::vector<const char *> argv;
+        for (const std::string &argument : arguments) {
+            argv.push_back(argument.c_str());
+        }
+        argv.push_back(nullptr);
+        execv(argv[0], const_cast<char *const *>(argv.data()));
+        std::perror(argv[0]);
+        _exit(kDeviceFailed);
+    }
+    int status = 0;
+    if (pid < 0 || waitpid(pid, &status, 0) != pid) {
+        std::perror("device_tests");
+        return EXIT_FAILURE;
+    }
+    if (!WIFEXITED(status)) {
+        std::fprintf(stderr, "device_tests: ended by signal %d\n", WTERMSIG(status));
+        return EXIT_FAILURE;
+    }
+    if (WEXITSTATUS(status) != kDeviceFailed) {
+        return WEXITSTATUS(status);
+    }
+    const char *ci = std::getenv("CI");
+    const bool must_run = ci != nullptr && std::string_view(ci) == "true";
+    std::fprintf(stderr, "device_tests: the virtual device did not start: %s\n",
+                 must_run ? "failed" : "not run");
+    return must_run ? EXIT_FAILURE : kSkipped;
+}
+
+} // namespace
+
+int main(int argc, char **argv)
+{
+    std::vector<std::string> arguments = {QUILLMARK_SOURCE_DIR "/device/run",
+                                          "--build",
+                                          QUILLMARK_BINARY_DIR,
+                                          "--bin",
+                                          QUILLMARK_BINARY_DIR "/tests/device/items",
+                                          "--",
+                                          QUILLMARK_BINARY_DIR "/tests/device/device_tests"};
+    arguments.insert(arguments.end(), argv + 1, argv + argc);
+    testing::InitGoogleTest(&argc, argv);
+    if (GTEST_FLAG_GET(list_tests) || std::getenv("QUILLMARK_DEVICE") != nullptr) {
+        return RUN_ALL_TESTS();
+    }
+    return run_on_device(arguments);
+}

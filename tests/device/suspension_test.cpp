@@ -1,0 +1,220 @@
+// Stopping the item last started, with the real ps and the real kill.
+#include "device_test.h"
+
+#include <algorithm>
+#include <chrono>
+#include <csignal>
+#include <filesystem>
+#include <sys/wait.h>
+#include <thread>
+#include <unistd.h>
+
+using namespace device;
+
+namespace
+{
+
+// 31 and 34 characters that share their first 28.
+constexpr char kLong[] = "ItemWithANameOfTwentyEightChars";
+constexpr char kLonger[] = "ItemWithANameOfTwentyEightCharsToo";
+
+class Suspension : public DeviceTest
+{
+  protected:
+    // Runs the path in a thread of its own while the body stops it.
+    template <typename Body> static double stop_while_running(const std::string &path, Body body)
+    {
+        const auto start = std::chrono::steady_clock::now();
+        std::thread command([&] { run_path(path); });
+        body();
+        command.join();
+        return std::chrono::duration<double>(std::chrono::steady_clock::now() - start).count();
+    }
+};
+
+TEST_F(Suspension, RunningItemIsStoppedAndItsCommandReturns)
+{
+    store(plan_of({{"G", {{"Note", "--sleep 60"}}}}));
+    pid_t pid = 0;
+    const double seconds = stop_while_running("P/G/Note", [&] {
+        EXPECT_TRUE(wait_for([] { return !processes_named("/system/bin/Note").empty(); }));
+        pid = processes_named("/system/bin/Note").at(0).pid;
+        EXPECT_EQ(FPTEST_SuspendItemExecute(), 0);
+    });
+    EXPECT_LT(seconds, 30);
+    EXPECT_THAT(processes_named("/system/bin/Note"), IsEmpty());
+    EXPECT_THAT(log_lines(),
+                ::testing::IsSupersetOf({std::string("FPTEST_SuspendItemExecute| enter... !"),
+                                         "FPTEST_SuspendItemExecute| pid = " + std::to_string(pid),
+                                         std::string("SingleItemExecute| leave... !")}));
+}
+
+TEST_F(Suspension, StoppedItemIsFollowedByTheNextOfItsGroup)
+{
+    store(plan_of({{"G", {{"Note", "--sleep 60"}, {"ab", "next"}}}}));
+    stop_while_running("P/G", [] {
+        EXPECT_TRUE(wait_for([] { return !processes_named("/system/bin/Note").empty(); }));
+        EXPECT_EQ(FPTEST_SuspendItemExecute(), 0);
+    });
+    EXPECT_THAT(ran(), ElementsAre("/system/bin/Note|--sleep|60", "/system/bin/ab|next"));
+}
+
+TEST_F(Suspension, ItemIsFoundUnderItsVendorsName)
+{
+    set_vendor("1");
+    store(plan_of({{"G", {{"Note", "--sleep 60"}}}}));
+    stop_while_running("P/G/Note", [] {
+        EXPECT_TRUE(wait_for([] { return !processes_named("/system/bin/Note_ca").empty(); }));
+        EXPECT_EQ(FPTEST_SuspendItemExecute(), 0);
+    });
+    EXPECT_THAT(processes_named("/system/bin/Note_ca"), IsEmpty());
+}
+
+TEST_F(Suspension, GathererIsStoppedAfterItsCommandHasReturned)
+{
+    store(plan_of({{"G", {{"SensorProbe", "--group G"}}}}));
+    run_path("P/G/SensorProbe");
+    ASSERT_THAT(processes_named("/system/bin/SensorProbe"), ::testing::SizeIs(1));
+    // its report is a child of the same name: let that be over
+    ASSERT_TRUE(wait_for([] { return read_back().find("result=\"0\"") != std::string::npos; }));
+    ASSERT_TRUE(wait_for([] { return processes_named("/system/bin/SensorProbe").size() == 1; }));
+
+    EXPECT_EQ(FPTEST_SuspendItemExecute(), 0);
+    EXPECT_TRUE(wait_for([] { return processes_named("/system/bin/SensorProbe").empty(); }));
+}
+
+TEST_F(Suspension, NameIsCutTo28CharactersForTheListing)
+{
+    // only the longer one runs: the cut name of the other finds it
+    const std::string program = std::string("/system/bin/") + kLonger;
+    const pid_t pid = start_program({program, "--sleep", "60"});
+    store(plan_of({{"G", {{kLong, ""}}}}));
+    run_path("P/G");
+    log_lines();
+
+    EXPECT_EQ(FPTEST_SuspendItemExecute(), 0);
+    EXPECT_THAT(log_lines(),
+                ElementsAre("FPTEST_SuspendItemExecute| enter... !",
+                            "FPTEST_SuspendItemExecute| pid = " + std::to_string(pid)));
+    int status = 0;
+    ASSERT_EQ(waitpid(pid, &status, 0), pid);
+    EXPECT_TRUE(WIFSIGNALED(status));
+    EXPECT_EQ(WTERMSIG(status), SIGTERM);
+}
+
+TEST_F(Suspension, OnlyTheFirstListedOfTwoIsStopped)
+{
+    const pid_t first = start_program({"/system/bin/ab", "--sleep", "60"});
+    const pid_t second = start_program({"/system/bin/ab", "--sleep", "60"});
+    store(plan_of({{"G", {{"ab", ""}}}}));
+    run_path("P/G");
+
+    EXPECT_EQ(FPTEST_SuspendItemExecute(), 0);
+    int status = 0;
+    ASSERT_EQ(waitpid(first, &status, 0), first);
+    EXPECT_EQ(WTERMSIG(status), SIGTERM);
+    EXPECT_EQ(waitpid(second, &status, WNOHANG), 0);
+}
+
+TEST_F(Suspension, ItemThatHasEndedIsNotFound)
+{
+    store(plan_of({{"G", {{"Note", ""}}}}));
+    run_path("P/G");
+    log_lines();
+
+    EXPECT_EQ(FPTEST_SuspendItemExecute(), -1);
+    EXPECT_THAT(log_lines(), ElementsAre("FPTEST_SuspendItemExecute| enter... !",
+                                         "FPTEST_SuspendItemExecute| target process not exist!"));
+}
+
+TEST_F(Suspension, ListingThatIsMissingIsNotFoundEither)
+{
+    setenv("PATH", "/nowhere", 1);
+    ::testing::internal::CaptureStderr();
+    EXPECT_EQ(FPTEST_SuspendItemExecute(), -1);
+    EXPECT_THAT(log_lines(), ElementsAre("FPTEST_SuspendItemExecute| enter... !",
+                                         "FPTEST_SuspendItemExecute| target process not exist!"));
+    EXPECT_TRUE(wait_for([] {
+        const auto all = processes();
+        return std::any_of(all.begin(), all.end(), [](const Process &process) {
+            return process.parent == getpid() && process.state == 'Z';
+        });
+    }));
+    EXPECT_THAT(::testing::internal::GetCapturedStderr(), HasSubstr("ps"));
+}
+
+// A listing of the test's own in front of the device's: what it prints, and
+// with how many arguments it was asked.
+void put_listing_in_front(const std::string &output)
+{
+    std::filesystem::create_directory("/data/vorlane/bin");
+    write_file("/data/vorlane/listing", output);
+    write_file("/data/vorlane/bin/ps",
+               "#!/system/bin/sh\necho $# >/data/vorlane/asked\ncat /data/vorlane/listing\n");
+    std::filesystem::permissions("/data/vorlane/bin/ps", std::filesystem::perms::owner_all);
+    setenv("PATH", "/data/vorlane/bin:/system/bin", 1);
+}
+
+TEST_F(Suspension, BeforeAnyItemEveryProcessIsListedAndTheFirstIsStopped)
+{
+    const pid_t victim = start_program({"/system/bin/ab", "--sleep", "60"});
+    put_listing_in_front("USER PID\nroot     " + std::to_string(victim) +
+                         "   1 x\nroot 1 1 init\n");
+
+    EXPECT_EQ(FPTEST_SuspendItemExecute(), 0);
+    EXPECT_EQ(read_file("/data/vorlane/asked"), "0\n");
+    int status = 0;
+    ASSERT_EQ(waitpid(victim, &status, 0), victim);
+    EXPECT_EQ(WTERMSIG(status), SIGTERM);
+}
+
+TEST_F(Suspension, LineOfASingleWordStillRunsAKillCommand)
+{
+    for (const char *line : {"word\n", "      \n"}) {
+        put_listing_in_front(std::string("USER PID\n") + line);
+        log_lines();
+        ::testing::internal::CaptureStderr();
+        EXPECT_EQ(FPTEST_SuspendItemExecute(), 0);
+        // the shell's complaint about "kill 9 (null)" tells that it was run
+        EXPECT_TRUE(wait_for([] {
+            const auto all = processes();
+            return std::none_of(all.begin(), all.end(), [](const Process &process) {
+                return process.parent == getpid() && process.state != 'Z';
+            });
+        }));
+        EXPECT_THAT(::testing::internal::GetCapturedStderr(), HasSubstr("syntax error"));
+        EXPECT_THAT(log_lines(), ElementsAre("FPTEST_SuspendItemExecute| enter... !"));
+    }
+}
+
+TEST_F(Suspension, EveryCallLeavesItsStreamAndItsChildren)
+{
+    store(plan_of({{"G", {{"Note", ""}}}}));
+    run_path("P/G");
+    const auto before = descriptors().size();
+    for (std::size_t call = 1; call <= 3; ++call) {
+        EXPECT_EQ(FPTEST_SuspendItemExecute(), -1);
+        EXPECT_EQ(descriptors().size(), before + call);
+        EXPECT_TRUE(descriptors().back().second.starts_with("pipe:"));
+    }
+    EXPECT_TRUE(wait_for([] {
+        const auto all = processes();
+        return std::count_if(all.begin(), all.end(), [](const Process &process) {
+                   return process.parent == getpid() && process.state == 'Z';
+               }) == 3;
+    }));
+}
+
+TEST_F(Suspension, StandardKillTakesTheNineForAProcess)
+{
+    // the same text that the module runs, with a process that is there in the
+    // place of the nobody that process 9 is
+    EXPECT_NE(kill(9, 0), 0) << "process 9 must be nobody on the device";
+    const pid_t victim = start_program({"/system/bin/ab", "--sleep", "60"});
+    EXPECT_NE(std::system(("kill 9 " + std::to_string(victim) + " 2>/dev/null").c_str()), 0);
+    int status = 0;
+    ASSERT_EQ(waitpid(victim, &status, 0), victim);
+    EXPECT_EQ(WTERMSIG(status), SIGTERM) << "not 9: that would be SIGKILL";
+}
+
+} // namespace
