@@ -1,0 +1,215 @@
+// The plan store: load, look up, report, save, load again. Input:
+// "DOCUMENT\0GROUP\0ITEM\0DESCRIPTION\0" and up to five bytes: what kind of
+// report, and its progress. An empty group or item stands for the first one.
+#include "doubles.h"
+#include "input.h"
+#include "module.h"
+#include "plan.h"
+#include "quillmark.h"
+
+#include <algorithm>
+#include <array>
+#include <cstdio>
+#include <cstdlib>
+#include <cstring>
+#include <optional>
+#include <string>
+#include <utility>
+#include <vector>
+
+using doubles::require;
+
+namespace
+{
+
+constexpr char kPath[] = "/data/vorlane/src1.xml";
+constexpr std::size_t kMostNames = 6; // of each kind: enough to meet, and quick
+
+std::vector<std::string> names_of(const Plan &plan, std::string_view element)
+{
+    std::vector<std::string> names;
+    for (const Content &content : plan.contents) {
+        const std::string *name = content.attribute("name");
+        if (content.element == element && name != nullptr && names.size() < kMostNames) {
+            names.push_back(*name);
+        }
+    }
+    return names;
+}
+
+void check_no_lone_white_space(const Plan &plan)
+{
+    for (const Content &content : plan.contents) {
+        require(content.type != MXML_TEXT ||
+                    content.text.find_first_not_of(" \t\n\v\f\r") != std::string::npos,
+                "white space alone is a node");
+    }
+}
+
+void check_layout(const Plan &plan)
+{
+    for (std::size_t at = 0; at < plan.nodes.size(); ++at) {
+        const std::size_t depth = plan.contents[at].depth;
+        const std::string tabs(std::min<std::size_t>(depth > 0 ? depth - 1 : 0, 8), '\t');
+        const bool declaration = plan.contents[at].element.starts_with("?xml");
+        const char *text = module::whitespace_cb(plan.nodes[at], MXML_WS_BEFORE_OPEN);
+        require(declaration ? text == nullptr : text != nullptr && text == tabs,
+                "a node is indented otherwise");
+    }
+}
+
+void check_plain_group(const Plan &plan, std::size_t group, const char *name)
+{
+    const auto items = plan.children(group);
+    for (std::size_t at = 0; at < items.size(); ++at) {
+        const auto index = static_cast<int>(at);
+        const std::string &item = *plan.contents[items[at]].attribute("name");
+        require(module::get_node_index(name, item.c_str(), 3) == index &&
+                    module::get_node_byIndex(g_TestCmdTree, name, index) == plan.nodes[items[at]],
+                "index and name do not find the same item");
+    }
+}
+
+void check_lookups(const Plan &plan, const std::string &name,
+                   const std::vector<std::string> &item_names)
+{
+    const auto group = plan.group(name);
+    const auto count = group ? static_cast<int>(plan.children(*group).size()) : -1;
+    require(module::get_node_length(name.c_str(), 2) == count, "the group's length is another");
+    for (const std::string &item : item_names) {
+        const auto place = group ? plan.item(*group, item) : std::nullopt;
+        require(module::get_node_index(name.c_str(), item.c_str(), 3) ==
+                    (place ? static_cast<int>(plan.positions[*place]) : -1),
+                "the item's index is another");
+    }
+    for (const int index : {-1, 0, 1, count - 1, count, count + 1}) {
+        const auto place = group ? plan.item_by_index(*group, index) : std::nullopt;
+        require(module::get_node_byIndex(g_TestCmdTree, name.c_str(), index) ==
+                    (place ? plan.nodes[*place] : nullptr),
+                "the item at the index is another");
+    }
+    if (group && plan.is_plain(*group)) {
+        check_plain_group(plan, *group, name.c_str());
+    }
+}
+
+struct Report {
+    std::string group;
+    std::string item;
+    std::string description;
+    bool without_description;
+    int result;
+    int progress;
+
+    void make() const
+    {
+        FPTEST_SetTransation(group.c_str(), item.c_str(), progress, result,
+                             without_description ? nullptr : description.c_str());
+    }
+    void expect_in(Content &content) const
+    {
+        using Value = std::optional<std::string>;
+        const bool known = result == 0 || result == 1 || result == -2;
+        content.set_attribute("progress", std::to_string(progress).substr(0, 9));
+        content.set_attribute("result", known ? Value(std::to_string(result)) : std::nullopt);
+        content.set_attribute("description",
+                              without_description ? std::nullopt : Value(description));
+    }
+};
+
+Report report_from(const Plan &plan, const std::array<std::string, 5> &input)
+{
+    const auto first = [](const std::string &given, const std::vector<std::string> &names) {
+        return given.empty() && !names.empty() ? names.front() : given;
+    };
+    static constexpr int kResults[] = {0, 1, -2, 2, -1};
+    const std::string &numbers = input[4];
+    const auto kind = numbers.empty() ? 0U : static_cast<unsigned char>(numbers[0]);
+    Report report{.group = first(input[1], names_of(plan, "CmdGroup")),
+                  .item = first(input[2], names_of(plan, "Cmd")),
+                  .description = input[3],
+                  .without_description = (kind & 0x80U) != 0,
+                  .result = kResults[kind % 5],
+                  .progress = static_cast<int>(kind)};
+    if (numbers.size() >= 5) {
+        std::memcpy(&report.progress, numbers.data() + 1, sizeof report.progress);
+    }
+    return report;
+}
+
+// As another process finds the file.
+bool is_loaded_as(const std::vector<Content> &contents)
+{
+    mxml_node_t *tree = module::load_configs_file(kPath);
+    const bool same = tree != nullptr && Plan(tree).contents == contents;
+    module::reset();
+    return same;
+}
+
+// Some trees Mini-XML itself does not give back, whatever their layout: it refuses
+// an attribute without a value, and it resolves references to characters that it
+// then writes as they stand, where they mean something else (white space in a
+// word, markup in a name) or are refused (control characters, surrogates, a byte
+// order mark), as they are in a description that holds them. So a tree that comes
+// back changed is a finding only if Mini-XML gives it back without the module's
+// layout.
+void check_file(const std::vector<Content> &contents)
+{
+    mxml_node_t *tree = std::exchange(g_TestCmdTree, nullptr);
+    if (!is_loaded_as(contents)) {
+        const std::string saved = doubles::plan().value_or("");
+        char *plain = mxmlSaveAllocString(tree, MXML_NO_CALLBACK);
+        require(plain != nullptr, "Mini-XML cannot write the tree");
+        doubles::write_plan(plain);
+        std::free(plain);
+        if (is_loaded_as(contents)) {
+            std::fprintf(stderr, "saved as:\n%s\n", saved.c_str());
+            require(false, "a saved plan is another one");
+        }
+    }
+    mxmlDelete(tree);
+}
+
+} // namespace
+
+extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t *data, std::size_t size)
+{
+    const doubles::Run run;
+    const auto input = texts<5>(data, size);
+    doubles::write_plan(input[0]);
+
+    mxml_node_t *tree = module::load_configs_file(kPath);
+    require(tree == g_TestCmdTree, "the loaded plan is not the one in use");
+    require(doubles::left_open() == 0, "loading leaves a descriptor open");
+    if (tree == nullptr) {
+        require(module::get_node_length("", 2) == -1, "a group of no plan has a length");
+        require(module::get_node_index("", "", 3) == -1, "an item of no plan has an index");
+        return 0;
+    }
+    const Plan plan(tree);
+    check_no_lone_white_space(plan);
+    check_layout(plan);
+    auto groups = names_of(plan, "CmdGroup");
+    auto items = names_of(plan, "Cmd");
+    groups.push_back(input[1]);
+    items.push_back(input[2]);
+    for (const std::string &group : groups) {
+        check_lookups(plan, group, items);
+    }
+
+    const Report report = report_from(plan, input);
+    auto contents = plan.contents;
+    const auto group = plan.group(report.group);
+    const auto item = group ? plan.item(*group, report.item) : std::nullopt;
+    report.make();
+    if (item) {
+        report.expect_in(contents[*item]);
+    } else {
+        require(doubles::plan() == input[0], "a report of no item changes the file");
+        module::save_XmlFile(tree);
+    }
+    require(g_TestCmdTree == tree && Plan(tree).contents == contents, "the report is another");
+    require(doubles::left_open() == 0, "saving leaves a descriptor open");
+    check_file(contents);
+    return 0;
+}
