@@ -117,22 +117,34 @@ static int is_lone_whitespace(mxml_node_t *node)
         return 0;
     }
     const char *text = mxmlGetText(node, nullptr);
-    return text == nullptr || text[strspn(text, " \t\n\v\f\r")] == '\0';
+    return text[strspn(text, " \t\n\v\f\r")] == '\0';
+}
+
+/* Mini-XML does not look whether it could copy a name or a text: where memory
+   was short a node lacks it, and the next save ends the process. */
+static int is_whole(mxml_node_t *node)
+{
+    return mxmlGetType(node) == MXML_TEXT ? mxmlGetText(node, nullptr) != nullptr
+                                          : mxmlGetElement(node) != nullptr;
 }
 
 /* The stock library lacks the switch that load_configs_file sets, and positions
-   count every node: what white space it has made nodes of must go. */
-static void remove_lone_whitespace(mxml_node_t *tree)
+   count every node: what white space it has made nodes of must go. Returns 0,
+   with the tree as it was left, when a node of it is not whole. */
+static int remove_lone_whitespace(mxml_node_t *tree)
 {
+    int whole = is_whole(tree);
     mxml_node_t *node = mxmlWalkNext(tree, tree, MXML_DESCEND);
 
-    while (node != nullptr) {
+    while (node != nullptr && whole) {
         mxml_node_t *next = mxmlWalkNext(node, tree, MXML_DESCEND);
-        if (is_lone_whitespace(node)) {
+        whole = is_whole(node);
+        if (whole && is_lone_whitespace(node)) {
             mxmlDelete(node);
         }
         node = next;
     }
+    return whole;
 }
 
 static mxml_node_t *load_configs_file(const char *file_path)
@@ -149,8 +161,9 @@ static mxml_node_t *load_configs_file(const char *file_path)
     }
     g_TestCmdTree = mxmlLoadFd(nullptr, fd, nullptr);
     close(fd);
-    if (g_TestCmdTree != nullptr) {
-        remove_lone_whitespace(g_TestCmdTree);
+    if (g_TestCmdTree != nullptr && !remove_lone_whitespace(g_TestCmdTree)) {
+        mxmlDelete(g_TestCmdTree); /* as one that does not parse */
+        g_TestCmdTree = nullptr;
     }
     return g_TestCmdTree;
 }
@@ -431,8 +444,9 @@ static int mysystem(const char *command)
     argp[2] = command;
     sigemptyset(&mask);
     sigaddset(&mask, SIGCHLD);
-    sigprocmask(SIG_BLOCK, &mask, &omask);
-
+    if (sigprocmask(SIG_BLOCK, &mask, &omask) == -1) {
+        return -1; /* nothing is started without a mask to put back */
+    }
     const pid_t pid = vfork();
     if (pid == -1) {
         sigprocmask(SIG_SETMASK, &omask, nullptr);

@@ -82,6 +82,14 @@ TEST_F(Launcher, FailedForkRestoresTheMaskAloneAndYieldsMinusOne)
     EXPECT_THAT(events(), ElementsAreArray(failed_launch()));
 }
 
+TEST_F(Launcher, BlockThatFailsStartsNothingAndYieldsMinusOne)
+{
+    plan_steps("sigprocmask", {gives(-1, EINVAL)});
+
+    EXPECT_EQ(module::mysystem("true"), -1);
+    EXPECT_THAT(events(), ElementsAreArray(sequences::blocked_signals()));
+}
+
 TEST_F(Launcher, ChildRestoresTheMaskRunsTheShellAndExitsWhenThatFails)
 {
     EXPECT_THAT(child("/system/bin/SensorProbe -t 5"),

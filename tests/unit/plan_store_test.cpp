@@ -288,6 +288,21 @@ TEST_F(PlanStore, PlanThatDoesNotParseLeavesTheCacheEmptyWithoutALine)
     }
 }
 
+// A tree in which Mini-XML has left out what it had no memory for. The library
+// makes none on request; a node of a kind that the module does not load is as
+// nameless to it.
+TEST_F(PlanStore, PlanThatIsNotWholeIsAsOneThatDoesNotParse)
+{
+    write_plan(kPlan);
+    platform::on_load([](mxml_node_t *tree) { mxmlNewCustom(tree, nullptr, nullptr); });
+    EXPECT_EQ(module::load_configs_file(kPath), nullptr);
+    EXPECT_EQ(events(), sequences::load());
+    EXPECT_EQ(g_TestCmdTree, nullptr);
+
+    platform::on_load(nullptr);
+    EXPECT_NE(module::load_configs_file(kPath), nullptr);
+}
+
 TEST_F(PlanStore, PlanThatDoesNotParseFailsTheLookupsAndIsTriedAgain)
 {
     write_plan("<P><CmdGroup name='g'></P>");

@@ -38,7 +38,7 @@ namespace
 constexpr char kPlan[] = "/data/vorlane/src1.xml";
 constexpr int kPid = 4242;
 constexpr int kTid = 4343;
-constexpr int kFirstFake = 700; // descriptors that stand for sockets
+constexpr int kFirstFake = 1'000'000; // descriptors that stand for sockets
 // What a log call may leave in errno: nothing that a later line may print.
 constexpr int kErrnoAfterLog = EXDEV;
 
@@ -48,8 +48,8 @@ class Directory
   public:
     Directory()
     {
-        char name[] = "/tmp/quillmark-unit-XXXXXX";
-        if (mkdtemp(name) == nullptr) {
+        std::string name = fs::temp_directory_path() / "quillmark-unit-XXXXXX";
+        if (mkdtemp(name.data()) == nullptr) {
             std::perror("mkdtemp");
             std::abort();
         }
@@ -80,6 +80,7 @@ const Directory &directory()
 
 struct State {
     std::vector<std::string> events;
+    bool recording = true;
     std::map<std::string, std::deque<Step>> steps;
     std::deque<std::string> outputs;
     std::map<int, std::string> descriptors;
@@ -91,6 +92,7 @@ struct State {
     int standard_input = -1; // kept here while descriptor 0 is free
     std::function<void(const std::string &)> system_hook;
     std::function<void(const std::string &)> log_hook;
+    std::function<void(mxml_node_t *)> load_hook;
     sigset_t mask{};
     std::jmp_buf child{};
 };
@@ -127,7 +129,9 @@ Step next_step(const std::string &function)
 
 void record(std::string event)
 {
-    state().events.push_back(std::move(event));
+    if (state().recording) {
+        state().events.push_back(std::move(event));
+    }
 }
 
 std::string number(long value)
@@ -313,6 +317,21 @@ void plan_steps(const std::string &function, std::vector<Step> steps)
     queue.insert(queue.end(), steps.begin(), steps.end());
 }
 
+bool steps_left(const std::string &function)
+{
+    return !state().steps[function].empty();
+}
+
+void drop_output()
+{
+    state().outputs.clear();
+}
+
+void stop_recording()
+{
+    state().recording = false;
+}
+
 void plan_output(std::vector<std::string> outputs)
 {
     state().outputs.insert(state().outputs.end(), outputs.begin(), outputs.end());
@@ -331,6 +350,11 @@ void set_vendor(const std::string &text)
 void on_system(std::function<void(const std::string &)> hook)
 {
     state().system_hook = std::move(hook);
+}
+
+void on_load(std::function<void(mxml_node_t *)> hook)
+{
+    state().load_hook = std::move(hook);
 }
 
 void on_log(std::function<void(const std::string &)> hook)
@@ -523,6 +547,15 @@ int qm_remove(const char *path)
     return result;
 }
 
+mxml_node_t *qm_mxmlLoadFd(mxml_node_t *top, int descriptor, mxml_load_cb_t type)
+{
+    mxml_node_t *tree = mxmlLoadFd(top, descriptor, type);
+    if (state().load_hook) {
+        state().load_hook(tree);
+    }
+    return tree;
+}
+
 // --- sockets -------------------------------------------------------------
 
 int qm_socket(int domain, int type, int protocol)
@@ -709,7 +742,7 @@ int qm_sigaddset(sigset_t *set, int signal)
 int qm_sigprocmask(int how, const sigset_t *set, sigset_t *old)
 {
     const Step step = next_step("sigprocmask");
-    if (old != nullptr) {
+    if (old != nullptr && step.kind != Step::Kind::Return) {
         *old = state().mask;
     }
     record("sigprocmask(" + std::string(how == SIG_BLOCK ? "SIG_BLOCK" : "SIG_SETMASK") + ", " +
@@ -755,6 +788,10 @@ int vr_log_printf(int priority, const char *tag, const char *format, ...)
     va_end(arguments);
     EXPECT_EQ(priority, 4);
     EXPECT_STREQ(tag, "VRCODE");
+    if (!state().recording) {
+        errno = kErrnoAfterLog;
+        return static_cast<int>(line.size());
+    }
     const std::string event = log_event(format, line);
     record(event);
     if (state().log_hook) {

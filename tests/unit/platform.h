@@ -4,6 +4,8 @@
 // started, signalled, listened on or slept for.
 #pragma once
 
+#include <mxml.h>
+
 #include <functional>
 #include <string>
 #include <vector>
@@ -34,9 +36,13 @@ void reset();
 // "popen", "fgets", "pclose", "system", "vfork", "execve", "waitpid",
 // "sigprocmask", "strdup".
 void plan_steps(const std::string &function, std::vector<Step> steps);
+// Whether any of them are still to come.
+bool steps_left(const std::string &function);
 
 // What the coming popen calls, in turn, will have printed.
 void plan_output(std::vector<std::string> outputs);
+// Forgets those that no popen call has taken.
+void drop_output();
 
 // The status word that the next waitpid calls with a result above 0 store.
 void set_wait_status(int status);
@@ -46,6 +52,8 @@ void set_vendor(const std::string &text);
 
 // Called inside each system() call, with its command.
 void on_system(std::function<void(const std::string &)> hook);
+// Called with each tree that Mini-XML has loaded, before the module sees it.
+void on_load(std::function<void(mxml_node_t *)> hook);
 // Called inside each log call, with its event.
 void on_log(std::function<void(const std::string &)> hook);
 
@@ -70,6 +78,9 @@ std::vector<std::string> calls();
 // What the module has opened and not closed, by the names above; popen's
 // streams are stream#1 and so on.
 std::vector<std::string> left_open();
+
+// For long runs: no events, and no checks of log lines, from now on.
+void stop_recording();
 
 // The test plan file: where it is, whether it is there, what is in it.
 std::string plan_path();
