@@ -1,0 +1,21 @@
+// What Mini-XML asks of the platform: its memory and its files. Its library is
+// linked with these calls renamed, so that any one of them can be made to fail.
+#pragma once
+
+#include <string>
+
+namespace mini_xml
+{
+
+// The functions, as faults name them.
+constexpr char kMemory[] = "Mini-XML's memory";
+constexpr char kRead[] = "Mini-XML's read";
+constexpr char kWrite[] = "Mini-XML's write";
+
+// Makes that call of the function fail, counted from 1 from now on.
+void plan_fault(const std::string &function, long number);
+// Whether it has been made, and what was to be stored: "strdup(Cmd)".
+bool met();
+const std::string &met_in();
+
+} // namespace mini_xml
