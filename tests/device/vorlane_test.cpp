@@ -81,7 +81,7 @@ TEST_F(Vorlane, LogWritesLinesOfAnyLengthWhole)
 {
     unsetenv("VR_LOG_FILE");
     WritesToStandardError writes;
-    for (const std::size_t size : {2030, 2038, 2039, 2040, 2041, 2042, 2048, 100000}) {
+    for (const std::size_t size : {2030U, 2038U, 2039U, 2040U, 2041U, 2042U, 2048U, 100000U}) {
         const std::string text(size, 'x');
         EXPECT_EQ(vr_log_printf(VR_LOG_DEBUG, "TAG", "%s", text.c_str()), static_cast<int>(size));
         EXPECT_THAT(writes.take(), ElementsAre("4/TAG: " + text + "\n")) << size;
