@@ -293,12 +293,16 @@ TEST_F(PlanStore, PlanThatDoesNotParseLeavesTheCacheEmptyWithoutALine)
 // nameless to it.
 TEST_F(PlanStore, PlanThatIsNotWholeIsAsOneThatDoesNotParse)
 {
-    write_plan(kPlan);
-    platform::on_load([](mxml_node_t *tree) { mxmlNewCustom(tree, nullptr, nullptr); });
-    EXPECT_EQ(module::load_configs_file(kPath), nullptr);
-    EXPECT_EQ(events(), sequences::load());
-    EXPECT_EQ(g_TestCmdTree, nullptr);
-
+    for (const int place : {MXML_ADD_BEFORE, MXML_ADD_AFTER}) { // first, last
+        platform::reset();
+        write_plan(kPlan);
+        platform::on_load([place](mxml_node_t *tree) {
+            mxmlAdd(tree, place, MXML_ADD_TO_PARENT, mxmlNewCustom(nullptr, nullptr, nullptr));
+        });
+        EXPECT_EQ(module::load_configs_file(kPath), nullptr);
+        EXPECT_EQ(events(), sequences::load());
+        EXPECT_EQ(g_TestCmdTree, nullptr);
+    }
     platform::on_load(nullptr);
     EXPECT_NE(module::load_configs_file(kPath), nullptr);
 }
