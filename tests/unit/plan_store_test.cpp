@@ -288,6 +288,20 @@ TEST_F(PlanStore, PlanThatDoesNotParseLeavesTheCacheEmptyWithoutALine)
     }
 }
 
+TEST_F(PlanStore, WordOfAnyOneVisibleCharacterIsANode)
+{
+    std::string words;
+    int count = 0;
+    for (char character = '!'; character <= '~'; ++character) {
+        if (character != '<' && character != '&') {
+            words += std::string(" ") + character;
+            ++count;
+        }
+    }
+    write_plan("<P><CmdGroup name='g'>" + words + " </CmdGroup></P>");
+    EXPECT_EQ(module::get_node_length("g", 2), count);
+}
+
 // A tree in which Mini-XML has left out what it had no memory for. The library
 // makes none on request; a node of a kind that the module does not load is as
 // nameless to it.
