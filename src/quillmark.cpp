@@ -569,8 +569,8 @@ static void SingleItemExecute(mxml_node_t *tree, const char *groupname, int inde
     }
     copy_text(tLine, 1024, tName);
     ExtractString(tLine, 1024);
-    /* fills all of it at once: a suspension may read it at any moment, and an
-       empty name would stop the first process of the system */
+    /* not emptied before, since all of it is filled: a suspension may read it at
+       any moment, and an empty name would stop the first process of the system */
     copy_text(g_CmdName, sizeof g_CmdName, tLine);
 
     const int row = ResourceReduce();
