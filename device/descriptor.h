@@ -13,7 +13,11 @@ class Descriptor
     Descriptor(Descriptor &&other) noexcept : descriptor_(std::exchange(other.descriptor_, -1))
     {
     }
-    Descriptor &operator=(Descriptor &&) = delete;
+    Descriptor &operator=(Descriptor &&other) noexcept
+    {
+        std::swap(descriptor_, other.descriptor_);
+        return *this;
+    }
     ~Descriptor()
     {
         if (descriptor_ >= 0) {
