@@ -4,6 +4,7 @@
 
 #include <cstdio>
 #include <cstdlib>
+#include <filesystem>
 #include <string>
 #include <string_view>
 #include <sys/wait.h>
@@ -31,11 +32,11 @@ int run_on_device(const std::vector<std::string> &arguments)
     }
     int status = 0;
     if (pid < 0 || waitpid(pid, &status, 0) != pid) {
-        std::perror("device_tests");
+        std::perror("fork");
         return EXIT_FAILURE;
     }
     if (!WIFEXITED(status)) {
-        std::fprintf(stderr, "device_tests: ended by signal %d\n", WTERMSIG(status));
+        std::fprintf(stderr, "the tests were ended by signal %d\n", WTERMSIG(status));
         return EXIT_FAILURE;
     }
     if (WEXITSTATUS(status) != kDeviceFailed) {
@@ -43,7 +44,7 @@ int run_on_device(const std::vector<std::string> &arguments)
     }
     const char *ci = std::getenv("CI");
     const bool must_run = ci != nullptr && std::string_view(ci) == "true";
-    std::fprintf(stderr, "device_tests: the virtual device did not start: %s\n",
+    std::fprintf(stderr, "the virtual device did not start: %s\n",
                  must_run ? "failed" : "not run");
     return must_run ? EXIT_FAILURE : kSkipped;
 }
@@ -56,9 +57,9 @@ int main(int argc, char **argv)
                                           "--build",
                                           QUILLMARK_BINARY_DIR,
                                           "--bin",
-                                          QUILLMARK_BINARY_DIR "/tests/device/items",
+                                          QUILLMARK_TEST_ITEMS,
                                           "--",
-                                          QUILLMARK_BINARY_DIR "/tests/device/device_tests"};
+                                          std::filesystem::read_symlink("/proc/self/exe")};
     arguments.insert(arguments.end(), argv + 1, argv + argc);
     testing::InitGoogleTest(&argc, argv);
     if (GTEST_FLAG_GET(list_tests) || std::getenv("QUILLMARK_DEVICE") != nullptr) {
