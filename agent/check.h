@@ -1,0 +1,35 @@
+// Finds in a test plan what the module would make something else of than its
+// author meant.
+#pragma once
+
+#include <cstddef>
+#include <string>
+#include <vector>
+
+namespace fptest
+{
+
+struct Finding {
+    enum class Severity { error, warning };
+
+    Severity severity = Severity::error;
+    std::size_t offset = 0; // in the text
+    std::string text;
+};
+
+enum class PlanUse {
+    to_send, // it is stored by a command: what the command cuts off matters
+    stored,  // it stands in its place already
+};
+
+// The findings in a plan's text, in its order.
+std::vector<Finding> check(const std::string &text, PlanUse use);
+
+bool has_errors(const std::vector<Finding> &findings);
+
+// "FILE:LINE:COLUMN: error: TEXT", the source line and a caret under the place;
+// three lines, each with a line feed. A long source line is cut around the place
+// to fit 80 columns.
+std::string message(const std::string &file, const std::string &text, const Finding &finding);
+
+} // namespace fptest

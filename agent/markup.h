@@ -1,0 +1,44 @@
+// Where things stand in a test plan's text. The scanner takes what comes, a
+// document that is half written or breaks off included, and judges nothing.
+#pragma once
+
+#include <cstddef>
+#include <string>
+#include <string_view>
+#include <vector>
+
+namespace fptest
+{
+
+struct Attribute {
+    std::string name;
+    std::size_t begin = 0; // offset of the name's first byte
+    std::size_t end = 0;   // behind the closing quote, or behind the name
+    bool has_value = false;
+    std::size_t value_begin = 0; // inside the quotes
+    std::size_t value_end = 0;
+};
+
+struct Tag {
+    enum class Kind { open, empty, close, comment, cdata, instruction, declaration, text };
+
+    Kind kind = Kind::text;
+    std::string name;      // of an element or an instruction
+    std::size_t begin = 0; // offset of its '<', or of a text's first word
+    std::size_t end = 0;   // behind its '>', or behind a text's last word
+    bool complete = true;  // whether the text goes on to its end
+    std::vector<Attribute> attributes;
+};
+
+// The tags of a text in order; white space alone is no text.
+std::vector<Tag> scan(std::string_view text);
+
+// Line and column, both from 1; a column is a character of UTF-8.
+struct Position {
+    std::size_t line = 1;
+    std::size_t column = 1;
+};
+
+Position position(std::string_view text, std::size_t offset);
+
+} // namespace fptest

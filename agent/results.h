@@ -1,0 +1,121 @@
+// What a run is to do and what has become of it: filled in by the runner, read
+// by everything that shows or writes results.
+#pragma once
+
+#include <chrono>
+#include <cstddef>
+#include <optional>
+#include <string>
+#include <vector>
+
+namespace fptest
+{
+
+// What an item has reported, as it stands in the test plan.
+struct Report {
+    std::optional<std::string> progress;
+    // An attribute without a value is a result that is none of 0, 1 and -2.
+    std::optional<std::string> result;
+    bool result_without_value = false;
+    std::optional<std::string> description;
+
+    bool operator==(const Report &) const = default;
+};
+
+enum class Outcome {
+    not_run,   // and nothing was started of it
+    passed,    // it reported the code that means so
+    failed,    // it reported another one
+    silent,    // it ended and has reported no result
+    timed_out, // it was stopped because it took too long
+    stopped,   // it was stopped because the run was
+};
+
+// One item of a run.
+struct ItemRun {
+    std::string group; // as the test plan names it
+    std::string name;
+    Outcome outcome = Outcome::not_run;
+    Report report;
+    std::string reason; // in words, for every outcome but passed; may be empty
+    std::optional<std::chrono::system_clock::time_point> start;
+    std::optional<double> seconds; // how long it ran, once it has ended
+    std::string output;            // what it printed: the end of it, where that is long
+};
+
+// Items that are run in a row and belong to one group.
+struct Suite {
+    std::string group;
+    int round = 1; // of --repeat
+    std::vector<ItemRun> items;
+};
+
+struct Counts {
+    std::size_t passed = 0;
+    std::size_t failed = 0; // failed, silent, timed out and stopped
+    std::size_t to_go = 0;  // not run
+
+    std::size_t all() const
+    {
+        return passed + failed + to_go;
+    }
+};
+
+struct Run {
+    std::string plan; // the file that the plan came from
+    int rounds = 1;
+    int pass_code = 0;
+    int vendor = 0;
+    std::vector<Suite> suites;
+    std::chrono::system_clock::time_point start;
+    double seconds = 0;         // since the start, when last looked at
+    bool finished = false;      // every item has been run
+    std::string why_unfinished; // once it has ended without that
+};
+
+// Where in a run something happened.
+struct Place {
+    std::size_t suite = 0;
+    std::size_t item = 0;
+};
+
+Counts count(const std::vector<ItemRun> &items);
+Counts count(const Run &run);
+
+// "passed", "failed", "no result", "timed out", "stopped", "not run"
+const char *word(Outcome outcome);
+
+// "Bringup", or "Bringup (round 2)" where there is more than one round.
+std::string title(const Run &run, const Suite &suite);
+
+// Gets told what happens, in this order: begin, then for each item started, any
+// number of progressed, ended; then finish, also where items were not run. What
+// is told is already in the run.
+class Listener
+{
+  public:
+    Listener() = default;
+    Listener(const Listener &) = delete;
+    Listener &operator=(const Listener &) = delete;
+    virtual ~Listener() = default;
+
+    virtual void begin(const Run &run) = 0;
+    virtual void started(const Run &run, Place place) = 0;
+    virtual void progressed(const Run &run, Place place) = 0;
+    virtual void ended(const Run &run, Place place) = 0;
+    virtual void finish(const Run &run) = 0;
+
+    // Several times a second while the run lasts.
+    virtual void tick(const Run & /* run */)
+    {
+    }
+
+    // What keeps it from writing, in words: "out.json: No space left on device";
+    // empty while nothing does. A listener that has failed stays quiet.
+    virtual std::string failure() const
+    {
+        return {};
+    }
+};
+
+} // namespace fptest
