@@ -1,0 +1,31 @@
+// Results in files, as they come: whatever ends this process, what was known
+// then can be read, and says that the run did not finish.
+#pragma once
+
+#include "results.h"
+
+#include <cstdio>
+#include <memory>
+#include <string>
+
+namespace fptest
+{
+
+// One JSON object per line and event, flushed; the path "-" is standard output.
+// "run" comes first, with the format's version and the planned items. Then, for
+// each item, come "start", "progress" and "end", which name it by its index among
+// those. "finish" comes last: without it the run was cut off. A run that ended
+// early has it, with "finished":false, and an "end" for each item not run.
+std::unique_ptr<Listener> json_report(const std::string &path);
+
+// JUnit XML. The file always holds a whole document: it is replaced, at most
+// once a second and at the end. What is no regular file is written at the end
+// alone. Each suite has a property "finished".
+std::unique_ptr<Listener> junit_report(const std::string &path);
+
+// TAP 14, a subtest per suite, into a stream that stays the caller's. A point is
+// written when its item and those before it have ended. A run that ended early
+// bails out; one that was cut off lacks points of the plan in front.
+std::unique_ptr<Listener> tap_report(std::FILE *stream);
+
+} // namespace fptest

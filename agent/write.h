@@ -1,0 +1,40 @@
+// Writing to descriptors.
+#pragma once
+
+#include <cerrno>
+#include <cstddef>
+#include <cstring>
+#include <poll.h>
+#include <string>
+#include <string_view>
+#include <unistd.h>
+
+namespace fptest
+{
+
+// Writes the whole text, waiting where it has to. Gives the bytes written: fewer
+// than there are where that fails, errno then says why.
+inline std::size_t write_text(int descriptor, std::string_view text)
+{
+    std::size_t done = 0;
+    while (done < text.size()) {
+        const ssize_t written = write(descriptor, text.data() + done, text.size() - done);
+        if (written > 0) {
+            done += static_cast<std::size_t>(written);
+        } else if (written < 0 && errno == EAGAIN) {
+            pollfd waiting{descriptor, POLLOUT, 0};
+            poll(&waiting, 1, -1);
+        } else if (written == 0 || errno != EINTR) {
+            break;
+        }
+    }
+    return done;
+}
+
+// "out.json: No space left on device"
+inline std::string failure_of(const std::string &file, int error)
+{
+    return file + ": " + std::strerror(error);
+}
+
+} // namespace fptest
