@@ -1,0 +1,34 @@
+// How the program ends, and what makes it end early.
+#pragma once
+
+#include <stdexcept>
+#include <string>
+
+namespace fptest
+{
+
+enum class Exit {
+    success = 0,
+    items_failed = 1,  // or, of a checked plan, errors
+    usage = 2,         // or an error in the plan
+    environment = 3,   // the device is not ready for it
+    interrupted = 130, // by a signal
+};
+
+// One line for people: what is wrong, where, and what to do.
+class Failure : public std::runtime_error
+{
+  public:
+    Failure(Exit status, const std::string &text) : std::runtime_error(text), status_(status)
+    {
+    }
+    Exit status() const
+    {
+        return status_;
+    }
+
+  private:
+    Exit status_;
+};
+
+} // namespace fptest

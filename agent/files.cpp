@@ -1,0 +1,76 @@
+#include "files.h"
+
+#include "failure.h"
+#include "plan.h"
+#include "write.h"
+
+#include <array>
+#include <cerrno>
+#include <cstdio>
+#include <cstring>
+#include <fcntl.h>
+#include <sys/file.h>
+#include <sys/stat.h>
+
+namespace fptest
+{
+std::optional<std::string> read_file(const std::string &path)
+{
+    const Descriptor file(path == "-" ? dup(STDIN_FILENO)
+                                      : open(path.c_str(), O_RDONLY | O_CLOEXEC));
+    if (!file.is_open()) {
+        return std::nullopt;
+    }
+    std::string text;
+    std::array<char, 16384> buffer;
+    for (;;) {
+        const ssize_t got = read(file.get(), buffer.data(), buffer.size());
+        if (got < 0 && errno == EINTR) {
+            continue;
+        }
+        if (got < 0) {
+            return std::nullopt;
+        }
+        if (got == 0) {
+            return text;
+        }
+        text.append(buffer.data(), static_cast<std::size_t>(got));
+    }
+}
+
+Descriptor lock_stored_plan()
+{
+    for (;;) {
+        Descriptor plan(open(kStoredPlan, O_RDONLY | O_CLOEXEC));
+        if (!plan.is_open()) {
+            return plan;
+        }
+        while (flock(plan.get(), LOCK_EX) != 0 && errno == EINTR) {
+        }
+        // it may have been replaced while this waited
+        struct stat held {
+        };
+        struct stat named {
+        };
+        if (fstat(plan.get(), &held) != 0 || stat(kStoredPlan, &named) != 0 ||
+            (held.st_ino == named.st_ino && held.st_dev == named.st_dev)) {
+            return plan;
+        }
+    }
+}
+
+void replace_stored_plan(const std::string &text)
+{
+    const std::string aside = std::string(kStoredPlan) + ".new";
+    const Descriptor file(open(aside.c_str(), O_WRONLY | O_CREAT | O_TRUNC | O_CLOEXEC, 0666));
+    if (!file.is_open() || write_text(file.get(), text) < text.size() || fsync(file.get()) != 0 ||
+        std::rename(aside.c_str(), kStoredPlan) != 0) {
+        const int error = errno;
+        unlink(aside.c_str());
+        throw Failure(Exit::environment, std::string(kStoredPlan) +
+                                             " cannot be written: " + std::strerror(error) +
+                                             "; the old plan is still there");
+    }
+}
+
+} // namespace fptest

@@ -1,0 +1,24 @@
+// Files, and the stored plan among them.
+#pragma once
+
+#include "descriptor.h"
+
+#include <optional>
+#include <string>
+
+namespace fptest
+{
+
+// The whole file; nothing where it cannot be read, errno then says why.
+std::optional<std::string> read_file(const std::string &path);
+
+// The lock that those who report take on the stored plan, so that none writes
+// what another has just overwritten. Waits for it. A plan that is not there
+// needs none.
+Descriptor lock_stored_plan();
+
+// Puts another text in the stored plan's place, whole or not at all. Throws a
+// Failure where it cannot.
+void replace_stored_plan(const std::string &text);
+
+} // namespace fptest

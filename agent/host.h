@@ -1,0 +1,93 @@
+// The module in a process of its own, which the agent asks by messages. A
+// terminal's Ctrl-C reaches the agent and not the items, a module that dies
+// takes no results along, and while a command runs this process calls nothing:
+// the suspension goes through the other one.
+#pragma once
+
+#include "descriptor.h"
+
+#include <chrono>
+#include <cstddef>
+#include <cstdio>
+#include <deque>
+#include <optional>
+#include <string>
+#include <sys/types.h>
+#include <vector>
+
+namespace fptest
+{
+
+class Host
+{
+  public:
+    struct Event {
+        enum class Kind {
+            item,     // the command has come to an item; value is the vendor
+            returned, // the command has returned; text is its reply
+            stopped,  // a stop has returned; value is what it returned, or kNothingToStop
+            gone,     // the process has ended; text says how
+        };
+        Kind kind;
+        int value = 0;
+        std::string text;
+        // when it happened, and how much had been printed by then; not of a stop
+        std::chrono::steady_clock::time_point time;
+        off_t output = 0;
+    };
+
+    // Throws std::system_error where the process cannot be made.
+    // What the module and its items print is kept for take_output(); input they get
+    // none.
+    Host();
+    // Ends the process. An item that it still runs is stopped.
+    ~Host();
+    Host(const Host &) = delete;
+    Host &operator=(const Host &) = delete;
+
+    // Starts a command that runs items of these names. The one before must have
+    // returned.
+    void command(const std::string &text, const std::vector<std::string> &items = {});
+
+    // Asks for FPTEST_SuspendItemExecute, which is called where a process of the
+    // item is there to be stopped: before any has been started, the module would
+    // stop the first process of the system.
+    void stop(const std::string &item);
+
+    // Sends SIGTERM to what runs below the host, the gatherer excepted: for items
+    // that a stop does not find. False where there is nothing.
+    bool end_items();
+
+    static constexpr int kNothingToStop = -2;
+
+    // The next event, waited for that long, or until the other descriptor can be
+    // read.
+    std::optional<Event> wait(std::chrono::milliseconds longest, int other = -1);
+
+    // The stored plan, as FPTEST_ExtractResultMsg gives it. Only between commands.
+    std::string read_back();
+
+    // What was printed since the last call, up to now or up to where an event says,
+    // or the last 64 KiB of it. Nothing while there are events to come first.
+    std::string take_output();
+    std::string take_output(off_t end);
+
+    // Writes all that was printed since the last call.
+    void pass_output(std::FILE *stream);
+
+  private:
+    bool has_news(std::chrono::milliseconds longest, int other) const;
+    void read_control();
+    void lose();
+    off_t output_size() const;
+
+    pid_t pid_ = -1;
+    Descriptor control_{-1};
+    Descriptor output_{-1};
+    off_t taken_ = 0;
+    std::deque<Event> events_;
+    std::string plan_;
+    bool has_plan_ = false;
+};
+
+} // namespace fptest

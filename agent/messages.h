@@ -1,0 +1,30 @@
+// What the agent and the module's process say to each other over their socket.
+#pragma once
+
+#include <string>
+
+namespace fptest
+{
+
+enum class MessageKind : char {
+    // to the module's process
+    command = 'c',   // the command and the names of its items, a zero byte between each
+    stop = 's',      // the item's name
+    read_back = 'b', // nothing
+    // from it
+    item = 'i',     // "MOMENT VENDOR": the command has come to an item
+    returned = 'r', // "MOMENT REPLY"
+    stopped = 'd',  // what the stop returned
+    plan = 'p',     // the stored plan
+};
+
+struct Message {
+    MessageKind kind{};
+    std::string text;
+};
+
+// Both return false where the other side is gone.
+bool send_message(int socket, const Message &message);
+bool receive_message(int socket, Message &message);
+
+} // namespace fptest

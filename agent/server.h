@@ -1,0 +1,12 @@
+// The module's process, from the inside.
+#pragma once
+
+namespace fptest
+{
+
+// Turns this process, which was just made, into the module's: it calls the module
+// as the messages on the socket say, until their sender is gone. What the module
+// starts prints into the output and gets no input.
+[[noreturn]] void serve_module(int socket, int output);
+
+} // namespace fptest
