@@ -1,0 +1,51 @@
+// What fptest does, one function a sub-command. Each returns how the program is
+// to end, or throws a Failure.
+#pragma once
+
+#include "failure.h"
+
+#include <optional>
+#include <string>
+#include <vector>
+
+namespace fptest
+{
+
+struct RunOptions {
+    std::string plan; // a file, "-" for standard input; empty: the stored plan
+    std::vector<std::string> paths;
+    bool as_group = false;
+    bool list = false;
+    bool force = false;
+    bool tap = false;
+    bool quiet = false;
+    std::optional<double> timeout; // seconds for each item
+    int repeat = 1;
+    int pass_code = 0;
+    std::string junit; // files; empty for none
+    std::string json;
+    std::string log;
+};
+
+struct ReportOptions {
+    std::string group;
+    std::string item;
+    int progress = 0;
+    int result = 0;
+    std::string description;
+    std::string log;
+};
+
+struct SendOptions {
+    std::vector<std::string> commands;
+    bool from_input = false; // separated by zero bytes, and the replies as well
+    std::string log;
+};
+
+Exit run(const RunOptions &options);
+Exit check_files(const std::vector<std::string> &files);
+Exit show(const std::string &file); // empty: the stored plan
+Exit report(const ReportOptions &options);
+Exit send(const SendOptions &options);
+
+} // namespace fptest
