@@ -1,0 +1,481 @@
+// The program as a whole: what it says of itself, wrong usage, and the commands
+// that only read.
+#include "fptest_runner.h"
+#include "terminal_session.h"
+
+#include <algorithm>
+#include <filesystem>
+#include <regex>
+#include <set>
+
+using namespace fptest_runner;
+using device::kPlanFile;
+using device::Lines;
+using device::plan_of;
+using device::read_file;
+using device::write_file;
+using ::testing::Contains;
+using ::testing::EndsWith;
+using ::testing::IsSupersetOf;
+using ::testing::Not;
+using ::testing::SizeIs;
+using ::testing::StartsWith;
+using ::testing::UnorderedElementsAre;
+
+namespace fs = std::filesystem;
+
+namespace
+{
+
+const Lines kCommands = {"run", "check", "show", "report", "send"};
+
+class Fptest : public FptestTest
+{
+};
+
+// The columns of a text in UTF-8 without wide characters.
+std::size_t columns(const std::string &text)
+{
+    return static_cast<std::size_t>(
+        std::ranges::count_if(text, [](unsigned char c) { return (c & 0xc0U) != 0x80U; }));
+}
+
+// --- help -----------------------------------------------------------------------------
+
+std::string help_of(const std::string &command)
+{
+    const Ended ended = run_fptest(command.empty() ? Lines{"--help"} : Lines{command, "--help"});
+    EXPECT_EQ(ended.status, 0);
+    EXPECT_EQ(ended.err, "");
+    return ended.out;
+}
+
+// Those that a help names at the beginnings of its lines.
+std::set<std::string> options_of(const std::string &command)
+{
+    static const std::regex line(R"(^ +((-\w|--[\w-]+)(,(-\w|--[\w-]+))*)( .*)?$)");
+    static const std::regex option(R"(--?\w[\w-]*)");
+    std::set<std::string> options;
+    for (const std::string &text : lines_of(help_of(command))) {
+        std::smatch match;
+        if (!std::regex_match(text, match, line)) {
+            continue;
+        }
+        const std::string names = match[1];
+        for (std::sregex_iterator at(names.begin(), names.end(), option), end; at != end; ++at) {
+            options.insert(at->str());
+        }
+    }
+    return options;
+}
+
+TEST_F(Fptest, HasHelpWithExamplesForEveryCommand)
+{
+    for (const std::string &command : Lines{"", "run", "check", "show", "report", "send"}) {
+        SCOPED_TRACE(command);
+        const std::string help = help_of(command);
+        EXPECT_THAT(help, HasSubstr("\nExamples:\n  fptest " + command));
+        for (const std::string &line : lines_of(help)) {
+            EXPECT_LE(columns(line), 80U) << line;
+            EXPECT_EQ(line.find_last_not_of(' ') + 1, line.size()) << line;
+        }
+    }
+    EXPECT_EQ(run_fptest({"-h"}).out, help_of(""));
+}
+
+TEST_F(Fptest, NamesItsCommandsAndExitCodesInItsHelp)
+{
+    const std::string help = help_of("");
+    for (const std::string &command : kCommands) {
+        EXPECT_THAT(help, HasSubstr("\n  " + command + " ")) << command;
+    }
+    const std::string codes = help.substr(help.find("Exit status:"));
+    for (const std::string code : {"0", "1", "2", "3", "130"}) {
+        EXPECT_TRUE(std::regex_search(codes, std::regex("\\b" + code + "\\b"))) << codes;
+    }
+}
+
+TEST_F(Fptest, NamesEveryOptionInItsHelp)
+{
+    EXPECT_THAT(
+        options_of("run"),
+        IsSupersetOf({"--plan", "--as-group", "--timeout", "--repeat", "--list", "--junit",
+                      "--json", "--tap", "--pass-code", "--force", "--quiet", "--log", "--help"}));
+    EXPECT_THAT(options_of("report"),
+                IsSupersetOf({"--progress", "--result", "--description", "--log"}));
+    EXPECT_THAT(options_of("send"), IsSupersetOf({"-0", "--log"}));
+    EXPECT_THAT(options_of(""), IsSupersetOf({"--version", "--help"}));
+}
+
+TEST_F(Fptest, TellsItsVersion)
+{
+    const Ended ended = run_fptest({"--version"});
+    EXPECT_EQ(ended.status, 0);
+    EXPECT_EQ(ended.out, "fptest " FPTEST_VERSION "\n");
+    EXPECT_EQ(ended.err, "");
+}
+
+// --- wrong usage ------------------------------------------------------------------------
+
+void expect_wrong(const std::vector<std::string> &arguments, const std::string &line)
+{
+    const Ended ended = run_fptest(arguments);
+    EXPECT_EQ(ended.status, 2) << ::testing::PrintToString(arguments);
+    EXPECT_EQ(ended.err, line + "\n");
+    EXPECT_EQ(ended.out, "");
+}
+
+TEST_F(Fptest, SaysInOneLineWhatIsWrongWithItsArguments)
+{
+    expect_wrong({}, "fptest: A subcommand is required; see fptest --help");
+    expect_wrong({"bogus"}, "fptest: there is no command 'bogus'; the commands are run, check, "
+                            "show, report and send");
+    expect_wrong({"rum"}, "fptest: there is no command 'rum'; did you mean 'run'? The commands "
+                          "are run, check, show, report and send");
+    for (const std::string &command : kCommands) {
+        const Ended ended = run_fptest({command, "--bogus"});
+        EXPECT_EQ(ended.status, 2);
+        EXPECT_THAT(lines_of(ended.err), SizeIs(1)) << ended.err;
+        EXPECT_THAT(ended.err, StartsWith("fptest: "));
+        EXPECT_EQ(ended.out, "");
+    }
+    expect_wrong({"check"}, "fptest: FILE is required; see fptest --help");
+    expect_wrong({"show", "one", "two"},
+                 "fptest: The following argument was not expected: two; see fptest --help");
+}
+
+TEST_F(Fptest, TakesNoValuesThatMakeNoSense)
+{
+    const std::vector<std::pair<std::string, Lines>> wrong = {
+        {"--timeout", {"0", "-1", "x", "nan", ""}},
+        {"--repeat", {"0", "-1", "x", "1.5", ""}},
+        {"--pass-code", {"2", "7", "-1", "x", ""}}};
+    for (const auto &[option, values] : wrong) {
+        for (const std::string &value : values) {
+            const Ended ended = run_fptest(
+                {"run", option, value, "--plan", plan(plan_of({{"G", {{"Item", ""}}}})), "P/G"});
+            EXPECT_EQ(ended.status, 2) << option << " " << value;
+            EXPECT_THAT(lines_of(ended.err), SizeIs(1)) << ended.err;
+            EXPECT_THAT(ended.err, HasSubstr(option));
+            EXPECT_EQ(ended.out, "");
+            EXPECT_FALSE(fs::exists(kPlanFile));
+        }
+    }
+}
+
+// --- show -------------------------------------------------------------------------------
+
+TEST_F(Fptest, ShowsTheStoredPlanAsATable)
+{
+    write_file(kPlanFile,
+               "<P><CmdGroup name=\"Bringup\">"
+               "<Cmd name=\"SpiCheck\" args=\"\" progress=\"100\" result=\"0\" "
+               "description=\"chip 0x1a2b &amp; more\"/>"
+               "<Cmd name=\"DeadPixel\" progress=\"5\" result=\"-2\" description=\"\"/>"
+               "<Cmd name=\"指紋\"/></CmdGroup>"
+               "<CmdGroup name=\"G\"><Cmd name=\"x\" description=\"two\nlines\"/></CmdGroup></P>");
+    const Ended ended = run_fptest({"show"});
+    EXPECT_EQ(ended.status, 0);
+    EXPECT_EQ(ended.err, "");
+    EXPECT_EQ(ended.out, "GROUP    ITEM       PROGRESS  RESULT  DESCRIPTION\n"
+                         "Bringup  SpiCheck        100       0  chip 0x1a2b & more\n"
+                         "Bringup  DeadPixel         5      -2\n"
+                         "Bringup  指紋              -       -  -\n"
+                         "G        x                 -       -  two␊lines\n");
+}
+
+TEST_F(Fptest, ShowsAResultWithoutAValue)
+{
+    write_file(kPlanFile, "<P><CmdGroup name=\"G\"><Cmd name=\"a\" progress=\"1\" result "
+                          "description=\"d\"/><Cmd name=\"b\"/></CmdGroup></P>");
+    const Ended ended = run_fptest({"show"});
+    EXPECT_EQ(ended.status, 0);
+    EXPECT_EQ(ended.out, "GROUP  ITEM  PROGRESS  RESULT  DESCRIPTION\n"
+                         "G      a            1       ?  d\n"
+                         "G      b            -       -  -\n");
+}
+
+TEST_F(Fptest, ShowsAFileAndStandardInput)
+{
+    const std::string text = plan_of({{"G", {{"Item", ""}}}});
+    const std::string table = "GROUP  ITEM  PROGRESS  RESULT  DESCRIPTION\n"
+                              "G      Item         -       -  -\n";
+    EXPECT_EQ(run_fptest({"show", plan(text)}).out, table);
+    EXPECT_EQ(run_fptest({"show", "-"}, text).out, table);
+    EXPECT_FALSE(fs::exists(kPlanFile));
+}
+
+TEST_F(Fptest, ShowsWhatNoByteOfADescriptionCanChange)
+{
+    write_file(kPlanFile, "<P><CmdGroup name=\"G\"><Cmd name=\"a\" progress=\"1\" result=\"0\" "
+                          "description=\"\x1b[31m\x01\xff]]>\"/></CmdGroup></P>");
+    EXPECT_EQ(run_fptest({"show"}).out, "GROUP  ITEM  PROGRESS  RESULT  DESCRIPTION\n"
+                                        "G      a            1       0  ␛[31m␁�]]>\n");
+}
+
+TEST_F(Fptest, SaysInOneLineWhyItShowsNothing)
+{
+    const auto expect = [](int status, const std::string &line, const Lines &arguments,
+                           const std::string &input = "") {
+        const Ended ended = run_fptest(arguments, input);
+        EXPECT_EQ(ended.status, status);
+        EXPECT_EQ(ended.err, line + "\n");
+        EXPECT_EQ(ended.out, "");
+    };
+    expect(3,
+           "fptest: no plan is stored in /data/vorlane/src1.xml: run one with fptest run --plan "
+           "FILE, or name a file to show",
+           {"show"});
+    expect(2, "fptest: /tmp/scene/none: No such file or directory", {"show", work("none")});
+    const std::string half = "<P><CmdGroup name=\"G\"><Cmd name=\"a\"/><Cmd nam";
+    expect(2, "fptest: /tmp/scene/plan.xml is no whole test plan: fptest check says what is wrong",
+           {"show", plan(half)});
+    expect(2, "fptest: <stdin> is no whole test plan: fptest check says what is wrong",
+           {"show", "-"}, half);
+    expect(2, "fptest: <stdin> has no items: fptest check says more", {"show", "-"},
+           "<P><CmdGroup name=\"G\"/></P>");
+    write_file(kPlanFile, half);
+    expect(2,
+           "fptest: /data/vorlane/src1.xml is no whole test plan: fptest check says what is wrong",
+           {"show"});
+}
+
+TEST_F(Fptest, CutsTheTableToTheTerminal)
+{
+    write_file(kPlanFile, "<P><CmdGroup name=\"G\"><Cmd name=\"a\" progress=\"1\" result=\"0\" "
+                          "description=\"" +
+                              std::string(200, 'd') + "\"/></CmdGroup></P>");
+    TerminalSession session({FPTEST_PROGRAM, "show"}, 50, 24);
+    EXPECT_EQ(session.wait_for_end(), 0);
+    EXPECT_THAT(session.all_lines(),
+                ElementsAre("GROUP  ITEM  PROGRESS  RESULT  DESCRIPTION",
+                            "G      a            1       0  dddddddddddddddd..."));
+}
+
+// --- check ------------------------------------------------------------------------------
+
+TEST_F(Fptest, ChecksAPlan)
+{
+    const std::string sound = plan_of({{"G", {{"Item", ""}, {"Other", ""}}}});
+    const Ended ended = run_fptest({"check", plan(sound)});
+    EXPECT_EQ(ended.status, 0);
+    EXPECT_EQ(ended.err, "");
+    EXPECT_EQ(ended.out, "/tmp/scene/plan.xml: 0 errors, 0 warnings (1 group, 2 items, " +
+                             std::to_string(sound.size()) + " of 2048 bytes)\n");
+    EXPECT_FALSE(fs::exists(kPlanFile));
+}
+
+TEST_F(Fptest, ChecksWithAMessageASourceLineAndACaret)
+{
+    const std::string text = "<P>\n"
+                             "  <CmdGroup name=\"G\">\n"
+                             "    <Cmd name=\"a/b\" args=\"\"/>\n"
+                             "  </CmdGroup>\n"
+                             "</P>\n";
+    const Ended ended = run_fptest({"check", plan(text)});
+    EXPECT_EQ(ended.status, 1);
+    EXPECT_EQ(ended.err, "");
+    const Lines lines = lines_of(ended.out);
+    ASSERT_THAT(lines, SizeIs(4));
+    const std::string place = "/tmp/scene/plan.xml:3:";
+    EXPECT_THAT(lines[0], StartsWith(place));
+    EXPECT_TRUE(std::regex_match(lines[0].substr(place.size()), std::regex(R"(\d+: error: .+)")))
+        << lines[0];
+    EXPECT_EQ(lines[1], "    <Cmd name=\"a/b\" args=\"\"/>");
+    const std::size_t column = std::stoul(lines[0].substr(place.size()));
+    EXPECT_EQ(lines[2], std::string(column - 1, ' ') + "^");
+    EXPECT_EQ(lines[3],
+              "/tmp/scene/plan.xml: 1 error, 0 warnings (1 group, 1 item, 75 of 2048 bytes)");
+}
+
+TEST_F(Fptest, ChecksSeveralFilesAndStandardInput)
+{
+    const std::string sound = file("sound.xml", plan_of({{"G", {{"Item", ""}}}}));
+    const std::string broken = file("broken.xml", "<P><CmdGroup></P>");
+    EXPECT_EQ(run_fptest({"check", sound, sound}).status, 0);
+    Ended ended = run_fptest({"check", broken, sound, "-"}, "<P/>");
+    EXPECT_EQ(ended.status, 1);
+    Lines summaries = lines_of(ended.out);
+    std::erase_if(summaries,
+                  [](const std::string &line) { return line.find("warning") == line.npos; });
+    EXPECT_THAT(summaries, ElementsAre(StartsWith("/tmp/scene/broken.xml: 1 error, 0 warnings ("),
+                                       StartsWith("/tmp/scene/sound.xml: 0 errors, 0 warnings ("),
+                                       StartsWith("<stdin>: 1 error, 0 warnings (")));
+    EXPECT_EQ(run_fptest({"check", "-"}, plan_of({{"G", {{"Item", ""}}}})).status, 0);
+}
+
+TEST_F(Fptest, PassesAPlanWithWarningsAlone)
+{
+    const std::string name(30, 'n'); // too long to be stopped by
+    const Ended ended = run_fptest({"check", plan(plan_of({{"G", {{name, ""}}}}))});
+    EXPECT_EQ(ended.status, 0);
+    EXPECT_THAT(ended.out, HasSubstr(": warning: "));
+    EXPECT_THAT(ended.out, HasSubstr(": 0 errors, 1 warning (1 group, 1 item, "));
+}
+
+TEST_F(Fptest, SaysWhichFilesItCannotCheck)
+{
+    const std::string sound = file("sound.xml", plan_of({{"G", {{"Item", ""}}}}));
+    const std::string broken = file("broken.xml", "<P><CmdGroup></P>");
+    const Ended ended = run_fptest({"check", work("none"), sound, kWork, broken});
+    EXPECT_EQ(ended.status, 2);
+    EXPECT_EQ(ended.err, "fptest: /tmp/scene/none: No such file or directory\n"
+                         "fptest: /tmp/scene: Is a directory\n");
+    EXPECT_THAT(ended.out, StartsWith("/tmp/scene/sound.xml: 0 errors"));
+    EXPECT_THAT(ended.out, HasSubstr("\n/tmp/scene/broken.xml: 1 error"));
+}
+
+TEST_F(Fptest, SaysThatStandardOutputCannotBeWritten)
+{
+    write_file(kPlanFile, plan_of({{"G", {{"Item", ""}}}}));
+    for (const Lines &arguments :
+         {Lines{"show"}, Lines{"check", kPlanFile}, Lines{"--help"}, Lines{"run", "--list"}}) {
+        Start start;
+        start.arguments = arguments;
+        start.output = "/dev/full";
+        const Ended ended = run_fptest(start);
+        EXPECT_EQ(ended.status, 3) << arguments[0];
+        EXPECT_EQ(ended.err, "fptest: standard output cannot be written\n") << arguments[0];
+    }
+}
+
+// --- manual pages -----------------------------------------------------------------------
+
+constexpr char kDocuments[] = QUILLMARK_SOURCE_DIR "/docs/";
+
+// As a person reads it, without bold and underlined characters.
+std::string manual(const std::string &page)
+{
+    const Ended ended =
+        run_program({"/usr/bin/mandoc", "-T", "utf8", "-O", "width=78", kDocuments + page});
+    EXPECT_EQ(ended.status, 0) << ended.out;
+    std::string text;
+    for (const char c : ended.out) {
+        if (c == '\b' && !text.empty()) {
+            text.pop_back();
+        } else if (c != '\b') {
+            text += c;
+        }
+    }
+    return text;
+}
+
+void expect_no_complaints(const std::string &page)
+{
+    const Ended ended =
+        run_program({"/usr/bin/mandoc", "-T", "lint", "-W", "warning", kDocuments + page});
+    EXPECT_EQ(ended.status, 0);
+    EXPECT_EQ(ended.out, "");
+}
+
+TEST_F(Fptest, HasAManualPageWithEveryCommandAndOption)
+{
+    expect_no_complaints("fptest.1");
+    const std::string text = manual("fptest.1");
+    EXPECT_THAT(text, StartsWith("FPTEST(1)"));
+    for (const std::string &command : kCommands) {
+        EXPECT_THAT(text, HasSubstr("fptest " + command));
+        for (const std::string &option : options_of(command)) {
+            EXPECT_TRUE(std::regex_search(text, std::regex("[ \\[|(,]" + option + "\\b")))
+                << option << " of " << command;
+        }
+    }
+    for (const std::string &option : options_of("")) {
+        EXPECT_THAT(text, HasSubstr(option));
+    }
+    for (const std::string word : {"EXIT STATUS", "EXAMPLES", "130", "quillmark-plan(5)",
+                                   "/data/vorlane/src1.xml", "NO_COLOR"}) {
+        EXPECT_THAT(text, HasSubstr(word)) << word;
+    }
+}
+
+TEST_F(Fptest, HasAManualPageOfThePlansFormat)
+{
+    expect_no_complaints("quillmark-plan.5");
+    const std::string text = manual("quillmark-plan.5");
+    EXPECT_THAT(text, StartsWith("QUILLMARK-PLAN(5)"));
+    for (const std::string word :
+         {"CmdGroup", "Cmd", "name", "args", "progress", "result", "description", "2048",
+          "SensorProbe", "fptest(1)", "/data/vorlane/src1.xml", "EXAMPLES"}) {
+        EXPECT_THAT(text, HasSubstr(word)) << word;
+    }
+}
+
+// --- completion -------------------------------------------------------------------------
+
+// What bash offers for the last of these words.
+Lines completions(const Lines &words)
+{
+    std::string array;
+    std::string line;
+    for (const std::string &word : words) {
+        array += " '" + word + "'";
+        line += (line.empty() ? "" : " ") + word;
+    }
+    const std::string script = "source /usr/share/bash-completion/bash_completion\n"
+                               "source " QUILLMARK_SOURCE_DIR "/agent/completion/fptest\n"
+                               "compopt() { :; }\n" // there is no line that is being edited
+                               "function=$(complete -p fptest | sed 's/.*-F \\([^ ]*\\).*/\\1/')\n"
+                               "COMP_WORDS=(" +
+                               array + ") COMP_CWORD=" + std::to_string(words.size() - 1) + "\n" +
+                               "COMP_LINE='" + line +
+                               "' COMP_POINT=${#COMP_LINE} COMP_TYPE=9\n"
+                               "\"$function\" fptest '" +
+                               words.back() + "' '" + words.at(words.size() - 2) +
+                               "'\n"
+                               "printf '%s\\n' \"${COMPREPLY[@]}\"\n";
+    const Ended ended = run_program({"/usr/bin/bash", "--norc", "-c", script});
+    EXPECT_EQ(ended.status, 0) << ended.out;
+    Lines offered = lines_of(ended.out);
+    for (std::string &word : offered) {
+        word.erase(word.find_last_not_of(' ') + 1);
+    }
+    return offered;
+}
+
+TEST_F(Fptest, CompletesNodePathsOfTheStoredPlan)
+{
+    write_file(kPlanFile,
+               "<Plan name=\"demo\"><CmdGroup name=\"Bringup\"><Cmd name=\"SpiCheck\" args=\"\"/>"
+               "<Cmd name=\"DeadPixel\" args=\"\"/></CmdGroup><CmdGroup name=\"Endurance\">"
+               "<Cmd name=\"BurnIn\" args=\"\"/></CmdGroup></Plan>");
+    EXPECT_THAT(completions({"fptest", "run", "demo/B"}), Contains(StartsWith("demo/Bringup")));
+    EXPECT_THAT(completions({"fptest", "run", "demo/B"}), Not(Contains(HasSubstr("Endurance"))));
+    EXPECT_THAT(completions({"fptest", "run", "--tap", "demo/Bringup/S"}),
+                ElementsAre("demo/Bringup/SpiCheck"));
+    EXPECT_THAT(completions({"fptest", "run", "demo/Bringup/"}),
+                IsSupersetOf({"demo/Bringup/SpiCheck", "demo/Bringup/DeadPixel"}));
+}
+
+TEST_F(Fptest, CompletesNodePathsOfThePlanThatIsGiven)
+{
+    write_file(kPlanFile, plan_of({{"Stored", {{"Item", ""}}}}));
+    const std::string path = plan(plan_of({{"Given", {{"Other", ""}}}}));
+    EXPECT_THAT(completions({"fptest", "run", "--plan", path, "P/"}),
+                ::testing::AllOf(Contains(HasSubstr("Given")), Not(Contains(HasSubstr("Stored")))));
+}
+
+TEST_F(Fptest, CompletesWhatAReportIsAbout)
+{
+    write_file(kPlanFile, plan_of({{"Bringup", {{"SpiCheck", ""}, {"DeadPixel", ""}}},
+                                   {"Endurance", {{"BurnIn", ""}}}}));
+    EXPECT_THAT(completions({"fptest", "report", "Br"}), ElementsAre("Bringup"));
+    EXPECT_THAT(completions({"fptest", "report", "Bringup", ""}),
+                UnorderedElementsAre("SpiCheck", "DeadPixel"));
+    EXPECT_THAT(completions({"fptest", "report", "Bringup", "SpiCheck", "--result", ""}),
+                UnorderedElementsAre("0", "1", "-2"));
+}
+
+TEST_F(Fptest, CompletesOnATerminal)
+{
+    TerminalSession session({"/usr/bin/bash", "--norc", "--noprofile", "-i"}, 80, 24,
+                            {{"PS1", "ready> "}, {"PATH", "/system/bin:/usr/bin"}});
+    ASSERT_TRUE(session.wait_for_text("ready>")) << session.text();
+    session.type("source /usr/share/bash-completion/bash_completion; source " QUILLMARK_SOURCE_DIR
+                 "/agent/completion/fptest; echo soon-$((1 + 1))\n");
+    ASSERT_TRUE(session.wait_for_text("soon-2")) << session.text();
+    session.type("fptest rep\t");
+    EXPECT_TRUE(session.wait_for_text("ready> fptest report")) << session.text();
+}
+
+} // namespace

@@ -1,0 +1,319 @@
+// The scanner: which tags a text has, and where.
+#include "markup.h"
+
+#include <gmock/gmock.h>
+#include <gtest/gtest.h>
+
+#include <random>
+#include <string>
+#include <string_view>
+#include <vector>
+
+using fptest::Attribute;
+using fptest::Position;
+using fptest::Tag;
+using testing::ElementsAre;
+using testing::IsEmpty;
+using std::string_view_literals::operator""sv;
+
+namespace
+{
+
+const char *kind_name(Tag::Kind kind)
+{
+    switch (kind) {
+    case Tag::Kind::open:
+        return "open";
+    case Tag::Kind::empty:
+        return "empty";
+    case Tag::Kind::close:
+        return "close";
+    case Tag::Kind::comment:
+        return "comment";
+    case Tag::Kind::cdata:
+        return "cdata";
+    case Tag::Kind::instruction:
+        return "instruction";
+    case Tag::Kind::declaration:
+        return "declaration";
+    case Tag::Kind::text:
+        return "text";
+    }
+    return "?";
+}
+
+// "KIND NAME|what stands there", with " ..." behind what is not complete.
+std::vector<std::string> scanned(std::string_view text)
+{
+    std::vector<std::string> tags;
+    for (const Tag &tag : fptest::scan(text)) {
+        tags.push_back(std::string(kind_name(tag.kind)) + (tag.name.empty() ? "" : " " + tag.name) +
+                       "|" + std::string(text.substr(tag.begin, tag.end - tag.begin)) +
+                       (tag.complete ? "" : " ..."));
+    }
+    return tags;
+}
+
+// "NAME|what stands there|its value" for the attributes of the first tag.
+std::vector<std::string> attributes(std::string_view text)
+{
+    std::vector<std::string> list;
+    const std::vector<Tag> tags = fptest::scan(text);
+    for (const Attribute &attribute : tags.at(0).attributes) {
+        std::string line =
+            attribute.name + "|" +
+            std::string(text.substr(attribute.begin, attribute.end - attribute.begin));
+        if (attribute.has_value) {
+            line += "|" + std::string(text.substr(attribute.value_begin,
+                                                  attribute.value_end - attribute.value_begin));
+        }
+        list.push_back(line);
+    }
+    return list;
+}
+
+std::string place(std::string_view text, std::size_t offset)
+{
+    const Position position = fptest::position(text, offset);
+    return std::to_string(position.line) + ":" + std::to_string(position.column);
+}
+
+// --- tags -------------------------------------------------------------------
+
+TEST(Scan, FindsNothingInNothingAndInWhiteSpace)
+{
+    EXPECT_THAT(scanned(""), IsEmpty());
+    EXPECT_THAT(scanned(" \t\r\n "), IsEmpty());
+}
+
+TEST(Scan, FindsEveryKindOfTagInOrder)
+{
+    EXPECT_THAT(
+        scanned("<?xml version=\"1.0\"?>\n<!DOCTYPE Plan>\r\n<Plan>\n\t<!-- one > two -->\n"
+                "  some  words\n <A name=\"x\"/><![CDATA[ <b> ]]></Plan >\n"),
+        ElementsAre("instruction xml|<?xml version=\"1.0\"?>", "declaration|<!DOCTYPE Plan>",
+                    "open Plan|<Plan>", "comment|<!-- one > two -->", "text|some  words",
+                    "empty A|<A name=\"x\"/>", "cdata|<![CDATA[ <b> ]]>", "close Plan|</Plan >"));
+}
+
+TEST(Scan, TakesTextUpToItsLastWord)
+{
+    EXPECT_THAT(scanned("a\n b \n<x> \n c</x>d "),
+                ElementsAre("text|a\n b", "open x|<x>", "text|c", "close x|</x>", "text|d"));
+}
+
+TEST(Scan, EndsATagBehindQuotesOnly)
+{
+    EXPECT_THAT(scanned("<a b='<c>/>'><d e=\"?>'/>\"/>"),
+                ElementsAre("open a|<a b='<c>/>'>", "empty d|<d e=\"?>'/>\"/>"));
+}
+
+TEST(Scan, TakesATagEndedByAQuestionMarkForAnEmptyOne)
+{
+    EXPECT_THAT(scanned("<a b='c'?>d"), ElementsAre("empty a|<a b='c'?>", "text|d"));
+}
+
+TEST(Scan, SeesNoEndInACommentOfNothing)
+{
+    EXPECT_THAT(scanned("<!----><a/><!-- b --><c/>"),
+                ElementsAre("comment|<!----><a/><!-- b -->", "empty c|<c/>"));
+    EXPECT_THAT(scanned("<!--><a/>-->"), ElementsAre("comment|<!--><a/>-->"));
+    EXPECT_THAT(scanned("<!---><a/>-->"), ElementsAre("comment|<!---><a/>-->"));
+    EXPECT_THAT(scanned("<!--a-->b"), ElementsAre("comment|<!--a-->", "text|b"));
+}
+
+TEST(Scan, SeesNoEndOfACommentBehindThreeHyphens)
+{
+    EXPECT_THAT(scanned("<!-- a ---> b --> c"), ElementsAre("comment|<!-- a ---> b -->", "text|c"));
+}
+
+TEST(Scan, EndsADeclarationAtItsFirstBracket)
+{
+    EXPECT_THAT(
+        scanned("<!DOCTYPE a [<!ELEMENT b ANY>]><a/>"),
+        ElementsAre("declaration|<!DOCTYPE a [<!ELEMENT b ANY>", "text|]>", "empty a|<a/>"));
+}
+
+TEST(Scan, EndsAnInstructionAtItsFirstQuestionMarkAndBracket)
+{
+    EXPECT_THAT(scanned("<?a b='?>'?>"), ElementsAre("instruction a|<?a b='?>", "text|'?>"));
+    EXPECT_THAT(scanned("<?>a"), ElementsAre("instruction|<?>", "text|a"));
+    EXPECT_THAT(scanned("<?a?>"), ElementsAre("instruction a|<?a?>"));
+}
+
+TEST(Scan, TakesWhatBreaksOff)
+{
+    EXPECT_THAT(scanned("<"), ElementsAre("open|< ..."));
+    EXPECT_THAT(scanned("<a"), ElementsAre("open a|<a ..."));
+    EXPECT_THAT(scanned("<a b"), ElementsAre("open a|<a b ..."));
+    EXPECT_THAT(scanned("<a b="), ElementsAre("open a|<a b= ..."));
+    EXPECT_THAT(scanned("<a b=\"c>"), ElementsAre("open a|<a b=\"c> ..."));
+    EXPECT_THAT(scanned("<a b=\"c\" "), ElementsAre("open a|<a b=\"c\"  ..."));
+    EXPECT_THAT(scanned("<a /"), ElementsAre("open a|<a / ..."));
+    EXPECT_THAT(scanned("</"), ElementsAre("close|</ ..."));
+    EXPECT_THAT(scanned("</a "), ElementsAre("close a|</a  ..."));
+    EXPECT_THAT(scanned("<!"), ElementsAre("declaration|<! ..."));
+    EXPECT_THAT(scanned("<!--"), ElementsAre("comment|<!-- ..."));
+    EXPECT_THAT(scanned("<!-- --"), ElementsAre("comment|<!-- -- ..."));
+    EXPECT_THAT(scanned("<![CDATA[]]"), ElementsAre("cdata|<![CDATA[]] ..."));
+    EXPECT_THAT(scanned("<?xml ?"), ElementsAre("instruction xml|<?xml ? ..."));
+}
+
+TEST(Scan, GoesOnWithTheNextTagWhereOneBreaksOff)
+{
+    EXPECT_THAT(scanned("<a b=\"c\"\n<d/>"),
+                ElementsAre("open a|<a b=\"c\"\n ...", "empty d|<d/>"));
+    EXPECT_THAT(scanned("<a<d/>"), ElementsAre("open a|<a ...", "empty d|<d/>"));
+}
+
+TEST(Scan, PassesOverStrayCharactersInATag)
+{
+    EXPECT_THAT(scanned("<a / b='c' ?d>"), ElementsAre("open a|<a / b='c' ?d>"));
+}
+
+// --- attributes --------------------------------------------------------------
+
+TEST(ScannedAttributes, HaveNamesAndValuesInEitherQuotes)
+{
+    EXPECT_THAT(attributes("<Cmd name=\"x\" args='a \"b\"'\n\td = \"\" />"),
+                ElementsAre("name|name=\"x\"|x", "args|args='a \"b\"'|a \"b\"", "d|d = \"\"|"));
+}
+
+TEST(ScannedAttributes, MayStandWithoutBlanksBetweenThem)
+{
+    EXPECT_THAT(attributes("<a b=\"c\"d='e'/>"), ElementsAre("b|b=\"c\"|c", "d|d='e'|e"));
+}
+
+TEST(ScannedAttributes, MayLackTheirValue)
+{
+    EXPECT_THAT(attributes("<Cmd result name=\"x\" progress\n/>"),
+                ElementsAre("result|result", "name|name=\"x\"|x", "progress|progress"));
+    EXPECT_THAT(attributes("<Cmd result>"), ElementsAre("result|result"));
+    EXPECT_THAT(attributes("<Cmd result/>"), ElementsAre("result|result"));
+}
+
+TEST(ScannedAttributes, MayHaveAValueWithoutQuotes)
+{
+    EXPECT_THAT(attributes("<a b=c d= e/>"), ElementsAre("b|b=c|c", "d|d= e|e"));
+    EXPECT_THAT(attributes("<a b==c>"), ElementsAre("b|b==c|=c"));
+}
+
+TEST(ScannedAttributes, MayHaveAQuotedName)
+{
+    EXPECT_THAT(attributes("<a 'b c'=\"d\" \"e>"), ElementsAre("'b c'|'b c'=\"d\"|d", "\"e>|\"e>"));
+}
+
+TEST(ScannedAttributes, GoToTheEndWhereTheirQuoteIsMissing)
+{
+    EXPECT_THAT(attributes("<a b=\"c d='e'/>"), ElementsAre("b|b=\"c d='e'/>|c d='e'/>"));
+    EXPECT_THAT(attributes("<a b="), ElementsAre("b|b=|"));
+}
+
+TEST(ScannedAttributes, BelongToElementsOnly)
+{
+    EXPECT_THAT(attributes("<?xml version=\"1.0\"?>"), IsEmpty());
+    EXPECT_THAT(attributes("<!DOCTYPE a SYSTEM=\"b\">"), IsEmpty());
+}
+
+// --- any bytes ----------------------------------------------------------------
+
+TEST(Scan, CoversWhateverItIsGiven)
+{
+    std::mt19937 random(7);
+    constexpr std::string_view kBytes = "<>/?!-=\"'& ab[]CDATA\n\0\xC3\xA9\xFF"sv;
+    for (int round = 0; round < 20000; ++round) {
+        std::string text;
+        for (std::size_t size = random() % 40; text.size() < size;) {
+            text += kBytes[random() % kBytes.size()];
+        }
+        std::size_t at = 0;
+        for (const Tag &tag : fptest::scan(text)) {
+            ASSERT_LE(at, tag.begin) << text;
+            ASSERT_LT(tag.begin, tag.end) << text;
+            ASSERT_LE(tag.end, text.size()) << text;
+            // nothing but white space is left out
+            ASSERT_EQ(text.find_first_not_of(" \t\r\n", at), tag.begin) << text;
+            at = tag.end;
+            std::size_t inside = tag.begin;
+            for (const Attribute &attribute : tag.attributes) {
+                ASSERT_LT(inside, attribute.begin) << text;
+                ASSERT_LT(attribute.begin, attribute.end) << text;
+                ASSERT_LE(attribute.end, tag.end) << text;
+                ASSERT_FALSE(attribute.name.empty()) << text;
+                if (attribute.has_value) {
+                    ASSERT_LT(attribute.begin, attribute.value_begin) << text;
+                    ASSERT_LE(attribute.value_begin, attribute.value_end) << text;
+                    ASSERT_LE(attribute.value_end, attribute.end) << text;
+                }
+                inside = attribute.end - 1;
+            }
+        }
+        ASSERT_EQ(text.find_first_not_of(" \t\r\n", at), std::string::npos) << text;
+    }
+}
+
+// --- positions ------------------------------------------------------------------
+
+TEST(PositionInText, CountsLinesAndColumnsFromOne)
+{
+    EXPECT_EQ(place("", 0), "1:1");
+    EXPECT_EQ(place("abc", 0), "1:1");
+    EXPECT_EQ(place("abc", 2), "1:3");
+    EXPECT_EQ(place("abc", 3), "1:4");
+    EXPECT_EQ(place("a\nbc\n\nd", 1), "1:2");
+    EXPECT_EQ(place("a\nbc\n\nd", 2), "2:1");
+    EXPECT_EQ(place("a\nbc\n\nd", 5), "3:1");
+    EXPECT_EQ(place("a\nbc\n\nd", 6), "4:1");
+    EXPECT_EQ(place("a\n", 2), "2:1");
+}
+
+TEST(PositionInText, TakesAPlaceBehindTheEndForTheEnd)
+{
+    EXPECT_EQ(place("a\nbc", 99), "2:3");
+}
+
+TEST(PositionInText, CountsACharacterOfSeveralBytesOnce)
+{
+    EXPECT_EQ(place("\xC3\xA9\xE2\x82\xAC\xF0\x9F\x98\x80x", 0), "1:1");
+    EXPECT_EQ(place("\xC3\xA9\xE2\x82\xAC\xF0\x9F\x98\x80x", 2), "1:2");
+    EXPECT_EQ(place("\xC3\xA9\xE2\x82\xAC\xF0\x9F\x98\x80x", 5), "1:3");
+    EXPECT_EQ(place("\xC3\xA9\xE2\x82\xAC\xF0\x9F\x98\x80x", 9), "1:4");
+}
+
+TEST(PositionInText, IsThatOfTheCharacterThatItStandsIn)
+{
+    EXPECT_EQ(place("x\xE2\x82\xACy", 2), "1:2");
+    EXPECT_EQ(place("x\xE2\x82\xACy", 3), "1:2");
+    EXPECT_EQ(place("x\xE2\x82\xACy", 4), "1:3");
+}
+
+TEST(PositionInText, CountsBytesThatAreNoUtf8OneByOne)
+{
+    EXPECT_EQ(place("\xFF\xA9\xC3x\xE2\x82", 3), "1:4");
+    EXPECT_EQ(place("\xFF\xA9\xC3x\xE2\x82", 4), "1:5");
+    EXPECT_EQ(place("\xFF\xA9\xC3x\xE2\x82", 5), "1:6");
+    EXPECT_EQ(place("\xFF\xA9\xC3x\xE2\x82", 6), "1:7");
+}
+
+TEST(PositionInText, KnowsNoTwoByteCharacterBelowC2)
+{
+    EXPECT_EQ(place("\xC1\x80\xC2\x80", 2), "1:3");
+    EXPECT_EQ(place("\xC1\x80\xC2\x80", 4), "1:4");
+}
+
+TEST(PositionInText, CountsATabAndACarriageReturnOnce)
+{
+    EXPECT_EQ(place("\t\t<a>\r\nb", 2), "1:3");
+    EXPECT_EQ(place("\t\t<a>\r\nb", 6), "1:7");
+    EXPECT_EQ(place("\t\t<a>\r\nb", 7), "2:1");
+}
+
+TEST(PositionInText, DoesNotCountAByteOrderMark)
+{
+    EXPECT_EQ(place("\xEF\xBB\xBF<a>\n\xEF\xBB\xBFx", 0), "1:1");
+    EXPECT_EQ(place("\xEF\xBB\xBF<a>\n\xEF\xBB\xBFx", 3), "1:1");
+    EXPECT_EQ(place("\xEF\xBB\xBF<a>\n\xEF\xBB\xBFx", 5), "1:3");
+    EXPECT_EQ(place("\xEF\xBB\xBF<a>\n\xEF\xBB\xBFx", 10), "2:2");
+}
+
+} // namespace

@@ -1,0 +1,321 @@
+#include "report_files.h"
+
+#include <expat.h>
+#include <gtest/gtest.h>
+#include <nlohmann/json.hpp>
+
+#include <algorithm>
+#include <array>
+#include <cstdio>
+#include <cstdlib>
+#include <filesystem>
+#include <fstream>
+#include <iterator>
+#include <memory>
+#include <stdexcept>
+#include <sys/wait.h>
+
+namespace report_files
+{
+
+// --- files -------------------------------------------------------------------
+
+Directory::Directory() : path_(::testing::TempDir() + "fptest-reports-XXXXXX")
+{
+    if (mkdtemp(path_.data()) == nullptr) {
+        throw std::runtime_error("no temporary directory: " + path_);
+    }
+}
+
+Directory::~Directory()
+{
+    std::error_code ignored;
+    std::filesystem::remove_all(path_, ignored);
+}
+
+std::string Directory::path(const std::string &name) const
+{
+    return path_ + "/" + name;
+}
+
+std::vector<std::string> Directory::names() const
+{
+    std::vector<std::string> names;
+    for (const auto &entry : std::filesystem::directory_iterator(path_)) {
+        names.push_back(entry.path().filename());
+    }
+    std::sort(names.begin(), names.end());
+    return names;
+}
+
+std::string read_file(const std::string &path)
+{
+    std::ifstream file(path, std::ios::binary);
+    EXPECT_TRUE(file.is_open()) << path;
+    return {std::istreambuf_iterator<char>(file), {}};
+}
+
+void write_file(const std::string &path, const std::string &text)
+{
+    std::ofstream file(path, std::ios::binary);
+    file << text;
+    ASSERT_TRUE(file.flush().good()) << path;
+}
+
+std::vector<std::string> lines_of(const std::string &text)
+{
+    std::vector<std::string> lines;
+    for (std::size_t begin = 0; begin < text.size();) {
+        const std::size_t end = std::min(text.find('\n', begin), text.size() - 1);
+        lines.push_back(text.substr(begin, end + 1 - begin));
+        begin = end + 1;
+    }
+    return lines;
+}
+
+// --- XML ---------------------------------------------------------------------
+
+namespace
+{
+
+// The elements that are open while a document is read.
+using Open = std::vector<Element>;
+
+void start(void *data, const char *name, const char **attributes)
+{
+    Element element;
+    element.name = name;
+    for (; *attributes != nullptr; attributes += 2) {
+        element.attributes[attributes[0]] = attributes[1];
+    }
+    static_cast<Open *>(data)->push_back(std::move(element));
+}
+
+void end(void *data, const char * /* name */)
+{
+    Open &open = *static_cast<Open *>(data);
+    Element done = std::move(open.back());
+    open.pop_back();
+    open.back().children.push_back(std::move(done));
+}
+
+void characters(void *data, const char *text, int size)
+{
+    static_cast<Open *>(data)->back().text.append(text, static_cast<std::size_t>(size));
+}
+
+} // namespace
+
+std::vector<Element> Element::all(const std::string &child) const
+{
+    std::vector<Element> found;
+    std::copy_if(children.begin(), children.end(), std::back_inserter(found),
+                 [&](const Element &element) { return element.name == child; });
+    return found;
+}
+
+std::map<std::string, std::string> Element::properties() const
+{
+    std::map<std::string, std::string> values;
+    for (const Element &list : all("properties")) {
+        for (const Element &one : list.all("property")) {
+            values[one.attributes.at("name")] = one.attributes.at("value");
+        }
+    }
+    return values;
+}
+
+Element parse_xml(const std::string &text)
+{
+    const std::unique_ptr<XML_ParserStruct, decltype(&XML_ParserFree)> parser(
+        XML_ParserCreate(nullptr), &XML_ParserFree);
+    Open open(1);
+    XML_SetUserData(parser.get(), &open);
+    XML_SetElementHandler(parser.get(), start, end);
+    XML_SetCharacterDataHandler(parser.get(), characters);
+    if (XML_Parse(parser.get(), text.data(), static_cast<int>(text.size()), 1) != XML_STATUS_OK) {
+        ADD_FAILURE() << "line " << XML_GetCurrentLineNumber(parser.get()) << ": "
+                      << XML_ErrorString(XML_GetErrorCode(parser.get())) << "\n"
+                      << text.substr(0, 2000);
+        return {};
+    }
+    return open.front().children.front();
+}
+
+// --- TAP ---------------------------------------------------------------------
+
+namespace
+{
+
+// What stands behind the number of a point.
+struct PointText {
+    std::string name;
+    std::optional<std::string> directive;
+};
+
+// A directive begins at a '#' that is not escaped.
+PointText parse_point(const std::string &text)
+{
+    PointText point;
+    std::string *part = &point.name;
+    for (std::size_t at = 0; at < text.size(); ++at) {
+        if (text[at] == '\\') {
+            ++at;
+            EXPECT_TRUE(at < text.size() && (text[at] == '#' || text[at] == '\\')) << text;
+        } else if (text[at] == '#') {
+            EXPECT_FALSE(point.directive) << text;
+            part = &point.directive.emplace();
+        }
+        *part += text.substr(at, 1);
+    }
+    return point;
+}
+
+class TapParser
+{
+  public:
+    explicit TapParser(std::vector<std::string> lines) : lines_(std::move(lines))
+    {
+    }
+
+    Tap parse()
+    {
+        Tap tap;
+        tap.version = take("TAP version ").value_or("");
+        EXPECT_NE(tap.version, "");
+        tap.planned = plan("");
+        while (at_ < lines_.size()) {
+            if (const auto name = take("# Subtest: ")) {
+                subtest(tap, *name);
+            } else if (const auto reason = take("Bail out!  ")) {
+                tap.bail_out = *reason;
+                EXPECT_EQ(at_, lines_.size()) << "more behind the end";
+            } else if (const auto comment = take("# ")) {
+                tap.comments.push_back(*comment);
+            } else {
+                wrong();
+            }
+        }
+        return tap;
+    }
+
+  private:
+    static constexpr char kIndent[] = "    ";
+
+    // The rest of the next line, which is taken if it begins so.
+    std::optional<std::string> take(const std::string &start)
+    {
+        if (at_ == lines_.size() || !lines_[at_].starts_with(start)) {
+            return std::nullopt;
+        }
+        const std::string &line = lines_[at_++];
+        EXPECT_EQ(line.back(), '\n') << line;
+        return line.substr(start.size(), line.size() - 1 - start.size());
+    }
+
+    void wrong()
+    {
+        ADD_FAILURE() << "line " << at_ + 1 << ": " << lines_[at_];
+        ++at_;
+    }
+
+    std::size_t plan(const std::string &indent)
+    {
+        const std::optional<std::string> size = take(indent + "1..");
+        EXPECT_TRUE(size);
+        return size ? std::stoul(*size) : 0;
+    }
+
+    void subtest(Tap &tap, const std::string &name)
+    {
+        const std::size_t planned = plan(kIndent);
+        std::vector<Point> inside;
+        while (std::optional<Point> one = point(kIndent, inside.size() + 1)) {
+            inside.push_back(std::move(*one));
+        }
+        std::optional<Point> whole = point("", tap.points.size() + 1);
+        if (!whole) {
+            EXPECT_EQ(at_, lines_.size()) << "a subtest that is not closed";
+            tap.open = std::move(inside);
+            return;
+        }
+        EXPECT_EQ(whole->name, parse_point(name).name);
+        EXPECT_EQ(inside.size(), planned);
+        whole->inside = std::move(inside);
+        whole->planned = planned;
+        tap.points.push_back(std::move(*whole));
+    }
+
+    std::optional<Point> point(const std::string &indent, std::size_t number)
+    {
+        Point point;
+        std::optional<std::string> rest = take(indent + "ok " + std::to_string(number) + " - ");
+        point.ok = rest.has_value();
+        if (!rest) {
+            rest = take(indent + "not ok " + std::to_string(number) + " - ");
+        }
+        if (!rest) {
+            return std::nullopt;
+        }
+        PointText text = parse_point(*rest);
+        if (text.directive) {
+            EXPECT_TRUE(text.directive->starts_with("# SKIP ")) << *rest;
+            EXPECT_TRUE(text.name.ends_with(' ')) << *rest;
+            text.name.pop_back();
+            point.skipped = text.directive->substr(7);
+        }
+        point.name = text.name;
+        diagnosis(indent + "  ", point);
+        return point;
+    }
+
+    void diagnosis(const std::string &indent, Point &point)
+    {
+        if (!take(indent + "---")) {
+            return;
+        }
+        while (!take(indent + "...")) {
+            const std::string line = take(indent).value_or("");
+            const std::size_t colon = line.find(": ");
+            if (colon == std::string::npos) {
+                ADD_FAILURE() << "no end of the diagnosis at line " << at_;
+                return;
+            }
+            const std::string value = line.substr(colon + 2);
+            EXPECT_FALSE(point.diagnosis.contains(line.substr(0, colon))) << line;
+            // YAML reads it as JSON does
+            const auto json = nlohmann::json::parse(value);
+            point.diagnosis[line.substr(0, colon)] =
+                json.is_string() ? json.get<std::string>() : value;
+        }
+    }
+
+    std::vector<std::string> lines_;
+    std::size_t at_ = 0;
+};
+
+} // namespace
+
+Tap parse_tap(const std::string &text)
+{
+    return TapParser(lines_of(text)).parse();
+}
+
+Finished prove(const std::string &path)
+{
+    const std::string command = "/usr/bin/prove --exec cat '" + path + "' 2>&1";
+    std::FILE *const pipe = popen(command.c_str(), "r");
+    if (pipe == nullptr) {
+        throw std::runtime_error("prove cannot be started");
+    }
+    Finished finished;
+    std::array<char, 4096> buffer{};
+    while (const std::size_t got = std::fread(buffer.data(), 1, buffer.size(), pipe)) {
+        finished.output.append(buffer.data(), got);
+    }
+    const int status = pclose(pipe);
+    finished.status = WIFEXITED(status) ? WEXITSTATUS(status) : 128 + WTERMSIG(status);
+    return finished;
+}
+
+} // namespace report_files

@@ -1,0 +1,225 @@
+// Raw commands, one process for all of them.
+#include "fptest_runner.h"
+
+#include <csignal>
+#include <filesystem>
+
+using namespace fptest_runner;
+using device::kPlanFile;
+using device::plan_of;
+using device::processes_named;
+using device::read_file;
+using device::wait_for;
+using device::write_file;
+using ::testing::Not;
+
+namespace
+{
+
+using namespace std::string_literals;
+
+class Send : public FptestTest
+{
+};
+
+TEST_F(Send, PrintsALineForEachReply)
+{
+    const Ended ended = run_fptest({"send", "pingtest", "unknown::x", "XMLFile::<P/>"});
+    EXPECT_EQ(ended.status, 0);
+    EXPECT_EQ(ended.out, "Ping Success!\n\n\n");
+    EXPECT_EQ(ended.err, "");
+    EXPECT_EQ(read_file(kPlanFile), "<P/>");
+}
+
+TEST_F(Send, HandsAllCommandsToOneProcess)
+{
+    // the module answers one ping in the life of a process
+    EXPECT_EQ(run_fptest({"send", "pingtest", "pingtest"}).out, "Ping Success!\n\n");
+    EXPECT_EQ(run_fptest({"send", "pingtest"}).out, "Ping Success!\n");
+}
+
+TEST_F(Send, PassesCommandsOnAsTheyAre)
+{
+    EXPECT_EQ(run_fptest({"send", "", "XMLFile::<P>\n\t::</P>", "::XMLNodePath::::a/b c"}).out,
+              "\n\n\n");
+    EXPECT_EQ(read_file(kPlanFile), "<P>\n\t");
+    EXPECT_THAT(paths_run(), ElementsAre("a/b c"));
+}
+
+TEST_F(Send, ReadsAndWritesZeroBytesWhereThatIsWanted)
+{
+    Ended ended = run_fptest({"send", "-0"}, "pingtest\0pingtest\0"s);
+    EXPECT_EQ(ended.status, 0);
+    EXPECT_EQ(ended.out, "Ping Success!\0\0"s);
+    // the last one needs no zero byte, and an empty command is one as well
+    ended = run_fptest({"send", "-0"}, "\0XMLFile::<P>\n</P>\0pingtest"s);
+    EXPECT_EQ(ended.status, 0);
+    EXPECT_EQ(ended.out, "\0\0Ping Success!\0"s);
+    EXPECT_EQ(read_file(kPlanFile), "<P>\n</P>");
+    ended = run_fptest({"send", "-0"}, "");
+    EXPECT_EQ(ended.status, 2);
+    EXPECT_EQ(ended.err, "fptest: no command can be read from standard input\n");
+}
+
+TEST_F(Send, StoresAndRunsAPlan)
+{
+    const std::string text = plan_of({{"G",
+                                       {{"Item", "note /tmp/scene/order report G 100 0 a"},
+                                        {"Other", "note /tmp/scene/order report G 100 1 b"}}}});
+    const Ended ended = run_fptest({"send", "-0"}, "XMLFile::" + text + '\0' + "XMLNodePath::P/G" +
+                                                       '\0' + "pingtest" + '\0');
+    // what the items make of it is not looked at
+    EXPECT_EQ(ended.status, 0);
+    EXPECT_EQ(ended.out, "\0\0Ping Success!\0"s);
+    EXPECT_EQ(read_file(work("order")), "Item\nOther\n");
+    EXPECT_THAT(paths_run(), ElementsAre("P/G"));
+    EXPECT_THAT(run_fptest({"show"}).out, HasSubstr("G      Other       100       1  b\n"));
+}
+
+TEST_F(Send, PrintsWhatItemsPrintToStandardError)
+{
+    write_file(kPlanFile, plan_of({{"G", {{"Item", "say out complain err"}, {"Other", "say 2"}}}}));
+    const Ended ended = run_fptest({"send", "XMLNodePath::P/G", "pingtest"});
+    EXPECT_EQ(ended.status, 0);
+    EXPECT_EQ(ended.out, "\nPing Success!\n");
+    for (const std::string text : {"out\nerr\n", "2\n", "vendor = 0\n"}) {
+        EXPECT_THAT(ended.err, HasSubstr(text));
+    }
+}
+
+TEST_F(Send, ShowsWhatAnItemPrintsWhileItRuns)
+{
+    write_file(kPlanFile, plan_of({{"G", {{"Item", "say begun await /tmp/scene/go"}}}}));
+    FptestProcess fptest({"send", "pingtest", "XMLNodePath::P/G", "XMLNodePath::P/G"});
+    EXPECT_TRUE(wait_for([&] { return fptest.err().find("begun\n") != std::string::npos; }, 30));
+    // a reply as soon as there is one
+    EXPECT_EQ(fptest.out(), "Ping Success!\n");
+    file("go", "");
+    EXPECT_EQ(fptest.wait().status, 0);
+}
+
+TEST_F(Send, GivesItemsNoInput)
+{
+    write_file(kPlanFile, plan_of({{"G", {{"Item", "count-input"}}}}));
+    EXPECT_THAT(run_fptest({"send", "-0"}, "XMLNodePath::P/G/Item\0pingtest"s).err,
+                HasSubstr("0 bytes of input\n"));
+    EXPECT_THAT(run_fptest({"send", "XMLNodePath::P/G/Item"}, "text").err,
+                HasSubstr("0 bytes of input\n"));
+}
+
+TEST_F(Send, WritesTheModulesLogWhereItIsTold)
+{
+    EXPECT_EQ(run_fptest({"send", "--log", work("log"), "XMLNodePath::one/path"}).status, 0);
+    EXPECT_EQ(run_fptest({"send", "--log", work("log"), "XMLNodePath::other/path"}).status, 0);
+    EXPECT_THAT(paths_run(work("log")), ElementsAre("one/path", "other/path"));
+    EXPECT_THAT(paths_run(), IsEmpty());
+}
+
+TEST_F(Send, StopsTheItemOfAnInterruptedCommand)
+{
+    write_file(kPlanFile, plan_of({{"G",
+                                    {{"Item", "tell-signal /tmp/scene/signal note /tmp/scene/begun "
+                                              "sleep 60"},
+                                     {"Other", "note /tmp/scene/after"}}}}));
+    for (const int number : {SIGINT, SIGTERM}) {
+        SCOPED_TRACE(number);
+        std::filesystem::remove(work("begun"));
+        FptestProcess fptest(
+            {"send", "pingtest", "XMLNodePath::P/G/Item", "XMLNodePath::P/G/Other"});
+        ASSERT_TRUE(wait_for_file("begun"));
+        fptest.signal(number);
+        const Ended ended = fptest.wait();
+        EXPECT_EQ(ended.status, 130);
+        EXPECT_EQ(ended.out, "Ping Success!\n");
+        expect_items_to_end();
+        EXPECT_FALSE(is_there("after"));
+    }
+    EXPECT_EQ(read_file(work("signal")), "SIGTERM\nSIGTERM\n");
+    EXPECT_THAT(processes_stopped(), Not(IsEmpty()));
+}
+
+TEST_F(Send, StopsAlsoWhatAnInterruptedGroupWouldStartNext)
+{
+    const std::string sleeps = "note /tmp/scene/order sleep 60";
+    write_file(kPlanFile,
+               plan_of({{"G", {{"Item", sleeps}, {"Other", sleeps}, {"Third", sleeps}}}}));
+    FptestProcess fptest({"send", "XMLNodePath::P/G"});
+    ASSERT_TRUE(wait_for_file("order"));
+    fptest.signal(SIGINT);
+    EXPECT_EQ(fptest.wait().status, 130);
+    expect_items_to_end();
+    EXPECT_TRUE(wait_for([] { return processes_named(FPTEST_PROGRAM).empty(); }, 20));
+}
+
+TEST_F(Send, StopsAScriptAsWell)
+{
+    write_file(
+        kPlanFile,
+        plan_of({{"G", {{"Script", "'echo x >/tmp/scene/begun; /system/bin/Third sleep 60'"}}}}));
+    FptestProcess fptest({"send", "XMLNodePath::P/G"});
+    ASSERT_TRUE(wait_for_file("begun"));
+    fptest.signal(SIGINT);
+    EXPECT_EQ(fptest.wait().status, 130);
+    expect_items_to_end();
+}
+
+TEST_F(Send, SaysThatTheModulesProcessEnded)
+{
+    write_file(kPlanFile, plan_of({{"G", {{"Item", "note /tmp/scene/begun sleep 60"}}}}));
+    FptestProcess fptest({"send", "XMLNodePath::P/G", "pingtest"});
+    ASSERT_TRUE(wait_for_file("begun"));
+    kill(fptest.module(), SIGKILL);
+    const Ended ended = fptest.wait();
+    EXPECT_EQ(ended.status, 3);
+    EXPECT_EQ(ended.out, "");
+    EXPECT_EQ(lines_of(ended.err).back(),
+              "fptest: the module's process ended by signal 9; --log FILE keeps what it says");
+}
+
+TEST_F(Send, SaysThatRepliesCannotBeWritten)
+{
+    Start start;
+    start.arguments = {"send", "pingtest", "XMLFile::<P/>"};
+    start.output = "/dev/full";
+    const Ended ended = run_fptest(start);
+    EXPECT_EQ(ended.status, 3);
+    EXPECT_EQ(ended.err, "fptest: replies cannot be written to standard output\n");
+    EXPECT_FALSE(std::filesystem::exists(kPlanFile));
+}
+
+TEST_F(Send, WantsACommand)
+{
+    const Ended ended = run_fptest({"send"});
+    EXPECT_EQ(ended.status, 2);
+    EXPECT_EQ(ended.out, "");
+    EXPECT_THAT(lines_of(ended.err), ::testing::SizeIs(1));
+    EXPECT_THAT(ended.err, ::testing::StartsWith("fptest: "));
+    EXPECT_THAT(ended.err, HasSubstr("COMMAND"));
+}
+
+TEST_F(Send, WantsCommandsFromOneSideOnly)
+{
+    const Ended ended = run_fptest({"send", "-0", "pingtest"}, "pingtest");
+    EXPECT_EQ(ended.status, 2);
+    EXPECT_EQ(ended.out, "");
+    EXPECT_THAT(lines_of(ended.err), ::testing::SizeIs(1));
+    EXPECT_THAT(ended.err, HasSubstr("-0"));
+}
+
+TEST_F(Send, WantsADevice)
+{
+    if (is_in_place()) {
+        GTEST_SKIP() << "in place, /system/bin cannot be hidden from one program";
+    }
+    Start start;
+    start.is_no_device = true;
+    start.arguments = {"send", "XMLFile::<P/>"};
+    const Ended ended = run_fptest(start);
+    EXPECT_EQ(ended.status, 3);
+    EXPECT_EQ(ended.err,
+              "fptest: this machine is no device: there is no /system/bin/sh; on a desk, "
+              "run it as: device/run -- fptest ...\n");
+    EXPECT_FALSE(std::filesystem::exists(kPlanFile));
+}
+
+} // namespace

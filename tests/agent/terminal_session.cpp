@@ -1,0 +1,242 @@
+#include "terminal_session.h"
+
+#include <cerrno>
+#include <chrono>
+#include <csignal>
+#include <cstdlib>
+#include <poll.h>
+#include <pty.h>
+#include <stdexcept>
+#include <sys/ioctl.h>
+#include <sys/wait.h>
+#include <thread>
+#include <unistd.h>
+
+namespace
+{
+
+std::string utf8(const VTermScreenCell &cell)
+{
+    std::string text;
+    for (int at = 0; at < VTERM_MAX_CHARS_PER_CELL && cell.chars[at] != 0; ++at) {
+        const std::uint32_t c = cell.chars[at];
+        if (c < 0x80) {
+            text += static_cast<char>(c);
+        } else if (c < 0x800) {
+            text += static_cast<char>(0xc0 | (c >> 6));
+            text += static_cast<char>(0x80 | (c & 0x3f));
+        } else if (c < 0x10000) {
+            text += static_cast<char>(0xe0 | (c >> 12));
+            text += static_cast<char>(0x80 | ((c >> 6) & 0x3f));
+            text += static_cast<char>(0x80 | (c & 0x3f));
+        } else {
+            text += static_cast<char>(0xf0 | (c >> 18));
+            text += static_cast<char>(0x80 | ((c >> 12) & 0x3f));
+            text += static_cast<char>(0x80 | ((c >> 6) & 0x3f));
+            text += static_cast<char>(0x80 | (c & 0x3f));
+        }
+    }
+    return text;
+}
+
+// The cells of a line; the second half of a wide character holds none.
+std::string line_of(const std::function<VTermScreenCell(int)> &cell, int columns)
+{
+    std::string line;
+    for (int column = 0; column < columns; ++column) {
+        const VTermScreenCell one = cell(column);
+        if (one.chars[0] == static_cast<std::uint32_t>(-1)) {
+            continue;
+        }
+        line += one.chars[0] == 0 ? " " : utf8(one);
+    }
+    line.erase(line.find_last_not_of(' ') + 1);
+    return line;
+}
+
+double now()
+{
+    using namespace std::chrono;
+    return duration<double>(steady_clock::now().time_since_epoch()).count();
+}
+
+} // namespace
+
+TerminalSession::TerminalSession(const std::vector<std::string> &arguments, int columns, int rows,
+                                 const Environment &environment)
+    : columns_(columns), rows_(rows), vterm_(vterm_new(rows, columns)),
+      screen_(vterm_obtain_screen(vterm_))
+{
+    static const VTermScreenCallbacks callbacks = {
+        .damage = nullptr,
+        .moverect = nullptr,
+        .movecursor = nullptr,
+        .settermprop = nullptr,
+        .bell = nullptr,
+        .resize = nullptr,
+        .sb_pushline = push_line,
+        .sb_popline = nullptr,
+    };
+    vterm_set_utf8(vterm_, 1);
+    vterm_screen_set_callbacks(screen_, &callbacks, this);
+    vterm_screen_reset(screen_, 1);
+
+    winsize size{};
+    size.ws_col = static_cast<unsigned short>(columns);
+    size.ws_row = static_cast<unsigned short>(rows);
+    pid_ = forkpty(&terminal_, nullptr, nullptr, &size);
+    if (pid_ < 0) {
+        throw std::runtime_error("no terminal to be had");
+    }
+    if (pid_ == 0) {
+        setenv("TERM", "xterm-256color", 1);
+        unsetenv("NO_COLOR");
+        for (const auto &[name, value] : environment) {
+            if (value) {
+                setenv(name.c_str(), value->c_str(), 1);
+            } else {
+                unsetenv(name.c_str());
+            }
+        }
+        std::vector<char *> argv;
+        for (const std::string &argument : arguments) {
+            argv.push_back(const_cast<char *>(argument.c_str()));
+        }
+        argv.push_back(nullptr);
+        execv(argv[0], argv.data());
+        _exit(127);
+    }
+}
+
+TerminalSession::~TerminalSession()
+{
+    if (pid_ > 0) {
+        kill(pid_, SIGKILL);
+        waitpid(pid_, nullptr, 0);
+    }
+    close(terminal_);
+    vterm_free(vterm_);
+}
+
+void TerminalSession::type(std::string_view keys)
+{
+    if (write(terminal_, keys.data(), keys.size()) != static_cast<ssize_t>(keys.size())) {
+        throw std::runtime_error("the terminal takes no keys");
+    }
+}
+
+void TerminalSession::resize(int columns, int rows)
+{
+    winsize size{};
+    size.ws_col = static_cast<unsigned short>(columns);
+    size.ws_row = static_cast<unsigned short>(rows);
+    columns_ = columns;
+    rows_ = rows;
+    vterm_set_size(vterm_, rows, columns);
+    ioctl(terminal_, TIOCSWINSZ, &size);
+}
+
+bool TerminalSession::read_some(int milliseconds)
+{
+    pollfd polled{terminal_, POLLIN, 0};
+    if (at_end_ || poll(&polled, 1, milliseconds) <= 0) {
+        return !at_end_;
+    }
+    char buffer[4096];
+    const ssize_t got = read(terminal_, buffer, sizeof buffer);
+    if (got <= 0) { // EIO once nobody has the other side open
+        at_end_ = got == 0 || errno != EINTR;
+        return !at_end_;
+    }
+    written_.append(buffer, static_cast<std::size_t>(got));
+    vterm_input_write(vterm_, buffer, static_cast<std::size_t>(got));
+    vterm_screen_flush_damage(screen_);
+    return true;
+}
+
+bool TerminalSession::wait_for(const std::function<bool()> &condition, double seconds)
+{
+    const double end = now() + seconds;
+    while (!condition()) {
+        if (now() > end || !read_some(20)) {
+            return condition();
+        }
+    }
+    return true;
+}
+
+bool TerminalSession::wait_for_text(const std::string &text, double seconds)
+{
+    return wait_for([&] { return this->text().find(text) != std::string::npos; }, seconds);
+}
+
+int TerminalSession::wait_for_end(double seconds)
+{
+    const double end = now() + seconds;
+    while (now() < end && read_some(20)) {
+    }
+    int status = 0;
+    while (now() < end) {
+        if (waitpid(pid_, &status, WNOHANG) == pid_) {
+            pid_ = -1;
+            return WIFEXITED(status) ? WEXITSTATUS(status) : -WTERMSIG(status);
+        }
+        std::this_thread::sleep_for(std::chrono::milliseconds(5));
+    }
+    throw std::runtime_error("the program has not ended:\n" + text());
+}
+
+std::vector<std::string> TerminalSession::lines() const
+{
+    std::vector<std::string> lines;
+    for (int row = 0; row < rows_; ++row) {
+        lines.push_back(line_of(
+            [&](int column) {
+                VTermScreenCell cell{};
+                vterm_screen_get_cell(screen_, {row, column}, &cell);
+                return cell;
+            },
+            columns_));
+    }
+    return lines;
+}
+
+std::vector<std::string> TerminalSession::all_lines() const
+{
+    std::vector<std::string> all = gone_lines_;
+    for (std::string &line : lines()) {
+        all.push_back(std::move(line));
+    }
+    while (!all.empty() && all.back().empty()) {
+        all.pop_back();
+    }
+    return all;
+}
+
+std::string TerminalSession::text() const
+{
+    std::string text;
+    for (const std::string &line : all_lines()) {
+        text += line + "\n";
+    }
+    return text;
+}
+
+TerminalSession::Cell TerminalSession::cell(int row, int column) const
+{
+    VTermScreenCell cell{};
+    vterm_screen_get_cell(screen_, {row, column}, &cell);
+    Cell result;
+    result.text = utf8(cell);
+    if (VTERM_COLOR_IS_INDEXED(&cell.fg)) {
+        result.colour = cell.fg.indexed.idx;
+    }
+    return result;
+}
+
+int TerminalSession::push_line(int columns, const VTermScreenCell *cells, void *user)
+{
+    auto *session = static_cast<TerminalSession *>(user);
+    session->gone_lines_.push_back(line_of([cells](int column) { return cells[column]; }, columns));
+    return 1;
+}

@@ -1,0 +1,212 @@
+// Nothing counts as passed that has not passed in this run, and nothing that the
+// user has asked for is left out without a word.
+#include "fptest_runner.h"
+
+#include <algorithm>
+#include <nlohmann/json.hpp>
+#include <unistd.h>
+
+using device::kPlanFile;
+using device::read_file;
+using device::start_program;
+using device::wait_for;
+using fptest_runner::Ended;
+using fptest_runner::FptestProcess;
+using fptest_runner::lines_of;
+using fptest_runner::run_fptest;
+using ::testing::EndsWith;
+using ::testing::Not;
+
+namespace
+{
+
+class Trust : public FptestTest
+{
+  protected:
+    // "ITEM: OUTCOME" of each item that has ended.
+    static device::Lines outcomes()
+    {
+        device::Lines found;
+        for (const std::string &line : lines_of(read_file(work("json")))) {
+            const auto event = nlohmann::json::parse(line);
+            if (event.at("event") == "end") {
+                found.push_back(event.at("item").get<std::string>() + ": " +
+                                event.at("outcome").get<std::string>());
+            }
+        }
+        return found;
+    }
+
+    static void expect_refusal(int status, const std::string &line,
+                               const std::vector<std::string> &arguments)
+    {
+        const Ended ended = run_fptest(arguments);
+        EXPECT_EQ(ended.status, status);
+        EXPECT_EQ(ended.err, line + "\n");
+        EXPECT_EQ(ended.out, "");
+    }
+};
+
+constexpr char kOnePasses[] = "<P><CmdGroup name=\"G\">"
+                              "<Cmd name=\"Item\" args=\"report G 100 0 fine\"/>"
+                              "</CmdGroup></P>";
+
+} // namespace
+
+TEST_F(Trust, TakesNoResultThatAProcessWithAnOldCopyOfThePlanWritesBack)
+{
+    // it passes in the first run and reports nothing in the second
+    const std::string text =
+        "<P><CmdGroup name=\"G\"><Cmd name=\"Item\" args=\"note /tmp/scene/runs await "
+        "/tmp/scene/written once /tmp/scene/ran report G 100 0 fine\"/></CmdGroup>"
+        "<CmdGroup name=\"Other\"><Cmd name=\"Other\" args=\"\"/></CmdGroup></P>";
+    file("written", "");
+    ASSERT_EQ(run_fptest({"run", "--plan", plan(text), "P/G"}).status, 0);
+    unlink(work("runs").c_str());
+    unlink(work("written").c_str());
+
+    start_program({"/system/bin/Fourth",
+                   "report-here",
+                   "Other",
+                   "Other",
+                   "1",
+                   "-2",
+                   "a copy",
+                   "note",
+                   work("loaded"),
+                   "await",
+                   work("runs"),
+                   "report-here",
+                   "Other",
+                   "Other",
+                   "2",
+                   "-2",
+                   "the copy again",
+                   "note",
+                   work("written"),
+                   "sleep",
+                   "60"});
+    ASSERT_TRUE(wait_for_file("loaded"));
+    const Ended ended = run_fptest({"run", "--json", work("json"), "P/G"});
+    EXPECT_THAT(read_file(kPlanFile), HasSubstr("description=\"fine\"")); // as it was before
+    EXPECT_EQ(ended.status, 1);
+    EXPECT_THAT(outcomes(), ElementsAre("Item: no result"));
+    EXPECT_THAT(ended.out, HasSubstr("a process with an old copy of the plan has written it over"));
+}
+
+TEST_F(Trust, LeavesNoMarksOfItsOwnInThePlan)
+{
+    ASSERT_EQ(run_fptest({"run", "--plan", plan(kOnePasses), "P/G"}).status, 0);
+    ASSERT_EQ(run_fptest({"run", "--repeat", "3", "P/G"}).status, 0);
+    EXPECT_THAT(read_file(kPlanFile), Not(HasSubstr("fptest-run")));
+    EXPECT_THAT(read_file(kPlanFile), HasSubstr("description=\"fine\""));
+}
+
+TEST_F(Trust, EndsTheRunWhenTheStoredPlanIsGone)
+{
+    const std::string text = "<P><CmdGroup name=\"G\">"
+                             "<Cmd name=\"Item\" args=\"sleep 0; rm /data/vorlane/src1.xml\"/>"
+                             "<Cmd name=\"Other\" args=\"report G 100 0 fine\"/></CmdGroup></P>";
+    const Ended ended = run_fptest({"run", "--json", work("json"), "--plan", plan(text), "P/G"});
+    EXPECT_EQ(ended.status, 3);
+    EXPECT_EQ(ended.err, "fptest: the stored plan /data/vorlane/src1.xml is gone, or not whole any "
+                         "more: store it again\n");
+    EXPECT_THAT(outcomes(), ElementsAre("Item: no result", "Other: not run"));
+}
+
+TEST_F(Trust, StopsShortItemsOfAnInterruptedGroupAsWell)
+{
+    const std::string text = "<P><CmdGroup name=\"G\">"
+                             "<Cmd name=\"Item\" args=\"note /tmp/scene/begun sleep 0.3\"/>"
+                             "<Cmd name=\"Other\" args=\"sleep 0.2 note /tmp/scene/after\"/>"
+                             "<Cmd name=\"Third\" args=\"sleep 0.2 note /tmp/scene/after\"/>"
+                             "<Cmd name=\"Fourth\" args=\"sleep 0.2 note /tmp/scene/after\"/>"
+                             "</CmdGroup></P>";
+    FptestProcess fptest(
+        {"run", "--as-group", "--json", work("json"), "--plan", plan(text), "P/G"});
+    ASSERT_TRUE(wait_for_file("begun"));
+    fptest.signal(SIGINT);
+    EXPECT_EQ(fptest.wait().status, 130);
+    EXPECT_THAT(outcomes(), ElementsAre("Item: stopped", "Other: stopped", "Third: stopped",
+                                        "Fourth: stopped"));
+    EXPECT_FALSE(is_there("after"));
+}
+
+TEST_F(Trust, DoesNotBeginBesideAnItemOfAnEarlierRun)
+{
+    const pid_t left = start_program({"/system/bin/Item", "sleep", "60"});
+    expect_refusal(3,
+                   "fptest: /system/bin/Item of an earlier run is still running, as process " +
+                       std::to_string(left) + ", and would report into this one: end it first",
+                   {"run", "--plan", plan(kOnePasses), "P/G"});
+    EXPECT_NE(access(kPlanFile, F_OK), 0);
+}
+
+TEST_F(Trust, RefusesAPathThatTheModuleWouldCut)
+{
+    const std::string path = std::string(2100, 'r') + "/G/Item";
+    expect_refusal(2, "fptest: a path of 2107 bytes is cut at 2047: name the root with less",
+                   {"run", "--plan", plan(kOnePasses), path});
+}
+
+TEST_F(Trust, TakesNoEmptyNameForAFile)
+{
+    for (const std::string option : {"--plan", "--json", "--junit", "--log"}) {
+        expect_refusal(2, "fptest: " + option + ": an empty name is none; see fptest --help",
+                       {"run", option, "", "P/G"});
+    }
+}
+
+TEST_F(Trust, WritesNoTwoThingsIntoOneFile)
+{
+    const std::string plan_file = plan(kOnePasses);
+    expect_refusal(
+        2,
+        "fptest: --json and --junit both want the file " + work("out") +
+            ": give them files of their own",
+        {"run", "--plan", plan_file, "--json", work("out"), "--junit", work("out"), "P/G"});
+    expect_refusal(2,
+                   "fptest: --plan and --json both want the file " + plan_file +
+                       ": give them files of their own",
+                   {"run", "--plan", plan_file, "--json", plan_file, "P/G"});
+    EXPECT_EQ(read_file(plan_file), kOnePasses);
+    EXPECT_EQ(run_fptest({"run", "--plan", plan_file, "--json", "/dev/null", "--junit", "/dev/null",
+                          "P/G"})
+                  .status,
+              0);
+}
+
+TEST_F(Trust, PassesOnAllThatIsPrintedDuringASend)
+{
+    ASSERT_EQ(run_fptest({"send", "XMLFile::<P><CmdGroup name=\"G\"><Cmd name=\"Item\" "
+                                  "args=\"flood 1000000\"/></CmdGroup></P>"})
+                  .status,
+              0);
+    const Ended ended = run_fptest({"send", "XMLNodePath::P/G/Item"});
+    const auto lines = lines_of(ended.err);
+    const auto first = std::ranges::find(lines, "line 1");
+    ASSERT_NE(first, lines.end());
+    std::size_t number = 0;
+    for (auto line = first; line != lines.end() && line->starts_with("line "); ++line) {
+        EXPECT_EQ(*line, "line " + std::to_string(++number));
+    }
+    EXPECT_GT(number, 80000U);
+}
+
+TEST_F(Trust, SendsNothingIntoARun)
+{
+    const std::string text = "<P><CmdGroup name=\"G\"><Cmd name=\"Item\" args=\"note "
+                             "/tmp/scene/begun await /tmp/scene/go report G 100 0 fine\"/>"
+                             "</CmdGroup></P>";
+    FptestProcess fptest({"run", "--plan", plan(text), "P/G"});
+    ASSERT_TRUE(wait_for_file("begun"));
+    for (const std::string command : {"XMLFile::<P/>", "XMLNodePath::P/G"}) {
+        expect_refusal(3,
+                       "fptest: another fptest is running a plan on this device: wait for its "
+                       "end, or stop it",
+                       {"send", command});
+    }
+    EXPECT_EQ(run_fptest({"send", "pingtest"}).out, "Ping Success!\n");
+    file("go", "");
+    EXPECT_EQ(fptest.wait().status, 0);
+}
