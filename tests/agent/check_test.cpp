@@ -584,6 +584,12 @@ TEST(CheckedValue, IsNotMissedWhereAQuoteIs)
         "<P><CmdGroup name=\"A\"><Cmd name=\"x\" args=\"\"\"/></CmdGroup></P>\n"
         "                                           ^\n");
     EXPECT_EQ(
+        stored("<P a\"/>"),
+        "p.xml:1:5: error: not well-formed, invalid token: the module would not load it; mend it "
+        "here\n"
+        "<P a\"/>\n"
+        "    ^\n");
+    EXPECT_EQ(
         stored("<P 1/>"),
         "p.xml:1:4: error: not well-formed, invalid token: the module would not load it; mend it "
         "here\n"

@@ -114,24 +114,6 @@ TEST_F(Trust, EndsTheRunWhenTheStoredPlanIsGone)
     EXPECT_THAT(outcomes(), ElementsAre("Item: no result", "Other: not run"));
 }
 
-TEST_F(Trust, StopsShortItemsOfAnInterruptedGroupAsWell)
-{
-    const std::string text = "<P><CmdGroup name=\"G\">"
-                             "<Cmd name=\"Item\" args=\"note /tmp/scene/begun sleep 0.3\"/>"
-                             "<Cmd name=\"Other\" args=\"sleep 0.2 note /tmp/scene/after\"/>"
-                             "<Cmd name=\"Third\" args=\"sleep 0.2 note /tmp/scene/after\"/>"
-                             "<Cmd name=\"Fourth\" args=\"sleep 0.2 note /tmp/scene/after\"/>"
-                             "</CmdGroup></P>";
-    FptestProcess fptest(
-        {"run", "--as-group", "--json", work("json"), "--plan", plan(text), "P/G"});
-    ASSERT_TRUE(wait_for_file("begun"));
-    fptest.signal(SIGINT);
-    EXPECT_EQ(fptest.wait().status, 130);
-    EXPECT_THAT(outcomes(), ElementsAre("Item: stopped", "Other: stopped", "Third: stopped",
-                                        "Fourth: stopped"));
-    EXPECT_FALSE(is_there("after"));
-}
-
 TEST_F(Trust, DoesNotBeginBesideAnItemOfAnEarlierRun)
 {
     const pid_t left = start_program({"/system/bin/Item", "sleep", "60"});
