@@ -1073,7 +1073,7 @@ class PlanChecker
             findings_.error(places_.of(item.number, "args"),
                             "the command line of item " + quoted(*item.name) + " is cut to " +
                                 std::to_string(kCommandLimit) + " bytes, by " + listing(excesses) +
-                                "; shorten its args");
+                                "; shorten its " + (item.args->empty() ? "name" : "args"));
         }
     }
 

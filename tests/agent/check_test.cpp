@@ -1608,4 +1608,11 @@ TEST(CheckedForm, IsSaidOfWhatTheModuleWouldGet)
     EXPECT_THAT(findings[1].text, testing::HasSubstr("the module would load them"));
 }
 
+TEST(CheckedItem, IsToldToShortenWhatIsLong)
+{
+    const std::string text = "<P>" + group("G", cmd(std::string(1100, 'n'))) + "</P>";
+    EXPECT_THAT(stored(text), testing::HasSubstr("; shorten its name\n"));
+    EXPECT_THAT(stored(text), testing::Not(testing::HasSubstr("shorten its args")));
+}
+
 } // namespace
