@@ -4,6 +4,7 @@
 #include "text.h"
 
 #include <algorithm>
+#include <cctype>
 #include <cerrno>
 #include <cstring>
 #include <sys/mman.h>
@@ -237,6 +238,13 @@ std::string program_of(std::string_view name, std::string_view suffix)
     std::string program = program_name(name);
     program += suffix.substr(0, kCommandLimit - program.size());
     return "/system/bin/" + program;
+}
+
+bool is_plain_name(std::string_view name)
+{
+    return std::ranges::all_of(name, [](unsigned char c) {
+        return std::isalnum(c) != 0 || c >= 0x80 || std::strchr("_-.,+@%", c) != nullptr;
+    });
 }
 
 std::string command_line(std::string_view name, const std::optional<std::string> &args,

@@ -39,6 +39,9 @@ bool is_gatherer(std::string_view name, int vendor);
 // The program of an item: the module cuts its name at a tab or line feed.
 std::string program_of(std::string_view name, std::string_view suffix);
 
+// Whether the shell takes the name as it stands; else the program is another one.
+bool is_plain_name(std::string_view name);
+
 // The command line that the module runs for an item, whole; it runs the first
 // 1024 characters.
 std::string command_line(std::string_view name, const std::optional<std::string> &args,

@@ -10,7 +10,6 @@
 #include "view.h"
 
 #include <algorithm>
-#include <cctype>
 #include <cerrno>
 #include <chrono>
 #include <cstdio>
@@ -316,14 +315,6 @@ void list(const std::vector<Path> &paths, const Plan &plan, const std::string &s
 }
 
 // --- before the run -----------------------------------------------------------
-
-// Whether the shell takes the name for more, or less, than a program's.
-bool is_plain_name(const std::string &name)
-{
-    return std::ranges::all_of(name, [](unsigned char c) {
-        return std::isalnum(c) != 0 || c >= 0x80 || std::strchr("_-.,+@%", c) != nullptr;
-    });
-}
 
 void require_programs(const Work &work, int vendor, bool force)
 {

@@ -349,7 +349,7 @@ std::string Runner::why_silent(const Active &active)
         return "vendor " + std::to_string(run_.vendor) + " runs no item";
     }
     const std::string program = program_of(item(active.place).name, *suffix);
-    if (access(program.c_str(), X_OK) != 0) {
+    if (is_plain_name(item(active.place).name) && access(program.c_str(), X_OK) != 0) {
         return "there is no program " + one_line(program);
     }
     if (broken_) {

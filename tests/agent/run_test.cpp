@@ -6,8 +6,10 @@
 
 #include <algorithm>
 #include <csignal>
+#include <fcntl.h>
 #include <filesystem>
 #include <nlohmann/json.hpp>
+#include <optional>
 #include <sys/socket.h>
 #include <sys/stat.h>
 #include <sys/wait.h>
@@ -466,6 +468,34 @@ TEST_F(Run, RunsAGroupInWhichNamesLeadElsewhereByOneCommand)
               "fptest: the plan has errors: see fptest check " + work("plan.xml") + "\n");
 }
 
+TEST_F(Run, KnowsWhatAGroupsCommandComesToBetweenItems)
+{
+    const std::string text =
+        "<P><CmdGroup name=\"G\">"
+        "<Cmd name=\"Item\" args=\"note /tmp/scene/order report G 100 0 one\"/><!-- about it -->"
+        "<Cmd args=\"nobody\"/>"
+        "<Cmd name=\"Other\" args=\"note /tmp/scene/order report G 100 1 two\"/>"
+        "</CmdGroup></P>";
+    EXPECT_EQ(run_fptest({"run", "--list", "--force", "--plan", plan(text), "P/G"}).out,
+              "P/G/Item   /system/bin/Item note /tmp/scene/order report G 100 0 one\n"
+              "P/G/Other  /system/bin/Other note /tmp/scene/order report G 100 1 two\n");
+    EXPECT_EQ(run({"--force", "--plan", plan(text), "P/G"}).status, 1);
+    EXPECT_THAT(outcomes(json()), ElementsAre("Item: passed", "Other: failed"));
+    const auto ends = events_of(json(), "end");
+    EXPECT_EQ(ends.at(0).at("description"), "one");
+    EXPECT_EQ(ends.at(1).at("description"), "two");
+}
+
+TEST_F(Run, LeavesNamesToTheShellThatItReadsAsItsOwn)
+{
+    const std::string text = group_of({{"$(echo Item)", "note /tmp/scene/order"}});
+    const Ended ended = run({"--plan", plan(text), "P/G"});
+    EXPECT_EQ(ended.status, 1) << ended.err;
+    EXPECT_EQ(read_file(work("order")), "Item\n") << json() << read_file(device::kLogFile);
+    EXPECT_THAT(outcomes(json()), ElementsAre("$(echo Item): no result"));
+    EXPECT_THAT(reasons(json()), ElementsAre("ended without reporting a result"));
+}
+
 TEST_F(Run, CreditsTheItemThatReallyRanAndNotTheOneNamed)
 {
     const Ended ended = run({"--force", "--plan", plan(kShifted), "P/G/Item"});
@@ -511,11 +541,11 @@ TEST_F(Run, SaysWhereANameLeadsToNothing)
 
 TEST_F(Run, TakesNoResultOfAnEarlierRoundForOneOfThis)
 {
-    const std::string path = plan(
-        group_of({{"Item", "once /tmp/scene/item report G 100 0 once"},
-                  {"Other", "report G 100 0 always"},
-                  {"Third", "$(test -e /tmp/scene/order &amp;&amp; echo crash) note /tmp/scene/order "
-                            "report G 100 1 once"}}));
+    const std::string path = plan(group_of(
+        {{"Item", "once /tmp/scene/item report G 100 0 once"},
+         {"Other", "report G 100 0 always"},
+         {"Third", "$(test -e /tmp/scene/order &amp;&amp; echo crash) note /tmp/scene/order "
+                   "report G 100 1 once"}}));
     const Ended ended = run({"--repeat", "2", "--plan", path, "P/G"});
     EXPECT_EQ(ended.status, 1);
     EXPECT_THAT(outcomes(json()),
@@ -811,7 +841,8 @@ TEST_F(Run, TakesNoStepOfAGathererForItsEnd)
         start_gatherer({"gather", "report", "G", "50", "0", "half", "note", "/tmp/scene/half",
                         "await", "/tmp/scene/go", "report", "G", "100", "1", "whole"});
     FptestProcess fptest(with_json(
-        {"--plan", plan(group_of({{"SensorProbe", ""}, {"Item", "note /tmp/scene/next"}})), "P/G"}));
+        {"--plan", plan(group_of({{"SensorProbe", ""}, {"Item", "note /tmp/scene/next"}})),
+         "P/G"}));
     ASSERT_TRUE(wait_for([] { return events_so_far("progress") == 1; }, 30));
     EXPECT_THAT(events_of(json(), "end"), IsEmpty());
     file("go", "");
@@ -918,6 +949,27 @@ TEST_F(Run, ListsWhatWouldBeRunAndLeavesEverythingAsItIs)
     EXPECT_FALSE(is_there("order"));
     EXPECT_THAT(programs_run(), IsEmpty());
     EXPECT_THAT(running_items(), IsEmpty());
+}
+
+TEST_F(Run, ListsAllUnderThePlansOwnName)
+{
+    const std::string group = "<CmdGroup name=\"G\"><Cmd name=\"Item\" args=\"\"/></CmdGroup>";
+    const std::string head = "<?xml version=\"1.0\"?>\n<!-- a plan -->\n";
+    EXPECT_EQ(run_fptest({"run", "--list", "--plan", "-"},
+                         head + "<TestPlan name=\"demo\">" + group + "</TestPlan>")
+                  .out,
+              "demo/G/Item  /system/bin/Item \n");
+    EXPECT_EQ(
+        run_fptest({"run", "--list", "--plan", "-"}, head + "<Tests>" + group + "</Tests>").out,
+        "Tests/G/Item  /system/bin/Item \n");
+}
+
+TEST_F(Run, ListsCommandLinesAsFarAsTheyAreRun)
+{
+    const std::string text = group_of({{"Item", std::string(1100, 'a')}});
+    const std::string line = "/system/bin/Item " + std::string(1100, 'a');
+    EXPECT_EQ(run_fptest({"run", "--list", "--force", "--plan", plan(text)}).out,
+              "P/G/Item  " + line.substr(0, 1024) + "\n");
 }
 
 TEST_F(Run, ListsThePathsThatAreNamedOnly)
@@ -1049,8 +1101,9 @@ TEST_P(HostileDescription, IsTheSameInEveryReport)
 {
     const auto &[name, bytes, shown] = GetParam();
     file("description", bytes);
-    const std::string text = group_of({{"Item", "report-file G 100 1 /tmp/scene/description say '#' "
-                                                "complain-file /tmp/scene/description"}});
+    const std::string text =
+        group_of({{"Item", "report-file G 100 1 /tmp/scene/description say '#' "
+                           "complain-file /tmp/scene/description"}});
     const Ended ended = run_fptest({"run", "--tap", "--junit", work("junit"), "--json",
                                     work("json"), "--plan", plan(text), "P/G"});
     EXPECT_EQ(ended.status, 1) << ended.err;
@@ -1752,6 +1805,26 @@ TEST_F(Run, SaysThatAReportCouldNotBeWrittenToItsEnd)
     const Ended ended = run_fptest(start);
     EXPECT_EQ(ended.status, 3);
     EXPECT_EQ(ended.err, "fptest: the TAP output: No space left on device; nothing was run\n");
+}
+
+TEST_F(Run, GoesOnWithoutAReportThatCannotBeWrittenAnyMore)
+{
+    const std::string fifo = work("fifo");
+    ASSERT_EQ(mkfifo(fifo.c_str(), 0600), 0);
+    std::optional<device::Socket> reader(std::in_place,
+                                         open(fifo.c_str(), O_RDONLY | O_NONBLOCK | O_CLOEXEC));
+    const std::string text =
+        group_of({{"Item", "note /tmp/scene/begun await /tmp/scene/go report G 100 0 x"},
+                  {"Other", kItemPasses}});
+    FptestProcess fptest({"run", "--json", fifo, "--plan", plan(text), "P/G"});
+    ASSERT_TRUE(wait_for_file("begun"))
+        << fptest.out() << fptest.err() << read_file(device::kLogFile);
+    reader.reset();
+    file("go", "");
+    const Ended ended = fptest.wait();
+    EXPECT_EQ(ended.status, 3);
+    EXPECT_EQ(ended.err, "fptest: /tmp/scene/fifo: Broken pipe; the run went on without it\n");
+    EXPECT_THAT(ended.out, HasSubstr("\n2 passed, 0 failed, "));
 }
 
 TEST_F(Refusal, OfASecondRunAtTheSameTime)
