@@ -54,9 +54,22 @@ static char sendBuf[33];
 
 /* --- log and text helpers ------------------------------------------------ */
 
+/* One function for each kind of arguments, never inlined: repeated at every line
+   that is logged, the call takes a seventh of the library. */
+template <typename... Arguments>
+__attribute__((noinline)) static void log_line(const char *format, const char *function, int line,
+                                               Arguments... arguments)
+{
+    vr_log_printf(VR_LOG_DEBUG, "VRCODE", format, function, line, (int)getpid(), (int)gettid(),
+                  arguments...);
+}
+
+/* The size is of no use: asking for it has the compiler check the arguments against
+   the format. */
 #define LOG(format, ...)                                                                           \
-    vr_log_printf(VR_LOG_DEBUG, "VRCODE", "%-15s:%04d:pid=%d:ctid=%d => " format, __func__,        \
-                  __LINE__, (int)getpid(), (int)gettid() __VA_OPT__(, ) __VA_ARGS__)
+    ((void)sizeof(vr_log_printf(VR_LOG_DEBUG, "", format __VA_OPT__(, ) __VA_ARGS__)),             \
+     log_line("%-15s:%04d:pid=%d:ctid=%d => " format, __func__,                                    \
+              __LINE__ __VA_OPT__(, ) __VA_ARGS__))
 
 /* A failure that names its place once more. */
 #define LOG_PLACE(format) LOG("%s[%d]" format, __func__, __LINE__)
