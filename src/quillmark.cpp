@@ -124,40 +124,36 @@ static void ExtractString(char *iStr, int ilen)
 
 /* --- test plan store ----------------------------------------------------- */
 
-static int is_lone_whitespace(mxml_node_t *node)
+static int is_white(const char *text)
 {
-    if (mxmlGetType(node) != MXML_TEXT) {
-        return 0;
+    while (*text == ' ' || (*text >= '\t' && *text <= '\r')) {
+        ++text;
     }
-    const char *text = mxmlGetText(node, nullptr);
-    return text[strspn(text, " \t\n\v\f\r")] == '\0';
-}
-
-/* Mini-XML does not look whether it could copy a name or a text: where memory
-   was short a node lacks it, and the next save ends the process. */
-static int is_whole(mxml_node_t *node)
-{
-    return mxmlGetType(node) == MXML_TEXT ? mxmlGetText(node, nullptr) != nullptr
-                                          : mxmlGetElement(node) != nullptr;
+    return *text == '\0';
 }
 
 /* The stock library lacks the switch that load_configs_file sets, and positions
    count every node: what white space it has made nodes of must go. Returns 0,
-   with the tree as it was left, when a node of it is not whole. */
+   with the tree as it was left, when a node of it is not whole: Mini-XML does not
+   look whether it could copy a name or a text; where memory was short a node lacks
+   it, and the next save ends the process. The root is never text. */
 static int remove_lone_whitespace(mxml_node_t *tree)
 {
-    int whole = is_whole(tree);
-    mxml_node_t *node = mxmlWalkNext(tree, tree, MXML_DESCEND);
+    mxml_node_t *node = tree;
 
-    while (node != nullptr && whole) {
+    while (node != nullptr) {
         mxml_node_t *next = mxmlWalkNext(node, tree, MXML_DESCEND);
-        whole = is_whole(node);
-        if (whole && is_lone_whitespace(node)) {
+        const int is_text = mxmlGetType(node) == MXML_TEXT;
+        const char *text = is_text ? mxmlGetText(node, nullptr) : mxmlGetElement(node);
+        if (text == nullptr) {
+            return 0;
+        }
+        if (is_text && is_white(text)) {
             mxmlDelete(node);
         }
         node = next;
     }
-    return whole;
+    return 1;
 }
 
 static mxml_node_t *load_configs_file(const char *file_path)
