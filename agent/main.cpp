@@ -67,10 +67,12 @@ constexpr char kSendExamples[] =
     "  printf 'XMLFile::%s\\0XMLNodePath::demo/Bringup' \"$(cat plan.xml)\" |\n"
     "      adb shell -T fptest send -0";
 
-// One line, as every other error.
-std::string one_line(const CLI::App *, const CLI::Error &error)
+// One line, as every other error; the help that it names is that of the command.
+std::string one_line(const CLI::App *app, const CLI::Error &error)
 {
-    return std::string("fptest: ") + error.what() + "; see fptest --help\n";
+    const std::vector<CLI::App *> commands = app->get_subcommands();
+    const std::string command = commands.empty() ? "" : " " + commands.front()->get_name();
+    return std::string("fptest: ") + error.what() + "; see fptest" + command + " --help\n";
 }
 
 // A whole number or fraction in that range. CLI11's own takes an empty text for 0.

@@ -100,14 +100,22 @@ char32_t visible(char32_t code)
     return code >= 0x80 && code < 0xA0 ? kReplacement : code;
 }
 
-std::string cleaned(std::string_view bytes, std::string_view kept)
+// On a terminal, one that turns the direction of what follows would turn the rest
+// of the line as well.
+char32_t visible_on_line(char32_t code)
+{
+    const bool turns = (code >= 0x202A && code <= 0x202E) || (code >= 0x2066 && code <= 0x2069);
+    return turns ? kReplacement : visible(code);
+}
+
+std::string cleaned(std::string_view bytes, std::string_view kept, char32_t (*shown)(char32_t))
 {
     std::string text;
     text.reserve(bytes.size());
     while (!bytes.empty()) {
         const Character character = decode(bytes);
         const bool keep = kept.find(bytes.front()) != std::string_view::npos;
-        append(text, keep ? character.code : visible(character.code));
+        append(text, keep ? character.code : shown(character.code));
         bytes.remove_prefix(character.size);
     }
     return text;
@@ -255,12 +263,12 @@ bool near(std::size_t edits, std::size_t length)
 
 std::string clean(std::string_view bytes)
 {
-    return cleaned(bytes, "\t\n\r");
+    return cleaned(bytes, "\t\n\r", visible);
 }
 
 std::string one_line(std::string_view bytes)
 {
-    return cleaned(bytes, "");
+    return cleaned(bytes, "", visible_on_line);
 }
 
 std::string replaced(std::string_view text, std::span<const Replacement> list)

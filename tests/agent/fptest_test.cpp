@@ -139,9 +139,9 @@ TEST_F(Fptest, SaysInOneLineWhatIsWrongWithItsArguments)
         EXPECT_THAT(ended.err, StartsWith("fptest: "));
         EXPECT_EQ(ended.out, "");
     }
-    expect_wrong({"check"}, "fptest: FILE is required; see fptest --help");
+    expect_wrong({"check"}, "fptest: FILE is required; see fptest check --help");
     expect_wrong({"show", "one", "two"},
-                 "fptest: The following argument was not expected: two; see fptest --help");
+                 "fptest: The following argument was not expected: two; see fptest show --help");
 }
 
 TEST_F(Fptest, TakesNoValuesThatMakeNoSense)

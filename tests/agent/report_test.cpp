@@ -203,7 +203,7 @@ TEST_F(Report, WantsEverythingButTheDescription)
         {"ITEM", {"Bringup", "--progress", "1", "--result", "0"}},
         {"GROUP", {"--progress", "1", "--result", "0"}}};
     for (const auto &[what, arguments] : missing) {
-        expect_refusal(2, "fptest: " + what + " is required; see fptest --help", arguments);
+        expect_refusal(2, "fptest: " + what + " is required; see fptest report --help", arguments);
     }
 }
 

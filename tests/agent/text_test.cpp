@@ -135,6 +135,18 @@ TEST(OneLine, ShowsTabsAndLineEndsByTheirPictures)
     EXPECT_EQ(one_line("a\tb\nc\r"), "a\u2409b\u240Ac\u240D");
 }
 
+TEST(OneLine, TurnsNoText)
+{
+    for (const std::string turn : {"\u202A", "\u202E", "\u2066", "\u2069"}) {
+        EXPECT_EQ(one_line("a" + turn + "b"), "a\uFFFDb");
+        EXPECT_EQ(clean("a" + turn + "b"), "a" + turn + "b"); // files keep it
+    }
+    // their neighbours, a mark that belongs to a text among them
+    for (const std::string other : {"\u200F", "\u2029", "\u202F", "\u2065", "\u206A"}) {
+        EXPECT_EQ(one_line("a" + other + "b"), "a" + other + "b");
+    }
+}
+
 TEST(Replaced, TakesTheFirstOfTheListAtEveryPlace)
 {
     const std::array<Replacement, 3> list = {{{"ab", "1"}, {"a", "22"}, {"b", ""}}};
