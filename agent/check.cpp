@@ -7,11 +7,13 @@
 #include <algorithm>
 #include <array>
 #include <cctype>
+#include <cstring>
 #include <expat.h>
 #include <memory>
 #include <new>
 #include <optional>
 #include <string_view>
+#include <strings.h>
 #include <type_traits>
 #include <unordered_map>
 #include <unordered_set>
@@ -811,6 +813,7 @@ class PlanChecker
     void check()
     {
         collect();
+        check_tags();
         if (groups_.empty()) {
             findings_.error(places_.of(root()),
                             "no CmdGroup in it: the module would find nothing "
@@ -901,6 +904,22 @@ class PlanChecker
     }
 
     // --- names ---
+
+    void check_tags()
+    {
+        for (mxml_node_t *node : plan_.elements()) {
+            for (const char *meant : {"CmdGroup", "Cmd"}) {
+                const char *tag = mxmlGetElement(node);
+                if (strcasecmp(tag, meant) == 0 && std::strcmp(tag, meant) != 0) {
+                    findings_.warning(places_.of(plan_.number(node)),
+                                      kind_of(node) +
+                                          " is nothing to the module, which tells small "
+                                          "letters from capitals; write <" +
+                                          meant + ">");
+                }
+            }
+        }
+    }
 
     void check_group_name(Group &group)
     {

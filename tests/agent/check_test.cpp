@@ -667,7 +667,11 @@ TEST(CheckedGroup, IsMissing)
               "p.xml:1:1: error: no CmdGroup in it: the module would find nothing to run; put the "
               "items into <CmdGroup name=\"...\">\n"
               "<P><cmdgroup name=\"A\"/></P>\n"
-              "^\n");
+              "^\n"
+              "p.xml:1:4: warning: <cmdgroup> is nothing to the module, which tells small letters "
+              "from capitals; write <CmdGroup>\n"
+              "<P><cmdgroup name=\"A\"/></P>\n"
+              "   ^\n");
 }
 
 TEST(CheckedGroup, IsTheTopOfTheDocument)
@@ -778,6 +782,20 @@ TEST(CheckedItem, IsInNoGroup)
         "it into a <CmdGroup>\n"
         "<S><Cmd name=\"z\" args=\"\"/><Cmd/></S></P>\n"
         "                          ^\n");
+}
+
+TEST(CheckedTags, AreTakenLetterByLetter)
+{
+    EXPECT_EQ(stored("<P>\n" + group("A", cmd("x")) + "\n<cmdgroup name=\"B\"/>\n" +
+                     "<CMD name=\"y\"/>\n<Command/></P>"),
+              "p.xml:3:1: warning: <cmdgroup> is nothing to the module, which tells small letters "
+              "from capitals; write <CmdGroup>\n"
+              "<cmdgroup name=\"B\"/>\n"
+              "^\n"
+              "p.xml:4:1: warning: <CMD> is nothing to the module, which tells small letters from "
+              "capitals; write <Cmd>\n"
+              "<CMD name=\"y\"/>\n"
+              "^\n");
 }
 
 TEST(CheckedItem, HasNoName)
