@@ -1,0 +1,10 @@
+// How a floor logs: as the module does, its own function and line in the prefix.
+#pragma once
+
+#include "vr_log.h"
+
+#include <unistd.h>
+
+#define FLOOR_LOG(format, ...)                                                                     \
+    vr_log_printf(VR_LOG_DEBUG, "VRCODE", "%-15s:%04d:pid=%d:ctid=%d => " format, __func__,        \
+                  __LINE__, (int)getpid(), (int)gettid() __VA_OPT__(, ) __VA_ARGS__)

@@ -1,0 +1,13 @@
+// Memory: the library's on disk, an idle agent's, and what commands leave.
+#pragma once
+
+#include "figures.h"
+
+namespace bench
+{
+
+// Whether what a device has to hold is small enough.
+Verdict size_table();
+Verdict memory_table();
+
+} // namespace bench
