@@ -9,6 +9,7 @@
 #include <cstdlib>
 #include <filesystem>
 #include <fstream>
+#include <optional>
 #include <stdexcept>
 #include <unistd.h>
 
@@ -98,7 +99,8 @@ const Peer kPeers[] = {
     {"kyua", "/usr/bin/kyua", "test", make_for_kyua},
 };
 
-double time_of(const Peer &peer, int count)
+// Seconds; none where it does not run here.
+std::optional<double> time_of(const Peer &peer, int count)
 {
     const Items items(count);
     peer.make(items);
@@ -111,7 +113,7 @@ double time_of(const Peer &peer, int count)
         took.push_back(
             std::chrono::duration<double>(std::chrono::steady_clock::now() - start).count());
         if (status != 0) {
-            throw std::runtime_error(peer.name + " fails: " + command);
+            return std::nullopt;
         }
     }
     return median(took);
@@ -122,6 +124,19 @@ std::string row(const std::string &name, double seconds, double ours)
     return table_line({name, time_text(seconds), "", decimal(seconds / ours, 2)});
 }
 
+std::string peer_row(const Peer &peer, int items, double ours)
+{
+    if (access(peer.program.c_str(), X_OK) != 0) {
+        return table_line({peer.name, "-", "", "-", "", "", "absent"});
+    }
+    const auto one = time_of(peer, 1);
+    const auto all = time_of(peer, items + 1);
+    if (!one || !all) {
+        return table_line({peer.name, "-", "", "-", "", "", "fails"});
+    }
+    return row(peer.name, (*all - *one) / items, ours);
+}
+
 } // namespace
 
 std::string peer_table(double ours, double query, int items)
@@ -130,12 +145,7 @@ std::string peer_table(double ours, double query, int items)
                         row("a group run", ours, ours) +
                         row("  without the query", ours * (1 - query), ours);
     for (const Peer &peer : kPeers) {
-        if (access(peer.program.c_str(), X_OK) == 0) {
-            const double all = time_of(peer, items + 1) - time_of(peer, 1);
-            table += row(peer.name, all / items, ours);
-        } else {
-            table += table_line({peer.name, "-", "", "-", "", "", "absent"});
-        }
+        table += peer_row(peer, items, ours);
     }
     table += "Of what an item takes here, asking for a running gatherer takes " +
              decimal(100 * query, 0) + " %.\n";
