@@ -197,14 +197,26 @@ off_t Host::output_size() const
 std::string Host::take_output()
 {
     const off_t size = output_size();
-    // what has been printed behind an event that is still to come is not what was
-    // printed before it
-    return events_.empty() && !has_news(std::chrono::milliseconds(0), -1) ? take_output(size) : "";
+    return has_events() ? "" : take_output(size);
+}
+
+// What has been printed behind an event that is still to come is not what was
+// printed before it.
+bool Host::has_events() const
+{
+    return !events_.empty() || has_news(std::chrono::milliseconds(0), -1);
 }
 
 void Host::pass_output(std::FILE *stream)
 {
-    const off_t end = output_size();
+    const off_t size = output_size();
+    if (!has_events()) {
+        pass_output(stream, size);
+    }
+}
+
+void Host::pass_output(std::FILE *stream, off_t end)
+{
     while (taken_ < end) {
         const std::string piece = take_output(std::min(end, taken_ + kOutputKept));
         std::fwrite(piece.data(), 1, piece.size(), stream);

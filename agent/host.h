@@ -72,11 +72,14 @@ class Host
     std::string take_output();
     std::string take_output(off_t end);
 
-    // Writes all that was printed since the last call.
+    // Writes what was printed since the last call, all of it, up to now or up to
+    // where an event says. Nothing while there are events to come first.
     void pass_output(std::FILE *stream);
+    void pass_output(std::FILE *stream, off_t end);
 
   private:
     bool has_news(std::chrono::milliseconds longest, int other) const;
+    bool has_events() const;
     void read_control();
     void lose();
     off_t output_size() const;

@@ -65,10 +65,13 @@ class Sender
         host_.command(command, items);
         for (;;) {
             const auto event = host_.wait(100ms, signals_.descriptor());
-            host_.pass_output(stderr);
+            if (event) {
+                host_.pass_output(stderr, event->output);
+            }
             if (event && event->kind == Host::Event::Kind::item) {
                 std::fprintf(stderr, "vendor = %d\n", event->value);
             }
+            host_.pass_output(stderr);
             if (event && event->kind == Host::Event::Kind::gone) {
                 throw Failure(Exit::environment, gone_text(*event));
             }

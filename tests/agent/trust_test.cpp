@@ -3,6 +3,7 @@
 #include "fptest_runner.h"
 
 #include <algorithm>
+#include <csignal>
 #include <nlohmann/json.hpp>
 #include <unistd.h>
 
@@ -173,6 +174,25 @@ TEST_F(Trust, PassesOnAllThatIsPrintedDuringASend)
         EXPECT_EQ(*line, "line " + std::to_string(++number));
     }
     EXPECT_GT(number, 80000U);
+}
+
+TEST_F(Trust, PutsWhatIsPrintedDuringASendWhereItBelongsThoughItComesLate)
+{
+    const std::string text =
+        "<P><CmdGroup name=\"G\">"
+        "<Cmd name=\"Item\" args=\"say one note /tmp/scene/begun await /tmp/scene/go say 1\"/>"
+        "<Cmd name=\"Other\" args=\"say two note /tmp/scene/last await /tmp/scene/end\"/>"
+        "</CmdGroup></P>";
+    FptestProcess fptest({"send", "XMLFile::" + text, "XMLNodePath::P/G"});
+    ASSERT_TRUE(wait_for_file("begun"));
+    fptest.signal(SIGSTOP);
+    file("go", "");
+    ASSERT_TRUE(wait_for_file("last"));
+    fptest.signal(SIGCONT);
+    file("end", "");
+    const Ended ended = fptest.wait();
+    EXPECT_EQ(ended.status, 0);
+    EXPECT_EQ(ended.err, "vendor = 0\none\n1\nvendor = 0\ntwo\n");
 }
 
 TEST_F(Trust, SendsNothingIntoARun)
