@@ -518,12 +518,14 @@ TEST_F(Run, RunsByForceWhatTheModuleTakesForAnUnknownItem)
 
 TEST_F(Run, RunsAGroupWithANameTwiceByOneCommand)
 {
-    const std::string text = group_of({{"Item", "note /tmp/scene/order report G 100 0 first"},
-                                       {"Item", "note /tmp/scene/order report G 100 0 second"}});
+    const std::string text =
+        group_of({{"Item", "note /tmp/scene/order report G 100 0 first"},
+                  {"Item", "note /tmp/scene/order sleep 1 report G 100 0 second"}});
     EXPECT_EQ(run({"--force", "--plan", plan(text), "P/G"}).status, 1);
     EXPECT_THAT(paths_run(), ElementsAre("P/G"));
     EXPECT_EQ(read_file(work("order")), "Item\nItem\n");
-    // both have reported for the first one
+    // both have reported for the first one; that the second had not yet is seen
+    // while it sleeps
     EXPECT_THAT(outcomes(json()), ElementsAre("Item: passed", "Item: no result"));
     EXPECT_EQ(events_of(json(), "end").at(0).at("description"), "first");
 }
@@ -669,11 +671,11 @@ TEST_F(Run, StopsItemsOfAGroupsCommandOneByOne)
 TEST_F(Run, LeavesAnItemAloneThatIsWithinItsTime)
 {
     const std::string text =
-        group_of({{"Item", "sleep 0.4 report G 100 0 a"}, {"Other", "sleep 0.4 report G 100 0 b"}});
+        group_of({{"Item", "sleep 1.5 report G 100 0 a"}, {"Other", "sleep 1.5 report G 100 0 b"}});
     // a limit for each item and not for all of them
-    EXPECT_EQ(run({"--timeout", "0.7", "--plan", plan(text), "P/G"}).status, 0);
+    EXPECT_EQ(run({"--timeout", "2.9", "--plan", plan(text), "P/G"}).status, 0);
     EXPECT_THAT(processes_stopped(), IsEmpty());
-    EXPECT_EQ(run({"--as-group", "--timeout", "0.7", "P/G"}).status, 0);
+    EXPECT_EQ(run({"--as-group", "--timeout", "2.9", "P/G"}).status, 0);
     EXPECT_THAT(processes_stopped(), IsEmpty());
 }
 

@@ -53,7 +53,7 @@ TEST_F(Suspension, StoppedItemIsFollowedByTheNextOfItsGroup)
 {
     store(plan_of({{"G", {{"Note", "--sleep 60"}, {"ab", "next"}}}}));
     stop_while_running("P/G", [] {
-        EXPECT_TRUE(wait_for([] { return !processes_named("/system/bin/Note").empty(); }));
+        EXPECT_TRUE(wait_for([] { return !ran().empty(); }));
         EXPECT_EQ(FPTEST_SuspendItemExecute(), 0);
     });
     EXPECT_THAT(ran(), ElementsAre("/system/bin/Note|--sleep|60", "/system/bin/ab|next"));
