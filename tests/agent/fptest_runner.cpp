@@ -1,5 +1,7 @@
 #include "fptest_runner.h"
 
+#include "become.h"
+
 #include <algorithm>
 #include <array>
 #include <cerrno>
@@ -247,20 +249,7 @@ Ended run_program(const std::vector<std::string> &arguments,
         dup2(null, STDIN_FILENO);
         dup2(output.get(), STDOUT_FILENO);
         dup2(output.get(), STDERR_FILENO);
-        for (const auto &[name, value] : environment) {
-            if (value) {
-                setenv(name.c_str(), value->c_str(), 1);
-            } else {
-                unsetenv(name.c_str());
-            }
-        }
-        std::vector<char *> argv;
-        for (const std::string &argument : arguments) {
-            argv.push_back(const_cast<char *>(argument.c_str()));
-        }
-        argv.push_back(nullptr);
-        execv(argv[0], argv.data());
-        _exit(127);
+        become(arguments, environment);
     }
     int status = 0;
     if (pid < 0 || waitpid(pid, &status, 0) != pid) {

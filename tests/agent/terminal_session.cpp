@@ -1,5 +1,7 @@
 #include "terminal_session.h"
 
+#include "become.h"
+
 #include <cerrno>
 #include <chrono>
 #include <csignal>
@@ -91,20 +93,7 @@ TerminalSession::TerminalSession(const std::vector<std::string> &arguments, int 
     if (pid_ == 0) {
         setenv("TERM", "xterm-256color", 1);
         unsetenv("NO_COLOR");
-        for (const auto &[name, value] : environment) {
-            if (value) {
-                setenv(name.c_str(), value->c_str(), 1);
-            } else {
-                unsetenv(name.c_str());
-            }
-        }
-        std::vector<char *> argv;
-        for (const std::string &argument : arguments) {
-            argv.push_back(const_cast<char *>(argument.c_str()));
-        }
-        argv.push_back(nullptr);
-        execv(argv[0], argv.data());
-        _exit(127);
+        become(arguments, environment);
     }
 }
 
