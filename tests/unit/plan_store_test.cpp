@@ -288,6 +288,11 @@ TEST_F(PlanStore, PlanThatDoesNotParseLeavesTheCacheEmptyWithoutALine)
     }
 }
 
+TEST_F(PlanStore, ElementWithoutANameIsANode)
+{
+    EXPECT_EQ(shape(load("<P><a/><></><b/></P>")), "P{a, , b}");
+}
+
 TEST_F(PlanStore, WordOfAnyOneVisibleCharacterIsANode)
 {
     std::string words;
