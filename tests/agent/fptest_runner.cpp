@@ -239,6 +239,14 @@ Ended run_fptest(const std::vector<std::string> &arguments, const std::string &i
     return run_fptest(start_of(arguments, input));
 }
 
+void expect_refusal(int status, const std::string &line, const std::vector<std::string> &arguments)
+{
+    const Ended ended = run_fptest(arguments);
+    EXPECT_EQ(ended.status, status) << ::testing::PrintToString(arguments);
+    EXPECT_EQ(ended.err, line + "\n");
+    EXPECT_EQ(ended.out, "");
+}
+
 Ended run_program(const std::vector<std::string> &arguments,
                   const std::map<std::string, std::optional<std::string>> &environment)
 {

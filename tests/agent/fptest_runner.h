@@ -73,6 +73,9 @@ class FptestProcess
 Ended run_fptest(const Start &start);
 Ended run_fptest(const std::vector<std::string> &arguments, const std::string &input = "");
 
+// It ends with that status and says why in that line, and nothing else.
+void expect_refusal(int status, const std::string &line, const std::vector<std::string> &arguments);
+
 // Another program of this system, by its path and with everything it prints in out.
 Ended run_program(const std::vector<std::string> &arguments,
                   const std::map<std::string, std::optional<std::string>> &environment = {});

@@ -119,10 +119,7 @@ TEST_F(Fptest, TellsItsVersion)
 
 void expect_wrong(const std::vector<std::string> &arguments, const std::string &line)
 {
-    const Ended ended = run_fptest(arguments);
-    EXPECT_EQ(ended.status, 2) << ::testing::PrintToString(arguments);
-    EXPECT_EQ(ended.err, line + "\n");
-    EXPECT_EQ(ended.out, "");
+    fptest_runner::expect_refusal(2, line, arguments);
 }
 
 TEST_F(Fptest, SaysInOneLineWhatIsWrongWithItsArguments)

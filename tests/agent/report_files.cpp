@@ -142,6 +142,35 @@ Element parse_xml(const std::string &text)
     return open.front().children.front();
 }
 
+// --- JSON lines --------------------------------------------------------------
+
+std::vector<nlohmann::json> events_of(const std::string &text)
+{
+    std::vector<nlohmann::json> events;
+    for (const std::string &line : lines_of(text)) {
+        events.push_back(nlohmann::json::parse(line, nullptr, false));
+        EXPECT_FALSE(events.back().is_discarded()) << line;
+    }
+    return events;
+}
+
+std::vector<nlohmann::json> events_of(const std::string &text, const std::string &kind)
+{
+    auto events = events_of(text);
+    std::erase_if(events, [&](const nlohmann::json &event) { return event.at("event") != kind; });
+    return events;
+}
+
+std::vector<std::string> outcomes(const std::string &text)
+{
+    std::vector<std::string> all;
+    for (const nlohmann::json &end : events_of(text, "end")) {
+        all.push_back(end.at("item").get<std::string>() + ": " +
+                      end.at("outcome").get<std::string>());
+    }
+    return all;
+}
+
 // --- TAP ---------------------------------------------------------------------
 
 namespace

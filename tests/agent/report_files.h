@@ -4,6 +4,7 @@
 
 #include <cstddef>
 #include <map>
+#include <nlohmann/json_fwd.hpp>
 #include <optional>
 #include <string>
 #include <vector>
@@ -51,6 +52,15 @@ struct Element {
 
 // The top element; a test failure and an empty one where it is not well-formed.
 Element parse_xml(const std::string &text);
+
+// --- JSON lines --------------------------------------------------------------
+
+// The events; a test failure for a line that is none.
+std::vector<nlohmann::json> events_of(const std::string &text);
+std::vector<nlohmann::json> events_of(const std::string &text, const std::string &kind);
+
+// "Item: passed" for each end, in their order.
+std::vector<std::string> outcomes(const std::string &text);
 
 // --- TAP ---------------------------------------------------------------------
 

@@ -55,10 +55,9 @@ class Report : public FptestTest
     static void expect_refusal(int status, const std::string &line,
                                const std::vector<std::string> &arguments)
     {
-        const Ended ended = report(arguments);
-        EXPECT_EQ(ended.status, status);
-        EXPECT_EQ(ended.err, line + "\n");
-        EXPECT_EQ(ended.out, "");
+        std::vector<std::string> all = {"report"};
+        all.insert(all.end(), arguments.begin(), arguments.end());
+        fptest_runner::expect_refusal(status, line, all);
         EXPECT_EQ(read_file(kPlanFile), kPlan);
     }
 };

@@ -26,6 +26,8 @@ using device::set_vendor;
 using device::wait_for;
 using device::write_file;
 using report_files::Element;
+using report_files::events_of;
+using report_files::outcomes;
 using report_files::parse_tap;
 using report_files::parse_xml;
 using report_files::Point;
@@ -45,35 +47,6 @@ namespace
 using Json = nlohmann::json;
 
 // --- reports ----------------------------------------------------------------------
-
-// The JSON lines; a test failure for one that is none.
-std::vector<Json> events_of(const std::string &text)
-{
-    std::vector<Json> events;
-    for (const std::string &line : lines_of(text)) {
-        events.push_back(Json::parse(line, nullptr, false));
-        EXPECT_FALSE(events.back().is_discarded()) << line;
-    }
-    return events;
-}
-
-std::vector<Json> events_of(const std::string &text, const std::string &kind)
-{
-    auto events = events_of(text);
-    std::erase_if(events, [&](const Json &event) { return event.at("event") != kind; });
-    return events;
-}
-
-// "Item: passed" for each end, in their order.
-Lines outcomes(const std::string &json)
-{
-    Lines all;
-    for (const Json &end : events_of(json, "end")) {
-        all.push_back(end.at("item").get<std::string>() + ": " +
-                      end.at("outcome").get<std::string>());
-    }
-    return all;
-}
 
 Lines reasons(const std::string &json)
 {

@@ -1,10 +1,10 @@
 // Nothing counts as passed that has not passed in this run, and nothing that the
 // user has asked for is left out without a word.
 #include "fptest_runner.h"
+#include "report_files.h"
 
 #include <algorithm>
 #include <csignal>
-#include <nlohmann/json.hpp>
 #include <unistd.h>
 
 using device::kPlanFile;
@@ -12,6 +12,7 @@ using device::read_file;
 using device::start_program;
 using device::wait_for;
 using fptest_runner::Ended;
+using fptest_runner::expect_refusal;
 using fptest_runner::FptestProcess;
 using fptest_runner::lines_of;
 using fptest_runner::run_fptest;
@@ -24,27 +25,9 @@ namespace
 class Trust : public FptestTest
 {
   protected:
-    // "ITEM: OUTCOME" of each item that has ended.
     static device::Lines outcomes()
     {
-        device::Lines found;
-        for (const std::string &line : lines_of(read_file(work("json")))) {
-            const auto event = nlohmann::json::parse(line);
-            if (event.at("event") == "end") {
-                found.push_back(event.at("item").get<std::string>() + ": " +
-                                event.at("outcome").get<std::string>());
-            }
-        }
-        return found;
-    }
-
-    static void expect_refusal(int status, const std::string &line,
-                               const std::vector<std::string> &arguments)
-    {
-        const Ended ended = run_fptest(arguments);
-        EXPECT_EQ(ended.status, status);
-        EXPECT_EQ(ended.err, line + "\n");
-        EXPECT_EQ(ended.out, "");
+        return report_files::outcomes(read_file(work("json")));
     }
 };
 
