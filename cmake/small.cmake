@@ -15,8 +15,8 @@ foreach(triplet x86_64-linux-gnu arm-linux-gnueabihf aarch64-linux-gnu)
 endforeach()
 
 if(NOT TARGET quillmark_small)
-  # alone: the machine's other headers are not those of another architecture
   file(GLOB sources CONFIGURE_DEPENDS ${CMAKE_SOURCE_DIR}/src/* ${CMAKE_SOURCE_DIR}/vorlane/*.h)
+  # alone: the machine's other headers are not those of another architecture
   configure_file(${MINIXML_INCLUDE_DIR}/mxml.h ${small_directory}/include/mxml.h COPYONLY)
   foreach(file ${small_files})
     get_filename_component(triplet ${file} DIRECTORY)
