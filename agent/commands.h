@@ -1,3 +1,6 @@
+// SPDX-FileCopyrightText: 2026 The Quillmark authors
+// SPDX-License-Identifier: Apache-2.0
+
 // What fptest does, one function a sub-command. Each returns how the program is
 // to end, or throws a Failure.
 #pragma once

@@ -1,3 +1,6 @@
+// SPDX-FileCopyrightText: 2026 The Quillmark authors
+// SPDX-License-Identifier: Apache-2.0
+
 // What a device must have before something is run on it. Each function throws a
 // Failure that says what to do where it has not.
 #pragma once

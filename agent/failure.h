@@ -1,3 +1,6 @@
+// SPDX-FileCopyrightText: 2026 The Quillmark authors
+// SPDX-License-Identifier: Apache-2.0
+
 // How the program ends, and what makes it end early.
 #pragma once
 

@@ -1,3 +1,6 @@
+// SPDX-FileCopyrightText: 2026 The Quillmark authors
+// SPDX-License-Identifier: Apache-2.0
+
 // The module in a process of its own, which the agent asks by messages. A
 // terminal's Ctrl-C reaches the agent and not the items, a module that dies
 // takes no results along, and while a command runs this process calls nothing:

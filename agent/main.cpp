@@ -1,3 +1,6 @@
+// SPDX-FileCopyrightText: 2026 The Quillmark authors
+// SPDX-License-Identifier: Apache-2.0
+
 // fptest: the command line. What the sub-commands do stands in files of their
 // own.
 #include "commands.h"

@@ -1,3 +1,6 @@
+// SPDX-FileCopyrightText: 2026 The Quillmark authors
+// SPDX-License-Identifier: Apache-2.0
+
 // Where things stand in a test plan's text. The scanner takes what comes, a
 // document that is half written or breaks off included, and judges nothing.
 #pragma once

@@ -1,3 +1,6 @@
+// SPDX-FileCopyrightText: 2026 The Quillmark authors
+// SPDX-License-Identifier: Apache-2.0
+
 // Test plans as the module sees them: the same library loads them, and the same
 // lookups tell which item a command really runs.
 #pragma once

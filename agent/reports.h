@@ -1,3 +1,6 @@
+// SPDX-FileCopyrightText: 2026 The Quillmark authors
+// SPDX-License-Identifier: Apache-2.0
+
 // Results in files, as they come: whatever ends this process, what was known
 // then can be read, and says that the run did not finish.
 #pragma once

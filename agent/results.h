@@ -1,3 +1,6 @@
+// SPDX-FileCopyrightText: 2026 The Quillmark authors
+// SPDX-License-Identifier: Apache-2.0
+
 // What a run is to do and what has become of it: filled in by the runner, read
 // by everything that shows or writes results.
 #pragma once

@@ -1,3 +1,6 @@
+// SPDX-FileCopyrightText: 2026 The Quillmark authors
+// SPDX-License-Identifier: Apache-2.0
+
 // Text for people and for files: whatever bytes an item reports, what is shown
 // or written is valid UTF-8 in which no byte moves the cursor.
 #pragma once

@@ -1,3 +1,6 @@
+// SPDX-FileCopyrightText: 2026 The Quillmark authors
+// SPDX-License-Identifier: Apache-2.0
+
 // The module against its floor: the same job done by the bare calls that it
 // needs. Both do it turn by turn in one process.
 #pragma once

@@ -1,3 +1,6 @@
+// SPDX-FileCopyrightText: 2026 The Quillmark authors
+// SPDX-License-Identifier: Apache-2.0
+
 // A process of which nothing is wanted but its memory.
 //
 //   idle_agent            prints its resident kilobytes

@@ -1,3 +1,6 @@
+// SPDX-FileCopyrightText: 2026 The Quillmark authors
+// SPDX-License-Identifier: Apache-2.0
+
 // What the module costs beside the bare calls that its job needs: see README.md.
 #include "cases.h"
 #include "figures.h"

@@ -1,3 +1,6 @@
+// SPDX-FileCopyrightText: 2026 The Quillmark authors
+// SPDX-License-Identifier: Apache-2.0
+
 // Memory: the library's on disk, an idle agent's, and what commands leave.
 #pragma once
 

@@ -1,3 +1,6 @@
+// SPDX-FileCopyrightText: 2026 The Quillmark authors
+// SPDX-License-Identifier: Apache-2.0
+
 /*
  * The maker's library as it is for measuring: the log drops what it gets, and
  * what the bench wants to hear of can be listened to. The rest is as shipped.

@@ -1,3 +1,6 @@
+# SPDX-FileCopyrightText: 2026 The Quillmark authors
+# SPDX-License-Identifier: Apache-2.0
+
 # Mini-XML with the interface of its versions 2.7 to 3.x: MiniXml::MiniXml.
 #
 # MINIXML_INCLUDE_DIR and MINIXML_LIBRARY name a device's own.

@@ -1,3 +1,6 @@
+# SPDX-FileCopyrightText: 2026 The Quillmark authors
+# SPDX-License-Identifier: Apache-2.0
+
 # The library as the preset "small" builds it, for each architecture that a g++ is
 # here for: QUILLMARK_SMALL_<triplet> names the file, or is empty. The target
 # quillmark_small makes them all.

@@ -1,3 +1,6 @@
+# SPDX-FileCopyrightText: 2026 The Quillmark authors
+# SPDX-License-Identifier: Apache-2.0
+
 # shellcheck shell=bash disable=SC2154
 #
 # The in-place way of device/run, which sources this file: the root of this

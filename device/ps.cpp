@@ -1,3 +1,6 @@
+// SPDX-FileCopyrightText: 2026 The Quillmark authors
+// SPDX-License-Identifier: Apache-2.0
+
 // ps as Android's old toolbox prints it: ps [NAME]
 //
 // One header line, then one line for each process whose name starts with NAME,

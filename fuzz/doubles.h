@@ -1,3 +1,6 @@
+// SPDX-FileCopyrightText: 2026 The Quillmark authors
+// SPDX-License-Identifier: Apache-2.0
+
 // What the module calls outside itself, for the fuzz targets: the same calls as
 // the unit tests' doubles take over, but nothing is scripted and little is
 // recorded, so that a run costs microseconds. The test plan file is in memory;

@@ -1,3 +1,6 @@
+// SPDX-FileCopyrightText: 2026 The Quillmark authors
+// SPDX-License-Identifier: Apache-2.0
+
 // The command entry and the read-back. Input: a byte for the reply buffer, then
 // "VENDOR\0", then commands, each ended by a zero byte.
 #include "doubles.h"

@@ -1,3 +1,6 @@
+// SPDX-FileCopyrightText: 2026 The Quillmark authors
+// SPDX-License-Identifier: Apache-2.0
+
 // How the targets read their input: texts, each ended by a zero byte, so that
 // seeds stay readable.
 #pragma once

@@ -1,3 +1,6 @@
+// SPDX-FileCopyrightText: 2026 The Quillmark authors
+// SPDX-License-Identifier: Apache-2.0
+
 // The node-path walk. Input: "PATH\0VENDOR\0QUERY\0DOCUMENT"; without a document
 // a small plan stands for it.
 #include "doubles.h"

@@ -1,3 +1,6 @@
+// SPDX-FileCopyrightText: 2026 The Quillmark authors
+// SPDX-License-Identifier: Apache-2.0
+
 // A test plan as the fuzz targets see it: read from Mini-XML's nodes, but looked
 // up by code that shares nothing with the module's.
 #pragma once

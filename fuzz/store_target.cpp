@@ -1,3 +1,6 @@
+// SPDX-FileCopyrightText: 2026 The Quillmark authors
+// SPDX-License-Identifier: Apache-2.0
+
 // The plan store: load, look up, report, save, load again. Input:
 // "DOCUMENT\0GROUP\0ITEM\0DESCRIPTION\0" and up to five bytes: what kind of
 // report, and its progress. An empty group or item stands for the first one.

@@ -1,3 +1,6 @@
+// SPDX-FileCopyrightText: 2026 The Quillmark authors
+// SPDX-License-Identifier: Apache-2.0
+
 // The process-list parser of the suspension. Input: "NAME\0" and what ps prints.
 #include "doubles.h"
 #include "input.h"

@@ -1,4 +1,9 @@
 /*
+ * SPDX-FileCopyrightText: 2026 The Quillmark authors
+ * SPDX-License-Identifier: Apache-2.0
+ */
+
+/*
  * The whole module, in the order in which it builds on itself: each function
  * stands above its callers. To follow a command, start at the last section and
  * read upward.

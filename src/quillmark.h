@@ -1,4 +1,9 @@
 /*
+ * SPDX-FileCopyrightText: 2026 The Quillmark authors
+ * SPDX-License-Identifier: Apache-2.0
+ */
+
+/*
  * Quillmark: lets a remote test service drive the tests of a fingerprint-sensor
  * stack on the device that loads this library.
  *

@@ -1,3 +1,8 @@
+/*
+ * SPDX-FileCopyrightText: 2026 The Quillmark authors
+ * SPDX-License-Identifier: Apache-2.0
+ */
+
 /* The maker's addition to Mini-XML. */
 #ifndef VORLANE_MXML_WHITESPACE_H
 #define VORLANE_MXML_WHITESPACE_H

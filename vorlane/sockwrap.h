@@ -1,3 +1,8 @@
+/*
+ * SPDX-FileCopyrightText: 2026 The Quillmark authors
+ * SPDX-License-Identifier: Apache-2.0
+ */
+
 /* The maker's socket wrappers. */
 #ifndef VORLANE_SOCKWRAP_H
 #define VORLANE_SOCKWRAP_H

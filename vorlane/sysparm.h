@@ -1,3 +1,8 @@
+/*
+ * SPDX-FileCopyrightText: 2026 The Quillmark authors
+ * SPDX-License-Identifier: Apache-2.0
+ */
+
 /* The maker's reader of parameter files. */
 #ifndef VORLANE_SYSPARM_H
 #define VORLANE_SYSPARM_H

@@ -1,3 +1,8 @@
+/*
+ * SPDX-FileCopyrightText: 2026 The Quillmark authors
+ * SPDX-License-Identifier: Apache-2.0
+ */
+
 /* The maker's log call. */
 #ifndef VORLANE_VR_LOG_H
 #define VORLANE_VR_LOG_H

@@ -1,3 +1,6 @@
+// SPDX-FileCopyrightText: 2026 The Quillmark authors
+// SPDX-License-Identifier: Apache-2.0
+
 // A sample item that takes long enough to be stopped; a stop is a plain SIGTERM.
 
 #include "item.h"

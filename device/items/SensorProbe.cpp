@@ -1,3 +1,6 @@
+// SPDX-FileCopyrightText: 2026 The Quillmark authors
+// SPDX-License-Identifier: Apache-2.0
+
 // The sensor-data gatherer. It stays in the background and gathers whenever the
 // module tells it to: it connects to the module's port, waits there for the
 // word, leaves, gathers, and connects again.

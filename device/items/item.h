@@ -1,3 +1,6 @@
+// SPDX-FileCopyrightText: 2026 The Quillmark authors
+// SPDX-License-Identifier: Apache-2.0
+
 // What the sample items have in common: their options, their reports, their
 // pace. An item is a program of its own that reports through the module.
 #pragma once

@@ -1,3 +1,6 @@
+// SPDX-FileCopyrightText: 2026 The Quillmark authors
+// SPDX-License-Identifier: Apache-2.0
+
 // A test item that does what its arguments say, one after another:
 //   report GROUP PROGRESS RESULT DESCRIPTION   through the module
 //   report-file GROUP PROGRESS RESULT FILE     the description is that file

@@ -1,3 +1,6 @@
+// SPDX-FileCopyrightText: 2026 The Quillmark authors
+// SPDX-License-Identifier: Apache-2.0
+
 // The plan checker: every message as it is printed, and what must hold of it for
 // whatever it is given.
 #include "check.h"

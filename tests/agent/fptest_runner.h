@@ -1,3 +1,6 @@
+// SPDX-FileCopyrightText: 2026 The Quillmark authors
+// SPDX-License-Identifier: Apache-2.0
+
 // fptest as it is started from a shell: with arguments, an environment and an
 // input, and what comes of it. Waited for, or left running to be signalled.
 #pragma once

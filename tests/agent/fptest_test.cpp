@@ -1,3 +1,6 @@
+// SPDX-FileCopyrightText: 2026 The Quillmark authors
+// SPDX-License-Identifier: Apache-2.0
+
 // The program as a whole: what it says of itself, wrong usage, and the commands
 // that only read.
 #include "fptest_runner.h"

@@ -1,3 +1,6 @@
+// SPDX-FileCopyrightText: 2026 The Quillmark authors
+// SPDX-License-Identifier: Apache-2.0
+
 // Draws what a program shows on a terminal, as an SVG.
 //
 //   terminal_picture FILE COLUMNS ROWS UNTIL COMMAND [ARG...]

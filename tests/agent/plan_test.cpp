@@ -1,3 +1,6 @@
+// SPDX-FileCopyrightText: 2026 The Quillmark authors
+// SPDX-License-Identifier: Apache-2.0
+
 // Test plans as the module sees them. What it runs is compared with its own
 // lookups, done on the same tree by the same calls of the library.
 #include "plan.h"

@@ -1,3 +1,6 @@
+// SPDX-FileCopyrightText: 2026 The Quillmark authors
+// SPDX-License-Identifier: Apache-2.0
+
 // Reads reports back as other programs do: XML by a parser that accepts nothing
 // that is not well-formed, TAP line by line, and TAP by prove.
 #pragma once

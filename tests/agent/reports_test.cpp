@@ -1,3 +1,6 @@
+// SPDX-FileCopyrightText: 2026 The Quillmark authors
+// SPDX-License-Identifier: Apache-2.0
+
 // What a run leaves in files, read back by other programs' parsers.
 #include "report_files.h"
 #include "reports.h"

@@ -1,3 +1,6 @@
+// SPDX-FileCopyrightText: 2026 The Quillmark authors
+// SPDX-License-Identifier: Apache-2.0
+
 // Running plans: what is sent to the module, what becomes of the items, and what
 // is told of it.
 #include "fptest_runner.h"

@@ -1,3 +1,6 @@
+// SPDX-FileCopyrightText: 2026 The Quillmark authors
+// SPDX-License-Identifier: Apache-2.0
+
 // A program on a terminal of its own: what it shows is what a person would see.
 #pragma once
 

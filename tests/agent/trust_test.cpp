@@ -1,3 +1,6 @@
+// SPDX-FileCopyrightText: 2026 The Quillmark authors
+// SPDX-License-Identifier: Apache-2.0
+
 // Nothing counts as passed that has not passed in this run, and nothing that the
 // user has asked for is left out without a word.
 #include "fptest_runner.h"

@@ -1,3 +1,6 @@
+// SPDX-FileCopyrightText: 2026 The Quillmark authors
+// SPDX-License-Identifier: Apache-2.0
+
 // The live view, on a terminal as people have it.
 #include "device_test.h"
 #include "terminal_session.h"

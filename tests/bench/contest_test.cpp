@@ -1,3 +1,6 @@
+// SPDX-FileCopyrightText: 2026 The Quillmark authors
+// SPDX-License-Identifier: Apache-2.0
+
 // How two sides are set against each other.
 #include "contest.h"
 #include "quiet_vorlane.h"

@@ -1,3 +1,6 @@
+// SPDX-FileCopyrightText: 2026 The Quillmark authors
+// SPDX-License-Identifier: Apache-2.0
+
 // What the benchmarks make of the times they have taken.
 #include "figures.h"
 #include "filter.h"

@@ -1,3 +1,8 @@
+/*
+ * SPDX-FileCopyrightText: 2026 The Quillmark authors
+ * SPDX-License-Identifier: Apache-2.0
+ */
+
 /* A host agent in C: pings the module twice and says what it got. */
 #include "quillmark.h"
 

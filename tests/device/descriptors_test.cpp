@@ -1,3 +1,6 @@
+// SPDX-FileCopyrightText: 2026 The Quillmark authors
+// SPDX-License-Identifier: Apache-2.0
+
 // What the calls leave in the host's descriptor table, and descriptor 0.
 #include "device_test.h"
 

@@ -1,3 +1,6 @@
+// SPDX-FileCopyrightText: 2026 The Quillmark authors
+// SPDX-License-Identifier: Apache-2.0
+
 // What the tests on the virtual device share. They link the libraries as they
 // are shipped; each runs in a process and a device of its own.
 #pragma once

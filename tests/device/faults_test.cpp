@@ -1,3 +1,6 @@
+// SPDX-FileCopyrightText: 2026 The Quillmark authors
+// SPDX-License-Identifier: Apache-2.0
+
 // What the surroundings do to a host: disks that are full or read-only, a
 // directory in the plan's place, limits, a missing shell, gatherers that fail,
 // signals. After each fault the next command without one works.

@@ -1,3 +1,6 @@
+// SPDX-FileCopyrightText: 2026 The Quillmark authors
+// SPDX-License-Identifier: Apache-2.0
+
 // The gatherer: started in the background only if none runs, and told to gather
 // over one real connection for each command.
 #include "device_test.h"

@@ -1,3 +1,6 @@
+// SPDX-FileCopyrightText: 2026 The Quillmark authors
+// SPDX-License-Identifier: Apache-2.0
+
 // Hosts of other kinds, and what the library needs of its surroundings.
 #include "device_test.h"
 

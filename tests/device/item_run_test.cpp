@@ -1,3 +1,6 @@
+// SPDX-FileCopyrightText: 2026 The Quillmark authors
+// SPDX-License-Identifier: Apache-2.0
+
 // Items run through the real shell: what is started, in which order, under
 // which name, and what the module says of it.
 #include "device_test.h"

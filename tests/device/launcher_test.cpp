@@ -1,3 +1,6 @@
+// SPDX-FileCopyrightText: 2026 The Quillmark authors
+// SPDX-License-Identifier: Apache-2.0
+
 // The virtual device from outside: device/run as a person or a test runner
 // starts it, and ps on the device. What changes the root that it runs in is
 // tried only in a sandbox of its own, which truly refuses namespaces.

@@ -1,3 +1,6 @@
+// SPDX-FileCopyrightText: 2026 The Quillmark authors
+// SPDX-License-Identifier: Apache-2.0
+
 // These tests run on the virtual device. Started anywhere else, the program
 // starts itself again there, so that it never touches the machine it is on.
 #include <gtest/gtest.h>

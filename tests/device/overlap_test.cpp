@@ -1,3 +1,6 @@
+// SPDX-FileCopyrightText: 2026 The Quillmark authors
+// SPDX-License-Identifier: Apache-2.0
+
 // The one overlap that is allowed: the suspension while a command is blocked in
 // an item, again and again.
 #include "device_test.h"

@@ -1,3 +1,6 @@
+// SPDX-FileCopyrightText: 2026 The Quillmark authors
+// SPDX-License-Identifier: Apache-2.0
+
 // Stopping the item last started, with the real ps and the real kill.
 #include "device_test.h"
 

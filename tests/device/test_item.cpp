@@ -1,3 +1,6 @@
+// SPDX-FileCopyrightText: 2026 The Quillmark authors
+// SPDX-License-Identifier: Apache-2.0
+
 // A test item that notes how it was started, so that a test can see what ran.
 //   --sleep SECONDS   stays that long before it ends
 //   --vendor TEXT     writes the vendor selector

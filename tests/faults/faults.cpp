@@ -1,3 +1,6 @@
+// SPDX-FileCopyrightText: 2026 The Quillmark authors
+// SPDX-License-Identifier: Apache-2.0
+
 // Makes every call that the module and Mini-XML make of the platform fail, one
 // at a time, over a script that uses every exported function, and compares all
 // that the module shows with the model: before, at and after the fault. Each

@@ -1,3 +1,6 @@
+// SPDX-FileCopyrightText: 2026 The Quillmark authors
+// SPDX-License-Identifier: Apache-2.0
+
 // The process's memory, counted to the byte: the C library counts the rounding
 // of its blocks as well, and that differs with their history.
 #include "memory.h"

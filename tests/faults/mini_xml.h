@@ -1,3 +1,6 @@
+// SPDX-FileCopyrightText: 2026 The Quillmark authors
+// SPDX-License-Identifier: Apache-2.0
+
 // What Mini-XML asks of the platform: its memory and its files. Its library is
 // linked with these calls renamed, so that any one of them can be made to fail.
 #pragma once

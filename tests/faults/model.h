@@ -1,3 +1,6 @@
+// SPDX-FileCopyrightText: 2026 The Quillmark authors
+// SPDX-License-Identifier: Apache-2.0
+
 // What the module must show for a command, with or without a fault in it: an
 // independent account of its calls, log lines, replies and files, step by step.
 #pragma once

@@ -1,3 +1,6 @@
+// SPDX-FileCopyrightText: 2026 The Quillmark authors
+// SPDX-License-Identifier: Apache-2.0
+
 // A long life of one process: many commands of every kind, with real files and
 // stubbed program starts. Descriptors and memory must grow by what the module
 // leaves open on purpose, and by nothing else.

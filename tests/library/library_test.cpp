@@ -1,3 +1,6 @@
+// SPDX-FileCopyrightText: 2026 The Quillmark authors
+// SPDX-License-Identifier: Apache-2.0
+
 // What the product is from outside: its symbols, what it needs, how it compiles.
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>

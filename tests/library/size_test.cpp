@@ -1,3 +1,6 @@
+// SPDX-FileCopyrightText: 2026 The Quillmark authors
+// SPDX-License-Identifier: Apache-2.0
+
 // How small the library is: on devices, storage is dear.
 #include <gtest/gtest.h>
 

@@ -1,3 +1,6 @@
+// SPDX-FileCopyrightText: 2026 The Quillmark authors
+// SPDX-License-Identifier: Apache-2.0
+
 // The command entry: parsing, the three heads, storing a test plan.
 #include "unit_test.h"
 

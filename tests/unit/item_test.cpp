@@ -1,3 +1,6 @@
+// SPDX-FileCopyrightText: 2026 The Quillmark authors
+// SPDX-License-Identifier: Apache-2.0
+
 // The run of one item: the vendor, the item's name, the presence of a gatherer,
 // and what is started how.
 #include "sequences.h"

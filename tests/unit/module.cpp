@@ -1,3 +1,6 @@
+// SPDX-FileCopyrightText: 2026 The Quillmark authors
+// SPDX-License-Identifier: Apache-2.0
+
 // The module's unit itself, so that what it keeps to itself can be reached.
 #include "../../src/quillmark.cpp"
 

@@ -1,3 +1,6 @@
+// SPDX-FileCopyrightText: 2026 The Quillmark authors
+// SPDX-License-Identifier: Apache-2.0
+
 // Recording doubles for everything that the module calls outside itself: the
 // platform, whose calls are redirected here at link time, and the maker's
 // interfaces. Files are real ones in a directory of the test's own; nothing is

@@ -1,3 +1,6 @@
+// SPDX-FileCopyrightText: 2026 The Quillmark authors
+// SPDX-License-Identifier: Apache-2.0
+
 // The read-back: the plan's file, byte by byte, in the caller's buffer.
 #include "unit_test.h"
 

@@ -1,3 +1,6 @@
+// SPDX-FileCopyrightText: 2026 The Quillmark authors
+// SPDX-License-Identifier: Apache-2.0
+
 // Reports: what an item says of its progress and its end goes into the plan.
 #include "sequences.h"
 #include "unit_test.h"

@@ -1,3 +1,6 @@
+// SPDX-FileCopyrightText: 2026 The Quillmark authors
+// SPDX-License-Identifier: Apache-2.0
+
 // The suspension: the item last started is looked up in the process list and
 // killed.
 #include "sequences.h"

@@ -1,3 +1,6 @@
+// SPDX-FileCopyrightText: 2026 The Quillmark authors
+// SPDX-License-Identifier: Apache-2.0
+
 // The trigger: one gatherer connects and is told to gather again.
 #include "sequences.h"
 #include "unit_test.h"

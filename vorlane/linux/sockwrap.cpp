@@ -1,3 +1,8 @@
+/*
+ * SPDX-FileCopyrightText: 2026 The Quillmark authors
+ * SPDX-License-Identifier: Apache-2.0
+ */
+
 /* The socket wrappers on Linux. What they cannot report they log. */
 #include "sockwrap.h"
 

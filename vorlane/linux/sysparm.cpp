@@ -1,4 +1,9 @@
 /*
+ * SPDX-FileCopyrightText: 2026 The Quillmark authors
+ * SPDX-License-Identifier: Apache-2.0
+ */
+
+/*
  * Parameter files on Linux: XML, a value being the text of the element that the
  * path leads to.
  */

@@ -1,4 +1,9 @@
 /*
+ * SPDX-FileCopyrightText: 2026 The Quillmark authors
+ * SPDX-License-Identifier: Apache-2.0
+ */
+
+/*
  * The log on Linux: one line and one write for each call, to standard error or
  * to the file that VR_LOG_FILE names.
  */
