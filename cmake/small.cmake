@@ -4,7 +4,7 @@
 # The library as the preset "small" builds it, for each architecture that a g++ is
 # here for: QUILLMARK_SMALL_<triplet> names the file, or is empty. The target
 # quillmark_small makes them all.
-set(small_directory ${CMAKE_BINARY_DIR}/small)
+set(small_directory ${PROJECT_BINARY_DIR}/small)
 set(small_files)
 
 foreach(triplet x86_64-linux-gnu arm-linux-gnueabihf aarch64-linux-gnu)
@@ -18,7 +18,7 @@ foreach(triplet x86_64-linux-gnu arm-linux-gnueabihf aarch64-linux-gnu)
 endforeach()
 
 if(NOT TARGET quillmark_small)
-  file(GLOB sources CONFIGURE_DEPENDS ${CMAKE_SOURCE_DIR}/src/* ${CMAKE_SOURCE_DIR}/vorlane/*.h)
+  file(GLOB sources CONFIGURE_DEPENDS ${PROJECT_SOURCE_DIR}/src/* ${PROJECT_SOURCE_DIR}/vorlane/*.h)
   # alone: the machine's other headers are not those of another architecture
   configure_file(${MINIXML_INCLUDE_DIR}/mxml.h ${small_directory}/include/mxml.h COPYONLY)
   foreach(file ${small_files})
@@ -37,11 +37,11 @@ if(NOT TARGET quillmark_small)
       COMMAND ${CMAKE_COMMAND} -E make_directory ${small_directory}/${triplet}
       COMMAND ${QUILLMARK_${triplet}_GXX} -std=c++20 -Os -DNDEBUG -fPIC
               -fno-exceptions -fno-rtti -fno-threadsafe-statics -fvisibility=hidden
-              -ffile-prefix-map=${CMAKE_SOURCE_DIR}/=
-              -I${small_directory}/include -I${CMAKE_SOURCE_DIR}/vorlane
-              -shared -Wl,-soname,libquillmark.so -Wl,--as-needed
+              -ffile-prefix-map=${PROJECT_SOURCE_DIR}/=
+              -I${small_directory}/include -I${PROJECT_SOURCE_DIR}/vorlane
+              -shared -Wl,-soname,libquillmark.so.${PROJECT_VERSION_MAJOR} -Wl,--as-needed
               ${QUILLMARK_SMALL_LINK_OPTIONS}
-              -o ${file} ${CMAKE_SOURCE_DIR}/src/quillmark.cpp ${libraries}
+              -o ${file} ${PROJECT_SOURCE_DIR}/src/quillmark.cpp ${libraries}
       DEPENDS ${sources} ${needed}
       VERBATIM)
   endforeach()

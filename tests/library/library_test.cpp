@@ -24,6 +24,7 @@ namespace fs = std::filesystem;
 namespace
 {
 
+using ::testing::ElementsAre;
 using ::testing::HasSubstr;
 using ::testing::UnorderedElementsAre;
 using Words = std::vector<std::string>;
@@ -69,11 +70,17 @@ Words exports_of(const std::string &library)
     return last_words(listing.output, ".");
 }
 
-Words needs_of(const std::string &library)
+// The entries of that kind of a library's dynamic section.
+Words entries_of(const std::string &library, const std::string &kind)
 {
     const Outcome listing = run("readelf --dynamic --wide " + library);
     EXPECT_EQ(listing.status, 0) << listing.output;
-    return last_words(listing.output, "NEEDED");
+    return last_words(listing.output, "\\(" + kind + "\\)");
+}
+
+Words needs_of(const std::string &library)
+{
+    return entries_of(library, "NEEDED");
 }
 
 class Directory
@@ -119,6 +126,14 @@ TEST(Library, NeedsTheCLibraryMiniXmlAndTheMakersLibraryAlone)
 {
     EXPECT_THAT(needs_of(QUILLMARK_LIBRARY),
                 UnorderedElementsAre("libmxml.so.1]", "libvorlane.so]", "libc.so.6]"));
+}
+
+TEST(Library, IsAskedForByItsMajorVersionAndTheMakersByItsPlainName)
+{
+    for (const std::string library : {QUILLMARK_LIBRARY, SMALL_HERE}) {
+        EXPECT_THAT(entries_of(library, "SONAME"), ElementsAre("libquillmark.so.1]"));
+    }
+    EXPECT_THAT(entries_of(VORLANE_LIBRARY, "SONAME"), ElementsAre("libvorlane.so]"));
 }
 
 TEST(Library, OfTheMakerExportsItsInterfacesAndNothingElse)
