@@ -17,8 +17,8 @@ install(TARGETS quillmark EXPORT quillmark
     NAMELINK_COMPONENT development)
 
 if(TARGET vorlane)
-  # In a directory that only the library looks into, and last: a maker's
-  # libvorlane.so in any other place of the loader's is taken instead.
+  # In a directory that only the library looks into, so that it stands in nobody's
+  # way: the maker's has the same name.
   set(vorlane_directory ${CMAKE_INSTALL_LIBDIR}/quillmark)
   if(ANDROID)
     set(vorlane_directory ${CMAKE_INSTALL_LIBDIR})
