@@ -2,24 +2,15 @@
 // SPDX-License-Identifier: Apache-2.0
 
 // What the product is from outside: its symbols, what it needs, how it compiles.
+#include "outside.h"
+
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
 
-#include <array>
-#include <cstdio>
-#include <cstdlib>
-#include <filesystem>
 #include <fstream>
-#include <memory>
 #include <regex>
-#include <sstream>
 #include <string>
-#include <sys/wait.h>
-#include <unistd.h>
 #include <utility>
-#include <vector>
-
-namespace fs = std::filesystem;
 
 namespace
 {
@@ -27,92 +18,6 @@ namespace
 using ::testing::ElementsAre;
 using ::testing::HasSubstr;
 using ::testing::UnorderedElementsAre;
-using Words = std::vector<std::string>;
-
-const std::string kSource = QUILLMARK_SOURCE_DIR;
-
-struct Outcome {
-    int status = -1;
-    std::string output; // both streams
-};
-
-Outcome run(const std::string &command)
-{
-    Outcome outcome;
-    FILE *pipe = popen(("( " + command + " ) 2>&1").c_str(), "r");
-    std::array<char, 4096> buffer{};
-    while (fgets(buffer.data(), buffer.size(), pipe) != nullptr) {
-        outcome.output += buffer.data();
-    }
-    const int status = pclose(pipe);
-    outcome.status = WIFEXITED(status) ? WEXITSTATUS(status) : -1;
-    return outcome;
-}
-
-// The last words of the lines that match.
-Words last_words(const std::string &text, const std::string &pattern)
-{
-    Words words;
-    std::istringstream lines(text);
-    const std::regex wanted(pattern);
-    for (std::string line; std::getline(lines, line);) {
-        if (std::regex_search(line, wanted)) {
-            words.push_back(line.substr(line.find_last_of(" [") + 1));
-        }
-    }
-    return words;
-}
-
-Words exports_of(const std::string &library)
-{
-    const Outcome listing = run("nm --dynamic --defined-only " + library);
-    EXPECT_EQ(listing.status, 0) << listing.output;
-    return last_words(listing.output, ".");
-}
-
-// The entries of that kind of a library's dynamic section.
-Words entries_of(const std::string &library, const std::string &kind)
-{
-    const Outcome listing = run("readelf --dynamic --wide " + library);
-    EXPECT_EQ(listing.status, 0) << listing.output;
-    return last_words(listing.output, "\\(" + kind + "\\)");
-}
-
-Words needs_of(const std::string &library)
-{
-    return entries_of(library, "NEEDED");
-}
-
-class Directory
-{
-  public:
-    Directory()
-    {
-        char name[] = "/tmp/quillmark-library-XXXXXX";
-        path_ = mkdtemp(name);
-    }
-    ~Directory()
-    {
-        fs::remove_all(path_);
-    }
-    Directory(const Directory &) = delete;
-    Directory &operator=(const Directory &) = delete;
-
-    std::string write(const std::string &name, const std::string &text) const
-    {
-        const fs::path file = path_ / name;
-        fs::create_directories(file.parent_path());
-        std::ofstream(file) << text;
-        return file;
-    }
-    [[nodiscard]] std::string path() const
-    {
-        return path_;
-    }
-
-  private:
-    fs::path path_;
-};
 
 TEST(Library, ExportsTheFourFunctionsAndTheVariableAndNothingElse)
 {

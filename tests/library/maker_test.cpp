@@ -1,0 +1,113 @@
+// SPDX-FileCopyrightText: 2026 The Quillmark authors
+// SPDX-License-Identifier: Apache-2.0
+
+// A device's own libraries in the place of those for Linux.
+#include "outside.h"
+
+#include <gmock/gmock.h>
+#include <gtest/gtest.h>
+
+#include <filesystem>
+#include <regex>
+#include <string>
+
+namespace
+{
+
+using ::testing::HasSubstr;
+using ::testing::IsEmpty;
+using ::testing::UnorderedElementsAre;
+
+constexpr char kMaker[] = "#include \"mxml_whitespace.h\"\n"
+                          "#include \"sockwrap.h\"\n"
+                          "#include \"sysparm.h\"\n"
+                          "#include \"vr_log.h\"\n"
+                          "void mxmlSetLoneWhitespaceOff(int off) { (void)off; }\n"
+                          "void Setsockopt(int d, const int *v) { (void)d; (void)v; }\n"
+                          "void Bind(int d, const struct sockaddr *a, socklen_t l)\n"
+                          "{ (void)d; (void)a; (void)l; }\n"
+                          "int Accept(int d, struct sockaddr *a, socklen_t *l)\n"
+                          "{ (void)d; (void)a; (void)l; return -1; }\n"
+                          "int get_node_value(const char *f, const char *p, char *b, size_t l)\n"
+                          "{ (void)f; (void)p; (void)b; (void)l; return -1; }\n";
+constexpr char kLog[] = "#include \"vr_log.h\"\n"
+                        "int vr_log_printf(int p, const char *t, const char *f, ...)\n"
+                        "{ (void)p; (void)t; (void)f; return 0; }\n";
+
+void make_library(const Directory &directory, const std::string &name, const std::string &text)
+{
+    const std::string source = directory.write(name + ".c", text);
+    const std::string file = "lib" + name + ".so";
+    const Outcome made = run("cc -shared -fPIC -I" + kSource + "/vorlane -Wl,-soname," + file +
+                             " -o " + directory.path() + "/" + file + " " + source);
+    ASSERT_EQ(made.status, 0) << made.output;
+}
+
+TEST(MakersLibraries, AreLinkedAndThoseForLinuxAreNotBuilt)
+{
+    const Directory directory;
+    make_library(directory, "maker", kMaker);
+    make_library(directory, "makerlog", kLog);
+    const std::string place = directory.path();
+    const std::string build = place + "/build";
+
+    const Outcome configured = run("cmake -S " + kSource + " -B " + build +
+                                   " -DQUILLMARK_BUILD_TOOLS=OFF '-DVORLANE_LIBRARIES=" + place +
+                                   "/libmaker.so;" + place + "/libmakerlog.so'");
+    ASSERT_EQ(configured.status, 0) << configured.output;
+    const Outcome built = run("cmake --build " + build);
+    ASSERT_EQ(built.status, 0) << built.output;
+
+    EXPECT_THAT(
+        needs_of(build + "/libquillmark.so"),
+        UnorderedElementsAre("libmxml.so.1]", "libmaker.so]", "libmakerlog.so]", "libc.so.6]"));
+    EXPECT_THAT(run("find " + build + " -name '*vorlane*'").output, IsEmpty());
+}
+
+// What the configuration says of them, in one line.
+std::string said_of(const Directory &directory, const std::string &options)
+{
+    directory.write("CMakeLists.txt", "cmake_minimum_required(VERSION 3.25)\n"
+                                      "project(makers NONE)\n"
+                                      "include(" +
+                                          kSource + "/cmake/Vorlane.cmake)\n");
+    const Outcome outcome =
+        run("cmake -S " + directory.path() + " -B " + directory.path() + "/build " + options);
+    EXPECT_NE(outcome.status, 0) << options;
+    return std::regex_replace(outcome.output, std::regex("\\s+"), " ");
+}
+
+TEST(MakersLibraries, FileThatIsMissingIsNamed)
+{
+    const Directory directory;
+    const std::string there = directory.write("libone.so", "");
+    const std::string headers = " -DVORLANE_INCLUDE_DIR=" + kSource + "/vorlane";
+
+    EXPECT_THAT(
+        said_of(directory, "'-DVORLANE_LIBRARIES=" + there + ";/absent/libtwo.so'" + headers),
+        HasSubstr("VORLANE_LIBRARIES names a file that is not there: /absent/libtwo.so"));
+}
+
+TEST(MakersLibraries, DirectoryWithoutTheirHeadersIsNamed)
+{
+    const Directory directory;
+    const std::string place = directory.path();
+    for (const char *header : {"mxml_whitespace.h", "sockwrap.h", "sysparm.h"}) {
+        directory.write(header, "");
+    }
+
+    EXPECT_THAT(said_of(directory, "-DVORLANE_INCLUDE_DIR=" + place),
+                HasSubstr("VORLANE_INCLUDE_DIR has no vr_log.h: " + place));
+}
+
+TEST(MakersLibraries, TestsAreRefusedWithThem)
+{
+    const Directory directory;
+    const std::string there = directory.write("libone.so", "");
+
+    EXPECT_THAT(said_of(directory, "-DQUILLMARK_BUILD_TESTS=ON -DVORLANE_LIBRARIES=" + there +
+                                       " -DVORLANE_INCLUDE_DIR=" + kSource + "/vorlane"),
+                HasSubstr("set QUILLMARK_BUILD_TESTS to OFF, or VORLANE_LIBRARIES to nothing"));
+}
+
+} // namespace
