@@ -2,6 +2,7 @@
 // SPDX-License-Identifier: Apache-2.0
 
 // A device's own libraries in the place of those for Linux.
+#include "maker.h"
 #include "outside.h"
 
 #include <gmock/gmock.h>
@@ -18,42 +19,16 @@ using ::testing::HasSubstr;
 using ::testing::IsEmpty;
 using ::testing::UnorderedElementsAre;
 
-constexpr char kMaker[] = "#include \"mxml_whitespace.h\"\n"
-                          "#include \"sockwrap.h\"\n"
-                          "#include \"sysparm.h\"\n"
-                          "#include \"vr_log.h\"\n"
-                          "void mxmlSetLoneWhitespaceOff(int off) { (void)off; }\n"
-                          "void Setsockopt(int d, const int *v) { (void)d; (void)v; }\n"
-                          "void Bind(int d, const struct sockaddr *a, socklen_t l)\n"
-                          "{ (void)d; (void)a; (void)l; }\n"
-                          "int Accept(int d, struct sockaddr *a, socklen_t *l)\n"
-                          "{ (void)d; (void)a; (void)l; return -1; }\n"
-                          "int get_node_value(const char *f, const char *p, char *b, size_t l)\n"
-                          "{ (void)f; (void)p; (void)b; (void)l; return -1; }\n";
-constexpr char kLog[] = "#include \"vr_log.h\"\n"
-                        "int vr_log_printf(int p, const char *t, const char *f, ...)\n"
-                        "{ (void)p; (void)t; (void)f; return 0; }\n";
-
-void make_library(const Directory &directory, const std::string &name, const std::string &text)
-{
-    const std::string source = directory.write(name + ".c", text);
-    const std::string file = "lib" + name + ".so";
-    const Outcome made = run("cc -shared -fPIC -I" + kSource + "/vorlane -Wl,-soname," + file +
-                             " -o " + directory.path() + "/" + file + " " + source);
-    ASSERT_EQ(made.status, 0) << made.output;
-}
-
 TEST(MakersLibraries, AreLinkedAndThoseForLinuxAreNotBuilt)
 {
     const Directory directory;
-    make_library(directory, "maker", kMaker);
-    make_library(directory, "makerlog", kLog);
+    const std::string libraries = make_makers_libraries(directory);
     const std::string place = directory.path();
     const std::string build = place + "/build";
 
-    const Outcome configured = run("cmake -S " + kSource + " -B " + build +
-                                   " -DQUILLMARK_BUILD_TOOLS=OFF '-DVORLANE_LIBRARIES=" + place +
-                                   "/libmaker.so;" + place + "/libmakerlog.so'");
+    const Outcome configured =
+        run("cmake -S " + kSource + " -B " + build +
+            " -DQUILLMARK_BUILD_TOOLS=OFF '-DVORLANE_LIBRARIES=" + libraries + "'");
     ASSERT_EQ(configured.status, 0) << configured.output;
     const Outcome built = run("cmake --build " + build);
     ASSERT_EQ(built.status, 0) << built.output;

@@ -1,0 +1,12 @@
+# SPDX-FileCopyrightText: 2026 The Quillmark authors
+# SPDX-License-Identifier: Apache-2.0
+
+# The NDK's own toolchain file, once it has been found to be there: of a path
+# that leads nowhere, CMake says nothing that helps.
+if(NOT EXISTS "${QUILLMARK_ANDROID_NDK}/build/cmake/android.toolchain.cmake")
+  message(FATAL_ERROR "ANDROID_NDK_ROOT names no NDK: '${QUILLMARK_ANDROID_NDK}'; "
+    "set it to the directory that holds build/cmake/android.toolchain.cmake")
+endif()
+# what is compiled to try the compiler reads this file as well
+list(APPEND CMAKE_TRY_COMPILE_PLATFORM_VARIABLES QUILLMARK_ANDROID_NDK)
+include("${QUILLMARK_ANDROID_NDK}/build/cmake/android.toolchain.cmake")
