@@ -12,6 +12,7 @@
 #include "../unit/sequences.h"
 #include "../unit/unit_test.h"
 
+#include <array>
 #include <cerrno>
 #include <csignal>
 #include <cstdio>
@@ -24,6 +25,7 @@
 #include <map>
 #include <sys/mman.h>
 #include <sys/wait.h>
+#include <ucontext.h>
 #include <unistd.h>
 
 using faults::Fault;
@@ -64,12 +66,30 @@ template <std::size_t size> void tell(char (&place)[size], const std::string &te
     std::snprintf(place, size, "%s", text.c_str());
 }
 
-// Notes the function of Mini-XML that the process dies in.
-void on_death(int signal)
+using Frames = std::array<void *, 32>;
+
+// Where a signal has come, innermost first.
+#ifdef __arm__
+// C has no tables there to find more callers by.
+std::size_t frames_of(const ucontext_t &context, Frames &frames)
 {
-    void *frames[32];
-    const int count = backtrace(frames, 32);
-    for (int at = 0; at < count && told()->died_in[0] == '\0'; ++at) {
+    frames[0] = reinterpret_cast<void *>(context.uc_mcontext.arm_pc);
+    frames[1] = reinterpret_cast<void *>(context.uc_mcontext.arm_lr);
+    return 2;
+}
+#else
+std::size_t frames_of(const ucontext_t & /*context*/, Frames &frames)
+{
+    return static_cast<std::size_t>(backtrace(frames.data(), static_cast<int>(frames.size())));
+}
+#endif
+
+// Notes the function of Mini-XML that the process dies in.
+void on_death(int signal, siginfo_t * /*info*/, void *context)
+{
+    Frames frames{};
+    const std::size_t count = frames_of(*static_cast<const ucontext_t *>(context), frames);
+    for (std::size_t at = 0; at < count && told()->died_in[0] == '\0'; ++at) {
         Dl_info place{};
         const bool known = dladdr(frames[at], &place) != 0 && place.dli_sname != nullptr;
         const std::string name = known ? place.dli_sname : "";
@@ -281,8 +301,11 @@ void plan(const Target &target, long number)
     alarm(kSeconds);
     void *first[1];
     backtrace(first, 1); // loads what it needs
+    struct sigaction noted = {};
+    noted.sa_sigaction = on_death;
+    noted.sa_flags = SA_SIGINFO;
     for (const int signal : {SIGSEGV, SIGBUS, SIGABRT}) {
-        std::signal(signal, on_death);
+        sigaction(signal, &noted, nullptr);
     }
     // Mini-XML says there what it could not allocate
     const int nowhere = open("/dev/null", O_WRONLY | O_CLOEXEC);

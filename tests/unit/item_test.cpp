@@ -236,9 +236,29 @@ TEST_F(Item, VendorIsTheDecimalNumberThatTheTextBeginsWith)
     }
 }
 
-TEST_F(Item, VendorBeyondThirtyTwoBitsIsCut)
+// The text is read as a long: 32-bit devices meet its end before the cut.
+TEST_F(Item, VendorBeyondThirtyTwoBitsIsCutWhereLongHoldsIt)
 {
-    if (sizeof(long) == 8) {
+    struct Case {
+        const char *text;
+        int cut;
+        int clamped;
+    };
+    const bool cut = sizeof(long) == 8;
+    for (const auto &[text, number, clamped] :
+         {Case{"2147483648", INT_MIN, INT_MAX}, Case{"-2147483649", INT_MAX, INT_MIN},
+          Case{"4294967295", -1, INT_MAX}, Case{"4294967296", 0, INT_MAX},
+          Case{"-4294967295", 1, INT_MIN}, Case{"99999999999999999999", -1, INT_MAX}}) {
+        SCOPED_TRACE(text);
+        platform::reset();
+        set_vendor(text);
+        load("");
+
+        const int expected = cut ? number : clamped;
+        EXPECT_THAT(run(), ElementsAreArray(not_found(std::to_string(expected))));
+        EXPECT_EQ(module::vendor(), expected);
+    }
+    if (cut) {
         EXPECT_THAT(run_item_under("4294967297", "x"),
                     ElementsAreArray(suffixed_run("1", "x", "x_ca")));
     }

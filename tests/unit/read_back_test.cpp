@@ -18,6 +18,7 @@ using platform::pass;
 using platform::plan_steps;
 using platform::write_plan;
 using ::testing::AllOf;
+using ::testing::Contains;
 using ::testing::ExitedWithCode;
 using ::testing::HasSubstr;
 using ::testing::KilledBySignal;
@@ -278,6 +279,21 @@ TEST_F(ReadBack, OffsetsAreOnlyLogged)
                                          line("offset = 12"),
                                          piece(400, 300),
                                          ended(100, 300)})));
+}
+
+TEST_F(ReadBack, OffsetIsLoggedAsAnInt)
+{
+    for (const long offset : {static_cast<long>(INT_MAX), static_cast<long>(3'000'000'000LL)}) {
+        SCOPED_TRACE(offset);
+        platform::reset();
+        write_plan("<P/>");
+        plan_steps("lseek", {gives(0), gives(offset)});
+        read_back(64);
+
+        const Lines lines = platform::log_lines();
+        EXPECT_THAT(lines, Contains("FPTEST_ExtractResultMsg| offset = " +
+                                    std::to_string(static_cast<int>(offset))));
+    }
 }
 
 TEST_F(ReadBack, FileIsReadNotThePlanInMemory)
