@@ -1,0 +1,74 @@
+// SPDX-FileCopyrightText: 2026 The Quillmark authors
+// SPDX-License-Identifier: Apache-2.0
+
+// Whoever builds the libraries from the same sources gets the same bytes.
+#include "outside.h"
+
+#include <gtest/gtest.h>
+
+#include <filesystem>
+#include <fstream>
+#include <iterator>
+#include <set>
+#include <string>
+
+namespace
+{
+
+namespace fs = std::filesystem;
+
+// All that may be of use to build the libraries, in another place.
+void copy_sources(const fs::path &place)
+{
+    const std::set<std::string> others = {".git", "build", "fuzz", "tests"};
+    fs::create_directories(place);
+    for (const auto &entry : fs::directory_iterator(kSource)) {
+        if (!others.contains(entry.path().filename())) {
+            fs::copy(entry, place / entry.path().filename(), fs::copy_options::recursive);
+        }
+    }
+}
+
+void build(const fs::path &place, const std::string &surroundings, const std::string &options)
+{
+    copy_sources(place);
+    const std::string build = place / "build";
+    const Outcome built = run(surroundings + " && cmake -S '" + place.string() + "' -B '" + build +
+                              "' -DQUILLMARK_BUILD_TOOLS=OFF " + options + " && cmake --build '" +
+                              build + "' --target quillmark vorlane");
+    ASSERT_EQ(built.status, 0) << built.output;
+}
+
+// Of the file, behind the symbolic links that may lead to it.
+std::string bytes_of(const fs::path &file)
+{
+    std::ifstream stream(file, std::ios::binary);
+    return {std::istreambuf_iterator<char>(stream), {}};
+}
+
+class Reproducible : public ::testing::TestWithParam<const char *>
+{
+};
+
+TEST_P(Reproducible, LibrariesOfTwoFoldersHaveTheSameBytes)
+{
+    const Directory directory;
+    const fs::path one = fs::path(directory.path()) / "a";
+    const fs::path other = fs::path(directory.path()) / "another place" / "some levels" / "deeper";
+    const std::string type = std::string("-DCMAKE_BUILD_TYPE=") + GetParam();
+
+    build(one, "umask 022 && export TZ=UTC LC_ALL=C", type);
+    build(other, "umask 077 && export TZ=Asia/Tokyo LC_ALL=C.UTF-8 && sleep 1", type);
+
+    for (const char *library : {"libquillmark.so", "libvorlane.so"}) {
+        const std::string bytes = bytes_of(one / "build" / library);
+        EXPECT_GT(bytes.size(), 10'000U) << library;
+        EXPECT_TRUE(bytes == bytes_of(other / "build" / library)) << library;
+        EXPECT_EQ(bytes.find(directory.path()), std::string::npos) << library;
+    }
+}
+
+INSTANTIATE_TEST_SUITE_P(BuildTypes, Reproducible, ::testing::Values("Release", "MinSizeRel"),
+                         [](const auto &type) { return std::string(type.param); });
+
+} // namespace
