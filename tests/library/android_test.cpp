@@ -11,17 +11,24 @@
 #include <gtest/gtest.h>
 
 #include <filesystem>
+#include <fstream>
+#include <iterator>
 #include <regex>
+#include <set>
 #include <string>
+#include <utility>
+#include <vector>
 
 namespace
 {
 
 using ::testing::Contains;
 using ::testing::Each;
+using ::testing::ElementsAreArray;
 using ::testing::HasSubstr;
 using ::testing::Not;
 using ::testing::SizeIs;
+using ::testing::UnorderedElementsAreArray;
 
 constexpr char kToolchain[] = "build/cmake/android.toolchain.cmake";
 
@@ -115,6 +122,98 @@ TEST(AndroidPresets, MakeASmallLibraryFor16KilobytePagesWithTheMakersOwn)
     EXPECT_THAT(alignments_of(library), Each("0x4000"));
     EXPECT_LE(std::filesystem::file_size(library), 24 * 1024U);
     EXPECT_THAT(run("readelf --sections --wide " + library).output, Not(HasSubstr(".symtab")));
+}
+
+// --- Android.bp -------------------------------------------------------------------
+
+const std::string kBlueprint = kSource + "/Android.bp";
+
+std::string text_of(const std::string &file)
+{
+    std::ifstream stream(file);
+    EXPECT_TRUE(stream) << file;
+    return {std::istreambuf_iterator<char>(stream), {}};
+}
+
+std::vector<std::string> all_matches(const std::string &text, const std::string &pattern)
+{
+    std::vector<std::string> found;
+    const std::regex wanted(pattern);
+    for (std::sregex_iterator at(text.begin(), text.end(), wanted), end; at != end; ++at) {
+        found.push_back((*at)[1]);
+    }
+    return found;
+}
+
+// The strings of a property of the library.
+std::vector<std::string> property(const std::string &name)
+{
+    const std::string text = text_of(kBlueprint);
+    const std::string library = text.substr(text.find("\ncc_library_shared {"));
+    std::smatch value;
+    const std::regex wanted("\n    " + name + ": (\\[[^\\]]*\\]|[^\n]*)");
+    if (!std::regex_search(library, value, wanted)) {
+        ADD_FAILURE() << "no property " << name;
+    }
+    return all_matches(value[1], "\"([^\"]*)\"");
+}
+
+// How CMake compiles the library, a unit a command.
+std::vector<std::string> compile_commands()
+{
+    return all_matches(text_of(QUILLMARK_BINARY_DIR "/compile_commands.json"),
+                       "\"command\": \"([^\n]*CMakeFiles/quillmark\\.dir/[^\n]*)\"");
+}
+
+TEST(AndroidBlueprint, IsFormattedAsAndroidsOwn)
+{
+    const Outcome formatted = run("bpfmt -d " + kBlueprint);
+    EXPECT_EQ(formatted.status, 0);
+    EXPECT_EQ(formatted.output, "");
+}
+
+TEST(AndroidBlueprint, CompilesWhatCMakeDoes)
+{
+    std::vector<std::string> sources;
+    for (const std::string &command : compile_commands()) {
+        sources.push_back(all_matches(command, " -c " + kSource + "/([^ ]+)").at(0));
+    }
+    EXPECT_THAT(sources, Not(SizeIs(0)));
+    EXPECT_THAT(property("srcs"), UnorderedElementsAreArray(sources));
+}
+
+TEST(AndroidBlueprint, CompilesAsCMakeDoes)
+{
+    // Android's build says these itself, or they are GCC's alone
+    const std::set<std::string> others = {"-fPIC",
+                                          "-ffile-prefix-map=" + kSource + "/=", "-Wno-restrict"};
+    const std::vector<std::string> commands = compile_commands();
+    ASSERT_THAT(commands, Not(SizeIs(0)));
+    std::vector<std::string> flags = all_matches(commands[0], " (-[fW][^ ]*)");
+    std::erase_if(flags, [&others](const auto &flag) { return others.contains(flag); });
+    flags.emplace_back("-Os");
+    EXPECT_THAT(property("cflags"), UnorderedElementsAreArray(flags));
+
+    EXPECT_THAT(property("cpp_std"), ElementsAreArray(all_matches(commands[0], " -std=([^ ]*)")));
+    EXPECT_THAT(property("stl"), ElementsAreArray({"none"}));
+    std::vector<std::string> directories = property("local_include_dirs");
+    for (const std::string &exported : property("export_include_dirs")) {
+        directories.push_back(exported);
+    }
+    EXPECT_THAT(directories,
+                UnorderedElementsAreArray(all_matches(commands[0], " -I" + kSource + "/([^ ]*)")));
+}
+
+TEST(AndroidBlueprint, LinksWhatTheLibraryNeeds)
+{
+    std::vector<std::string> needed;
+    for (const std::string &need : needs_of(QUILLMARK_LIBRARY)) {
+        const std::string name = need.substr(0, need.find(".so"));
+        if (name != "libc") { // linked to everything there
+            needed.push_back(name);
+        }
+    }
+    EXPECT_THAT(property("shared_libs"), UnorderedElementsAreArray(needed));
 }
 
 } // namespace
