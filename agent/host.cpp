@@ -29,7 +29,7 @@ namespace fptest
 namespace
 {
 
-constexpr off_t kOutputKept = 64 * 1024;
+constexpr off_t kOutputKept = off_t{64} * 1024;
 
 [[noreturn]] void fail(const char *what)
 {

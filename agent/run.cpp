@@ -278,10 +278,10 @@ class WorkPlanner
         job.suite = work_.suites.size() - 1;
         for (const auto &item : items) {
             if (!runs_something(item)) {
-                job.targets.push_back(std::nullopt);
+                job.targets.emplace_back(std::nullopt);
                 continue;
             }
-            job.targets.push_back(Job::Target{suite.items.size(), item->number, {}});
+            job.targets.emplace_back(Job::Target{suite.items.size(), item->number, {}});
             ItemRun run;
             run.group = group;
             run.name = *item->name;
@@ -453,7 +453,7 @@ std::vector<std::unique_ptr<Listener>> make_listeners(const RunOptions &options)
 std::string first_failure(const std::vector<Listener *> &listeners)
 {
     for (const Listener *listener : listeners) {
-        if (const std::string failure = listener->failure(); !failure.empty()) {
+        if (std::string failure = listener->failure(); !failure.empty()) {
             return failure;
         }
     }

@@ -36,7 +36,7 @@ constexpr Seconds kGathering = 10s;
 constexpr auto kBeforeRelease = 300ms;
 constexpr auto kBeforeTerm = 2s;
 constexpr auto kBeforeGivingUp = 10s;
-constexpr std::size_t kOutputKept = 64 * 1024;
+constexpr std::size_t kOutputKept = std::size_t{64} * 1024;
 
 void append_output(std::string &output, const std::string &text)
 {
@@ -55,7 +55,8 @@ void release_trigger()
     module.sin_family = AF_INET;
     module.sin_port = htons(kTriggerPort);
     module.sin_addr.s_addr = htonl(INADDR_LOOPBACK);
-    connect(connection.get(), reinterpret_cast<const sockaddr *>(&module), sizeof module);
+    static_cast<void>(
+        connect(connection.get(), reinterpret_cast<const sockaddr *>(&module), sizeof module));
     // long enough to be accepted; nothing depends on what is read
     std::this_thread::sleep_for(kTurn);
 }

@@ -5,12 +5,12 @@
 
 #include <algorithm>
 #include <array>
+#include <clocale>
 #include <cmath>
 #include <cstdio>
 #include <ctime>
-#include <locale.h>
+#include <cwchar>
 #include <utility>
-#include <wchar.h>
 
 namespace fptest
 {

@@ -26,7 +26,7 @@ using fptest::Finding;
 using fptest::Plan;
 using fptest::PlanUse;
 using testing::HasSubstr;
-using std::string_literals::operator""s;
+using namespace std::string_literals;
 
 namespace
 {

@@ -17,7 +17,7 @@ using fptest::Position;
 using fptest::Tag;
 using testing::ElementsAre;
 using testing::IsEmpty;
-using std::string_view_literals::operator""sv;
+using namespace std::string_view_literals;
 
 namespace
 {

@@ -25,9 +25,8 @@ using fptest::Plan;
 using fptest::Report;
 using fptest::Tag;
 using testing::ElementsAre;
-using testing::HasSubstr;
 using testing::IsEmpty;
-using std::string_literals::operator""s;
+using namespace std::string_literals;
 
 namespace
 {

@@ -13,10 +13,8 @@ using namespace fptest_runner;
 using device::kPlanFile;
 using device::plan_of;
 using device::read_file;
-using device::wait_for;
 using device::write_file;
 using ::testing::EndsWith;
-using ::testing::Not;
 using ::testing::SizeIs;
 using ::testing::StartsWith;
 

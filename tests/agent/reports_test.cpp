@@ -31,7 +31,6 @@
 using namespace fptest;
 using namespace report_files;
 using namespace std::chrono_literals;
-using ::testing::AnyOf;
 using ::testing::ElementsAre;
 using ::testing::EndsWith;
 using ::testing::HasSubstr;

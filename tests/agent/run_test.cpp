@@ -37,7 +37,6 @@ using report_files::Point;
 using report_files::Tap;
 using ::testing::Each;
 using ::testing::EndsWith;
-using ::testing::Gt;
 using ::testing::Not;
 using ::testing::SizeIs;
 using ::testing::StartsWith;

@@ -18,7 +18,7 @@
 
 using namespace fptest;
 using namespace std::chrono_literals;
-using std::string_literals::operator""s;
+using namespace std::string_literals;
 
 namespace
 {

@@ -13,13 +13,11 @@
 using device::kPlanFile;
 using device::read_file;
 using device::start_program;
-using device::wait_for;
 using fptest_runner::Ended;
 using fptest_runner::expect_refusal;
 using fptest_runner::FptestProcess;
 using fptest_runner::lines_of;
 using fptest_runner::run_fptest;
-using ::testing::EndsWith;
 using ::testing::Not;
 
 namespace

@@ -13,10 +13,8 @@
 
 using device::kPlanFile;
 using device::read_file;
-using device::wait_for;
 using device::write_file;
 using ::testing::Contains;
-using ::testing::Each;
 using ::testing::Not;
 using ::testing::SizeIs;
 

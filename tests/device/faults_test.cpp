@@ -922,7 +922,8 @@ TEST_P(DescriptorLimit, IsLoggedAndEndsNothing)
             if (!listeners().empty()) { // it may have gone by the time of connecting
                 const Socket client(socket(AF_INET, SOCK_STREAM | SOCK_CLOEXEC, 0));
                 const sockaddr_in address = loopback(kTriggerPort);
-                connect(client.get(), reinterpret_cast<const sockaddr *>(&address), sizeof address);
+                static_cast<void>(connect(
+                    client.get(), reinterpret_cast<const sockaddr *>(&address), sizeof address));
             }
             std::this_thread::sleep_for(std::chrono::milliseconds(5));
         }

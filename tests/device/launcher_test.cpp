@@ -649,7 +649,7 @@ TEST_F(Ps, PrintsTheOldToolboxsColumns)
 {
     const auto rows = processes(shell("ps; :"));
 
-    ASSERT_GE(rows.size(), 2u);
+    ASSERT_GE(rows.size(), 2U);
     for (const Words &row : rows) {
         EXPECT_EQ(row[user], way() == Way::namespaces ? "root" : row[user]);
     }
@@ -664,7 +664,7 @@ TEST_F(Ps, ListsByProcessId)
 {
     const auto ids = column(processes(shell("sleep 9 & sleep 9 & sleep 9 & ps")), pid);
 
-    EXPECT_GE(ids.size(), 5u);
+    EXPECT_GE(ids.size(), 5U);
     EXPECT_TRUE(std::ranges::is_sorted(ids, {}, [](auto &id) { return std::stoi(id); }));
 }
 
@@ -711,7 +711,7 @@ TEST_F(Ps, ShowsTheKernelsNameWhereTheProgramsIsEmpty)
 {
     const auto rows = processes(shell("(exec -a '' /usr/bin/sleep 9) & sleep 0.3; ps sleep"));
 
-    ASSERT_EQ(rows.size(), 1u);
+    ASSERT_EQ(rows.size(), 1U);
     EXPECT_EQ(rows[0][name], "sleep");
 }
 
@@ -723,7 +723,7 @@ TEST_F(Ps, ReadsAKernelsNameThatLooksLikeTheNextFields)
     const auto rows = processes(
         shell("(exec -a '' '/system/bin/a) Z 7' 9) & sleep 0.3; ps 'a)'", {"--bin", own.path()}));
 
-    ASSERT_EQ(rows.size(), 1u);
+    ASSERT_EQ(rows.size(), 1U);
     EXPECT_EQ(rows[0][name], "a) Z 7");
     EXPECT_EQ(rows[0][state], "S");
     EXPECT_NE(rows[0][parent], "7");
@@ -734,7 +734,7 @@ TEST_F(Ps, KeepsAProcessOnOneLine)
     const auto rows =
         processes(shell("(exec -a $'two\\nlines' /usr/bin/sleep 9) & sleep 0.3; ps two"));
 
-    ASSERT_EQ(rows.size(), 1u);
+    ASSERT_EQ(rows.size(), 1U);
     EXPECT_EQ(rows[0][name], "two?lines");
 }
 
@@ -752,7 +752,7 @@ TEST_F(Ps, AQueryForTheGathererFindsEveryVariantOfIt)
     for (const std::string program : {"SensorProbe", "SensorProbe_ca"}) {
         const Outcome outcome = shell("/system/bin/sh -c '/system/bin/" + program +
                                       " --group g' & sleep 0.4; ps | grep /system/bin/SensorProbe");
-        ASSERT_EQ(lines(outcome.out).size(), 1u) << outcome.out;
+        ASSERT_EQ(lines(outcome.out).size(), 1U) << outcome.out;
         EXPECT_TRUE(outcome.out.ends_with(" /system/bin/" + program + "\n")) << outcome.out;
     }
 }
@@ -766,7 +766,7 @@ TEST_F(Ps, SkipsProcessesThatEndMeanwhile)
               "kill $! $first; cat /tmp/list");
 
     EXPECT_EQ(outcome.status, 0);
-    EXPECT_GE(processes(outcome).size(), 5u);
+    EXPECT_GE(processes(outcome).size(), 5U);
 }
 
 TEST_F(Ps, TakesOneNameAndNoOptions)
@@ -867,7 +867,7 @@ TEST_F(SampleItems, BurnInReportsNowAndThenAndPassesInTheEnd)
     const Outcome outcome = on_plan("BurnIn --group sensor --seconds 0.1");
 
     EXPECT_EQ(outcome.status, 0);
-    EXPECT_EQ(reports(outcome).size(), 21u);
+    EXPECT_EQ(reports(outcome).size(), 21U);
     EXPECT_EQ(reports(outcome)[1], "5:-2");
     EXPECT_EQ(report("BurnIn"), " progress=\"100\" result=\"0\" description=\"stable for 0.1 s\"");
 }
@@ -1097,7 +1097,7 @@ TEST_F(NamespaceDevice, HasTheLoopbackAloneAndItIsUp)
 {
     const Words interfaces = lines(on_device({"cat", "/proc/net/dev"}).out);
 
-    ASSERT_EQ(interfaces.size(), 3u); // two are headers
+    ASSERT_EQ(interfaces.size(), 3U); // two are headers
     EXPECT_TRUE(interfaces[2].starts_with("    lo:")) << interfaces[2];
     EXPECT_NE(on_device({"ifconfig", "lo"}).out.find("UP LOOPBACK RUNNING"), std::string::npos);
     EXPECT_EQ(shell("echo over the loopback | timeout 9 netcat -l -p 34952 & sleep 0.5; "
@@ -1650,7 +1650,7 @@ TEST_F(InPlace, RefusesToStopItemsWhileAProcessNineIsAlive)
         std::regex("\ndevice/run: 'kill 9 [0-9]+' is not run: process 9 is alive here and would "
                    "get the signal\n")))
         << outcome.err;
-    EXPECT_EQ(lines(outcome.err).size(), 2u) << outcome.err;
+    EXPECT_EQ(lines(outcome.err).size(), 2U) << outcome.err;
 }
 
 TEST_F(InPlace, RunsEveryOtherCommandWhileAProcessNineIsAlive)

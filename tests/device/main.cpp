@@ -47,8 +47,7 @@ int run_on_device(const std::vector<std::string> &arguments)
     }
     const char *ci = std::getenv("CI");
     const bool must_run = ci != nullptr && std::string_view(ci) == "true";
-    std::fprintf(stderr, "the virtual device did not start: %s\n",
-                 must_run ? "failed" : "not run");
+    std::fprintf(stderr, "the virtual device did not start: %s\n", must_run ? "failed" : "not run");
     return must_run ? EXIT_FAILURE : kSkipped;
 }
 

@@ -67,7 +67,10 @@ Lines listeners()
     std::getline(table, line); // the header
     while (std::getline(table, line)) {
         std::istringstream columns(line);
-        std::string slot, local, remote, state;
+        std::string slot;
+        std::string local;
+        std::string remote;
+        std::string state;
         columns >> slot >> local >> remote >> state;
         if (state == "0A") {
             found.push_back(local);

@@ -184,7 +184,7 @@ std::string Model::new_name(const std::string &kind)
 std::string Model::opened(const std::string &flags, bool there, int &error)
 {
     error = fails("open") ? EMFILE : there ? 0 : ENOENT;
-    const std::string name = error != 0 ? "-1" : new_name("plan");
+    std::string name = error != 0 ? "-1" : new_name("plan");
     record(std::string("open(") + kPath + ", " + flags + ") = " + name);
     return name;
 }

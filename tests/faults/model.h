@@ -56,7 +56,7 @@ class Model
     Result nothing(); // a null command
     Result store(const Node &document);
     Result run_group(const std::string &group);
-    Result run_item(const std::string &group, const std::string &item, const std::string &presence);
+    Result run_item(const std::string &group, const std::string &item, const std::string &output);
     Result report(const std::string &group, const std::string &item, int progress,
                   const std::string &description);
     Result read_back();
@@ -108,7 +108,7 @@ class Model
     const Node *at_index(const std::string &group, int index);
     int path_level(const std::string &path, int level, const std::string &last);
     void path_names(const std::vector<std::string> &components);
-    void run(const std::string &group, int index, const std::string &presence);
+    void run(const std::string &group, int index, const std::string &output);
     int presence(const std::string &output);
     void launch();
     void trigger();
