@@ -3,19 +3,18 @@
 
 // What cmake --install puts where, and whether others can build on it: each test
 // installs into a prefix of its own and moves it before it looks.
+#include "outside.h"
+
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
 
 #include <algorithm>
-#include <array>
-#include <cstdio>
 #include <cstdlib>
 #include <filesystem>
 #include <fstream>
 #include <iterator>
 #include <regex>
 #include <string>
-#include <sys/wait.h>
 #include <vector>
 
 namespace fs = std::filesystem;
@@ -28,28 +27,9 @@ using ::testing::ElementsAreArray;
 using ::testing::HasSubstr;
 using ::testing::Not;
 
-const std::string kSource = QUILLMARK_SOURCE_DIR;
 const std::string kBuild = QUILLMARK_BINARY_DIR;
 const std::string kCMake = CMAKE_PROGRAM;
 const std::string kConsumers = kSource + "/tests/install/consumer";
-
-struct Outcome {
-    int status = -1;
-    std::string output; // both streams
-};
-
-Outcome run(const std::string &command)
-{
-    Outcome outcome;
-    FILE *pipe = popen(("( " + command + " ) 2>&1").c_str(), "r");
-    std::array<char, 4096> buffer{};
-    while (fgets(buffer.data(), buffer.size(), pipe) != nullptr) {
-        outcome.output += buffer.data();
-    }
-    const int status = pclose(pipe);
-    outcome.status = WIFEXITED(status) ? WEXITSTATUS(status) : -1;
-    return outcome;
-}
 
 // What it prints; a failure of the test where its exit status is not 0.
 std::string output_of(const std::string &command)
@@ -102,7 +82,7 @@ class Install : public ::testing::Test
     // Configures and builds a consumer. Gives its build.
     [[nodiscard]] std::string consumer(const std::string &kind, const std::string &options) const
     {
-        const std::string build = work(kind);
+        std::string build = work(kind);
         output_of(configure(kind, options));
         output_of(kCMake + " --build " + build);
         return build;

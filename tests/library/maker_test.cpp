@@ -17,6 +17,7 @@ namespace
 
 using ::testing::HasSubstr;
 using ::testing::IsEmpty;
+using ::testing::MatchesRegex;
 using ::testing::UnorderedElementsAre;
 
 TEST(MakersLibraries, AreLinkedAndThoseForLinuxAreNotBuilt)
@@ -37,6 +38,12 @@ TEST(MakersLibraries, AreLinkedAndThoseForLinuxAreNotBuilt)
         needs_of(build + "/libquillmark.so"),
         UnorderedElementsAre("libmxml.so.1]", "libmaker.so]", "libmakerlog.so]", "libc.so.6]"));
     EXPECT_THAT(run("find " + build + " -name '*vorlane*'").output, IsEmpty());
+
+    const Outcome installed = run("cmake --install " + build + " --prefix " + place + "/prefix");
+    ASSERT_EQ(installed.status, 0) << installed.output;
+    EXPECT_THAT(run("find " + place + "/prefix -name 'lib*' -type f -printf '%f '").output,
+                MatchesRegex("libquillmark\\.so\\.[0-9.]+ "));
+    EXPECT_THAT(entries_of(place + "/prefix/lib/libquillmark.so", "RUNPATH"), IsEmpty());
 }
 
 // What the configuration says of them, in one line.
