@@ -2,6 +2,7 @@
 // SPDX-License-Identifier: Apache-2.0
 
 // The completion of fptest's command line in bash.
+#include "../quoted.h"
 #include "report_files.h"
 
 #include <gmock/gmock.h>
@@ -76,9 +77,10 @@ class Completion : public ::testing::Test
     Lines offered(const std::string &words) const
     {
         write_file(directory_.path("try"),
-                   std::string("source '" QUILLMARK_SOURCE_DIR "/agent/completion/fptest'\n"
-                               "PATH=/usr/bin:/bin\n"
-                               "COMP_WORDS=(./fptest ") +
+                   "source " + quoted(QUILLMARK_SOURCE_DIR "/agent/completion/fptest") +
+                       "\n"
+                       "PATH=/usr/bin:/bin\n"
+                       "COMP_WORDS=(./fptest " +
                        words +
                        ")\nCOMP_CWORD=$((${#COMP_WORDS[@]} - 1))\n"
                        "_fptest ./fptest\n"
@@ -111,7 +113,7 @@ TEST_F(Completion, OffersTheSubCommands)
 Lines options_of(const std::string &command)
 {
     Lines options;
-    for (const std::string &line : output_of(FPTEST_PROGRAM " " + command + " --help")) {
+    for (const std::string &line : output_of(quoted(FPTEST_PROGRAM) + " " + command + " --help")) {
         if (!line.starts_with("  -")) {
             continue;
         }
@@ -244,9 +246,11 @@ TEST_F(Completion, FindsWhatHasBeenTypedWithoutQuoting)
 
 TEST_F(Completion, IsBoundToTheName)
 {
-    EXPECT_THAT(output_of("/usr/bin/bash -c 'source " QUILLMARK_SOURCE_DIR
-                          "/agent/completion/fptest; complete -p fptest'"),
-                ElementsAre("complete -F _fptest fptest"));
+    EXPECT_THAT(
+        output_of("/usr/bin/bash -c " +
+                  quoted("source " + quoted(QUILLMARK_SOURCE_DIR "/agent/completion/fptest") +
+                         "; complete -p fptest")),
+        ElementsAre("complete -F _fptest fptest"));
 }
 
 } // namespace

@@ -3,6 +3,7 @@
 
 // The program as a whole: what it says of itself, wrong usage, and the commands
 // that only read.
+#include "../quoted.h"
 #include "fptest_runner.h"
 #include "terminal_session.h"
 
@@ -411,7 +412,9 @@ Lines completions(const Lines &words)
         line += (line.empty() ? "" : " ") + word;
     }
     const std::string script = "source /usr/share/bash-completion/bash_completion\n"
-                               "source " QUILLMARK_SOURCE_DIR "/agent/completion/fptest\n"
+                               "source " +
+                               quoted(QUILLMARK_SOURCE_DIR "/agent/completion/fptest") +
+                               "\n"
                                "compopt() { :; }\n" // there is no line that is being edited
                                "function=$(complete -p fptest | sed 's/.*-F \\([^ ]*\\).*/\\1/')\n"
                                "COMP_WORDS=(" +
@@ -469,8 +472,9 @@ TEST_F(Fptest, CompletesOnATerminal)
     TerminalSession session({"/usr/bin/bash", "--norc", "--noprofile", "-i"}, 80, 24,
                             {{"PS1", "ready> "}, {"PATH", "/system/bin:/usr/bin"}});
     ASSERT_TRUE(session.wait_for_text("ready>")) << session.text();
-    session.type("source /usr/share/bash-completion/bash_completion; source " QUILLMARK_SOURCE_DIR
-                 "/agent/completion/fptest; echo soon-$((1 + 1))\n");
+    session.type("source /usr/share/bash-completion/bash_completion; source " +
+                 quoted(QUILLMARK_SOURCE_DIR "/agent/completion/fptest") +
+                 "; echo soon-$((1 + 1))\n");
     ASSERT_TRUE(session.wait_for_text("soon-2")) << session.text();
     session.type("fptest rep\t");
     EXPECT_TRUE(session.wait_for_text("ready> fptest report")) << session.text();

@@ -1013,10 +1013,11 @@ TEST_F(Run, IsATestForProve)
     const std::string text =
         plan_of({{"G", {{"Item", kItemPasses}}}, {"Bad", {{"Other", "report Bad 100 1 x"}}}});
     write_file(kPlanFile, text);
-    Ended ended = run_program({"/usr/bin/prove", "--exec", FPTEST_PROGRAM " run --tap", "P/G"});
+    Ended ended = run_program({"/usr/bin/prove", "--exec", "/system/bin/fptest run --tap", "P/G"});
     EXPECT_EQ(ended.status, 0) << ended.out;
     EXPECT_THAT(ended.out, HasSubstr("Result: PASS")) << ended.out;
-    ended = run_program({"/usr/bin/prove", "--exec", FPTEST_PROGRAM " run --tap", "P/G", "P/Bad"});
+    ended =
+        run_program({"/usr/bin/prove", "--exec", "/system/bin/fptest run --tap", "P/G", "P/Bad"});
     EXPECT_EQ(ended.status, 1) << ended.out;
     EXPECT_THAT(ended.out, HasSubstr("Files=2, Tests=2"));
     EXPECT_THAT(ended.out, HasSubstr("Result: FAIL"));

@@ -2,6 +2,7 @@
 // SPDX-License-Identifier: Apache-2.0
 
 // What the benchmarks make of the times they have taken.
+#include "../quoted.h"
 #include "figures.h"
 #include "filter.h"
 #include "growth.h"
@@ -292,7 +293,7 @@ TEST_P(BadCommandLine, GetsOneLineAndStatus2)
 {
     const auto &[name, arguments, line] = GetParam();
     const std::string command =
-        std::string(QUILLMARK_SOURCE_DIR "/scripts/bench ") + arguments + " 2>&1";
+        quoted(QUILLMARK_SOURCE_DIR "/scripts/bench") + " " + arguments + " 2>&1";
     std::array<char, 4096> buffer{};
     std::string output;
 

@@ -2,6 +2,7 @@
 // SPDX-License-Identifier: Apache-2.0
 
 // Hosts of other kinds, and what the library needs of its surroundings.
+#include "../quoted.h"
 #include "device_test.h"
 
 #include <array>
@@ -29,19 +30,20 @@ std::string output_of(const std::string &command)
     return output;
 }
 
-constexpr char kTests[] = QUILLMARK_BINARY_DIR "/tests/device/";
+const std::string kTests = QUILLMARK_BINARY_DIR "/tests/device";
+const std::string kHost = quoted(kTests + "/c_host");
 
 TEST_F(Host, InCGetsItsPingOnce)
 {
-    EXPECT_EQ(output_of(std::string(kTests) + "c_host"),
-              "0 <Ping Success!> <> 32 2049 1024 no plan\n");
+    EXPECT_EQ(output_of(kHost), "0 <Ping Success!> <> 32 2049 1024 no plan\n");
 }
 
 TEST_F(Host, MakersLibraryIsReplacedAtLoadTime)
 {
     unsetenv("VR_LOG_FILE");
     EXPECT_EQ(
-        output_of("LD_PRELOAD=" + std::string(kTests) + "libother_vorlane.so " + kTests + "c_host"),
+        // by its name: the loader takes a blank for the end of a path
+        output_of("LD_LIBRARY_PATH=" + quoted(kTests) + " LD_PRELOAD=libother_vorlane.so " + kHost),
         "other log: 4 VRCODE => testHead is : %s\n"
         "other log: 4 VRCODE => Get ping reply success!\n"
         "other log: 4 VRCODE => testHead is : %s\n"

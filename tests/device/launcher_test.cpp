@@ -5,6 +5,8 @@
 // starts it, and ps on the device. What changes the root that it runs in is
 // tried only in a sandbox of its own, which truly refuses namespaces.
 
+#include "../quoted.h"
+
 #include <gtest/gtest.h>
 
 #include <algorithm>
@@ -1534,7 +1536,7 @@ TEST_F(Sandbox, ATreeMayLieInAnyDirectory)
 // Every connection is made from the module's port, so that it finds itself.
 TEST_F(Sandbox, AGathererConnectedToItselfDoesNotHoldTheModulesPort)
 {
-    const std::string gatherer = build / "device/bin/SensorProbe";
+    const std::string gatherer = quoted(build / "device/bin/SensorProbe");
 
     const Outcome outcome = Machine{.refuses_namespaces = false}.run(
         "echo 34952 34953 >/proc/sys/net/ipv4/ip_local_port_range; " + gatherer +

@@ -9,12 +9,14 @@
 
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
+#include <nlohmann/json.hpp>
 
 #include <filesystem>
 #include <fstream>
 #include <iterator>
 #include <regex>
 #include <set>
+#include <sstream>
 #include <string>
 #include <utility>
 #include <vector>
@@ -35,8 +37,8 @@ constexpr char kToolchain[] = "build/cmake/android.toolchain.cmake";
 // Configures a preset with the NDK there; the text with single blanks.
 Outcome configure(const std::string &preset, const std::string &ndk, const std::string &more)
 {
-    Outcome outcome = run("cd " + kSource + " && ANDROID_NDK_ROOT=" + ndk + " cmake --preset " +
-                          preset + " " + more);
+    Outcome outcome = run("cd " + quoted(kSource) + " && ANDROID_NDK_ROOT=" + quoted(ndk) +
+                          " cmake --preset " + preset + " " + more);
     outcome.output = std::regex_replace(outcome.output, std::regex("\\s+"), " ");
     return outcome;
 }
@@ -51,7 +53,7 @@ TEST(AndroidPresets, AskTheNdkForAnArchitectureAndNoCppRuntime)
         ndk.write(kToolchain, "message(FATAL_ERROR \"asked: ${ANDROID_ABI} ${ANDROID_PLATFORM} "
                               "${ANDROID_STL} ${CMAKE_BUILD_TYPE}\")\n");
 
-        EXPECT_THAT(configure(preset, ndk.path(), "-B " + ndk.path() + "/build").output,
+        EXPECT_THAT(configure(preset, ndk.path(), "-B " + quoted(ndk.path() + "/build")).output,
                     HasSubstr("asked: " + std::string(abi) + " android-28 none MinSizeRel"));
     }
 }
@@ -61,7 +63,7 @@ TEST(AndroidPresets, NdkThatIsMissingIsAskedFor)
     const Directory directory;
     for (const std::string &ndk : {std::string(), directory.path() + "/none"}) {
         const Outcome outcome =
-            configure("android-arm64", ndk, "-B " + directory.path() + "/build");
+            configure("android-arm64", ndk, "-B " + quoted(directory.path() + "/build"));
 
         EXPECT_NE(outcome.status, 0);
         EXPECT_THAT(outcome.output, HasSubstr("ANDROID_NDK_ROOT names no NDK: '" + ndk +
@@ -73,7 +75,7 @@ TEST(AndroidPresets, NdkThatIsMissingIsAskedFor)
 // The alignments of the segments that are loaded.
 Words alignments_of(const std::string &library)
 {
-    const Outcome listing = run("readelf --program-headers --wide " + library);
+    const Outcome listing = run("readelf --program-headers --wide " + quoted(library));
     EXPECT_EQ(listing.status, 0) << listing.output;
     return last_words(listing.output, "^ *LOAD");
 }
@@ -105,11 +107,11 @@ TEST(AndroidPresets, MakeASmallLibraryFor16KilobytePagesWithTheMakersOwn)
 
     const Outcome configured =
         configure("android-x86_64", place,
-                  "-B " + place + "/built -DMINIXML_INCLUDE_DIR=" + place +
-                      " -DMINIXML_LIBRARY=" MINIXML_LIBRARY " '-DVORLANE_LIBRARIES=" +
-                      make_makers_libraries(ndk) + "'");
+                  "-B " + quoted(place + "/built") + " -DMINIXML_INCLUDE_DIR=" + quoted(place) +
+                      " -DMINIXML_LIBRARY=" + quoted(MINIXML_LIBRARY) +
+                      " -DVORLANE_LIBRARIES=" + quoted(make_makers_libraries(ndk)));
     ASSERT_EQ(configured.status, 0) << configured.output;
-    const Outcome built = run("cmake --build " + place + "/built");
+    const Outcome built = run("cmake --build " + quoted(place + "/built"));
     ASSERT_EQ(built.status, 0) << built.output;
 
     const std::string library = place + "/built/libquillmark.so";
@@ -121,7 +123,8 @@ TEST(AndroidPresets, MakeASmallLibraryFor16KilobytePagesWithTheMakersOwn)
     EXPECT_THAT(alignments_of(library), Not(SizeIs(0)));
     EXPECT_THAT(alignments_of(library), Each("0x4000"));
     EXPECT_LE(std::filesystem::file_size(library), 24 * 1024U);
-    EXPECT_THAT(run("readelf --sections --wide " + library).output, Not(HasSubstr(".symtab")));
+    EXPECT_THAT(run("readelf --sections --wide " + quoted(library)).output,
+                Not(HasSubstr(".symtab")));
 }
 
 // --- Android.bp -------------------------------------------------------------------
@@ -158,25 +161,57 @@ std::vector<std::string> property(const std::string &name)
     return all_matches(value[1], "\"([^\"]*)\"");
 }
 
-// How CMake compiles the library, a unit a command.
-std::vector<std::string> compile_commands()
+// A command's words, as the shell takes them.
+Words words_of(const std::string &command)
 {
-    return all_matches(text_of(QUILLMARK_BINARY_DIR "/compile_commands.json"),
-                       "\"command\": \"([^\n]*CMakeFiles/quillmark\\.dir/[^\n]*)\"");
+    const Outcome listing = run("printf '%s\\n' " + command);
+    EXPECT_EQ(listing.status, 0) << listing.output;
+    Words words;
+    std::istringstream lines(listing.output);
+    for (std::string word; std::getline(lines, word);) {
+        words.push_back(word);
+    }
+    return words;
+}
+
+// How CMake compiles the library: for each unit, the words of its command.
+std::vector<Words> compile_commands()
+{
+    std::vector<Words> commands;
+    const auto all = nlohmann::json::parse(text_of(QUILLMARK_BINARY_DIR "/compile_commands.json"));
+    for (const auto &unit : all) {
+        const std::string command = unit.at("command");
+        if (command.find(" -o CMakeFiles/quillmark.dir/") != std::string::npos) {
+            commands.push_back(words_of(command));
+        }
+    }
+    return commands;
+}
+
+// The ends of the words that begin so.
+Words words_after(const std::string &beginning, const Words &words)
+{
+    Words ends;
+    for (const std::string &word : words) {
+        if (word.starts_with(beginning)) {
+            ends.push_back(word.substr(beginning.size()));
+        }
+    }
+    return ends;
 }
 
 TEST(AndroidBlueprint, IsFormattedAsAndroidsOwn)
 {
-    const Outcome formatted = run("bpfmt -d " + kBlueprint);
+    const Outcome formatted = run("bpfmt -d " + quoted(kBlueprint));
     EXPECT_EQ(formatted.status, 0);
     EXPECT_EQ(formatted.output, "");
 }
 
 TEST(AndroidBlueprint, CompilesWhatCMakeDoes)
 {
-    std::vector<std::string> sources;
-    for (const std::string &command : compile_commands()) {
-        sources.push_back(all_matches(command, " -c " + kSource + "/([^ ]+)").at(0));
+    Words sources;
+    for (const Words &command : compile_commands()) {
+        sources.push_back(words_after(kSource + "/", command).at(0));
     }
     EXPECT_THAT(sources, Not(SizeIs(0)));
     EXPECT_THAT(property("srcs"), UnorderedElementsAreArray(sources));
@@ -187,21 +222,24 @@ TEST(AndroidBlueprint, CompilesAsCMakeDoes)
     // Android's build says these itself, or they are GCC's alone
     const std::set<std::string> others = {"-fPIC",
                                           "-ffile-prefix-map=" + kSource + "/=", "-Wno-restrict"};
-    const std::vector<std::string> commands = compile_commands();
+    const std::vector<Words> commands = compile_commands();
     ASSERT_THAT(commands, Not(SizeIs(0)));
-    std::vector<std::string> flags = all_matches(commands[0], " (-[fW][^ ]*)");
-    std::erase_if(flags, [&others](const auto &flag) { return others.contains(flag); });
+    Words flags = commands[0];
+    std::erase_if(flags, [&others](const auto &word) {
+        const bool flag = word.starts_with("-f") || word.starts_with("-W");
+        return !flag || others.contains(word);
+    });
     flags.emplace_back("-Os");
     EXPECT_THAT(property("cflags"), UnorderedElementsAreArray(flags));
 
-    EXPECT_THAT(property("cpp_std"), ElementsAreArray(all_matches(commands[0], " -std=([^ ]*)")));
+    EXPECT_THAT(property("cpp_std"), ElementsAreArray(words_after("-std=", commands[0])));
     EXPECT_THAT(property("stl"), ElementsAreArray({"none"}));
     std::vector<std::string> directories = property("local_include_dirs");
     for (const std::string &exported : property("export_include_dirs")) {
         directories.push_back(exported);
     }
     EXPECT_THAT(directories,
-                UnorderedElementsAreArray(all_matches(commands[0], " -I" + kSource + "/([^ ]*)")));
+                UnorderedElementsAreArray(words_after("-I" + kSource + "/", commands[0])));
 }
 
 TEST(AndroidBlueprint, LinksWhatTheLibraryNeeds)

@@ -29,9 +29,9 @@ TEST_P(BareLibc, IsAllThatTheModuleIsCompiledAndLinkedWith)
     const Directory directory;
     const std::string machine = run("uname -m | tr -d '\\n'").output + "-linux-musl";
 
-    const Outcome made =
-        run(kTools + "bare-libc " + directory.path() + " /usr/include/" + machine + " /usr/lib/" +
-            machine + "/libc.so " MINIXML_HEADER " ld " + GetParam());
+    const Outcome made = run(quoted(kTools + "bare-libc") + " " + quoted(directory.path()) +
+                             " /usr/include/" + machine + " /usr/lib/" + machine + "/libc.so " +
+                             quoted(MINIXML_HEADER) + " ld " + GetParam());
     EXPECT_EQ(made.status, 0) << made.output;
 }
 
@@ -62,7 +62,7 @@ std::set<std::string> libc_names()
 TEST(ShippedLibrary, AsksNothingElseOfItsCLibrary)
 {
     const std::set<std::string> shared = libc_names();
-    const Outcome listing = run("nm --dynamic --undefined-only " QUILLMARK_LIBRARY);
+    const Outcome listing = run("nm --dynamic --undefined-only " + quoted(QUILLMARK_LIBRARY));
     ASSERT_EQ(listing.status, 0) << listing.output;
     std::istringstream lines(listing.output);
     int asked = 0;

@@ -63,7 +63,8 @@ TEST_P(ModuleSource, CompilesWithoutAWarning)
             run(compiler + " -std=c++20 " + options +
                 " -Wall -Wextra -Wpedantic -Wconversion -Wshadow -Werror -fPIC -fno-exceptions"
                 " -fno-rtti -I" +
-                kSource + "/vorlane -c -o /dev/null " + kSource + "/src/quillmark.cpp");
+                quoted(kSource + "/vorlane") + " -c -o /dev/null " +
+                quoted(kSource + "/src/quillmark.cpp"));
         EXPECT_EQ(compiled.status, 0) << compiler << " " << options << "\n" << compiled.output;
     }
 }
@@ -114,11 +115,19 @@ TEST(PublicHeader, IsUsableByItselfFromC11AndCpp)
                                                           {"g++ -std=c++11", "use.cpp"},
                                                           {"clang++ -std=c++20", "use.cpp"}};
     for (const auto &[compiler, name] : ways) {
-        const Outcome compiled =
-            run(std::string(compiler) + " -Wall -Wextra -Wpedantic -Werror -I" + kSource +
-                "/src -c -o /dev/null " + directory.write(name, text));
+        const Outcome compiled = run(
+            std::string(compiler) + " -Wall -Wextra -Wpedantic -Werror -I" +
+            quoted(kSource + "/src") + " -c -o /dev/null " + quoted(directory.write(name, text)));
         EXPECT_EQ(compiled.status, 0) << compiler << "\n" << compiled.output;
     }
+}
+
+// --- the tests themselves ---------------------------------------------------
+
+TEST(Quoted, IsOneWordOfTheShell)
+{
+    const std::string text = "a  b'c''\"$HOME;*\\";
+    EXPECT_EQ(run("printf '<%s>' " + quoted(text) + " " + quoted("")).output, "<" + text + "><>");
 }
 
 // --- Mini-XML's version ---------------------------------------------------
@@ -131,11 +140,12 @@ Outcome configure_with(const Directory &directory, const std::string &major,
     directory.write("libmxml.so", "");
     directory.write("CMakeLists.txt", "cmake_minimum_required(VERSION 3.25)\n"
                                       "project(version NONE)\n"
-                                      "include(" +
-                                          kSource + "/cmake/MiniXml.cmake)\n");
+                                      "include(\"" +
+                                          kSource + "/cmake/MiniXml.cmake\")\n");
     const std::string place = directory.path();
-    return run("cmake -S " + place + " -B " + place + "/build -DMINIXML_INCLUDE_DIR=" + place +
-               " -DMINIXML_LIBRARY=" + place + "/libmxml.so");
+    return run("cmake -S " + quoted(place) + " -B " + quoted(place + "/build") +
+               " -DMINIXML_INCLUDE_DIR=" + quoted(place) +
+               " -DMINIXML_LIBRARY=" + quoted(place + "/libmxml.so"));
 }
 
 TEST(MiniXmlVersion, From2Point7To3IsTaken)

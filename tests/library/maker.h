@@ -32,8 +32,9 @@ inline void make_library(const Directory &directory, const std::string &name,
 {
     const std::string source = directory.write(name + ".c", text);
     const std::string file = "lib" + name + ".so";
-    const Outcome made = run("cc -shared -fPIC -I" + kSource + "/vorlane -Wl,-soname," + file +
-                             " -o " + directory.path() + "/" + file + " " + source);
+    const Outcome made =
+        run("cc -shared -fPIC -I" + quoted(kSource + "/vorlane") + " -Wl,-soname," + file + " -o " +
+            quoted(directory.path() + "/" + file) + " " + quoted(source));
     ASSERT_EQ(made.status, 0) << made.output;
 }
 

@@ -28,21 +28,23 @@ TEST(MakersLibraries, AreLinkedAndThoseForLinuxAreNotBuilt)
     const std::string build = place + "/build";
 
     const Outcome configured =
-        run("cmake -S " + kSource + " -B " + build +
-            " -DQUILLMARK_BUILD_TOOLS=OFF '-DVORLANE_LIBRARIES=" + libraries + "'");
+        run("cmake -S " + quoted(kSource) + " -B " + quoted(build) +
+            " -DQUILLMARK_BUILD_TOOLS=OFF -DVORLANE_LIBRARIES=" + quoted(libraries));
     ASSERT_EQ(configured.status, 0) << configured.output;
-    const Outcome built = run("cmake --build " + build);
+    const Outcome built = run("cmake --build " + quoted(build));
     ASSERT_EQ(built.status, 0) << built.output;
 
     EXPECT_THAT(
         needs_of(build + "/libquillmark.so"),
         UnorderedElementsAre("libmxml.so.1]", "libmaker.so]", "libmakerlog.so]", "libc.so.6]"));
-    EXPECT_THAT(run("find " + build + " -name '*vorlane*'").output, IsEmpty());
+    EXPECT_THAT(run("find " + quoted(build) + " -name '*vorlane*'").output, IsEmpty());
 
-    const Outcome installed = run("cmake --install " + build + " --prefix " + place + "/prefix");
+    const Outcome installed =
+        run("cmake --install " + quoted(build) + " --prefix " + quoted(place + "/prefix"));
     ASSERT_EQ(installed.status, 0) << installed.output;
-    EXPECT_THAT(run("find " + place + "/prefix -name 'lib*' -type f -printf '%f '").output,
-                MatchesRegex("libquillmark\\.so\\.[0-9.]+ "));
+    EXPECT_THAT(
+        run("find " + quoted(place + "/prefix") + " -name 'lib*' -type f -printf '%f '").output,
+        MatchesRegex("libquillmark\\.so\\.[0-9.]+ "));
     EXPECT_THAT(entries_of(place + "/prefix/lib/libquillmark.so", "RUNPATH"), IsEmpty());
 }
 
@@ -51,10 +53,10 @@ std::string said_of(const Directory &directory, const std::string &options)
 {
     directory.write("CMakeLists.txt", "cmake_minimum_required(VERSION 3.25)\n"
                                       "project(makers NONE)\n"
-                                      "include(" +
-                                          kSource + "/cmake/Vorlane.cmake)\n");
-    const Outcome outcome =
-        run("cmake -S " + directory.path() + " -B " + directory.path() + "/build " + options);
+                                      "include(\"" +
+                                          kSource + "/cmake/Vorlane.cmake\")\n");
+    const Outcome outcome = run("cmake -S " + quoted(directory.path()) + " -B " +
+                                quoted(directory.path() + "/build") + " " + options);
     EXPECT_NE(outcome.status, 0) << options;
     return std::regex_replace(outcome.output, std::regex("\\s+"), " ");
 }
@@ -63,10 +65,10 @@ TEST(MakersLibraries, FileThatIsMissingIsNamed)
 {
     const Directory directory;
     const std::string there = directory.write("libone.so", "");
-    const std::string headers = " -DVORLANE_INCLUDE_DIR=" + kSource + "/vorlane";
+    const std::string headers = " -DVORLANE_INCLUDE_DIR=" + quoted(kSource + "/vorlane");
 
     EXPECT_THAT(
-        said_of(directory, "'-DVORLANE_LIBRARIES=" + there + ";/absent/libtwo.so'" + headers),
+        said_of(directory, "-DVORLANE_LIBRARIES=" + quoted(there + ";/absent/libtwo.so") + headers),
         HasSubstr("VORLANE_LIBRARIES names a file that is not there: /absent/libtwo.so"));
 }
 
@@ -78,7 +80,7 @@ TEST(MakersLibraries, DirectoryWithoutTheirHeadersIsNamed)
         directory.write(header, "");
     }
 
-    EXPECT_THAT(said_of(directory, "-DVORLANE_INCLUDE_DIR=" + place),
+    EXPECT_THAT(said_of(directory, "-DVORLANE_INCLUDE_DIR=" + quoted(place)),
                 HasSubstr("VORLANE_INCLUDE_DIR has no vr_log.h: " + place));
 }
 
@@ -87,9 +89,10 @@ TEST(MakersLibraries, TestsAreRefusedWithThem)
     const Directory directory;
     const std::string there = directory.write("libone.so", "");
 
-    EXPECT_THAT(said_of(directory, "-DQUILLMARK_BUILD_TESTS=ON -DVORLANE_LIBRARIES=" + there +
-                                       " -DVORLANE_INCLUDE_DIR=" + kSource + "/vorlane"),
-                HasSubstr("set QUILLMARK_BUILD_TESTS to OFF, or VORLANE_LIBRARIES to nothing"));
+    EXPECT_THAT(
+        said_of(directory, "-DQUILLMARK_BUILD_TESTS=ON -DVORLANE_LIBRARIES=" + quoted(there) +
+                               " -DVORLANE_INCLUDE_DIR=" + quoted(kSource + "/vorlane")),
+        HasSubstr("set QUILLMARK_BUILD_TESTS to OFF, or VORLANE_LIBRARIES to nothing"));
 }
 
 } // namespace

@@ -4,6 +4,8 @@
 // Programs run, their output, and what they say of a library.
 #pragma once
 
+#include "../quoted.h"
+
 #include <gtest/gtest.h>
 
 #include <array>
@@ -55,7 +57,7 @@ inline Words last_words(const std::string &text, const std::string &pattern)
 
 inline Words exports_of(const std::string &library)
 {
-    const Outcome listing = run("nm --dynamic --defined-only " + library);
+    const Outcome listing = run("nm --dynamic --defined-only " + quoted(library));
     EXPECT_EQ(listing.status, 0) << listing.output;
     return last_words(listing.output, ".");
 }
@@ -63,7 +65,7 @@ inline Words exports_of(const std::string &library)
 // The entries of that kind of a library's dynamic section.
 inline Words entries_of(const std::string &library, const std::string &kind)
 {
-    const Outcome listing = run("readelf --dynamic --wide " + library);
+    const Outcome listing = run("readelf --dynamic --wide " + quoted(library));
     EXPECT_EQ(listing.status, 0) << listing.output;
     return last_words(listing.output, "\\(" + kind + "\\)");
 }

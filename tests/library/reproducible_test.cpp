@@ -33,9 +33,9 @@ void build(const fs::path &place, const std::string &surroundings, const std::st
 {
     copy_sources(place);
     const std::string build = place / "build";
-    const Outcome built = run(surroundings + " && cmake -S '" + place.string() + "' -B '" + build +
-                              "' -DQUILLMARK_BUILD_TOOLS=OFF " + options + " && cmake --build '" +
-                              build + "' --target quillmark vorlane");
+    const Outcome built = run(surroundings + " && cmake -S " + quoted(place) + " -B " +
+                              quoted(build) + " -DQUILLMARK_BUILD_TOOLS=OFF " + options +
+                              " && cmake --build " + quoted(build) + " --target quillmark vorlane");
     ASSERT_EQ(built.status, 0) << built.output;
 }
 
