@@ -26,6 +26,7 @@ namespace
 
 using ::testing::Contains;
 using ::testing::Each;
+using ::testing::ElementsAre;
 using ::testing::ElementsAreArray;
 using ::testing::HasSubstr;
 using ::testing::Not;
@@ -88,8 +89,8 @@ TEST(AndroidPresets, MakeASmallLibraryFor16KilobytePagesWithTheMakersOwn)
     }
     const Directory ndk;
     const std::string place = ndk.path();
-    ndk.write(kToolchain, "set(CMAKE_SYSTEM_NAME Linux)\n"
-                          "set(ANDROID TRUE)\n"
+    ndk.write(kToolchain, "set(CMAKE_SYSTEM_NAME Android)\n"
+                          "set(CMAKE_SYSTEM_VERSION 1)\n"
                           "set(CMAKE_C_COMPILER clang)\n"
                           "set(CMAKE_CXX_COMPILER clang++)\n"
                           "set(CMAKE_C_COMPILER_TARGET x86_64-linux-android28)\n"
@@ -115,6 +116,8 @@ TEST(AndroidPresets, MakeASmallLibraryFor16KilobytePagesWithTheMakersOwn)
     ASSERT_EQ(built.status, 0) << built.output;
 
     const std::string library = place + "/built/libquillmark.so";
+    EXPECT_FALSE(std::filesystem::is_symlink(library)) << "Android knows no versions of libraries";
+    EXPECT_THAT(entries_of(library, "SONAME"), ElementsAre("libquillmark.so]"));
     const Words needs = needs_of(library);
     EXPECT_THAT(needs, Contains("libmaker.so]"));
     EXPECT_THAT(needs, Not(Contains(HasSubstr("c++"))));
