@@ -62,13 +62,23 @@ TEST(AndroidPresets, AskTheNdkForAnArchitectureAndNoCppRuntime)
 TEST(AndroidPresets, NdkThatIsMissingIsAskedFor)
 {
     const Directory directory;
-    for (const std::string &ndk : {std::string(), directory.path() + "/none"}) {
+    // it leads there from the tree's root, where CMake is started
+    const std::string relative =
+        std::filesystem::path(directory.path()).lexically_relative(kSource);
+    directory.write(kToolchain, "message(FATAL_ERROR \"read\")\n");
+
+    const std::string none = directory.path() + "/none";
+    const std::pair<std::string, std::string> complaints[] = {
+        {"", "names no NDK: ''"},
+        {none, "names no NDK: '" + none + "'"},
+        {relative, "is not an absolute path: '" + relative + "'"}};
+    for (const auto &[ndk, complaint] : complaints) {
         const Outcome outcome =
             configure("android-arm64", ndk, "-B " + quoted(directory.path() + "/build"));
 
         EXPECT_NE(outcome.status, 0);
-        EXPECT_THAT(outcome.output, HasSubstr("ANDROID_NDK_ROOT names no NDK: '" + ndk +
-                                              "'; set it to the directory that holds "
+        EXPECT_THAT(outcome.output, HasSubstr("ANDROID_NDK_ROOT " + complaint +
+                                              "; set it to the directory that holds "
                                               "build/cmake/android.toolchain.cmake"));
     }
 }
