@@ -323,4 +323,11 @@ TEST_F(Install, AddSubdirectoryBuildsTheLibraryAloneAndInstallsNothingOfIt)
     EXPECT_THAT(files_below(install(build)), ElementsAreArray({"bin/agent"}));
 }
 
+TEST_F(Install, AddSubdirectoryFindsTheTestsToo)
+{
+    output_of(configure("subdirectory", "-DQUILLMARK_TREE=" + quoted(kSource) +
+                                            " -DQUILLMARK_BUILD_TOOLS=ON"
+                                            " -DQUILLMARK_BUILD_TESTS=ON"));
+}
+
 } // namespace
