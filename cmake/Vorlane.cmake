@@ -10,7 +10,8 @@
 set(VORLANE_LIBRARIES "" CACHE FILEPATH "The maker's libraries; empty builds those for Linux")
 set(VORLANE_INCLUDE_DIR "${PROJECT_SOURCE_DIR}/vorlane" CACHE PATH "The maker's headers")
 
-foreach(header mxml_whitespace.h sockwrap.h sysparm.h vr_log.h)
+set(VORLANE_HEADERS mxml_whitespace.h sockwrap.h sysparm.h vr_log.h)
+foreach(header ${VORLANE_HEADERS})
   if(NOT EXISTS "${VORLANE_INCLUDE_DIR}/${header}")
     message(FATAL_ERROR "VORLANE_INCLUDE_DIR has no ${header}: ${VORLANE_INCLUDE_DIR}")
   endif()
@@ -18,8 +19,9 @@ endforeach()
 
 if(VORLANE_LIBRARIES)
   foreach(library IN LISTS VORLANE_LIBRARIES)
-    if(NOT EXISTS "${library}" OR IS_DIRECTORY "${library}")
-      message(FATAL_ERROR "VORLANE_LIBRARIES names a file that is not there: ${library}")
+    if(NOT IS_ABSOLUTE "${library}" OR NOT EXISTS "${library}" OR IS_DIRECTORY "${library}")
+      message(FATAL_ERROR "VORLANE_LIBRARIES names no file by its whole path: ${library}; "
+        "several are separated by ';'")
     endif()
   endforeach()
   if(QUILLMARK_BUILD_TESTS)
@@ -43,5 +45,7 @@ add_library(vorlane SHARED
   vorlane/linux/vr_log.cpp)
 target_include_directories(vorlane PUBLIC "$<BUILD_INTERFACE:${VORLANE_INCLUDE_DIR}>")
 target_link_libraries(vorlane PRIVATE MiniXml::MiniXml quillmark_warnings quillmark_plain)
+# a log beyond 2 GB, on 32-bit devices as well
+target_compile_definitions(vorlane PRIVATE _FILE_OFFSET_BITS=64)
 set_target_properties(vorlane PROPERTIES LINKER_LANGUAGE C)
 add_library(Vorlane::Vorlane ALIAS vorlane)

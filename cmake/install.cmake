@@ -17,8 +17,8 @@ install(TARGETS quillmark EXPORT quillmark
     NAMELINK_COMPONENT development)
 
 if(TARGET vorlane)
-  # In a directory that only the library looks into, so that it stands in nobody's
-  # way: the maker's has the same name.
+  # Not beside the library, so that it stands in nobody's way: the maker's has the
+  # same name.
   set(vorlane_directory ${CMAKE_INSTALL_LIBDIR}/quillmark)
   if(ANDROID)
     set(vorlane_directory ${CMAKE_INSTALL_LIBDIR})
@@ -36,9 +36,10 @@ endif()
 target_include_directories(quillmark INTERFACE $<INSTALL_INTERFACE:${CMAKE_INSTALL_INCLUDEDIR}>)
 install(FILES ${PROJECT_SOURCE_DIR}/src/quillmark.h
   DESTINATION ${CMAKE_INSTALL_INCLUDEDIR} COMPONENT development)
-install(DIRECTORY ${PROJECT_SOURCE_DIR}/vorlane/
-  DESTINATION ${CMAKE_INSTALL_INCLUDEDIR}/vorlane COMPONENT development
-  FILES_MATCHING PATTERN *.h PATTERN linux EXCLUDE)
+foreach(header ${VORLANE_HEADERS})
+  install(FILES ${VORLANE_INCLUDE_DIR}/${header}
+    DESTINATION ${CMAKE_INSTALL_INCLUDEDIR}/vorlane COMPONENT development)
+endforeach()
 
 set(cmake_directory ${CMAKE_INSTALL_LIBDIR}/cmake/quillmark)
 set(generated ${PROJECT_BINARY_DIR}/install)
@@ -67,6 +68,13 @@ if(NOT IS_ABSOLUTE "${CMAKE_INSTALL_LIBDIR}")
 endif()
 if(NOT IS_ABSOLUTE "${CMAKE_INSTALL_INCLUDEDIR}")
   set(pc_includedir "\${prefix}/${CMAKE_INSTALL_INCLUDEDIR}")
+endif()
+# Mini-XML's own description goes with a Mini-XML that compilers find by themselves
+set(pc_mxml "Requires.private: mxml >= 2.7, mxml < 4")
+set(pc_mxml_flags "")
+if(NOT MINIXML_INCLUDE_DIR IN_LIST CMAKE_CXX_IMPLICIT_INCLUDE_DIRECTORIES)
+  set(pc_mxml "Libs.private: \"${MINIXML_LIBRARY}\"")
+  set(pc_mxml_flags " \"-I${MINIXML_INCLUDE_DIR}\"")
 endif()
 configure_file(cmake/quillmark.pc.in ${generated}/quillmark.pc @ONLY)
 install(FILES ${generated}/quillmark.pc

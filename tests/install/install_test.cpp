@@ -323,6 +323,35 @@ TEST_F(Install, AddSubdirectoryBuildsTheLibraryAloneAndInstallsNothingOfIt)
     EXPECT_THAT(files_below(install(build)), ElementsAreArray({"bin/agent"}));
 }
 
+TEST_F(Install, AddSubdirectoryMayInstallItForOthers)
+{
+    const std::string build =
+        consumer("subdirectory", "-DQUILLMARK_TREE=" + quoted(kSource) + " -DQUILLMARK_INSTALL=ON");
+    EXPECT_FALSE(fs::exists(build + "/compile_commands.json"));
+    const std::string prefix = install(build);
+    expect_agent_works(consumer("find_package", "-DCMAKE_PREFIX_PATH=" + quoted(prefix)) +
+                       "/agent");
+}
+
+TEST_F(Install, PkgConfigNamesTheMiniXmlThatWasNamed)
+{
+    fs::create_directory(work("mini"));
+    fs::copy(MINIXML_HEADER, work("mini"));
+    fs::create_symlink(MINIXML_LIBRARY, work("mini/libmine.so"));
+    output_of(kCMake + " -S " + quoted(kSource) + " -B " + quoted(work("plain")) +
+              " -DQUILLMARK_BUILD_TOOLS=OFF -DMINIXML_INCLUDE_DIR=" + quoted(work("mini")) +
+              " -DMINIXML_LIBRARY=" + quoted(work("mini/libmine.so")));
+    output_of(kCMake + " --build " + quoted(work("plain")));
+    const std::string prefix = install(work("plain"));
+
+    // which knows no Mini-XML of the machine's
+    const std::string said =
+        output_of("PKG_CONFIG_LIBDIR=" + quoted(prefix + "/" INSTALL_LIBDIR "/pkgconfig") +
+                  " pkg-config --cflags --libs --static quillmark");
+    EXPECT_THAT(said, HasSubstr("/mini"));
+    EXPECT_THAT(said, HasSubstr("libmine.so"));
+}
+
 TEST_F(Install, AddSubdirectoryFindsTheTestsToo)
 {
     output_of(configure("subdirectory", "-DQUILLMARK_TREE=" + quoted(kSource) +

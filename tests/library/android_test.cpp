@@ -247,6 +247,7 @@ TEST(AndroidBlueprint, CompilesAsCMakeDoes)
 
     EXPECT_THAT(property("cpp_std"), ElementsAreArray(words_after("-std=", commands[0])));
     EXPECT_THAT(property("stl"), ElementsAreArray({"none"}));
+    EXPECT_THAT(property("export_include_dirs"), ElementsAreArray({"src"}));
     std::vector<std::string> directories = property("local_include_dirs");
     for (const std::string &exported : property("export_include_dirs")) {
         directories.push_back(exported);
@@ -265,6 +266,7 @@ TEST(AndroidBlueprint, LinksWhatTheLibraryNeeds)
         }
     }
     EXPECT_THAT(property("shared_libs"), UnorderedElementsAreArray(needed));
+    EXPECT_THAT(property("export_shared_lib_headers"), ElementsAreArray({"libmxml"}));
 }
 
 } // namespace

@@ -20,32 +20,82 @@ using ::testing::IsEmpty;
 using ::testing::MatchesRegex;
 using ::testing::UnorderedElementsAre;
 
+void expect_success(const std::string &command)
+{
+    const Outcome outcome = run(command);
+    ASSERT_EQ(outcome.status, 0) << command << "\n" << outcome.output;
+}
+
+// Builds the library with the maker's ones, and installs it in prefix.
+void build_and_install(const std::string &place, const std::string &options)
+{
+    const std::string build = quoted(place + "/build");
+    expect_success("cmake -S " + quoted(kSource) + " -B " + build +
+                   " -DQUILLMARK_BUILD_TOOLS=OFF " + options + " && cmake --build " + build +
+                   " && cmake --install " + build + " --prefix " + quoted(place + "/prefix"));
+}
+
 TEST(MakersLibraries, AreLinkedAndThoseForLinuxAreNotBuilt)
 {
     const Directory directory;
     const std::string libraries = make_makers_libraries(directory);
     const std::string place = directory.path();
     const std::string build = place + "/build";
-
-    const Outcome configured =
-        run("cmake -S " + quoted(kSource) + " -B " + quoted(build) +
-            " -DQUILLMARK_BUILD_TOOLS=OFF -DVORLANE_LIBRARIES=" + quoted(libraries));
-    ASSERT_EQ(configured.status, 0) << configured.output;
-    const Outcome built = run("cmake --build " + quoted(build));
-    ASSERT_EQ(built.status, 0) << built.output;
+    build_and_install(place, "-DVORLANE_LIBRARIES=" + quoted(libraries));
 
     EXPECT_THAT(
         needs_of(build + "/libquillmark.so"),
         UnorderedElementsAre("libmxml.so.1]", "libmaker.so]", "libmakerlog.so]", "libc.so.6]"));
     EXPECT_THAT(run("find " + quoted(build) + " -name '*vorlane*'").output, IsEmpty());
 
-    const Outcome installed =
-        run("cmake --install " + quoted(build) + " --prefix " + quoted(place + "/prefix"));
-    ASSERT_EQ(installed.status, 0) << installed.output;
     EXPECT_THAT(
         run("find " + quoted(place + "/prefix") + " -name 'lib*' -type f -printf '%f '").output,
         MatchesRegex("libquillmark\\.so\\.[0-9.]+ "));
     EXPECT_THAT(entries_of(place + "/prefix/lib/libquillmark.so", "RUNPATH"), IsEmpty());
+
+    // as the README says that agents are linked with it
+    const std::string prefix = place + "/prefix";
+    expect_success("cc " + quoted(kSource + "/tests/install/consumer/ping.c") + " -o " +
+                   quoted(place + "/ping") + " -I " + quoted(prefix + "/include") + " -L " +
+                   quoted(prefix + "/lib") + " -lquillmark -Wl,-rpath-link," + quoted(place));
+    EXPECT_EQ(
+        run("LD_LIBRARY_PATH=" + quoted(prefix + "/lib:" + place) + " " + quoted(place + "/ping"))
+            .output,
+        "Ping Success!\n");
+}
+
+TEST(MakersLibraries, OfArchivesNothingIsExported)
+{
+    const Directory directory;
+    const std::string place = directory.path();
+    make_makers_libraries(directory);
+    for (const char *name : {"maker", "makerlog"}) {
+        expect_success("cd " + quoted(place) + " && cc -c -fPIC -I " +
+                       quoted(kSource + "/vorlane") + " " + name + ".c && ar rc libmaker.a " +
+                       name + ".o");
+    }
+    build_and_install(place, "-DVORLANE_LIBRARIES=" + quoted(place + "/libmaker.a") +
+                                 " -DMINIXML_LIBRARY=" + quoted(MINIXML_ARCHIVE));
+
+    EXPECT_THAT(exports_of(place + "/prefix/lib/libquillmark.so"),
+                UnorderedElementsAre("FPTEST_RunTestCmd", "FPTEST_SetTransation",
+                                     "FPTEST_ExtractResultMsg", "FPTEST_SuspendItemExecute",
+                                     "g_TestCmdTree"));
+    EXPECT_THAT(needs_of(place + "/prefix/lib/libquillmark.so"),
+                UnorderedElementsAre("libc.so.6]"));
+}
+
+TEST(MakersHeaders, AreInstalledWhereTheyAreNamed)
+{
+    const Directory directory;
+    const std::string place = directory.path();
+    expect_success("mkdir " + quoted(place + "/own") + " && cp " + quoted(kSource + "/vorlane") +
+                   "/*.h " + quoted(place + "/own") + " && echo '/* mine */' >>" +
+                   quoted(place + "/own/vr_log.h"));
+    build_and_install(place, "-DVORLANE_INCLUDE_DIR=" + quoted(place + "/own"));
+
+    EXPECT_THAT(run("cat " + quoted(place + "/prefix/include/vorlane/vr_log.h")).output,
+                HasSubstr("/* mine */"));
 }
 
 // What the configuration says of them, in one line.
@@ -61,15 +111,18 @@ std::string said_of(const Directory &directory, const std::string &options)
     return std::regex_replace(outcome.output, std::regex("\\s+"), " ");
 }
 
-TEST(MakersLibraries, FileThatIsMissingIsNamed)
+TEST(MakersLibraries, WhatIsNoFileIsNamed)
 {
     const Directory directory;
     const std::string there = directory.write("libone.so", "");
     const std::string headers = " -DVORLANE_INCLUDE_DIR=" + quoted(kSource + "/vorlane");
 
-    EXPECT_THAT(
-        said_of(directory, "-DVORLANE_LIBRARIES=" + quoted(there + ";/absent/libtwo.so") + headers),
-        HasSubstr("VORLANE_LIBRARIES names a file that is not there: /absent/libtwo.so"));
+    for (const std::string &other : {std::string("/absent/libtwo.so"), directory.path()}) {
+        EXPECT_THAT(
+            said_of(directory, "-DVORLANE_LIBRARIES=" + quoted(there + ";" + other) + headers),
+            HasSubstr("VORLANE_LIBRARIES names no file by its whole path: " + other +
+                      "; several are separated by ';'"));
+    }
 }
 
 TEST(MakersLibraries, DirectoryWithoutTheirHeadersIsNamed)
