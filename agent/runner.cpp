@@ -325,7 +325,7 @@ void Runner::finish(Active &active, Clock::time_point end)
     judge(active);
 }
 
-void Runner::judge(Active &active)
+void Runner::judge(const Active &active)
 {
     ItemRun &result = item(active.place);
     const Report &report = result.report;

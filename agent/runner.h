@@ -113,7 +113,7 @@ class Runner
     void press_stop(Active &active, bool command_runs);
     void cannot_stop(Active &active);
     void finish(Active &active, Clock::time_point end = Clock::now());
-    void judge(Active &active);
+    void judge(const Active &active);
     std::string why_silent(const Active &active);
     void tell_ended();
     void tick();
