@@ -23,6 +23,8 @@ struct RunOptions {
     bool tap = false;
     bool quiet = false;
     std::optional<double> timeout; // seconds for each item
+    double grace = 2;              // seconds that a stopped item has to end
+    bool exit_status = false;      // one that is not 0 fails its item
     int repeat = 1;
     int pass_code = 0;
     std::string junit; // files; empty for none

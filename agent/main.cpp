@@ -209,6 +209,13 @@ class CommandLine
         command->add_option("--timeout", run_.timeout, "stop an item that takes longer")
             ->type_name("SECONDS")
             ->check(range(0.001, 1000000.0));
+        command->add_option("--grace", run_.grace, "then kill it after so long")
+            ->type_name("SECONDS")
+            ->capture_default_str()
+            ->check(range(0.0, 1000000.0));
+        command->add_flag("--exit-status", run_.exit_status,
+                          "an item that ends with a status other than\n"
+                          "0 has failed");
         command->add_option("--repeat", run_.repeat, "run everything N times")
             ->type_name("N")
             ->check(range(1, 1000000));

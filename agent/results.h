@@ -9,6 +9,7 @@
 #include <cstddef>
 #include <optional>
 #include <string>
+#include <sys/types.h>
 #include <vector>
 
 namespace fptest
@@ -34,6 +35,12 @@ enum class Outcome {
     stopped,   // it was stopped because the run was
 };
 
+// A process that an item has left running at its end.
+struct Leftover {
+    std::string name; // of its program, without the path
+    pid_t process = 0;
+};
+
 // One item of a run.
 struct ItemRun {
     std::string group; // as the test plan names it
@@ -44,6 +51,13 @@ struct ItemRun {
     std::optional<std::chrono::system_clock::time_point> start;
     std::optional<double> seconds; // how long it ran, once it has ended
     std::string output;            // what it printed: the end of it, where that is long
+    double running = 0;            // seconds so far, while it runs; a paused run does not count
+    bool stopping = false;         // it runs, and is being stopped
+    // How its process ended: at most one of both, none of the gatherer's and of what
+    // was not started.
+    std::optional<int> exit_status = std::nullopt;
+    int signal = 0;
+    std::vector<Leftover> left_running = {};
 };
 
 // Items that are run in a row and belong to one group.
@@ -107,6 +121,20 @@ class Listener
     virtual void progressed(const Run &run, Place place) = 0;
     virtual void ended(const Run &run, Place place) = 0;
     virtual void finish(const Run &run) = 0;
+
+    // An item that had ended already has reported: that changes no outcome, and the
+    // item keeps the report that it was judged by.
+    virtual void late(const Run & /* run */, Place /* place */, const Report & /* report */)
+    {
+    }
+
+    // The run is suspended (Ctrl-Z), and goes on.
+    virtual void paused(const Run & /* run */)
+    {
+    }
+    virtual void resumed(const Run & /* run */)
+    {
+    }
 
     // Several times a second while the run lasts.
     virtual void tick(const Run & /* run */)

@@ -492,6 +492,8 @@ Exit run_work(const RunOptions &options, Host &host, Signals &signals, Run &run,
     if (options.timeout) {
         limits.item = std::chrono::duration<double>(*options.timeout);
     }
+    limits.grace = std::chrono::duration<double>(options.grace);
+    limits.exit_status = options.exit_status;
     Runner runner(host, signals, run, listeners, limits);
     bool broken = false;
     try {

@@ -54,6 +54,8 @@ class Runner
   public:
     struct Limits {
         std::optional<std::chrono::duration<double>> item; // then it is stopped
+        std::chrono::duration<double> grace{2};            // and after that it is killed
+        bool exit_status = false; // an item whose exit status is not 0 has failed
     };
 
     // All of them outlive the runner.
