@@ -127,13 +127,11 @@ int send_and_wait(Host &host, const std::string &command)
 
 void require_no_leftovers(const std::vector<std::string> &programs)
 {
-    for (const std::string &program : programs) {
-        if (const pid_t process = process_of(program); process != 0) {
-            throw Failure(Exit::environment,
-                          one_line(program) + " of an earlier run is still running, as process " +
-                              std::to_string(process) +
-                              ", and would report into this one: end it first");
-        }
+    if (const auto found = process_of_any(programs)) {
+        throw Failure(Exit::environment, one_line(found->first) +
+                                             " of an earlier run is still running, as process " +
+                                             std::to_string(found->second) +
+                                             ", and would report into this one: end it first");
     }
 }
 

@@ -5,6 +5,7 @@
 
 #include "plan.h"
 
+#include <algorithm>
 #include <charconv>
 #include <csignal>
 #include <cstdlib>
@@ -103,14 +104,16 @@ bool runs_below(pid_t ancestor, const std::vector<std::string> &items)
     return false;
 }
 
-pid_t process_of(const std::string &program)
+std::optional<std::pair<std::string, pid_t>>
+process_of_any(const std::vector<std::string> &programs)
 {
     for (const auto &[pid, process] : read_processes()) {
-        if (process.state != 'Z' && process.program == program) {
-            return pid;
+        if (process.state != 'Z' &&
+            std::ranges::find(programs, process.program) != programs.end()) {
+            return std::pair(process.program, pid);
         }
     }
-    return 0;
+    return std::nullopt;
 }
 
 bool end_below(pid_t ancestor)

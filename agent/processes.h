@@ -4,8 +4,10 @@
 // The processes below another one.
 #pragma once
 
+#include <optional>
 #include <string>
 #include <sys/types.h>
+#include <utility>
 #include <vector>
 
 namespace fptest
@@ -15,8 +17,10 @@ namespace fptest
 // asked for the first characters of it.
 bool runs_below(pid_t ancestor, const std::vector<std::string> &items);
 
-// One that was started as this program, by its whole path; 0 where none runs.
-pid_t process_of(const std::string &program);
+// One that was started as one of these programs, by its whole path. All processes
+// are read once, however many programs there are.
+std::optional<std::pair<std::string, pid_t>>
+process_of_any(const std::vector<std::string> &programs);
 
 // Sends SIGTERM to all of them but the gatherer. False where there are none.
 bool end_below(pid_t ancestor);
