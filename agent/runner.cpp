@@ -241,6 +241,10 @@ void Runner::tick()
     if (!active_.empty()) {
         append_output(item(active_.back().place).output, output);
     }
+    for (const Active &active : active_) {
+        item(active.place).running = Seconds(Clock::now() - active.start).count();
+        item(active.place).stopping = active.stop.has_value();
+    }
     for (Listener *listener : listeners_) {
         listener->tick(run_);
     }
