@@ -63,7 +63,14 @@ Host::Event with_moment(Host::Event::Kind kind, const std::string &text)
 
 } // namespace
 
-Host::Host()
+Host::Host() : output_(make_output())
+{
+    // what outlives the module's process comes to this one, and can be found
+    prctl(PR_SET_CHILD_SUBREAPER, 1);
+    start();
+}
+
+void Host::start()
 {
     std::array<int, 2> control{};
     if (socketpair(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0, control.data()) != 0) {
@@ -71,14 +78,12 @@ Host::Host()
     }
     control_ = Descriptor(control[0]);
     const Descriptor their_control(control[1]);
-    output_ = Descriptor(make_output());
-    // what outlives the module's process comes to this one, and can be found
-    prctl(PR_SET_CHILD_SUBREAPER, 1);
     std::fflush(nullptr);
     pid_ = fork();
     if (pid_ < 0) {
         fail("no process for the module");
     }
+    leader_ = pid_;
     if (pid_ == 0) {
         close(control_.get());
         serve_module(their_control.get(), output_.get());
@@ -110,9 +115,47 @@ void Host::stop(const std::string &item)
     send_message(control_.get(), {MessageKind::stop, item});
 }
 
-bool Host::end_items()
+void Host::hold_at_ends()
 {
-    return end_below(pid_ > 0 ? pid_ : getpid());
+    holds_ = true;
+    send_message(control_.get(), {MessageKind::hold, ""});
+}
+
+void Host::go_on()
+{
+    send_message(control_.get(), {MessageKind::go_on, ""});
+}
+
+ModuleProcesses Host::processes() const
+{
+    return {leader_, pid_ > 0 ? pid_ : getpid()};
+}
+
+void Host::restart()
+{
+    if (pid_ < 0) {
+        start();
+        if (holds_) {
+            hold_at_ends();
+        }
+    }
+}
+
+// The module first, or it would start another item meanwhile.
+void Host::suspend()
+{
+    if (pid_ > 0) {
+        kill(pid_, SIGSTOP);
+    }
+    processes().signal_items(SIGSTOP);
+}
+
+void Host::resume()
+{
+    processes().signal_items(SIGCONT);
+    if (pid_ > 0) {
+        kill(pid_, SIGCONT);
+    }
 }
 
 std::string Host::read_back()
@@ -158,6 +201,13 @@ void Host::read_control()
         event = with_moment(Event::Kind::item, message.text);
         event.value = std::atoi(event.text.c_str());
         break;
+    case MessageKind::ended: {
+        event = with_moment(Event::Kind::ended, message.text);
+        char *end = nullptr;
+        event.value = static_cast<int>(std::strtol(event.text.c_str(), &end, 10));
+        event.left_running = std::strtol(end, nullptr, 10) != 0;
+        break;
+    }
     case MessageKind::returned:
         event = with_moment(Event::Kind::returned, message.text);
         break;

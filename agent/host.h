@@ -8,6 +8,7 @@
 #pragma once
 
 #include "descriptor.h"
+#include "processes.h"
 
 #include <chrono>
 #include <cstddef>
@@ -27,6 +28,7 @@ class Host
     struct Event {
         enum class Kind {
             item,     // the command has come to an item; value is the vendor
+            ended,    // that item's process has ended; value is its wait status
             returned, // the command has returned; text is its reply
             stopped,  // a stop has returned; value is what it returned, or kNothingToStop
             gone,     // the process has ended; text says how
@@ -37,6 +39,7 @@ class Host
         // when it happened, and how much had been printed by then; not of a stop
         std::chrono::steady_clock::time_point time;
         off_t output = 0;
+        bool left_running = false; // of ended: whether there may be processes left
     };
 
     // Throws std::system_error where the process cannot be made.
@@ -57,9 +60,20 @@ class Host
     // stop the first process of the system.
     void stop(const std::string &item);
 
-    // Sends SIGTERM to what runs below the host, the gatherer excepted: for items
-    // that a stop does not find. False where there is nothing.
-    bool end_items();
+    // Holds the module at the end of each item, from here on, until go_on() is called:
+    // what it left can be looked at before anything else starts.
+    void hold_at_ends();
+    void go_on();
+
+    // What runs for the module; also what a module's process that has ended left.
+    ModuleProcesses processes() const;
+
+    // Takes another process for the module in place of one that has ended.
+    void restart();
+
+    // Suspends the module and its items, and lets them go on.
+    void suspend();
+    void resume();
 
     static constexpr int kNothingToStop = -2;
 
@@ -81,15 +95,18 @@ class Host
     void pass_output(std::FILE *stream, off_t end);
 
   private:
+    void start();
     bool has_news(std::chrono::milliseconds longest, int other) const;
     bool has_events() const;
     void read_control();
     void lose();
     off_t output_size() const;
 
-    pid_t pid_ = -1;
+    pid_t pid_ = -1;    // none when it has ended
+    pid_t leader_ = -1; // of the process group that it had
     Descriptor control_{-1};
     Descriptor output_{-1};
+    bool holds_ = false;
     off_t taken_ = 0;
     std::deque<Event> events_;
     std::string plan_;

@@ -557,6 +557,15 @@ std::optional<ClearedPlan> without_reports(const std::string &text,
     return cleared;
 }
 
+std::optional<std::string> mended(const std::string &text)
+{
+    if (Plan::load(text) || !Plan::read(text)) {
+        return std::nullopt;
+    }
+    const std::string cleaned = clean(text);
+    return with_values(cleaned, scan(cleaned));
+}
+
 std::optional<std::string> without_marks(const std::string &text)
 {
     const auto tags = whole_tags(text);

@@ -144,6 +144,11 @@ std::optional<ClearedPlan> without_reports(const std::string &text,
                                            const std::vector<std::size_t> &numbers,
                                            const std::string &mark);
 
+// The text made loadable, where it is whole but does not load: attributes without a
+// value get an empty one, what no plan can hold is made visible. Nothing where it
+// need not or cannot be done.
+std::optional<std::string> mended(const std::string &text);
+
 // The text without any marks. Nothing where it is not whole.
 std::optional<std::string> without_marks(const std::string &text);
 

@@ -23,10 +23,19 @@ namespace
 
 struct Process {
     pid_t parent = 0;
+    pid_t group = 0;
     char state = '?';
     std::string program; // as it was started, or the kernel's name for it
     std::string name;    // without the path
+    std::string script;  // its first argument, without the path: of a script its name
 };
+
+using Processes = std::map<pid_t, Process>;
+
+std::string last_part(const std::string &path)
+{
+    return path.substr(path.rfind('/') + 1);
+}
 
 std::string file_text(const std::filesystem::path &path)
 {
@@ -46,16 +55,22 @@ std::optional<Process> read_process(const std::filesystem::path &directory)
     }
     Process process;
     process.state = stat[close + 2];
-    process.parent = std::atoi(stat.c_str() + close + 3);
-    const std::string command = file_text(directory / "cmdline").c_str();
+    char *end = nullptr;
+    process.parent = static_cast<pid_t>(std::strtol(stat.c_str() + close + 3, &end, 10));
+    process.group = static_cast<pid_t>(std::strtol(end, nullptr, 10));
+    const std::string arguments = file_text(directory / "cmdline");
+    const std::string command = arguments.c_str();
     process.program = command.empty() ? stat.substr(open + 1, close - open - 1) : command;
-    process.name = process.program.substr(process.program.rfind('/') + 1);
+    process.name = last_part(process.program);
+    if (arguments.size() > command.size() + 1) {
+        process.script = last_part(arguments.c_str() + command.size() + 1);
+    }
     return process;
 }
 
-std::map<pid_t, Process> read_processes()
+Processes read_processes()
 {
-    std::map<pid_t, Process> processes;
+    Processes processes;
     std::error_code gone;
     for (const auto &entry : std::filesystem::directory_iterator("/proc", gone)) {
         const std::string name = entry.path().filename();
@@ -71,7 +86,7 @@ std::map<pid_t, Process> read_processes()
     return processes;
 }
 
-bool is_below(const std::map<pid_t, Process> &processes, pid_t pid, pid_t ancestor)
+bool is_below(const Processes &processes, pid_t pid, pid_t ancestor)
 {
     for (std::size_t steps = 0; steps < processes.size(); ++steps) {
         const auto found = processes.find(pid);
@@ -86,13 +101,57 @@ bool is_below(const std::map<pid_t, Process> &processes, pid_t pid, pid_t ancest
     return false;
 }
 
+bool lives(const Process &process)
+{
+    return process.state != 'Z' && process.state != 'X';
+}
+
+// By its name: a script is its shell's first argument. Vendor 2's is an item like
+// any other.
+bool is_named_gatherer(const Process &process)
+{
+    const auto matches = [](const std::string &name) {
+        return name.starts_with(kGatherer) && !name.ends_with("_qsee");
+    };
+    return matches(process.name) || (matches(process.script) && process.name != "grep");
+}
+
+bool comes_of_gatherer(const Processes &processes, pid_t pid)
+{
+    for (std::size_t steps = 0; steps < processes.size(); ++steps) {
+        const auto found = processes.find(pid);
+        if (found == processes.end()) {
+            return false;
+        }
+        if (is_named_gatherer(found->second)) {
+            return true;
+        }
+        pid = found->second.parent;
+    }
+    return false;
+}
+
+// What goes on for an item: a shell that waits for another program is one of them.
+std::map<pid_t, std::string> item_processes(pid_t module, pid_t ancestor)
+{
+    std::map<pid_t, std::string> found;
+    const Processes processes = read_processes();
+    for (const auto &[pid, process] : processes) {
+        if (lives(process) && pid != module && process.group != module &&
+            is_below(processes, pid, ancestor) && !comes_of_gatherer(processes, pid)) {
+            found.emplace(pid, process.name);
+        }
+    }
+    return found;
+}
+
 } // namespace
 
 bool runs_below(pid_t ancestor, const std::vector<std::string> &items)
 {
     const auto processes = read_processes();
     for (const auto &[pid, process] : processes) {
-        if (process.state == 'Z' || !is_below(processes, pid, ancestor)) {
+        if (!lives(process) || !is_below(processes, pid, ancestor)) {
             continue;
         }
         for (const std::string &item : items) {
@@ -108,25 +167,57 @@ std::optional<std::pair<std::string, pid_t>>
 process_of_any(const std::vector<std::string> &programs)
 {
     for (const auto &[pid, process] : read_processes()) {
-        if (process.state != 'Z' &&
-            std::ranges::find(programs, process.program) != programs.end()) {
+        if (lives(process) && std::ranges::find(programs, process.program) != programs.end()) {
             return std::pair(process.program, pid);
         }
     }
     return std::nullopt;
 }
 
-bool end_below(pid_t ancestor)
+std::vector<Leftover> ModuleProcesses::of_items() const
+{
+    std::vector<Leftover> all;
+    for (const auto &[pid, name] : item_processes(module_, ancestor_)) {
+        all.push_back({name, pid});
+    }
+    return all;
+}
+
+bool ModuleProcesses::signal_items(int signal) const
 {
     bool found = false;
-    const auto processes = read_processes();
-    for (const auto &[pid, process] : processes) {
-        if (process.state != 'Z' && is_below(processes, pid, ancestor) &&
-            !process.name.starts_with(kGatherer)) {
-            found = kill(pid, SIGTERM) == 0 || found;
-        }
+    for (const auto &[pid, name] : item_processes(module_, ancestor_)) {
+        found = kill(pid, signal) == 0 || found;
     }
     return found;
+}
+
+bool ModuleProcesses::has_gatherer() const
+{
+    const Processes processes = read_processes();
+    return std::ranges::any_of(processes, [&](const auto &entry) {
+        const auto &[pid, process] = entry;
+        return lives(process) && pid != module_ &&
+               (is_named_gatherer(process) ||
+                (process.group == module_ && is_below(processes, pid, ancestor_)));
+    });
+}
+
+void ModuleProcesses::kill_gatherer() const
+{
+    const Processes processes = read_processes();
+    for (const auto &[pid, process] : processes) {
+        if (lives(process) && pid != module_ && is_below(processes, pid, ancestor_) &&
+            comes_of_gatherer(processes, pid)) {
+            kill(pid, SIGKILL);
+        }
+    }
+}
+
+char state_of(pid_t process)
+{
+    const auto found = read_process("/proc/" + std::to_string(process));
+    return found ? found->state : '?';
 }
 
 } // namespace fptest

@@ -1,8 +1,11 @@
 // SPDX-FileCopyrightText: 2026 The Quillmark authors
 // SPDX-License-Identifier: Apache-2.0
 
-// The processes below another one.
+// The processes below the one that holds the module: an item's own, and those of
+// the gatherer, which stays when its item has ended.
 #pragma once
+
+#include "results.h"
 
 #include <optional>
 #include <string>
@@ -22,7 +25,35 @@ bool runs_below(pid_t ancestor, const std::vector<std::string> &items);
 std::optional<std::pair<std::string, pid_t>>
 process_of_any(const std::vector<std::string> &programs);
 
-// Sends SIGTERM to all of them but the gatherer. False where there are none.
-bool end_below(pid_t ancestor);
+// What a module's process has started and what came of that.
+class ModuleProcesses
+{
+  public:
+    // The module's process, which leads its own process group, and the one that
+    // inherits what it leaves behind when it dies; they may be the same.
+    ModuleProcesses(pid_t module, pid_t ancestor) : module_(module), ancestor_(ancestor)
+    {
+    }
+
+    // Those of items: everything but the gatherer, which the module starts in its
+    // own process group, and what the gatherer has started.
+    std::vector<Leftover> of_items() const;
+
+    // Sends them a signal. False where there are none.
+    bool signal_items(int signal) const;
+
+    // Whether the gatherer runs, or is being started; also one of an earlier run.
+    bool has_gatherer() const;
+
+    // Kills the gatherer, unless it is an earlier run's.
+    void kill_gatherer() const;
+
+  private:
+    pid_t module_;
+    pid_t ancestor_;
+};
+
+// "D", "S", ...: the state of a process as ps shows it; '?' where it has gone.
+char state_of(pid_t process);
 
 } // namespace fptest

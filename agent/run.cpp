@@ -465,6 +465,7 @@ std::string first_failure(const std::vector<Listener *> &listeners)
 void run_jobs(Runner &runner, Run &run, const std::vector<Job> &jobs)
 {
     for (Job job : jobs) {
+        runner.make_way_for(job);
         clear_reports(job);
         if (!runner.run(job)) {
             return;
@@ -498,6 +499,7 @@ Exit run_work(const RunOptions &options, Host &host, Signals &signals, Run &run,
     bool broken = false;
     try {
         run_jobs(runner, run, work.jobs);
+        runner.end_round();
         if (!runner.broken()) {
             clear_marks();
         }

@@ -4,19 +4,12 @@
 #include "runner.h"
 
 #include "files.h"
+#include "stored_plan.h"
 #include "text.h"
+#include "trigger.h"
 
 #include <algorithm>
-#include <arpa/inet.h>
-#include <array>
-#include <cerrno>
-#include <csignal>
-#include <cstdio>
-#include <cstring>
-#include <netinet/in.h>
-#include <sys/signalfd.h>
-#include <sys/socket.h>
-#include <system_error>
+#include <sys/wait.h>
 #include <thread>
 #include <unistd.h>
 
@@ -29,13 +22,12 @@ using namespace std::chrono_literals;
 using Seconds = std::chrono::duration<double>;
 
 constexpr auto kTurn = 25ms;
-constexpr auto kBetweenStops = 250ms;
 // The gatherer's command returns when the gatherer has been told; its report
 // comes in its own time.
 constexpr Seconds kGathering = 10s;
-constexpr auto kBeforeRelease = 300ms;
-constexpr auto kBeforeTerm = 2s;
-constexpr auto kBeforeGivingUp = 10s;
+// A gatherer that is being started may not be there yet.
+constexpr auto kBeforeMissed = 500ms;
+constexpr auto kBetweenLooks = 250ms;
 constexpr std::size_t kOutputKept = std::size_t{64} * 1024;
 
 void append_output(std::string &output, const std::string &text)
@@ -46,21 +38,6 @@ void append_output(std::string &output, const std::string &text)
     }
 }
 
-// Takes the place of a gatherer that will not come: the module waits for one
-// without end, and sends what it has to whoever connects.
-void release_trigger()
-{
-    const Descriptor connection(socket(AF_INET, SOCK_STREAM | SOCK_NONBLOCK | SOCK_CLOEXEC, 0));
-    sockaddr_in module{};
-    module.sin_family = AF_INET;
-    module.sin_port = htons(kTriggerPort);
-    module.sin_addr.s_addr = htonl(INADDR_LOOPBACK);
-    static_cast<void>(
-        connect(connection.get(), reinterpret_cast<const sockaddr *>(&module), sizeof module));
-    // long enough to be accepted; nothing depends on what is read
-    std::this_thread::sleep_for(kTurn);
-}
-
 std::string reported(const Report &report)
 {
     return report.result_without_value
@@ -68,47 +45,35 @@ std::string reported(const Report &report)
                : "reported the result " + report.result.value_or("");
 }
 
+// As it reads once the plan has been mended.
+Report as_mended(Report report)
+{
+    if (report.result_without_value) {
+        report.result_without_value = false;
+        report.result = "";
+    }
+    report.description = report.description.value_or("");
+    return report;
+}
+
+// Whether that element is the item still, and not one of another plan.
+bool is_item(const Plan &plan, std::size_t number, const std::string &name)
+{
+    if (number >= plan.elements().size()) {
+        return false;
+    }
+    const char *found = mxmlElementGetAttr(plan.elements()[number], "name");
+    return found != nullptr && name == found;
+}
+
+// One without it is as a process with an old copy of the plan has written it.
+bool bears_mark(const Plan &plan, const Job::Target &target)
+{
+    const char *found = mxmlElementGetAttr(plan.elements()[target.element], kMark);
+    return target.mark.empty() || (found != nullptr && target.mark == found);
+}
+
 } // namespace
-
-// --- signals ------------------------------------------------------------------
-
-Signals::Signals() : descriptor_(-1)
-{
-    sigset_t set;
-    sigemptyset(&set);
-    for (const int signal : {SIGINT, SIGTERM, SIGHUP}) {
-        sigaddset(&set, signal);
-    }
-    sigprocmask(SIG_BLOCK, &set, nullptr);
-    descriptor_ = Descriptor(signalfd(-1, &set, SFD_NONBLOCK | SFD_CLOEXEC));
-    if (!descriptor_.is_open()) {
-        throw std::system_error(errno, std::generic_category(), "signals cannot be received");
-    }
-}
-
-int Signals::descriptor() const
-{
-    return descriptor_.get();
-}
-
-int Signals::take()
-{
-    signalfd_siginfo info{};
-    const ssize_t got = read(descriptor_.get(), &info, sizeof info);
-    return got == static_cast<ssize_t>(sizeof info) ? static_cast<int>(info.ssi_signo) : 0;
-}
-
-std::string signal_name(int signal)
-{
-    switch (signal) {
-    case SIGINT:
-        return "Ctrl-C";
-    case SIGTERM:
-        return "SIGTERM";
-    default:
-        return "SIGHUP";
-    }
-}
 
 // --- a job --------------------------------------------------------------------
 
@@ -116,6 +81,18 @@ Runner::Runner(Host &host, Signals &signals, Run &run, const std::vector<Listene
                const Limits &limits)
     : host_(host), signals_(signals), run_(run), listeners_(listeners), limits_(limits)
 {
+    signals_.take_suspensions();
+    host_.hold_at_ends();
+}
+
+Runner::TimePoint Runner::now() const
+{
+    return on_run_clock(SteadyClock::now());
+}
+
+Runner::TimePoint Runner::on_run_clock(TimePoint time) const
+{
+    return time - suspended_;
 }
 
 void Runner::give_up(const std::string &why)
@@ -131,6 +108,7 @@ bool Runner::run(const Job &job)
     if (!run_.why_unfinished.empty()) {
         return false;
     }
+    module_gone_.clear();
     std::vector<std::string> names;
     for (const auto &target : job.targets) {
         if (target) {
@@ -171,7 +149,8 @@ void Runner::require_all_started(const Job &job, std::size_t next)
         }
         result.seconds = 0;
         result.outcome = Outcome::silent;
-        result.reason = "the module did not come to it: --log FILE tells why";
+        result.reason = module_gone_.empty() ? "the module did not come to it: --log FILE tells why"
+                                             : "the module did not come to it: " + module_gone_;
         for (Listener *listener : listeners_) {
             listener->ended(run_, place);
         }
@@ -200,28 +179,38 @@ void Runner::handle(const Host::Event &event, const Job &job, std::size_t &next,
         move_on(event);
         start_next(job, next, event);
         break;
+    case Host::Event::Kind::ended:
+        end_item(event);
+        break;
     case Host::Event::Kind::returned:
         runs = false;
         move_on(event);
         break;
     case Host::Event::Kind::stopped:
-        stop_asked_ = false;
-        if (event.value == 0 && !active_.empty()) {
-            active_.back().was_stopped = true;
-        }
+        note_stop(event);
         break;
     case Host::Event::Kind::gone:
-        broken_ = true;
-        give_up("the module's process ended " + event.text);
-        advice_ = "; --log FILE keeps what it says";
-        host_.end_items();
-        if (!active_.empty()) {
-            append_output(item(active_.back().place).output, host_.take_output(event.output));
-        }
-        for (Active &active : active_) {
-            finish(active);
-        }
+        runs = false;
+        lose_module(event);
         break;
+    }
+}
+
+// It costs the items that it was running; the next ones get another.
+void Runner::lose_module(const Host::Event &event)
+{
+    module_gone_ = "the module's process ended " + event.text + "; --log FILE keeps what it says";
+    stop_asked_ = false;
+    if (!active_.empty()) {
+        append_output(item(active_.back().place).output, host_.take_output(event.output));
+    }
+    for (Active &active : active_) {
+        finish(active, on_run_clock(event.time));
+    }
+    tell_ended();
+    end_left_running();
+    if (!broken_) {
+        host_.restart();
     }
 }
 
@@ -236,13 +225,13 @@ void Runner::watch(bool command_runs)
 
 void Runner::tick()
 {
-    run_.seconds = Seconds(Clock::now() - began_).count();
+    run_.seconds = Seconds(now() - began_).count();
     const std::string output = host_.take_output();
     if (!active_.empty()) {
         append_output(item(active_.back().place).output, output);
     }
     for (const Active &active : active_) {
-        item(active.place).running = Seconds(Clock::now() - active.start).count();
+        item(active.place).running = std::max(0.0, Seconds(now() - active.start).count());
         item(active.place).stopping = active.stop.has_value();
     }
     for (Listener *listener : listeners_) {
@@ -255,7 +244,12 @@ ItemRun &Runner::item(const Place &place)
     return run_.suites[place.suite].items[place.item];
 }
 
-bool Runner::gathers(const Active &active)
+const ItemRun &Runner::item(const Place &place) const
+{
+    return run_.suites[place.suite].items[place.item];
+}
+
+bool Runner::gathers(const Active &active) const
 {
     return is_gatherer(item(active.place).name, run_.vendor);
 }
@@ -272,21 +266,48 @@ void Runner::start_next(const Job &job, std::size_t &next, const Host::Event &ev
     Active active;
     active.place = {job.suite, job.targets[at]->item};
     active.target = *job.targets[at];
-    active.start = event.time;
+    active.start = on_run_clock(event.time);
     if (signal_ != 0) {
         active.stop = Outcome::stopped;
-        active.stop_wanted_at = Clock::now();
+        active.stop_wanted_at = now();
     }
     active_.push_back(active);
-    item(active.place).start =
-        std::chrono::system_clock::now() -
-        std::chrono::duration_cast<std::chrono::system_clock::duration>(Clock::now() - event.time);
+    item(active.place).start = std::chrono::system_clock::now() -
+                               std::chrono::duration_cast<std::chrono::system_clock::duration>(
+                                   SteadyClock::now() - event.time);
     for (Listener *listener : listeners_) {
         listener->started(run_, active.place);
     }
 }
 
-// The module has gone on to its next item, or has returned.
+// The item's process has ended, and the module waits: what stands in the plan now is
+// what the item has reported.
+void Runner::end_item(const Host::Event &event)
+{
+    const std::string output = host_.take_output(event.output);
+    if (!active_.empty() && !active_.back().moved_on) {
+        Active &active = active_.back();
+        ItemRun &result = item(active.place);
+        append_output(result.output, output);
+        active.moved_on = true;
+        active.moved_on_at = on_run_clock(event.time);
+        if (WIFSIGNALED(event.value)) {
+            result.signal = WTERMSIG(event.value);
+        } else {
+            result.exit_status = WEXITSTATUS(event.value);
+        }
+        if (event.left_running) {
+            note_left_running(active);
+        }
+        read_reports(whole_stored_plan());
+        finish(active, active.moved_on_at);
+        tell_ended();
+    }
+    host_.go_on();
+}
+
+// The module has gone on to its next item, or has returned: it was with the
+// gatherer, or with an item that it could not start.
 void Runner::move_on(const Host::Event &event)
 {
     const std::string output = host_.take_output(event.output);
@@ -299,55 +320,76 @@ void Runner::move_on(const Host::Event &event)
         return;
     }
     active.moved_on = true;
-    active.moved_on_at = event.time;
-
-    // an item that has ended leaves a whole plan; a gatherer may be writing still
-    std::string text;
-    for (int tries = 0; tries < 20; ++tries) {
-        text = event.kind == Host::Event::Kind::returned ? host_.read_back()
-                                                         : read_file(kStoredPlan).value_or("");
-        if (Plan::read(text)) {
-            break;
-        }
-        std::this_thread::sleep_for(10ms);
-    }
-    read_reports(text);
-    if (!gathers(active) || active.was_stopped) {
-        finish(active, event.time);
+    active.moved_on_at = on_run_clock(event.time);
+    read_reports(event.kind == Host::Event::Kind::returned ? host_.read_back()
+                                                           : whole_stored_plan());
+    if (!gathers(active) || active.was_stopped || !active.gatherer_end.empty()) {
+        finish(active, active.moved_on_at);
         tell_ended();
     }
 }
 
-void Runner::finish(Active &active, Clock::time_point end)
+void Runner::finish(Active &active, TimePoint end)
 {
     if (active.done) {
         return;
     }
     active.done = true;
     ItemRun &result = item(active.place);
-    result.seconds = Seconds(end - active.start).count();
+    result.seconds = std::max(0.0, Seconds(end - active.start).count());
+    result.stopping = false;
+    if (!active.stop && limits_.item && *result.seconds > limits_.item->count()) {
+        active.stop = Outcome::timed_out; // over before that was seen
+    }
     judge(active);
+    if (!result.left_running.empty() || gathers(active)) {
+        judged_.push_back({active.place, active.target, result.report});
+    }
+    mend_stored_plan();
 }
 
 void Runner::judge(const Active &active)
 {
     ItemRun &result = item(active.place);
     const Report &report = result.report;
-    if (active.stop == Outcome::timed_out && active.was_stopped) {
-        result.outcome = Outcome::timed_out;
-        result.reason = "stopped after " + duration(limits_.item->count());
-    } else if (active.stop == Outcome::stopped && active.was_stopped) {
-        result.outcome = Outcome::stopped;
-        result.reason = "stopped by " + signal_name(signal_);
-    } else if (!report.result && !report.result_without_value) {
+    const bool has_reported = report.result || report.result_without_value;
+    if (active.stop == Outcome::timed_out ||
+        (active.stop == Outcome::stopped && active.was_stopped)) {
+        result.outcome = *active.stop;
+        result.reason = why_stopped(active);
+    } else if (!module_gone_.empty()) {
+        result.outcome = has_reported ? Outcome::failed : Outcome::silent;
+        result.reason = module_gone_;
+    } else if (result.signal != 0) {
+        result.outcome = Outcome::failed;
+        result.reason = "died by signal " + std::to_string(result.signal) +
+                        (has_reported ? ", though it " + reported(report) : "");
+    } else if (!has_reported) {
         result.outcome = Outcome::silent;
         result.reason = why_silent(active);
+    } else if (limits_.exit_status && result.exit_status.value_or(0) != 0) {
+        result.outcome = Outcome::failed;
+        result.reason = "ended with exit status " + std::to_string(*result.exit_status) +
+                        ", though it " + reported(report);
     } else if (report.result == std::to_string(run_.pass_code)) {
         result.outcome = Outcome::passed;
     } else {
         result.outcome = Outcome::failed;
         result.reason = reported(report);
     }
+}
+
+std::string Runner::why_stopped(const Active &active)
+{
+    const std::string took = duration(*item(active.place).seconds);
+    if (!active.was_stopped) {
+        return "ended by itself after " + took + ", past the limit of " +
+               duration(limits_.item->count());
+    }
+    const std::string by =
+        active.stop == Outcome::stopped ? " by " + signal_name(signal_) : " after " + took;
+    return (active.killed ? "killed" : "stopped") + by +
+           (active.killed ? ", as it did not end when it was asked to" : "");
 }
 
 std::string Runner::why_silent(const Active &active)
@@ -360,8 +402,8 @@ std::string Runner::why_silent(const Active &active)
     if (is_plain_name(item(active.place).name) && access(program.c_str(), X_OK) != 0) {
         return "there is no program " + one_line(program);
     }
-    if (broken_) {
-        return run_.why_unfinished;
+    if (!active.gatherer_end.empty()) {
+        return active.gatherer_end;
     }
     if (active.overwritten) {
         return "a process with an old copy of the plan has written it over; what the plan says "
@@ -403,7 +445,8 @@ void Runner::look()
 {
     struct stat status {
     };
-    if (!active_.empty() && stat(kStoredPlan, &status) == 0 && S_ISREG(status.st_mode) &&
+    if ((!active_.empty() || !judged_.empty()) && stat(kStoredPlan, &status) == 0 &&
+        S_ISREG(status.st_mode) &&
         (status.st_mtim.tv_sec != plan_status_.st_mtim.tv_sec ||
          status.st_mtim.tv_nsec != plan_status_.st_mtim.tv_nsec ||
          status.st_size != plan_status_.st_size || status.st_ino != plan_status_.st_ino)) {
@@ -414,14 +457,34 @@ void Runner::look()
         }
     }
     for (Active &active : active_) {
+        look_for_gatherer(active);
         const Report &report = item(active.place).report;
-        const auto patience = limits_.item.value_or(kGathering);
-        const bool reported = report.progress == "100" && report.result;
+        const bool has_ended = report.progress == "100" && report.result;
         if (active.moved_on && !active.done &&
-            (reported || active.was_stopped ||
-             (!limits_.item && Clock::now() - active.moved_on_at > patience))) {
-            finish(active);
+            (has_ended || active.was_stopped || !active.gatherer_end.empty() ||
+             (!limits_.item && now() - active.moved_on_at > kGathering))) {
+            finish(active, now());
         }
+    }
+}
+
+// Without it the module would wait at its port without end, and what has died
+// reports no more.
+void Runner::look_for_gatherer(Active &active)
+{
+    if (active.done || !active.gatherer_end.empty() || !gathers(active) ||
+        now() - active.gatherer_looked_for < kBetweenLooks) {
+        return;
+    }
+    active.gatherer_looked_for = now();
+    active.gatherer_missed = host_.processes().has_gatherer() ? 0 : active.gatherer_missed + 1;
+    if (active.gatherer_missed < 2 || now() - active.start < kBeforeMissed) {
+        return;
+    }
+    active.gatherer_end = active.moved_on ? "the gatherer ended before it had reported"
+                                          : "the gatherer ended before it connected";
+    if (!active.moved_on) {
+        release_trigger();
     }
 }
 
@@ -432,111 +495,49 @@ void Runner::read_reports(const std::string &text)
         return;
     }
     for (Active &active : active_) {
-        ItemRun &result = item(active.place);
-        const std::size_t number = active.target.element;
-        if (active.done || number >= plan->elements().size()) {
-            continue;
-        }
-        const char *name = mxmlElementGetAttr(plan->elements()[number], "name");
-        if (name == nullptr || result.name != name) {
-            continue; // another plan
-        }
-        const std::string &mark = active.target.mark;
-        const char *found = mxmlElementGetAttr(plan->elements()[number], kMark);
-        active.overwritten = !mark.empty() && (found == nullptr || mark != found);
-        if (active.overwritten) {
-            continue; // what it says is of an earlier run
-        }
-        Report report = plan->report(number);
-        if (report == result.report) {
-            continue;
-        }
-        result.report = std::move(report);
-        for (Listener *listener : listeners_) {
-            listener->progressed(run_, active.place);
-        }
+        read_report(active, *plan);
+    }
+    for (Judged &judged : judged_) {
+        read_late_report(judged, *plan);
     }
 }
 
-// --- stopping -----------------------------------------------------------------
-
-void Runner::read_signals()
+void Runner::read_report(Active &active, const Plan &plan)
 {
-    for (int signal = signals_.take(); signal != 0; signal = signals_.take()) {
-        if (signal_ != 0) {
-            // the reports are as far as they were written; the host's process
-            // sees that this one is gone and stops what runs
-            std::fputs("\nfptest: left at once; what runs is asked to stop\n", stderr);
-            _exit(static_cast<int>(128 + SIGINT));
-        }
-        signal_ = signal;
-        give_up("interrupted by " + signal_name(signal));
-        for (Active &active : active_) {
-            if (!active.stop) {
-                active.stop = Outcome::stopped;
-                active.stop_wanted_at = Clock::now();
-            }
-        }
-    }
-}
-
-void Runner::stop_what_is_due(bool command_runs)
-{
-    for (Active &active : active_) {
-        if (!active.done && !active.stop && limits_.item &&
-            Clock::now() - active.start > *limits_.item) {
-            active.stop = Outcome::timed_out;
-            active.stop_wanted_at = Clock::now();
-        }
-    }
-    if (!active_.empty() && !active_.back().done && active_.back().stop) {
-        press_stop(active_.back(), command_runs);
-    }
-    // the module stops only what it started last: an earlier gatherer is left alone
-    for (Active &active : active_) {
-        if (&active != &active_.back() && !active.done && active.stop) {
-            active.was_stopped = true;
-            finish(active);
-        }
-    }
-}
-
-void Runner::press_stop(Active &active, bool command_runs)
-{
-    const auto now = Clock::now();
-    // one that no stop has met may not have been started yet when that was tried
-    if (stop_asked_ || (active.was_stopped && now - active.stop_tried_at < kBetweenStops)) {
+    const std::size_t number = active.target.element;
+    if (active.done || !is_item(plan, number, item(active.place).name)) {
         return;
     }
-    active.stop_tried_at = now;
-    const auto waited = now - active.stop_wanted_at;
-    host_.stop(item(active.place).name);
-    stop_asked_ = true;
-    if (command_runs && gathers(active) && waited > kBeforeRelease) {
-        active.was_stopped = true;
-        release_trigger();
-    } else if (waited > kBeforeGivingUp || (active.moved_on && waited > kBeforeTerm)) {
-        cannot_stop(active);
-    } else if (waited > kBeforeTerm && host_.end_items()) {
-        // its process has a name that the module does not find, as a script's is
-        // its shell's
-        active.was_stopped = true;
+    active.overwritten = !bears_mark(plan, active.target);
+    if (active.overwritten) {
+        return; // what it says is of an earlier run
+    }
+    ItemRun &result = item(active.place);
+    Report report = plan.report(number);
+    if (report == result.report) {
+        return;
+    }
+    result.report = std::move(report);
+    for (Listener *listener : listeners_) {
+        listener->progressed(run_, active.place);
     }
 }
 
-void Runner::cannot_stop(Active &active)
+void Runner::read_late_report(Judged &judged, const Plan &plan)
 {
-    if (active.moved_on) { // a gatherer that is gone, or is none of this host
-        active.was_stopped = true;
-        finish(active);
+    const std::size_t number = judged.target.element;
+    if (!is_item(plan, number, item(judged.place).name) || !bears_mark(plan, judged.target)) {
         return;
     }
-    broken_ = true;
-    give_up(item(active.place).group + "/" + item(active.place).name +
-            " cannot be stopped: it goes on running");
-    active.was_stopped = true;
-    finish(active);
-    item(active.place).reason += ", but it goes on running";
+    const Report report = plan.report(number);
+    const bool has_reported = report.result || report.result_without_value;
+    if (!has_reported || as_mended(report) == as_mended(judged.report)) {
+        return;
+    }
+    judged.report = report;
+    for (Listener *listener : listeners_) {
+        listener->late(run_, judged.place, report);
+    }
 }
 
 } // namespace fptest

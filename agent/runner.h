@@ -7,6 +7,7 @@
 #include "host.h"
 #include "plan.h"
 #include "results.h"
+#include "signals.h"
 
 #include <chrono>
 #include <cstddef>
@@ -18,22 +19,6 @@
 
 namespace fptest
 {
-
-// SIGINT, SIGTERM and SIGHUP of this process, as something to wait for.
-class Signals
-{
-  public:
-    Signals();
-    int descriptor() const;
-    // The number of one that has come; 0 where none has.
-    int take();
-
-  private:
-    Descriptor descriptor_;
-};
-
-// "Ctrl-C", "SIGTERM"
-std::string signal_name(int signal);
 
 // One command and the items that the module comes to in it.
 struct Job {
@@ -66,6 +51,13 @@ class Runner
     // come to its end: the run then says why.
     bool run(const Job &job);
 
+    // Before the reports of its items are cleared from the plan: what an earlier
+    // run of them left running would report into this one, and is ended.
+    void make_way_for(const Job &job);
+
+    // Ends all that items have left running.
+    void end_round();
+
     // The signal that interrupted the run; 0 where none has.
     int signal() const
     {
@@ -85,43 +77,77 @@ class Runner
     void give_up(const std::string &why);
 
   private:
-    using Clock = std::chrono::steady_clock;
+    using SteadyClock = std::chrono::steady_clock;
+    // The time of the run: it stands still while the run is suspended.
+    using TimePoint = SteadyClock::time_point;
 
     // An item from its start until its end has been told.
     struct Active {
         Place place;
         Job::Target target;
-        Clock::time_point start;
+        TimePoint start;
         bool moved_on = false; // the module has: only a gatherer is still at work then
-        Clock::time_point moved_on_at;
+        TimePoint moved_on_at;
         bool done = false;
         std::optional<Outcome> stop; // timed_out or stopped, once that is wanted
         bool was_stopped = false;    // a stop has met it
-        bool overwritten = false;    // its element bears another mark
-        Clock::time_point stop_wanted_at;
-        Clock::time_point stop_tried_at;
+        bool killed = false;
+        bool overwritten = false; // its element bears another mark
+        TimePoint stop_wanted_at;
+        TimePoint stop_tried_at;
+        TimePoint gatherer_looked_for;
+        int gatherer_missed = 0; // how many times in a row
+        std::string gatherer_end;
     };
+
+    // A process that the item at that element of the plan has left running.
+    struct Left {
+        std::size_t element = 0;
+        pid_t process = 0;
+    };
+
+    // An item that has been judged while something that may report it goes on.
+    struct Judged {
+        Place place;
+        Job::Target target;
+        Report report;
+    };
+
+    TimePoint now() const;
+    TimePoint on_run_clock(TimePoint time) const; // of a moment on the steady clock
 
     void watch(bool command_runs);
     void handle(const Host::Event &event, const Job &job, std::size_t &next, bool &runs);
     void start_next(const Job &job, std::size_t &next, const Host::Event &event);
+    void end_item(const Host::Event &event);
     void move_on(const Host::Event &event);
+    void lose_module(const Host::Event &event);
     void require_all_started(const Job &job, std::size_t next);
     void require_plan();
     void look();
     void read_reports(const std::string &text);
+    void read_report(Active &active, const Plan &plan);
+    void read_late_report(Judged &judged, const Plan &plan);
+    void look_for_gatherer(Active &active);
     void read_signals();
+    void suspend();
     void stop_what_is_due(bool command_runs);
     void press_stop(Active &active, bool command_runs);
+    void stop_gatherer(Active &active, bool command_runs, SteadyClock::duration waited);
+    void note_stop(const Host::Event &event);
     void cannot_stop(Active &active);
-    void finish(Active &active, Clock::time_point end = Clock::now());
+    void note_left_running(Active &active);
+    void end_left_running();
+    void finish(Active &active, TimePoint end);
     void judge(const Active &active);
     std::string why_silent(const Active &active);
+    std::string why_stopped(const Active &active);
     void tell_ended();
     void tick();
 
     ItemRun &item(const Place &place);
-    bool gathers(const Active &active);
+    const ItemRun &item(const Place &place) const;
+    bool gathers(const Active &active) const;
 
     Host &host_;
     Signals &signals_;
@@ -129,11 +155,15 @@ class Runner
     const std::vector<Listener *> &listeners_;
     Limits limits_;
     std::deque<Active> active_;
+    std::vector<Judged> judged_; // of this round
+    std::vector<Left> left_;
     struct stat plan_status_ {
     };
-    Clock::time_point began_ = Clock::now();
+    SteadyClock::duration suspended_{};
+    TimePoint began_ = now();
     int signal_ = 0;
     bool stop_asked_ = false; // and not yet answered
+    std::string module_gone_; // why, in the job in which its process ended
     bool broken_ = false;
     std::string advice_;
 };

@@ -5,6 +5,7 @@
 
 #include "descriptor.h"
 #include "host.h"
+#include "item_shell.h"
 #include "messages.h"
 #include "plan.h"
 #include "processes.h"
@@ -13,6 +14,7 @@
 #include <array>
 #include <atomic>
 #include <chrono>
+#include <condition_variable>
 #include <csignal>
 #include <cstdio>
 #include <cstdlib>
@@ -34,6 +36,7 @@ namespace
 {
 
 constexpr std::size_t kReplyRoom = 1025;
+constexpr std::chrono::seconds kGrace{2}; // for items to end when the agent has gone
 
 class Server
 {
@@ -41,6 +44,7 @@ class Server
     explicit Server(int socket) : socket_(socket)
     {
         print_to(*this);
+        tell_item_status([this](int status) { tell_ended(status); });
     }
 
     // Ends with the agent, whatever has become of it; an item that is running
@@ -56,6 +60,12 @@ class Server
             case MessageKind::stop:
                 answer_stop(message.text);
                 break;
+            case MessageKind::hold:
+                holds_ = true;
+                break;
+            case MessageKind::go_on:
+                leave_item();
+                break;
             default:
                 answer({MessageKind::plan, read_back()});
                 break;
@@ -63,8 +73,9 @@ class Server
         }
         // held to the end, so that the command comes to no further item
         const std::lock_guard lock(mutex_);
-        if (busy_ && stop(items_) != 0) {
-            end_all_below();
+        if (busy_) {
+            stop(items_);
+            end_items();
         }
         _exit(EXIT_SUCCESS);
     }
@@ -120,6 +131,35 @@ class Server
                 moment() + (number == std::string::npos ? "0" : line.substr(number))});
     }
 
+    // Where that is wanted, the module is held until the agent has read what the item
+    // reported, and looked for what it has left running.
+    void tell_ended(int status)
+    {
+        std::unique_lock lock(mutex_);
+        at_end_ = holds_;
+        send_message(socket_, {MessageKind::ended,
+                               moment() + std::to_string(status) + (has_children() ? " 1" : " 0")});
+        left_.wait(lock, [this] { return !at_end_; });
+    }
+
+    void leave_item()
+    {
+        const std::lock_guard lock(mutex_);
+        at_end_ = false;
+        left_.notify_all();
+    }
+
+    // What an item has left running is this process's own by now. The finished ones
+    // among them, and those that stops have left behind, are nobody's to wait for.
+    static bool has_children()
+    {
+        pid_t child = 0;
+        do {
+            child = waitpid(-1, nullptr, WNOHANG);
+        } while (child > 0);
+        return child == 0;
+    }
+
     // This moment on the clock that all processes share, and in the output.
     static std::string moment()
     {
@@ -150,11 +190,20 @@ class Server
         return stopped;
     }
 
-    // Again and again, because a script may just be starting another program.
-    static void end_all_below()
+    // Again and again, because a script may just be starting another program; and
+    // in the end without asking.
+    static void end_items()
     {
-        for (int tries = 0; tries < 50 && end_below(getpid()); ++tries) {
-            std::this_thread::sleep_for(std::chrono::milliseconds(10));
+        using namespace std::chrono_literals;
+        const ModuleProcesses processes(getpid(), getpid());
+        const auto limit = std::chrono::steady_clock::now() + kGrace;
+        while (
+            processes.signal_items(std::chrono::steady_clock::now() < limit ? SIGTERM : SIGKILL)) {
+            processes.signal_items(SIGCONT);
+            if (std::chrono::steady_clock::now() > limit + kGrace) {
+                return; // not even that helps
+            }
+            std::this_thread::sleep_for(10ms);
         }
     }
 
@@ -173,8 +222,7 @@ class Server
         }
         // Nobody else waits for the gatherer and for what stops left behind, and a
         // finished process of an item's name would be found in place of the item.
-        while (waitpid(-1, nullptr, WNOHANG) > 0) {
-        }
+        static_cast<void>(has_children());
         busy_ = true;
         command_ = std::thread([this, command] { run(command); });
     }
@@ -201,6 +249,9 @@ class Server
 
     int socket_;
     std::mutex mutex_;
+    std::condition_variable left_;
+    bool at_end_ = false; // of an item, and held there
+    std::atomic<bool> holds_ = false;
     std::thread command_;
     std::vector<std::string> items_;
     std::atomic<bool> busy_ = false;
@@ -245,6 +296,8 @@ void serve_module(int socket, int output)
     reset_signals();
     raise_descriptor_limit();
     prctl(PR_SET_CHILD_SUBREAPER, 1); // what an item leaves behind stays below
+    // a suspended agent suspends this process; one that is killed then cannot resume it
+    prctl(PR_SET_PDEATHSIG, SIGCONT);
     setsid();
     const int null = open("/dev/null", O_RDONLY | O_CLOEXEC);
     move_descriptor(null, STDIN_FILENO);

@@ -128,6 +128,12 @@ FptestProcess::FptestProcess(const Start &start)
 
 void FptestProcess::become(const Start &start) const
 {
+    if (start.has_own_group) {
+        setpgid(0, 0);
+    }
+    if (start.has_own_session) {
+        setsid();
+    }
     dup2(input_.get(), STDIN_FILENO);
     dup2(output_.get(), STDOUT_FILENO);
     dup2(errors_.get(), STDERR_FILENO);

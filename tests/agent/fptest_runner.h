@@ -27,6 +27,8 @@ struct Start {
     bool is_plain_user = false;  // modes of files hold for it, as they do not for root
     bool is_no_device = false;   // it finds an empty /system/bin
     bool is_interrupted = false; // SIGINT has come before it does anything
+    bool has_own_group = false;  // of processes, as a shell with job control starts it
+    bool has_own_session = false;
 };
 
 struct Ended {

@@ -1,0 +1,356 @@
+// SPDX-FileCopyrightText: 2026 The Quillmark authors
+// SPDX-License-Identifier: Apache-2.0
+
+// How items end, and what they leave: time limits, exit statuses and signals, items
+// that do not stop, processes left running, reports that come late.
+#include "fptest_runner.h"
+#include "report_files.h"
+
+#include <algorithm>
+#include <csignal>
+#include <nlohmann/json.hpp>
+#include <thread>
+
+using namespace fptest_runner;
+using device::kPlanFile;
+using device::Lines;
+using device::plan_of;
+using device::processes_named;
+using device::read_file;
+using device::wait_for;
+using report_files::events_of;
+using report_files::outcomes;
+using ::testing::AllOf;
+using ::testing::ElementsAre;
+using ::testing::Ge;
+using ::testing::HasSubstr;
+using ::testing::IsEmpty;
+using ::testing::Lt;
+using ::testing::StartsWith;
+
+namespace
+{
+
+using Json = nlohmann::json;
+
+constexpr char kPasses[] = "report G 100 0 fine";
+
+// Its argument within quotes for the shell.
+std::string script(const std::string &text)
+{
+    return "'" + text + "'";
+}
+
+std::string script_report(const std::string &result, const std::string &description)
+{
+    return "fptest report G Script --progress 100 --result " + result + " --description &quot;" +
+           description + "&quot;";
+}
+
+bool is_suspended(pid_t process)
+{
+    return device::status_field(process, "State").starts_with('T');
+}
+
+class ItemEnd : public FptestTest
+{
+  protected:
+    // Runs the group G of these items.
+    static Ended run(const std::vector<device::PlanItem> &items,
+                     std::vector<std::string> arguments = {})
+    {
+        return run_fptest(with_plan(items, std::move(arguments)));
+    }
+
+    static std::vector<std::string> with_plan(const std::vector<device::PlanItem> &items,
+                                              std::vector<std::string> arguments = {})
+    {
+        const std::string text = plan_of({{"G", items}});
+        arguments.insert(arguments.begin(), {"run", "--json", work("json"), "--plan", plan(text)});
+        arguments.emplace_back("P/G");
+        return arguments;
+    }
+
+    static std::string json()
+    {
+        return read_file(work("json"));
+    }
+
+    static std::vector<Json> ends()
+    {
+        return events_of(json(), "end");
+    }
+
+    static std::string reason(std::size_t item)
+    {
+        const Json found = ends().at(item).at("reason");
+        return found.is_null() ? "" : found.get<std::string>();
+    }
+};
+
+// --- time limits -------------------------------------------------------------------
+
+TEST_F(ItemEnd, PastTheLimitIsTimedOutThoughTheItemThenPasses)
+{
+    const Ended ended =
+        run({{"Item", "ignore-stop sleep 1 report G 100 0 fine"},
+             {"Script", script("trap true TERM; sleep 1; sleep 0.5; " + script_report("0", "fine"))}},
+            {"--timeout", "0.5"});
+    EXPECT_EQ(ended.status, 1);
+    EXPECT_THAT(outcomes(json()), ElementsAre("Item: timed out", "Script: timed out"));
+    EXPECT_THAT(ends().at(0).at("seconds").get<double>(), AllOf(Ge(1.0), Lt(2.0)));
+    EXPECT_THAT(reason(0), StartsWith("stopped after 1."));
+}
+
+TEST_F(ItemEnd, PastTheLimitIsTimedOutThoughNobodyWatched)
+{
+    FptestProcess fptest(with_plan({{"Item", "note /tmp/scene/begun sleep 1 report G 100 0 fine"}},
+                                   {"--timeout", "0.5"}));
+    ASSERT_TRUE(wait_for_file("begun"));
+    fptest.signal(SIGSTOP);
+    ASSERT_TRUE(wait_for([] { return running_items().empty(); }, 30));
+    fptest.signal(SIGCONT);
+    EXPECT_EQ(fptest.wait().status, 1);
+    EXPECT_THAT(outcomes(json()), ElementsAre("Item: timed out"));
+    EXPECT_THAT(reason(0), AllOf(StartsWith("ended by itself after 1."),
+                                 HasSubstr(" s, past the limit of 0.5 s")));
+}
+
+TEST_F(ItemEnd, ScriptIsStoppedAtItsLimitAndNotLater)
+{
+    run({{"Script", script("sleep 30")}}, {"--timeout", "0.5"});
+    EXPECT_EQ(reason(0), "stopped after 0.5 s");
+    EXPECT_LT(ends().at(0).at("seconds"), 1.0);
+}
+
+// --- items that do not stop --------------------------------------------------------------
+
+TEST_F(ItemEnd, ItemThatIgnoresTheStopIsKilledAndTheRunGoesOn)
+{
+    const Ended ended =
+        run({{"Item", kPasses}, {"Stubborn", "ignore-stop sleep 60"}, {"Third", kPasses}},
+            {"--timeout", "0.5"});
+    EXPECT_EQ(ended.status, 1);
+    EXPECT_EQ(ended.err, "");
+    EXPECT_THAT(outcomes(json()),
+                ElementsAre("Item: passed", "Stubborn: timed out", "Third: passed"));
+    EXPECT_THAT(reason(1), AllOf(StartsWith("killed after 2."),
+                                 HasSubstr(" s, as it did not end when it was asked to")));
+    EXPECT_EQ(events_of(json(), "finish").at(0).at("finished"), true);
+    EXPECT_THAT(running_items(), IsEmpty());
+}
+
+TEST_F(ItemEnd, GraceIsAsLongAsItIsSaidToBe)
+{
+    run({{"Item", "ignore-stop sleep 1 report G 100 0 fine"}},
+        {"--timeout", "0.2", "--grace", "0.3"});
+    EXPECT_THAT(reason(0), StartsWith("killed after 0."));
+    run({{"Item", "ignore-stop sleep 3 report G 100 0 fine"}},
+        {"--timeout", "0.2", "--grace", "20"});
+    EXPECT_THAT(reason(0), StartsWith("stopped after 3."));
+}
+
+TEST_F(ItemEnd, ScriptAndItsChildrenAreKilledTogether)
+{
+    run({{"Script", script("trap true TERM; /system/bin/Third ignore-stop sleep 60; sleep 60")},
+         {"Other", kPasses}},
+        {"--timeout", "0.3", "--grace", "0.5"});
+    EXPECT_THAT(outcomes(json()), ElementsAre("Script: timed out", "Other: passed"));
+    EXPECT_THAT(reason(0), StartsWith("killed after "));
+    EXPECT_THAT(running_items(), IsEmpty());
+}
+
+TEST_F(ItemEnd, ItemThatIsSuspendedIsEndedAllTheSame)
+{
+    const Ended ended = run({{"Script", script("kill -STOP $$; sleep 60")}, {"Other", kPasses}},
+                            {"--timeout", "0.3"});
+    EXPECT_EQ(ended.status, 1);
+    EXPECT_THAT(outcomes(json()), ElementsAre("Script: timed out", "Other: passed"));
+    EXPECT_LT(ended.seconds, 10);
+}
+
+TEST_F(ItemEnd, SecondInterruptionLeavesNoItemThatIgnoresTheStop)
+{
+    FptestProcess fptest(with_plan({{"Stubborn", "note /tmp/scene/begun ignore-stop sleep 60"}}));
+    ASSERT_TRUE(wait_for_file("begun"));
+    fptest.signal(SIGINT);
+    std::this_thread::sleep_for(std::chrono::milliseconds(300));
+    fptest.signal(SIGINT);
+    EXPECT_EQ(fptest.wait().status, 130);
+    EXPECT_TRUE(wait_for([] { return running_items().empty(); }, 20));
+}
+
+// --- how the process ended -----------------------------------------------------------
+
+TEST_F(ItemEnd, DeathByASignalIsAFailureWhateverWasReported)
+{
+    const Ended ended = run({{"Item", "report G 100 0 fine crash"}, {"Other", "crash"}});
+    EXPECT_EQ(ended.status, 1);
+    EXPECT_THAT(outcomes(json()), ElementsAre("Item: failed", "Other: failed"));
+    EXPECT_EQ(reason(0), "died by signal 6, though it reported the result 0");
+    EXPECT_EQ(reason(1), "died by signal 6");
+}
+
+TEST_F(ItemEnd, ExitStatusFailsAnItemWhereThatIsWanted)
+{
+    const std::vector<device::PlanItem> items = {
+        {"Script", script(script_report("0", "fine") + "; exit 5")}, {"Item", kPasses}};
+    EXPECT_EQ(run(items).status, 0);
+    EXPECT_THAT(outcomes(json()), ElementsAre("Script: passed", "Item: passed"));
+
+    EXPECT_EQ(run(items, {"--exit-status"}).status, 1);
+    EXPECT_THAT(outcomes(json()), ElementsAre("Script: failed", "Item: passed"));
+    EXPECT_EQ(reason(0), "ended with exit status 5, though it reported the result 0");
+}
+
+TEST_F(ItemEnd, ItemThatSignalsItsProcessGroupEndsAlone)
+{
+    const Ended ended =
+        run({{"Script", script(script_report("0", "fine") + "; kill 0")}, {"Item", kPasses}});
+    EXPECT_EQ(ended.err, "");
+    EXPECT_THAT(outcomes(json()), ElementsAre("Script: failed", "Item: passed"));
+    EXPECT_EQ(reason(0), "died by signal 15, though it reported the result 0");
+}
+
+// --- what is left running -----------------------------------------------------------------
+
+// A script that leaves this to a child of its own.
+std::string leaving(const std::string &text)
+{
+    return script("(" + text + ") &amp; echo x >/tmp/scene/left");
+}
+
+TEST_F(ItemEnd, ChildOfAnEarlierRoundReportsIntoNoLaterOne)
+{
+    const std::string late = "if ! test -e /tmp/scene/left; then sleep 0.5; " +
+                             script_report("0", "of round 1") + "; fi";
+    const Ended ended = run({{"Script", leaving(late)}, {"Item", "sleep 0.2 report G 100 0 fine"}},
+                            {"--repeat", "3"});
+    EXPECT_EQ(ended.status, 1);
+    EXPECT_THAT(outcomes(json()),
+                ElementsAre("Script: no result", "Item: passed", "Script: no result",
+                            "Item: passed", "Script: no result", "Item: passed"));
+}
+
+TEST_F(ItemEnd, WhatIsLeftRunningIsEndedBeforeTheNextRoundAndAtTheEnd)
+{
+    const std::vector<device::PlanItem> items = {
+        {"Script", script("/system/bin/Third note /tmp/scene/order sleep 60 &amp; " +
+                          script_report("0", "fine"))},
+        {"Item", "await /tmp/scene/order sleep 0.2 report G 100 0 fine"}};
+    EXPECT_EQ(run(items, {"--repeat", "2"}).status, 0);
+    EXPECT_EQ(read_file(work("order")), "Third\nThird\n");
+    EXPECT_THAT(running_items(), IsEmpty());
+}
+
+TEST_F(ItemEnd, WhatIsLeftRunningServesTheRestOfItsRound)
+{
+    const std::vector<device::PlanItem> items = {
+        {"Script", script("/system/bin/Third await /tmp/scene/asked note /tmp/scene/answered "
+                          "sleep 60 &amp; " +
+                          script_report("0", "fine"))},
+        {"Item", "note /tmp/scene/asked await /tmp/scene/answered report G 100 0 fine"}};
+    EXPECT_EQ(run(items, {"--timeout", "20"}).status, 0);
+}
+
+TEST_F(ItemEnd, WhatIsLeftRunningIsKilledWhereItDoesNotEnd)
+{
+    const Ended ended =
+        run({{"Script", script("/system/bin/Third ignore-stop sleep 60 &amp; sleep 0.2; " +
+                               script_report("0", "fine"))}},
+            {"--grace", "0.5", "--repeat", "2"});
+    EXPECT_EQ(ended.status, 0);
+    EXPECT_THAT(running_items(), IsEmpty());
+}
+
+// --- a plan that a report has spoiled ------------------------------------------------
+
+TEST_F(ItemEnd, DescriptionThatNoPlanCanHoldCostsNoOtherItem)
+{
+    const std::string odd = "report-here G Item 100 0 $(printf a\\\\001b)";
+    const Ended ended = run({{"Item", odd}, {"Other", kPasses}}, {"--force"});
+    EXPECT_EQ(ended.status, 0) << ended.err;
+    EXPECT_THAT(outcomes(json()), ElementsAre("Item: passed", "Other: passed"));
+    EXPECT_THAT(read_file(kPlanFile), HasSubstr("a\u2401b"));
+}
+
+// --- the gatherer ------------------------------------------------------------------------
+
+TEST_F(ItemEnd, GathererThatEndsAtItsStartHoldsUpNoRun)
+{
+    for (const std::string way : {"--quiet", "--as-group"}) {
+        SCOPED_TRACE(way);
+        const Ended ended = run({{"SensorProbe", "--nosuch"}, {"Other", kPasses}}, {way});
+        EXPECT_EQ(ended.status, 1);
+        EXPECT_EQ(ended.err, "");
+        EXPECT_THAT(outcomes(json()), ElementsAre("SensorProbe: no result", "Other: passed"));
+        EXPECT_EQ(reason(0), "the gatherer ended before it connected");
+        EXPECT_THAT(ends().at(0).at("output").get<std::string>(), HasSubstr("SensorProbe: "));
+        EXPECT_LT(ended.seconds, 10);
+    }
+}
+
+TEST_F(ItemEnd, GathererThatEndsWithoutAReportIsNotWaitedFor)
+{
+    FptestProcess fptest(with_plan({{"SensorProbe", "--group G --seconds 60"}}));
+    ASSERT_TRUE(
+        wait_for([] { return processes_named("/system/bin/SensorProbe").size() == 1; }, 20));
+    std::this_thread::sleep_for(std::chrono::milliseconds(500)); // it has been told by now
+    for (const device::Process &process : processes_named("/system/bin/SensorProbe")) {
+        kill(process.pid, SIGKILL);
+    }
+    const Ended ended = fptest.wait();
+    EXPECT_EQ(ended.status, 1);
+    EXPECT_EQ(reason(0), "the gatherer ended before it had reported");
+    EXPECT_LT(ended.seconds, 8);
+}
+
+// --- a run that is suspended ---------------------------------------------------------
+
+TEST_F(ItemEnd, SuspendedRunSuspendsItsItemsAndNoTimePasses)
+{
+    Start start;
+    start.arguments = with_plan({{"Item", "note /tmp/scene/begun sleep 1.5 report G 100 0 fine"}},
+                                {"--timeout", "2.5"});
+    start.has_own_group = true;
+    FptestProcess fptest(start);
+    ASSERT_TRUE(wait_for_file("begun"));
+    fptest.signal(SIGTSTP);
+    ASSERT_TRUE(wait_for([&] { return is_suspended(fptest.pid()); }, 20));
+    for (const device::Process &process : processes_named("/system/bin/Item")) {
+        EXPECT_TRUE(is_suspended(process.pid));
+    }
+    std::this_thread::sleep_for(std::chrono::seconds(3));
+    fptest.signal(SIGCONT);
+    EXPECT_EQ(fptest.wait().status, 0);
+    EXPECT_THAT(outcomes(json()), ElementsAre("Item: passed"));
+}
+
+TEST_F(ItemEnd, RunThatNobodyCouldResumeIsNotSuspended)
+{
+    Start start;
+    start.arguments = with_plan({{"Item", "note /tmp/scene/begun sleep 1 report G 100 0 fine"}});
+    start.has_own_session = true;
+    FptestProcess fptest(start);
+    ASSERT_TRUE(wait_for_file("begun"));
+    fptest.signal(SIGTSTP);
+    EXPECT_EQ(fptest.wait().status, 0);
+    EXPECT_THAT(outcomes(json()), ElementsAre("Item: passed"));
+}
+
+TEST_F(ItemEnd, RunThatIsKilledWhileSuspendedLeavesNoItem)
+{
+    Start start;
+    start.arguments = with_plan({{"Item", "note /tmp/scene/begun sleep 60"}});
+    start.has_own_group = true;
+    FptestProcess fptest(start);
+    ASSERT_TRUE(wait_for_file("begun"));
+    fptest.signal(SIGTSTP);
+    ASSERT_TRUE(wait_for([&] { return is_suspended(fptest.pid()); }, 20));
+    fptest.signal(SIGKILL);
+    fptest.wait();
+    EXPECT_TRUE(wait_for([] { return running_items().empty(); }, 20));
+    EXPECT_TRUE(wait_for([] { return processes_named(FPTEST_PROGRAM).empty(); }, 20));
+}
+
+} // namespace
