@@ -25,9 +25,11 @@ struct RunOptions {
     std::optional<double> timeout; // seconds for each item
     double grace = 2;              // seconds that a stopped item has to end
     bool exit_status = false;      // one that is not 0 fails its item
-    int repeat = 1;
+    std::optional<int> repeat;
+    std::optional<double> time_limit; // seconds after which no round begins
+    bool until_fail = false;
     int pass_code = 0;
-    std::string junit; // files; empty for none
+    std::string junit; // files, "-" for standard output; empty for none
     std::string json;
     std::string log;
 };

@@ -3,15 +3,15 @@
 
 #include "reports.h"
 
-#include "descriptor.h"
 #include "text.h"
-#include "write.h"
+#include "wording.h"
+#include "writer.h"
 
 #include <cmath>
 #include <fcntl.h>
 #include <nlohmann/json.hpp>
 #include <optional>
-#include <sys/stat.h>
+#include <unistd.h>
 #include <utility>
 #include <vector>
 
@@ -23,7 +23,7 @@ namespace
 
 using Json = nlohmann::ordered_json;
 
-constexpr int kFormat = 1; // one more whenever a reader would have to be changed
+constexpr int kFormat = 2; // one more whenever a reader would have to be changed
 
 Json text_or_null(const std::optional<std::string> &text)
 {
@@ -46,22 +46,6 @@ Json event(const char *name)
     return {{"event", name}};
 }
 
-// Which of the planned items an event is about.
-Json event(const char *name, const Run &run, Place place)
-{
-    std::size_t index = place.item;
-    for (std::size_t suite = 0; suite < place.suite; ++suite) {
-        index += run.suites[suite].items.size();
-    }
-    const Suite &suite = run.suites[place.suite];
-    const ItemRun &item = suite.items[place.item];
-    return {{"event", name},
-            {"index", index},
-            {"group", clean(item.group)},
-            {"item", clean(item.name)},
-            {"round", suite.round}};
-}
-
 void add_report(Json &json, const Report &report)
 {
     json["progress"] = text_or_null(report.progress);
@@ -74,14 +58,32 @@ Json start_of(const ItemRun &item)
     return item.start ? Json(timestamp(*item.start)) : Json();
 }
 
-Json planned_items(const Run &run)
+// How its process ended.
+void add_end(Json &json, const ItemRun &item)
+{
+    json["exit_status"] = item.exit_status ? Json(*item.exit_status) : Json();
+    json["signal"] = item.signal != 0 ? Json(name_of_signal(item.signal)) : Json();
+    Json left = Json::array();
+    for (const Leftover &one : item.left_running) {
+        left.push_back({{"name", clean(one.name)}, {"pid", one.process}});
+    }
+    json["left_running"] = std::move(left);
+}
+
+Json summary_of(const Run &run)
 {
     Json items = Json::array();
-    for (const Suite &suite : run.suites) {
-        for (const ItemRun &item : suite.items) {
-            items.push_back(
-                {{"group", clean(item.group)}, {"item", clean(item.name)}, {"round", suite.round}});
-        }
+    for (const Summary &one : run.summary) {
+        const Times &times = one.times;
+        Json json = {{"group", clean(one.group)},
+                     {"item", clean(one.name)},
+                     {"run", times.count()},
+                     {"passed", one.passed}};
+        const bool is_run = times.count() > 0;
+        json["least"] = is_run ? seconds_or_null(times.least()) : Json();
+        json["median"] = is_run ? seconds_or_null(times.median()) : Json();
+        json["longest"] = is_run ? seconds_or_null(times.longest()) : Json();
+        items.push_back(std::move(json));
     }
     return items;
 }
@@ -95,9 +97,18 @@ class JsonReport : public Listener
 
     void begin(const Run &run) override
     {
-        open_file();
+        if (path_ == "-") {
+            writer_.emplace("standard output", STDOUT_FILENO);
+        } else {
+            writer_.emplace(path_, O_WRONLY | O_CREAT | O_TRUNC | O_APPEND, 0666);
+        }
+        Json items = Json::array();
         for (const Suite &suite : run.suites) {
-            ended_.emplace_back(suite.items.size(), false);
+            first_of_.push_back(ended_.size());
+            ended_.resize(ended_.size() + suite.items.size(), false);
+            for (const ItemRun &item : suite.items) {
+                items.push_back({{"group", clean(item.group)}, {"item", clean(item.name)}});
+            }
         }
         Json json = event("run");
         json["format"] = kFormat;
@@ -105,40 +116,66 @@ class JsonReport : public Listener
         json["version"] = FPTEST_VERSION;
         json["plan"] = clean(run.plan);
         json["vendor"] = run.vendor;
-        json["rounds"] = run.rounds;
+        json["rounds"] = run.rounds ? Json(*run.rounds) : Json();
+        json["time_limit"] = seconds_or_null(run.time_limit);
+        json["until_fail"] = run.until_fail;
         json["pass_code"] = run.pass_code;
         json["start"] = timestamp(run.start);
-        json["items"] = planned_items(run);
+        json["items"] = std::move(items);
         write(json);
     }
 
     void started(const Run &run, Place place) override
     {
-        Json json = event("start", run, place);
+        Json json = event_of("start", run, place);
         json["start"] = start_of(item_at(run, place));
         write(json);
     }
 
     void progressed(const Run &run, Place place) override
     {
-        Json json = event("progress", run, place);
-        json["time"] = timestamp(std::chrono::system_clock::now());
+        Json json = event_of("progress", run, place);
+        json["time"] = now();
         add_report(json, item_at(run, place).report);
         write(json);
     }
 
     void ended(const Run &run, Place place) override
     {
-        ended_[place.suite][place.item] = true;
+        ended_[first_of_[place.suite] + place.item] = true;
         const ItemRun &item = item_at(run, place);
-        Json json = event("end", run, place);
+        Json json = event_of("end", run, place);
         json["outcome"] = word(item.outcome);
         add_report(json, item.report);
         json["reason"] = words_or_null(item.reason);
         json["start"] = start_of(item);
         json["seconds"] = seconds_or_null(item.seconds);
+        add_end(json, item);
         json["output"] = clean(item.output);
         write(json);
+    }
+
+    void late(const Run &run, Place place, const Report &report) override
+    {
+        Json json = event_of("late", run, place);
+        json["time"] = now();
+        add_report(json, report);
+        write(json);
+    }
+
+    void paused(const Run & /* run */) override
+    {
+        write({{"event", "paused"}, {"time", now()}});
+    }
+
+    void resumed(const Run & /* run */) override
+    {
+        write({{"event", "resumed"}, {"time", now()}});
+    }
+
+    void round_over(const Run & /* run */) override
+    {
+        ended_.assign(ended_.size(), false);
     }
 
     void finish(const Run &run) override
@@ -147,47 +184,51 @@ class JsonReport : public Listener
         const Counts counts = count(run);
         Json json = event("finish");
         json["finished"] = run.finished;
-        json["reason"] = words_or_null(run.why_unfinished);
+        json["reason"] = words_or_null(run.finished ? run.why_ended : run.why_unfinished);
+        json["rounds"] = run.round;
         json["passed"] = counts.passed;
         json["failed"] = counts.failed;
         json["not_run"] = counts.to_go;
         json["seconds"] = seconds_or_null(run.seconds);
+        json["summary"] = summary_of(run);
         write(json);
+    }
+
+    bool flush() override
+    {
+        return !writer_ || !writer_->is_pending();
     }
 
     std::string failure() const override
     {
-        return failure_;
+        return writer_ ? writer_->failure() : "";
     }
 
   private:
-    static const ItemRun &item_at(const Run &run, Place place)
+    static std::string now()
     {
-        return run.suites[place.suite].items[place.item];
+        return timestamp(std::chrono::system_clock::now());
     }
 
-    void open_file()
+    // Which item of which round it is about.
+    Json event_of(const char *name, const Run &run, Place place) const
     {
-        if (path_ == "-") {
-            path_ = "standard output";
-            descriptor_ = STDOUT_FILENO;
-            return;
-        }
-        file_ = Descriptor(
-            open(path_.c_str(), O_WRONLY | O_CREAT | O_TRUNC | O_APPEND | O_CLOEXEC, 0666));
-        descriptor_ = file_.get();
-        if (!file_.is_open()) {
-            failure_ = failure_of(path_, errno);
-        }
+        const ItemRun &item = item_at(run, place);
+        const auto rounds_before = static_cast<std::size_t>(run.round) - 1;
+        return {{"event", name},
+                {"index", rounds_before * ended_.size() + first_of_[place.suite] + place.item},
+                {"group", clean(item.group)},
+                {"item", clean(item.name)},
+                {"round", run.round}};
     }
 
-    // So that every planned item has its end in the file of a run that was not
-    // killed.
+    // So that every item of a round that was begun has its end in the file of a run
+    // that was not killed.
     void end_the_rest(const Run &run)
     {
-        for (std::size_t suite = 0; suite < ended_.size(); ++suite) {
-            for (std::size_t item = 0; item < ended_[suite].size(); ++item) {
-                if (!ended_[suite][item]) {
+        for (std::size_t suite = 0; suite < first_of_.size(); ++suite) {
+            for (std::size_t item = 0; item < run.suites[suite].items.size(); ++item) {
+                if (!ended_[first_of_[suite] + item]) {
                     ended(run, {suite, item});
                 }
             }
@@ -196,35 +237,13 @@ class JsonReport : public Listener
 
     void write(const Json &json)
     {
-        if (!failure_.empty()) {
-            return;
-        }
-        const std::string line = json.dump() + "\n";
-        const std::size_t written = write_text(descriptor_, line);
-        if (written < line.size()) {
-            failure_ = failure_of(path_, errno);
-            take_back(written);
-        }
-    }
-
-    // A line that found no room would be taken for a broken file. What goes to
-    // standard output is not this object's to cut.
-    void take_back(std::size_t written)
-    {
-        struct stat status {
-        };
-        if (file_.is_open() && fstat(file_.get(), &status) == 0 && S_ISREG(status.st_mode)) {
-            // where even that fails the last line is left broken, and the failure is told
-            [[maybe_unused]] const int result =
-                ftruncate(file_.get(), status.st_size - static_cast<off_t>(written));
-        }
+        writer_->write(json.dump() + "\n");
     }
 
     std::string path_;
-    Descriptor file_{-1};
-    int descriptor_ = -1;
-    std::vector<std::vector<bool>> ended_;
-    std::string failure_;
+    std::optional<Writer> writer_;
+    std::vector<std::size_t> first_of_; // each suite, of a round's items
+    std::vector<bool> ended_;           // each item of the round
 };
 
 } // namespace

@@ -4,236 +4,29 @@
 #include "reports.h"
 
 #include "descriptor.h"
-#include "text.h"
+#include "junit_document.h"
+#include "wording.h"
 #include "write.h"
+#include "writer.h"
 
 #include <algorithm>
-#include <array>
 #include <cerrno>
 #include <chrono>
-#include <cmath>
 #include <cstdio>
 #include <cstdlib>
 #include <fcntl.h>
+#include <functional>
 #include <optional>
 #include <string_view>
 #include <sys/stat.h>
 #include <utility>
+#include <vector>
 
 namespace fptest
 {
 
 namespace
 {
-
-// --- XML ---------------------------------------------------------------------
-
-std::string escaped(std::string_view text)
-{
-    static constexpr Replacement kEscapes[] = {
-        {"&", "&amp;"},
-        {"<", "&lt;"},
-        {">", "&gt;"},
-        {"\"", "&quot;"},
-        {"\r", "&#13;"},
-        // Unicode has them, XML has not
-        {"\xEF\xBF\xBE", "\uFFFD"},
-        {"\xEF\xBF\xBF", "\uFFFD"},
-    };
-    return replaced(clean(text), kEscapes);
-}
-
-// A reader makes blanks of the tabs and line feeds in attributes.
-std::string attribute(const char *name, std::string_view value)
-{
-    static constexpr Replacement kEscapes[] = {{"\t", "&#9;"}, {"\n", "&#10;"}};
-    return std::string(" ") + name + "=\"" + replaced(escaped(value), kEscapes) + "\"";
-}
-
-std::string attribute(const char *name, std::size_t value)
-{
-    return attribute(name, std::to_string(value));
-}
-
-std::string time_attribute(double seconds)
-{
-    const long long milliseconds = std::llround(seconds * 1000);
-    std::array<char, 40> text{};
-    std::snprintf(text.data(), text.size(), "%lld.%03lld", milliseconds / 1000,
-                  milliseconds % 1000);
-    return attribute("time", text.data());
-}
-
-// In whole seconds and without a zone, as the format has it.
-std::string timestamp_attribute(std::chrono::system_clock::time_point time)
-{
-    return attribute("timestamp", timestamp(time).substr(0, 19));
-}
-
-std::string property(const std::string &indent, const char *name,
-                     const std::optional<std::string> &value)
-{
-    return value ? indent + "<property" + attribute("name", name) + attribute("value", *value) +
-                       "/>\n"
-                 : "";
-}
-
-std::string properties(const std::string &indent, const std::string &inside)
-{
-    return inside.empty() ? "" : indent + "<properties>\n" + inside + indent + "</properties>\n";
-}
-
-// --- the document ------------------------------------------------------------
-
-struct Tests {
-    std::size_t all = 0;
-    std::size_t failures = 0;
-    std::size_t errors = 0;
-    std::size_t skipped = 0;
-};
-
-void add(Tests &tests, const Suite &suite)
-{
-    for (const ItemRun &item : suite.items) {
-        ++tests.all;
-        switch (item.outcome) {
-        case Outcome::passed:
-            break;
-        case Outcome::not_run:
-            ++tests.skipped;
-            break;
-        case Outcome::failed:
-            ++tests.failures;
-            break;
-        case Outcome::silent:
-        case Outcome::timed_out:
-        case Outcome::stopped:
-            ++tests.errors;
-            break;
-        }
-    }
-}
-
-std::string attributes(const Tests &tests)
-{
-    return attribute("tests", tests.all) + attribute("failures", tests.failures) +
-           attribute("errors", tests.errors) + attribute("skipped", tests.skipped);
-}
-
-// Why there is no outcome of an item.
-std::string why_not_run(const Run &run, const ItemRun &item, bool ended)
-{
-    if (!item.reason.empty()) {
-        return item.reason;
-    }
-    if (!ended) {
-        return item.start ? "was running when this was written"
-                          : "not run yet when this was written";
-    }
-    return run.why_unfinished.empty() ? "not run" : run.why_unfinished;
-}
-
-// What is known of an item that has not passed, for readers that show no
-// properties.
-std::string details(const Report &report)
-{
-    std::string text;
-    if (report.result) {
-        text += "result: " + *report.result + "\n";
-    }
-    if (report.progress) {
-        text += "progress: " + *report.progress + "\n";
-    }
-    if (report.description) {
-        text += "description: " + *report.description + "\n";
-    }
-    return text;
-}
-
-std::string verdict(const Run &run, const ItemRun &item, bool ended)
-{
-    if (item.outcome == Outcome::passed) {
-        return "";
-    }
-    if (item.outcome == Outcome::not_run) {
-        return "      <skipped" + attribute("message", why_not_run(run, item, ended)) + "/>\n";
-    }
-    const std::string element = item.outcome == Outcome::failed ? "failure" : "error";
-    const char *const type = item.outcome == Outcome::failed ? "result" : word(item.outcome);
-    return "      <" + element + attribute("type", type) +
-           attribute("message", item.reason.empty() ? word(item.outcome) : item.reason) + ">" +
-           escaped(details(item.report)) + "</" + element + ">\n";
-}
-
-std::string test_case(const Run &run, const ItemRun &item, bool ended)
-{
-    const std::string indent(8, ' ');
-    const Report &report = item.report;
-    const std::optional<std::string> result =
-        report.result_without_value ? std::optional<std::string>("") : report.result;
-    std::string text = "    <testcase" + attribute("classname", item.group) +
-                       attribute("name", item.name) + time_attribute(item.seconds.value_or(0)) +
-                       ">\n";
-    text += properties("      ", property(indent, "progress", report.progress) +
-                                     property(indent, "result", result) +
-                                     property(indent, "description", report.description));
-    text += verdict(run, item, ended);
-    if (!item.output.empty()) {
-        text += "      <system-out>" + escaped(item.output) + "</system-out>\n";
-    }
-    return text + "    </testcase>\n";
-}
-
-std::string suite_properties(const Run &run, bool ended)
-{
-    const std::string indent(6, ' ');
-    std::string inside = property(indent, "plan", run.plan) +
-                         property(indent, "vendor", std::to_string(run.vendor)) +
-                         property(indent, "pass_code", std::to_string(run.pass_code)) +
-                         property(indent, "finished", run.finished ? "true" : "false");
-    if (!run.finished) {
-        inside += property(indent, "reason",
-                           ended ? run.why_unfinished : "the run went on when this was written");
-    }
-    return properties("    ", inside);
-}
-
-std::string test_suite(const Run &run, const Suite &suite, bool ended)
-{
-    Tests tests;
-    add(tests, suite);
-    double seconds = 0;
-    auto start = run.start;
-    for (std::size_t at = suite.items.size(); at-- > 0;) {
-        seconds += suite.items[at].seconds.value_or(0);
-        start = suite.items[at].start.value_or(start);
-    }
-    std::string text = "  <testsuite" + attribute("name", title(run, suite)) + attributes(tests) +
-                       time_attribute(seconds) + timestamp_attribute(start) + ">\n";
-    text += suite_properties(run, ended);
-    for (const ItemRun &item : suite.items) {
-        text += test_case(run, item, ended);
-    }
-    return text + "  </testsuite>\n";
-}
-
-// The whole run; ended is false while it lasts.
-std::string document(const Run &run, bool ended)
-{
-    Tests tests;
-    for (const Suite &suite : run.suites) {
-        add(tests, suite);
-    }
-    std::string text = "<?xml version=\"1.0\" encoding=\"UTF-8\"?>\n<testsuites" +
-                       attribute("name", "fptest") + attributes(tests) +
-                       time_attribute(run.seconds) + timestamp_attribute(run.start) + ">\n";
-    for (const Suite &suite : run.suites) {
-        text += test_suite(run, suite, ended);
-    }
-    return text + "</testsuites>\n";
-}
-
-// --- the file ----------------------------------------------------------------
 
 // Whether a file can be put in that one's place. A pipe or a device cannot be
 // replaced, and what has a name only as a descriptor is somebody else's.
@@ -257,6 +50,81 @@ std::string real_path(const std::string &path)
     return real ? real.get() : path;
 }
 
+// A file without a name, gone with this process.
+Descriptor unnamed_file(const std::string &directory)
+{
+    Descriptor file(open(directory.c_str(), O_TMPFILE | O_RDWR | O_CLOEXEC, 0600));
+    if (!file.is_open()) { // not every file system has such files
+        std::string name = directory + "/fptest-XXXXXX";
+        file = Descriptor(mkostemp(name.data(), O_CLOEXEC));
+        if (file.is_open()) {
+            unlink(name.c_str());
+        }
+    }
+    return file;
+}
+
+// The rounds that are over, as they are in the document.
+class Spool
+{
+  public:
+    // In one of the directories. False where there is no room.
+    bool open(const std::vector<std::string> &directories)
+    {
+        for (const std::string &directory : directories) {
+            file_ = unnamed_file(directory);
+            if (file_.is_open()) {
+                return true;
+            }
+        }
+        return false;
+    }
+
+    bool add(std::string_view text)
+    {
+        size_ += static_cast<off_t>(text.size());
+        return write_text(file_.get(), text) == text.size();
+    }
+
+    off_t size() const
+    {
+        return size_;
+    }
+
+    // The piece there, as far as it is there; empty at the end.
+    std::string piece(off_t at, off_t end) const
+    {
+        std::string text(static_cast<std::size_t>(std::min<off_t>(kPiece, end - at)), '\0');
+        const ssize_t got = pread(file_.get(), text.data(), text.size(), at);
+        text.resize(static_cast<std::size_t>(std::max<ssize_t>(got, 0)));
+        return text;
+    }
+
+  private:
+    static constexpr off_t kPiece = 1 << 20;
+
+    Descriptor file_{-1};
+    off_t size_ = 0;
+};
+
+std::string filled_in(const std::string &text, const std::string &how_it_stands)
+{
+    std::string whole;
+    std::size_t at = 0;
+    for (std::size_t mark = text.find(kHowItStands); mark != std::string::npos;
+         mark = text.find(kHowItStands, at)) {
+        whole.append(text, at, mark - at).append(how_it_stands);
+        at = mark + 1;
+    }
+    return whole.append(text, at);
+}
+
+std::string directory_of(const std::string &path)
+{
+    const std::size_t slash = path.rfind('/');
+    return slash == std::string::npos ? "." : path.substr(0, slash + 1);
+}
+
 class JunitReport : public Listener
 {
   public:
@@ -266,14 +134,18 @@ class JunitReport : public Listener
 
     void begin(const Run &run) override
     {
-        if (is_replaceable(path_)) {
+        if (path_ == "-") {
+            direct_.emplace("standard output", STDOUT_FILENO);
+        } else if (is_replaceable(path_)) {
             target_ = real_path(path_);
-            replace(run, false);
-            return;
+        } else {
+            direct_.emplace(path_, O_WRONLY | O_APPEND, 0);
         }
-        direct_ = Descriptor(open(path_.c_str(), O_WRONLY | O_APPEND | O_NOCTTY | O_CLOEXEC));
-        if (!direct_.is_open()) {
+        if (has_rounds(run) && !spool_.open(spool_directories())) {
             fail();
+        }
+        if (!direct_) {
+            replace(run);
         }
     }
 
@@ -292,44 +164,96 @@ class JunitReport : public Listener
         change(run);
     }
 
+    void late(const Run &run, Place place, const Report &report) override
+    {
+        late_.push_back({place.suite, late_report(item_at(run, place), report)});
+        change(run);
+    }
+
     void tick(const Run &run) override
     {
         if (changed_ && Clock::now() >= next_) {
-            replace(run, false);
+            replace(run);
         }
+    }
+
+    void round_over(const Run &run) override
+    {
+        if (failure_.empty() && !spool_.add(junit_round(run, late_))) {
+            fail();
+        }
+        before_ += tests_of_round(run);
+        late_.clear();
     }
 
     void finish(const Run &run) override
     {
-        if (!direct_.is_open()) {
-            replace(run, true);
-        } else if (!write_whole(direct_.get(), document(run, true))) {
-            fail();
+        if (!direct_) {
+            replace(run);
+        } else if (spool_.size() == 0) {
+            write(run, [this](std::string_view text) {
+                direct_->write(std::string(text));
+                return true;
+            });
+        } else {
+            // there may be no room for it where it waits for its reader
+            rest_ = spool_.size();
+            if (!write(run, [this](std::string_view text) { return spool_.add(text); })) {
+                fail();
+            }
+            flush();
         }
+    }
+
+    bool flush() override
+    {
+        if (!direct_ || !failure().empty()) {
+            return true;
+        }
+        while (rest_ && !direct_->is_pending()) {
+            std::string piece = spool_.piece(*rest_, spool_.size());
+            *rest_ += static_cast<off_t>(piece.size());
+            if (piece.empty()) {
+                rest_.reset();
+            } else {
+                direct_->write(std::move(piece));
+            }
+        }
+        return !rest_ && !direct_->is_pending();
     }
 
     std::string failure() const override
     {
-        return failure_;
+        return failure_.empty() && direct_ ? direct_->failure() : failure_;
     }
 
   private:
     using Clock = std::chrono::steady_clock;
+    using Sink = std::function<bool(std::string_view)>;
+
+    std::vector<std::string> spool_directories() const
+    {
+        if (!direct_) {
+            return {directory_of(target_)};
+        }
+        const char *const chosen = std::getenv("TMPDIR");
+        return {chosen != nullptr ? chosen : "/tmp", "/tmp", "/data/local/tmp"};
+    }
 
     void change(const Run &run)
     {
-        changed_ = !direct_.is_open();
+        changed_ = !direct_;
         tick(run);
     }
 
     // The more there is to write, the less often: a long run is not to be held up.
-    void replace(const Run &run, bool ended)
+    void replace(const Run &run)
     {
         if (!failure_.empty()) {
             return;
         }
         const auto start = Clock::now();
-        if (!replace_file(document(run, ended))) {
+        if (!replace_file(run)) {
             fail();
         }
         changed_ = false;
@@ -337,10 +261,15 @@ class JunitReport : public Listener
         next_ = end + std::max<Clock::duration>(std::chrono::seconds(1), 20 * (end - start));
     }
 
-    bool replace_file(const std::string &text)
+    bool replace_file(const Run &run) const
     {
         const std::string aside = target_ + "." + std::to_string(getpid()) + ".tmp";
-        if (write_file(aside, text) && std::rename(aside.c_str(), target_.c_str()) == 0) {
+        const int flags = O_WRONLY | O_CREAT | O_TRUNC | O_NOFOLLOW | O_CLOEXEC;
+        const Descriptor file(open(aside.c_str(), flags, 0666));
+        const bool is_written = file.is_open() && write(run, [&file](std::string_view text) {
+                                    return write_text(file.get(), text) == text.size();
+                                });
+        if (is_written && std::rename(aside.c_str(), target_.c_str()) == 0) {
             return true;
         }
         const int error = errno;
@@ -349,16 +278,22 @@ class JunitReport : public Listener
         return false;
     }
 
-    static bool write_file(const std::string &path, const std::string &text)
+    // The whole document, in pieces. False where the sink says so.
+    bool write(const Run &run, const Sink &sink) const
     {
-        const int flags = O_WRONLY | O_CREAT | O_TRUNC | O_NOFOLLOW | O_CLOEXEC;
-        const Descriptor file(open(path.c_str(), flags, 0666));
-        return file.is_open() && write_whole(file.get(), text);
-    }
-
-    static bool write_whole(int descriptor, const std::string &text)
-    {
-        return write_text(descriptor, text) == text.size();
+        const std::string how = junit_how_it_stands(run);
+        if (!sink(junit_head(run, before_))) {
+            return false;
+        }
+        const off_t end = spool_.size(); // the sink may be the spool
+        for (off_t at = 0; at < end;) {
+            const std::string piece = spool_.piece(at, end);
+            if (piece.empty() || !sink(filled_in(piece, how))) {
+                return false;
+            }
+            at += static_cast<off_t>(piece.size());
+        }
+        return sink(filled_in(junit_round(run, late_), how)) && sink(junit_tail(run));
     }
 
     void fail()
@@ -368,7 +303,11 @@ class JunitReport : public Listener
 
     std::string path_;
     std::string target_;
-    Descriptor direct_{-1};
+    std::optional<Writer> direct_; // in place of the target
+    Spool spool_;
+    std::optional<off_t> rest_; // from where on the spool has the document
+    std::vector<Late> late_;    // of the round
+    Tests before_;              // of the rounds before it
     bool changed_ = false;
     Clock::time_point next_;
     std::string failure_;

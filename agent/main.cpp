@@ -99,6 +99,33 @@ template <typename Number> CLI::Validator range(Number least, Number most)
             ""};
 }
 
+// Seconds, or so many minutes, hours or days; put down in seconds.
+CLI::Validator time_span()
+{
+    return {[](std::string &text) {
+                static constexpr std::pair<char, double> kUnits[] = {
+                    {'s', 1}, {'m', 60}, {'h', 3600}, {'d', 86400}};
+                double number = 0;
+                const char *const last = text.data() + text.size();
+                const auto [stop, error] = std::from_chars(text.data(), last, number);
+                double seconds = error == std::errc{} && stop == last ? number : 0;
+                for (const auto &[unit, size] : kUnits) {
+                    if (error == std::errc{} && stop + 1 == last && *stop == unit) {
+                        seconds = number * size;
+                    }
+                }
+                if (!(seconds >= 0.001 && seconds <= 1e8)) {
+                    return "'" + fptest::one_line(text) + "' is no time as 90, 90s, 10m, 2h or 1d";
+                }
+                std::ostringstream put_down;
+                put_down.precision(17);
+                put_down << seconds;
+                text = put_down.str();
+                return std::string();
+            },
+            ""};
+}
+
 // The codes that the module has a text for, spelled as it does.
 CLI::Validator result_code()
 {
@@ -219,10 +246,22 @@ class CommandLine
         command->add_option("--repeat", run_.repeat, "run everything N times")
             ->type_name("N")
             ->check(range(1, 1000000));
+        command
+            ->add_option("--for", run_.time_limit,
+                         "begin another round of everything for so\n"
+                         "long: 90, 90s, 10m, 2h, 1d")
+            ->type_name("TIME")
+            ->transform(time_span());
+        command->add_flag("--until-fail", run_.until_fail,
+                          "end with the first item that does not pass;\n"
+                          "begin another round until then");
         command->add_flag("--list", run_.list,
                           "print what would be run and start nothing;\n"
                           "without PATH, all that can be run");
-        command->add_option("--junit", run_.junit, "write the results as JUnit XML")
+        command
+            ->add_option("--junit", run_.junit,
+                         "write the results as JUnit XML ('-': standard\n"
+                         "output)")
             ->type_name("FILE")
             ->check(not_empty());
         command

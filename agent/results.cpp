@@ -6,6 +6,11 @@
 namespace fptest
 {
 
+const ItemRun &item_at(const Run &run, Place place)
+{
+    return run.suites[place.suite].items[place.item];
+}
+
 Counts count(const std::vector<ItemRun> &items)
 {
     Counts counts;
@@ -30,14 +35,48 @@ Counts count(const std::vector<ItemRun> &items)
 
 Counts count(const Run &run)
 {
-    Counts sum;
+    Counts sum = run.before;
+    std::size_t items = 0;
     for (const Suite &suite : run.suites) {
-        const Counts counts = count(suite.items);
-        sum.passed += counts.passed;
-        sum.failed += counts.failed;
-        sum.to_go += counts.to_go;
+        sum += count(suite.items);
+        items += suite.items.size();
     }
+    sum.to_go += rounds_to_come(run) * items;
     return sum;
+}
+
+bool has_rounds(const Run &run)
+{
+    return run.rounds != 1;
+}
+
+bool has_fixed_rounds(const Run &run)
+{
+    return run.rounds && !run.time_limit && !run.until_fail;
+}
+
+std::size_t rounds_to_come(const Run &run)
+{
+    const bool is_known = run.rounds && !run.time_limit && !run.finished;
+    return is_known ? static_cast<std::size_t>(*run.rounds - run.round) : 0;
+}
+
+void summarize(Run &run)
+{
+    const bool is_first = run.summary.empty();
+    std::size_t at = 0;
+    for (const Suite &suite : run.suites) {
+        for (const ItemRun &item : suite.items) {
+            if (is_first) {
+                run.summary.push_back({item.group, item.name, 0, {}});
+            }
+            Summary &summary = run.summary[at++];
+            summary.passed += item.outcome == Outcome::passed ? 1 : 0;
+            if (item.outcome != Outcome::not_run) {
+                summary.times.add(item.seconds.value_or(0));
+            }
+        }
+    }
 }
 
 const char *word(Outcome outcome)
@@ -59,10 +98,14 @@ const char *word(Outcome outcome)
     return "";
 }
 
+std::string of_round(const Run &run)
+{
+    return has_rounds(run) ? " (round " + std::to_string(run.round) + ")" : "";
+}
+
 std::string title(const Run &run, const Suite &suite)
 {
-    return run.rounds > 1 ? suite.group + " (round " + std::to_string(suite.round) + ")"
-                          : suite.group;
+    return suite.group + of_round(run);
 }
 
 } // namespace fptest

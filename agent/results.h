@@ -5,6 +5,8 @@
 // by everything that shows or writes results.
 #pragma once
 
+#include "times.h"
+
 #include <chrono>
 #include <cstddef>
 #include <optional>
@@ -63,7 +65,6 @@ struct ItemRun {
 // Items that are run in a row and belong to one group.
 struct Suite {
     std::string group;
-    int round = 1; // of --repeat
     std::vector<ItemRun> items;
 };
 
@@ -76,18 +77,40 @@ struct Counts {
     {
         return passed + failed + to_go;
     }
+    Counts &operator+=(const Counts &more)
+    {
+        passed += more.passed;
+        failed += more.failed;
+        to_go += more.to_go;
+        return *this;
+    }
 };
 
+// One item over the rounds that have been run.
+struct Summary {
+    std::string group;
+    std::string name;
+    std::size_t passed = 0;
+    Times times; // of each time that it was run
+};
+
+// Holds one round, whatever their number.
 struct Run {
     std::string plan; // the file that the plan came from
-    int rounds = 1;
+    int round = 1;
+    std::optional<int> rounds = 1;    // at most; nothing where their number ends no run
+    std::optional<double> time_limit; // in seconds: no round begins after that
+    bool until_fail = false;          // it ends with the first item that does not pass
     int pass_code = 0;
     int vendor = 0;
-    std::vector<Suite> suites;
+    std::vector<Suite> suites;    // of the round
+    Counts before;                // of the rounds before it
+    std::vector<Summary> summary; // in the order of the items, once a round is over
     std::chrono::system_clock::time_point start;
     double seconds = 0;         // since the start, when last looked at
-    bool finished = false;      // every item has been run
+    bool finished = false;      // all that was asked for has been done
     std::string why_unfinished; // once it has ended without that
+    std::string why_ended;      // once it has ended within a round, as was asked for
 };
 
 // Where in a run something happened.
@@ -96,18 +119,36 @@ struct Place {
     std::size_t item = 0;
 };
 
+const ItemRun &item_at(const Run &run, Place place);
+
 Counts count(const std::vector<ItemRun> &items);
+// Of all rounds. To go is what is left of this round, and of those to come.
 Counts count(const Run &run);
+
+// Whether it is, or was to be, of more than one round.
+bool has_rounds(const Run &run);
+// Whether the number of rounds was known when it began.
+bool has_fixed_rounds(const Run &run);
+// The rounds that have not begun, as far as their number is known; those of a run
+// that has finished have not been asked for.
+std::size_t rounds_to_come(const Run &run);
+
+// Counts the round that is over in the summary.
+void summarize(Run &run);
 
 // "passed", "failed", "no result", "timed out", "stopped", "not run"
 const char *word(Outcome outcome);
 
-// "Bringup", or "Bringup (round 2)" where there is more than one round.
+// " (round 2)" where there is more than one.
+std::string of_round(const Run &run);
+
+// "Bringup", or "Bringup (round 2)"
 std::string title(const Run &run, const Suite &suite);
 
 // Gets told what happens, in this order: begin, then for each item started, any
-// number of progressed, ended; then finish, also where items were not run. What
-// is told is already in the run.
+// number of progressed, ended; round_over between one round and the next; then
+// finish, also where items were not run. What is told is already in the run. None
+// of them waits for who reads.
 class Listener
 {
   public:
@@ -121,6 +162,12 @@ class Listener
     virtual void progressed(const Run &run, Place place) = 0;
     virtual void ended(const Run &run, Place place) = 0;
     virtual void finish(const Run &run) = 0;
+
+    // All of a round has ended, and another one follows: the run still holds what is
+    // over.
+    virtual void round_over(const Run & /* run */)
+    {
+    }
 
     // An item that had ended already has reported: that changes no outcome, and the
     // item keeps the report that it was judged by.
@@ -139,6 +186,13 @@ class Listener
     // Several times a second while the run lasts.
     virtual void tick(const Run & /* run */)
     {
+    }
+
+    // Goes on with what waits for its reader, and does not wait for that. Whether
+    // all of it is written, or never will be.
+    virtual bool flush()
+    {
+        return true;
     }
 
     // What keeps it from writing, in words: "out.json: No space left on device";

@@ -7,19 +7,18 @@
 #include "terminal.h"
 #include "text.h"
 
-#include <algorithm>
-#include <array>
 #include <cerrno>
 #include <cstdio>
 #include <cstring>
 #include <unistd.h>
+#include <vector>
 
 namespace fptest
 {
 namespace
 {
 
-using Row = std::array<std::string, 5>;
+using Row = std::vector<std::string>;
 
 std::string shown(const std::optional<std::string> &text)
 {
@@ -40,28 +39,12 @@ std::vector<Row> table(const Plan &plan)
     return rows;
 }
 
-// Numbers stand right, words left; a terminal's lines are cut to its width.
+// A terminal's lines are cut to its width.
 void print(const std::vector<Row> &rows)
 {
-    std::array<std::size_t, 5> widths{};
-    for (const Row &row : rows) {
-        for (std::size_t column = 0; column < row.size(); ++column) {
-            widths[column] = std::max(widths[column], columns(row[column]));
-        }
-    }
-    for (const Row &row : rows) {
-        std::string line;
-        for (std::size_t column = 0; column < row.size(); ++column) {
-            const bool is_number = column == 2 || column == 3;
-            const std::string blanks(widths[column] - columns(row[column]), ' ');
-            line += (column > 0 ? "  " : "") +
-                    (is_number ? blanks + row[column] : row[column] + blanks);
-        }
-        line.erase(line.find_last_not_of(' ') + 1);
-        if (isatty(STDOUT_FILENO) != 0) {
-            line = cut(line, terminal_width(stdout));
-        }
-        std::printf("%s\n", line.c_str());
+    for (const std::string &line : aligned(rows, {false, false, true, true, false})) {
+        const bool is_cut = isatty(STDOUT_FILENO) != 0;
+        std::printf("%s\n", is_cut ? cut(line, terminal_width(stdout)).c_str() : line.c_str());
     }
 }
 

@@ -4,12 +4,12 @@
 #include "reports.h"
 
 #include "text.h"
+#include "wording.h"
+#include "writer.h"
 
 #include <algorithm>
-#include <cerrno>
 #include <cmath>
 #include <cstdlib>
-#include <cstring>
 #include <optional>
 #include <string_view>
 #include <utility>
@@ -61,7 +61,8 @@ std::string point(bool ok, std::size_t number, const std::string &name)
 
 std::string skipped(const Run &run, const ItemRun &item)
 {
-    const std::string &reason = item.reason.empty() ? run.why_unfinished : item.reason;
+    const std::string &why = run.finished ? run.why_ended : run.why_unfinished;
+    const std::string &reason = item.reason.empty() ? why : item.reason;
     return " # SKIP not run" + (reason.empty() ? "" : ": " + escaped(reason));
 }
 
@@ -75,10 +76,11 @@ std::string entry(const char *name, const std::optional<std::string> &text)
     return text ? entry(name, quoted(*text)) : "";
 }
 
-// What is known of an item that has not passed.
+// What is known of an item that has been run.
 std::string diagnosis(const ItemRun &item)
 {
     const Report &report = item.report;
+    const std::string left = left_running(item);
     std::string text = std::string(kIndent) + "  ---\n";
     text += entry("outcome", quoted(word(item.outcome)));
     if (!item.reason.empty()) {
@@ -91,6 +93,15 @@ std::string diagnosis(const ItemRun &item)
     if (item.seconds) {
         text += entry("duration_ms", std::to_string(std::llround(*item.seconds * 1000)));
     }
+    if (item.exit_status) {
+        text += entry("exit_status", std::to_string(*item.exit_status));
+    }
+    if (item.signal != 0) {
+        text += entry("signal", quoted(name_of_signal(item.signal)));
+    }
+    if (!left.empty()) {
+        text += entry("left_running", quoted(left));
+    }
     return text + kIndent + "  ...\n";
 }
 
@@ -98,8 +109,8 @@ std::string item_point(const Run &run, const ItemRun &item, std::size_t number)
 {
     const bool ran = item.outcome != Outcome::not_run;
     const bool ok = !ran || item.outcome == Outcome::passed;
-    return kIndent + point(ok, number, item.name) + (ran ? "" : skipped(run, item)) + "\n" +
-           (ok ? "" : diagnosis(item));
+    return kIndent + point(ok, number, item.name) +
+           (ran ? "\n" + diagnosis(item) : skipped(run, item) + "\n");
 }
 
 std::string suite_point(const Run &run, const Suite &suite, std::size_t number)
@@ -117,19 +128,20 @@ std::string suite_point(const Run &run, const Suite &suite, std::size_t number)
 class TapReport : public Listener
 {
   public:
-    explicit TapReport(std::FILE *stream) : stream_(stream)
+    explicit TapReport(std::FILE *stream) : writer_("the TAP output", fileno(stream))
     {
     }
 
     void begin(const Run &run) override
     {
-        for (const Suite &suite : run.suites) {
-            ended_.emplace_back(suite.items.size(), false);
-        }
+        begin_round(run);
         // Perl's Test::Harness, which runs many a bench, refuses 14 up to its 3.44. What
         // is written is the same: to 13 a subtest is lines that it does not know.
         const bool harness = std::getenv("HARNESS_ACTIVE") != nullptr;
-        write((harness ? "TAP version 13\n" : "TAP version 14\n") + plan_line(run.suites.size()));
+        write(harness ? "TAP version 13\n" : "TAP version 14\n");
+        if (has_fixed_rounds(run)) {
+            write(plan_line(run.suites.size() * static_cast<std::size_t>(*run.rounds)));
+        }
     }
 
     void started(const Run &run, Place place) override
@@ -149,13 +161,30 @@ class TapReport : public Listener
         write(next_lines(run, false));
     }
 
+    void late(const Run &run, Place place, const Report &report) override
+    {
+        write((open_ ? kIndent : "") + comment(late_report(item_at(run, place), report)));
+    }
+
+    void round_over(const Run &run) override
+    {
+        write(next_lines(run, true));
+        begin_round(run);
+    }
+
     void finish(const Run &run) override
     {
         const Counts counts = count(run);
         std::string text = next_lines(run, true);
-        text += "# " + std::to_string(counts.passed) + " passed, " + std::to_string(counts.failed) +
-                " failed, " + std::to_string(counts.to_go) + " not run in " +
-                duration(run.seconds) + "\n";
+        if (run.finished && !has_fixed_rounds(run)) {
+            text += plan_line(points_);
+        }
+        for (const std::string &line : summary_table(run)) {
+            text += comment(line);
+        }
+        text += comment(std::to_string(counts.passed) + " passed, " +
+                        std::to_string(counts.failed) + " failed, " + std::to_string(counts.to_go) +
+                        " not run in " + duration(run.seconds));
         if (!run.finished) {
             text += "Bail out!  " +
                     one_line(run.why_unfinished.empty() ? "the run did not finish"
@@ -165,12 +194,32 @@ class TapReport : public Listener
         write(text);
     }
 
+    bool flush() override
+    {
+        return !writer_.is_pending();
+    }
+
     std::string failure() const override
     {
-        return failure_;
+        return writer_.failure();
     }
 
   private:
+    static std::string comment(const std::string &text)
+    {
+        return "# " + text + "\n";
+    }
+
+    void begin_round(const Run &run)
+    {
+        ended_.clear();
+        for (const Suite &suite : run.suites) {
+            ended_.emplace_back(suite.items.size(), false);
+        }
+        begun_ = 0;
+        suite_ = 0;
+    }
+
     // The lines that are due. Points stand in the order of the plan, or a harness
     // complains: one that has ended early waits for those before it.
     std::string next_lines(const Run &run, bool all)
@@ -188,7 +237,8 @@ class TapReport : public Listener
             if (item_ < suite.items.size()) {
                 break;
             }
-            text += suite_point(run, suite, ++suite_);
+            text += suite_point(run, suite, ++points_);
+            ++suite_;
             item_ = 0;
             open_ = false;
         }
@@ -197,22 +247,18 @@ class TapReport : public Listener
 
     void write(const std::string &text)
     {
-        if (!failure_.empty() || text.empty()) {
-            return;
-        }
-        const bool written = std::fwrite(text.data(), 1, text.size(), stream_) == text.size();
-        if (!written || std::fflush(stream_) != 0) {
-            failure_ = std::string("the TAP output: ") + std::strerror(errno);
+        if (!text.empty()) {
+            writer_.write(text);
         }
     }
 
-    std::FILE *stream_;
+    Writer writer_;
     std::vector<std::vector<bool>> ended_;
-    std::size_t begun_ = 0; // suites
-    std::size_t suite_ = 0; // the next point to be written
+    std::size_t points_ = 0; // of suites, written
+    std::size_t begun_ = 0;  // suites of the round
+    std::size_t suite_ = 0;  // the next point to be written
     std::size_t item_ = 0;
     bool open_ = false; // its subtest
-    std::string failure_;
 };
 
 } // namespace

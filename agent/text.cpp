@@ -10,6 +10,7 @@
 #include <cstdio>
 #include <ctime>
 #include <cwchar>
+#include <numeric>
 #include <utility>
 
 namespace fptest
@@ -382,6 +383,44 @@ std::string duration(double seconds)
         std::snprintf(text.data(), text.size(), "%lld:%02lld", minutes, whole % 60);
     }
     return text.data();
+}
+
+std::string fine_duration(double seconds)
+{
+    if (!(seconds < 9.9995)) {
+        return duration(seconds);
+    }
+    std::array<char, 40> text{};
+    std::snprintf(text.data(), text.size(), "%.3f s", std::max(seconds, 0.0));
+    return text.data();
+}
+
+std::vector<std::string> aligned(const std::vector<std::vector<std::string>> &rows,
+                                 const std::vector<bool> &is_number, std::size_t width)
+{
+    std::vector<std::size_t> widths(is_number.size());
+    for (const auto &row : rows) {
+        for (std::size_t column = 0; column < row.size(); ++column) {
+            widths[column] = std::max(widths[column], columns(row[column]));
+        }
+    }
+    const std::size_t others =
+        std::accumulate(widths.begin() + 1, widths.end(), 2 * (widths.size() - 1));
+    const std::size_t least = 10; // of a name that something can be seen of
+    widths[0] = std::min(widths[0], width > others + least ? width - others : least);
+
+    std::vector<std::string> lines;
+    for (const auto &row : rows) {
+        std::string line;
+        for (std::size_t column = 0; column < row.size(); ++column) {
+            const std::string text = cut(row[column], widths[column]);
+            const std::string blanks(widths[column] - columns(text), ' ');
+            line += (column > 0 ? "  " : "") + (is_number[column] ? blanks + text : text + blanks);
+        }
+        line.erase(line.find_last_not_of(' ') + 1);
+        lines.push_back(line);
+    }
+    return lines;
 }
 
 std::string timestamp(std::chrono::system_clock::time_point time)

@@ -58,6 +58,15 @@ std::string listing(const std::vector<std::string> &words);
 // Seconds for people: "0.3 s", "12.0 s", "3:05", "1:02:05".
 std::string duration(double seconds);
 
+// As duration(), with milliseconds under ten seconds: "0.012 s".
+std::string fine_duration(double seconds);
+
+// The rows as lines, their columns two blanks apart: words to the left, numbers to
+// the right. The first column is cut where a line would be wider than that.
+std::vector<std::string> aligned(const std::vector<std::vector<std::string>> &rows,
+                                 const std::vector<bool> &is_number,
+                                 std::size_t width = std::string::npos);
+
 // A point in time for files, in UTC: "2024-05-06T07:08:09.123Z".
 std::string timestamp(std::chrono::system_clock::time_point time);
 

@@ -145,6 +145,20 @@ Element parse_xml(const std::string &text)
     return open.front().children.front();
 }
 
+std::string verdict_of(const Element &test)
+{
+    std::vector<std::string> verdicts;
+    for (const Element &child : test.children) {
+        if (child.name == "error") {
+            verdicts.push_back(child.attributes.at("type"));
+        } else if (child.name == "failure" || child.name == "skipped") {
+            verdicts.push_back(child.name);
+        }
+    }
+    EXPECT_LE(verdicts.size(), 1U);
+    return verdicts.empty() ? "passed" : verdicts.front();
+}
+
 // --- JSON lines --------------------------------------------------------------
 
 std::vector<nlohmann::json> events_of(const std::string &text)
@@ -215,10 +229,14 @@ class TapParser
         Tap tap;
         tap.version = take("TAP version ").value_or("");
         EXPECT_NE(tap.version, "");
-        tap.planned = plan("");
+        if (starts_plan()) {
+            tap.planned = plan("");
+        }
         while (at_ < lines_.size()) {
             if (const auto name = take("# Subtest: ")) {
                 subtest(tap, *name);
+            } else if (tap.planned == 0 && starts_plan()) {
+                tap.planned = plan("");
             } else if (const auto reason = take("Bail out!  ")) {
                 tap.bail_out = *reason;
                 EXPECT_EQ(at_, lines_.size()) << "more behind the end";
@@ -251,6 +269,11 @@ class TapParser
         ++at_;
     }
 
+    bool starts_plan() const
+    {
+        return at_ < lines_.size() && lines_[at_].starts_with("1..");
+    }
+
     std::size_t plan(const std::string &indent)
     {
         const std::optional<std::string> size = take(indent + "1..");
@@ -262,7 +285,14 @@ class TapParser
     {
         const std::size_t planned = plan(kIndent);
         std::vector<Point> inside;
-        while (std::optional<Point> one = point(kIndent, inside.size() + 1)) {
+        for (;;) {
+            while (const auto comment = take(std::string(kIndent) + "# ")) {
+                tap.comments.push_back(*comment);
+            }
+            std::optional<Point> one = point(kIndent, inside.size() + 1);
+            if (!one) {
+                break;
+            }
             inside.push_back(std::move(*one));
         }
         std::optional<Point> whole = point("", tap.points.size() + 1);

@@ -53,6 +53,9 @@ struct Element {
     std::map<std::string, std::string> properties() const;
 };
 
+// Of a test case: "passed", "skipped", "failure", or what type of error it is.
+std::string verdict_of(const Element &test);
+
 // The top element; a test failure and an empty one where it is not well-formed.
 Element parse_xml(const std::string &text);
 
@@ -78,10 +81,10 @@ struct Point {
 
 struct Tap {
     std::string version;
-    std::size_t planned = 0;
+    std::size_t planned = 0; // by a plan in front or at the end
     std::vector<Point> points;
-    std::vector<Point> open; // those of a subtest that is not closed
-    std::vector<std::string> comments;
+    std::vector<Point> open;           // those of a subtest that is not closed
+    std::vector<std::string> comments; // those of subtests as well
     std::optional<std::string> bail_out;
 };
 

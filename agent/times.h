@@ -1,0 +1,43 @@
+// SPDX-FileCopyrightText: 2026 The Quillmark authors
+// SPDX-License-Identifier: Apache-2.0
+
+// Least, median and longest of any number of times, in bounded memory.
+#pragma once
+
+#include <cstddef>
+#include <map>
+#include <vector>
+
+namespace fptest
+{
+
+class Times
+{
+  public:
+    void add(double seconds);
+
+    std::size_t count() const
+    {
+        return count_;
+    }
+    // Where there are any. The median is exact while they are few, and then within
+    // 1 %, or a millisecond.
+    double least() const
+    {
+        return least_;
+    }
+    double median() const;
+    double longest() const
+    {
+        return longest_;
+    }
+
+  private:
+    std::size_t count_ = 0;
+    double least_ = 0;
+    double longest_ = 0;
+    std::vector<double> few_;            // all of them, sorted; empty once they are many
+    std::map<int, std::size_t> buckets_; // then: how many, by the logarithm
+};
+
+} // namespace fptest

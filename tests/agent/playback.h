@@ -1,0 +1,207 @@
+// SPDX-FileCopyrightText: 2026 The Quillmark authors
+// SPDX-License-Identifier: Apache-2.0
+
+// Runs that are not run: what listeners are told of them.
+#pragma once
+
+#include "results.h"
+
+#include <gtest/gtest.h>
+
+#include <chrono>
+#include <string>
+#include <thread>
+#include <utility>
+#include <vector>
+
+namespace playback
+{
+
+using namespace fptest;
+using RunOfItems = fptest::Run; // a test has a Run of its own
+
+const std::chrono::system_clock::time_point
+    kStart(std::chrono::milliseconds(1714979289123)); // 2024-05-06T07:08:09.123Z
+
+inline ItemRun item(const std::string &name, Outcome outcome, const std::string &reason = "")
+{
+    ItemRun item;
+    item.name = name;
+    item.outcome = outcome;
+    item.reason = reason;
+    if (outcome != Outcome::not_run) {
+        item.start = kStart + std::chrono::seconds(1);
+        item.seconds = 0.301;
+    }
+    return item;
+}
+
+inline ItemRun passed(const std::string &name)
+{
+    ItemRun one = item(name, Outcome::passed);
+    one.report = {"100", "0", false, "chip answers"};
+    return one;
+}
+
+inline ItemRun failed(const std::string &name)
+{
+    ItemRun one = item(name, Outcome::failed, "result 1");
+    one.report = {"100", "1", false, "3 dead pixels"};
+    one.output = "row 7\nrow 9\n";
+    return one;
+}
+
+inline Suite suite(const std::string &group, std::vector<ItemRun> items)
+{
+    for (ItemRun &one : items) {
+        one.group = group;
+    }
+    return {group, std::move(items)};
+}
+
+inline RunOfItems run_of(std::vector<Suite> suites)
+{
+    RunOfItems run;
+    run.plan = "plans/demo.xml";
+    run.vendor = 1;
+    run.pass_code = 0;
+    run.suites = std::move(suites);
+    run.start = kStart;
+    run.seconds = 2.5;
+    run.finished = true;
+    return run;
+}
+
+// One of every outcome.
+inline RunOfItems mixed_run()
+{
+    RunOfItems run =
+        run_of({suite("Bringup", {passed("SpiCheck"), failed("DeadPixel"),
+                                  item("QuietRun", Outcome::silent, "it reported nothing")}),
+                suite("Endurance", {item("Slow", Outcome::timed_out, "stopped after 5 s"),
+                                    item("BurnIn", Outcome::stopped, "interrupted by Ctrl-C"),
+                                    item("Last", Outcome::not_run, "interrupted by Ctrl-C")})});
+    run.finished = false;
+    run.why_unfinished = "interrupted by Ctrl-C";
+    return run;
+}
+
+// Tells listeners of a run as the runner does: what has not happened yet is not
+// in the run either.
+class Playback
+{
+  public:
+    Playback(Listener &listener, const RunOfItems &end) : listener_(listener), end_(end), now_(end)
+    {
+        now_.finished = false;
+        now_.why_unfinished.clear();
+        now_.seconds = 0;
+        plan();
+    }
+
+    void begin()
+    {
+        listener_.begin(now_);
+    }
+    void start(Place place)
+    {
+        now(place).start = end(place).start;
+        listener_.started(now_, place);
+    }
+    void progress(Place place, const Report &report)
+    {
+        now(place).report = report;
+        listener_.progressed(now_, place);
+    }
+    void end_item(Place place)
+    {
+        now(place) = end(place);
+        listener_.ended(now_, place);
+    }
+    void run_item(Place place)
+    {
+        start(place);
+        progress(place, {"10", std::nullopt, false, std::nullopt});
+        end_item(place);
+    }
+    void tick()
+    {
+        listener_.tick(now_);
+    }
+    // Which ends as the one before.
+    void begin_next_round()
+    {
+        summarize(now_);
+        listener_.round_over(now_);
+        for (const Suite &one : now_.suites) {
+            now_.before += count(one.items);
+        }
+        plan();
+        ++now_.round;
+    }
+    void finish()
+    {
+        RunOfItems last = end_;
+        last.round = now_.round;
+        last.before = now_.before;
+        last.summary = now_.summary;
+        now_ = last;
+        summarize(now_);
+        listener_.finish(now_);
+        while (!listener_.flush()) {
+            std::this_thread::sleep_for(std::chrono::milliseconds(1));
+        }
+    }
+
+    // All of it.
+    void play()
+    {
+        begin();
+        play_round();
+        finish();
+    }
+
+    void play_round()
+    {
+        for (std::size_t suite = 0; suite < end_.suites.size(); ++suite) {
+            for (std::size_t item = 0; item < end_.suites[suite].items.size(); ++item) {
+                if (end({suite, item}).outcome != Outcome::not_run) {
+                    run_item({suite, item});
+                }
+            }
+        }
+    }
+
+  private:
+    void plan()
+    {
+        for (Suite &one : now_.suites) {
+            for (ItemRun &item : one.items) {
+                ItemRun planned;
+                planned.group = item.group;
+                planned.name = item.name;
+                item = planned;
+            }
+        }
+    }
+    ItemRun &now(Place place)
+    {
+        return now_.suites[place.suite].items[place.item];
+    }
+    const ItemRun &end(Place place) const
+    {
+        return end_.suites[place.suite].items[place.item];
+    }
+
+    Listener &listener_;
+    RunOfItems end_;
+    RunOfItems now_;
+};
+
+inline void play(Listener &listener, const RunOfItems &run)
+{
+    Playback(listener, run).play();
+    EXPECT_EQ(listener.failure(), "");
+}
+
+} // namespace playback
