@@ -3,6 +3,7 @@
 
 #include "check.h"
 #include "commands.h"
+#include "desk_paths.h"
 #include "device.h"
 #include "files.h"
 #include "host.h"
@@ -569,6 +570,10 @@ Exit run(const RunOptions &options)
     if (options.tap && options.json == "-") {
         throw Failure(Exit::usage, "--tap and --json - both want standard output: give --json a "
                                    "file");
+    }
+    if (!options.list) {
+        look_after_reports(
+            {{"--json", options.json}, {"--junit", options.junit}, {"--log", options.log}});
     }
     const Descriptor lock = options.list ? Descriptor(-1) : ready_device();
     const Source source = open_plan(options);
