@@ -217,8 +217,9 @@ TEST_F(UsersProgram, ThatIsNotExecutableIsNamedAndLeftOut)
     const Outcome outcome = on_device({"MyItem"}, {"--bin", own.path()});
 
     EXPECT_EQ(outcome.out, "mine\n");
-    EXPECT_EQ(lines(outcome.err).front(), "device/run: --bin " + own.path().string() +
-                                              ": not executable, and left out: Other, README");
+    const std::string line = "device/run: --bin " + own.path().string() +
+                             ": not executable, and left out: Other, README\n";
+    EXPECT_TRUE(outcome.err.starts_with(line)) << outcome.err;
 }
 
 TEST_F(UsersProgram, MayBeALinkToOneOutsideOfTheDirectory)
