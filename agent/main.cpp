@@ -4,6 +4,7 @@
 // fptest: the command line. What the sub-commands do stands in files of their
 // own.
 #include "commands.h"
+#include "desk_paths.h"
 #include "text.h"
 
 #include <CLI/CLI.hpp>
@@ -146,6 +147,16 @@ CLI::Validator not_empty()
             ""};
 }
 
+// A plan that device/run has taken the working directory away from.
+CLI::Validator desk_file()
+{
+    return {[](std::string &text) {
+                text = fptest::found_on_desk(text);
+                return std::string();
+            },
+            ""};
+}
+
 class CommandLine
 {
   public:
@@ -229,6 +240,7 @@ class CommandLine
                          "store this plan first ('-': standard input);\n"
                          "without, the stored plan is run")
             ->type_name("FILE")
+            ->transform(desk_file())
             ->check(not_empty());
         command->add_flag("--as-group", run_.as_group,
                           "one command for each group, not for each\n"
@@ -290,6 +302,7 @@ class CommandLine
                                 [this] { return fptest::check_files(files_); });
         command->add_option("FILE", files_, "test plans ('-': standard input)")
             ->type_name("")
+            ->transform(desk_file())
             ->required();
     }
 
@@ -301,7 +314,8 @@ class CommandLine
             ->add_option("FILE", shown_,
                          "the plan ('-': standard input); without, the\n"
                          "stored one")
-            ->type_name("");
+            ->type_name("")
+            ->transform(desk_file());
     }
 
     void add_report()

@@ -3,6 +3,7 @@
 
 #include "check.h"
 #include "commands.h"
+#include "desk_paths.h"
 #include "device.h"
 #include "files.h"
 #include "host.h"
@@ -139,6 +140,10 @@ Descriptor ready_device()
 Exit run(const RunOptions &options)
 {
     require_different_outputs(options);
+    if (!options.list) {
+        look_after_reports(
+            {{"--json", options.json}, {"--junit", options.junit}, {"--log", options.log}});
+    }
     const Descriptor lock = options.list ? Descriptor(-1) : ready_device();
     const Source source = open_plan(options);
     std::vector<Path> paths;

@@ -291,10 +291,10 @@ void Runner::end_item(const Host::Event &event)
         append_output(result.output, output);
         active.moved_on = true;
         active.moved_on_at = on_run_clock(event.time);
-        if (WIFSIGNALED(event.value)) {
-            result.signal = WTERMSIG(event.value);
-        } else {
+        if (!WIFSIGNALED(event.value)) {
             result.exit_status = WEXITSTATUS(event.value);
+        } else if (!active.was_stopped) { // else it is fptest's own, or the module's
+            result.signal = WTERMSIG(event.value);
         }
         if (event.left_running) {
             note_left_running(active);

@@ -64,11 +64,14 @@ class Sender
     // The reply, or nothing where the command was interrupted.
     std::optional<std::string> send(const std::string &command)
     {
+        // the module waits for nobody who is just writing the plan that it loads
+        Descriptor plan = command.starts_with("XMLNodePath") ? lock_stored_plan() : Descriptor(-1);
         const auto items = items_of(command);
         host_.command(command, items);
         for (;;) {
             const auto event = host_.wait(100ms, signals_.descriptor());
             if (event) {
+                plan = Descriptor(-1); // it is loaded before the first item is told
                 host_.pass_output(stderr, event->output);
             }
             if (event && event->kind == Host::Event::Kind::item) {

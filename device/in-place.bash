@@ -5,8 +5,8 @@
 #
 # The in-place way of device/run, which sources this file: the root of this
 # container becomes the device for the time of one run and is put back after
-# it. Takes fail, leave_terminal_signals_to_command, device, mksh, program, data
-# and vendor from there.
+# it. Takes fail, device, supervise, signals, mksh, program, told, data, out and
+# vendor from there.
 
 # What an interrupted run leaves to be undone by the next one: run (its mark),
 # made (the directories it made, in order) and sh (the former /bin/sh). On the
@@ -55,7 +55,7 @@ put_back()
 	local path mark=''
 
 	[[ -d $keep ]] || return
-	trap '' TERM HUP
+	trap '' HUP INT QUIT TERM
 	read -r mark 2>/dev/null <"$keep/run"
 	stop_left_behind "$mark"
 	if ! put_shell_back; then
@@ -119,27 +119,44 @@ lay_out_container()
 	fill_system_bin && point_shell_at_mksh
 }
 
+# Waits for the supervisor, which is asked by every signal that comes here.
+wait_for_command()
+{
+	local pid=$1 signal status asked=''
+
+	for signal in ${signals//,/ }; do
+		# shellcheck disable=SC2064
+		trap "asked=yes; kill -$signal $pid 2>/dev/null" "$signal"
+	done
+	while wait "$pid"; status=$?; [[ -n $asked ]]; do
+		asked=''
+	done
+	exit "$status"
+}
+
 be_the_device()
 {
-	local path complaint run_mark="$$-$EPOCHREALTIME"
+	local path name complaint signal run_mark="$$-$EPOCHREALTIME"
 
 	take_the_container
-	leave_terminal_signals_to_command
 	put_back
 	for path in /system/bin /data/vorlane /etc/vorlane; do
 		[[ -e $path || -L $path ]] && fail "in place: $path exists already; move it away first"
 	done
 
 	trap put_back EXIT
-	trap 'exit 129' HUP
-	trap 'exit 143' TERM
+	for signal in ${signals//,/ }; do
+		# shellcheck disable=SC2064
+		trap "exit $((128 + signal))" "$signal"
+	done
 	complaint=$(lay_out_container 2>&1) || fail "in place: ${complaint%%$'\n'*}"
 
-	# Without this script nothing would put the container back while COMMAND
-	# went on; so COMMAND ends with it.
+	for name in "${!told[@]}"; do
+		export "$name=${told[$name]}"
+	done
+	[[ -z $out ]] || cd -- "$out" || exit 125
 	PATH=/system/bin TMPDIR=/tmp QUILLMARK_DEVICE=in-place QUILLMARK_DEVICE_RUN=$run_mark \
-		/usr/bin/setpriv --pdeathsig KILL -- \
-		"$mksh" "$device/start" "$vendor" "$default_signals" "$@" <&0 {lock}<&- &
-	wait $!
-	exit
+		"$supervise" here "$signals" "$mksh" "$device/start" "$supervise" "$signals" "$vendor" \
+		"$@" <&0 {lock}<&- &
+	wait_for_command $!
 }

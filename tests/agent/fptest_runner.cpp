@@ -147,6 +147,7 @@ void FptestProcess::become(const Start &start) const
     for (const int number : {SIGINT, SIGTERM, SIGHUP, SIGQUIT, SIGPIPE}) {
         std::signal(number, SIG_DFL);
     }
+    unsetenv("QUILLMARK_DEVICE"); // it would say at each start what goes with the device
     for (const auto &[name, value] : start.environment) {
         if (value) {
             setenv(name.c_str(), value->c_str(), 1);

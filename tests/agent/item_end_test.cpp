@@ -232,6 +232,39 @@ TEST_F(ItemEnd, ChildOfAnEarlierRoundReportsIntoNoLaterOne)
                             "Item: passed", "Script: no result", "Item: passed"));
 }
 
+TEST_F(ItemEnd, WhatIsLeftRunningIsNamed)
+{
+    const Ended ended =
+        run({{"Script", script("/system/bin/Third sleep 60 &amp; " + script_report("0", "fine"))},
+             {"Item", kPasses}});
+    const Json left = ends().at(0).at("left_running");
+    ASSERT_EQ(left.size(), 1U);
+    EXPECT_EQ(left.at(0).at("name"), "Third");
+    EXPECT_THAT(ended.out, HasSubstr("    left running: Third (pid " +
+                                     std::to_string(left.at(0).at("pid").get<int>()) + ")\n"));
+    EXPECT_THAT(ends().at(1).at("left_running"), IsEmpty());
+}
+
+TEST_F(ItemEnd, ChildOnlyJustEndingIsNotLeftRunning)
+{
+    run({{"Script", script("sleep 0.05 &amp; " + script_report("0", "fine"))}});
+    EXPECT_THAT(ends().at(0).at("left_running"), IsEmpty());
+}
+
+TEST_F(ItemEnd, ReportAfterTheItemsEndIsToldAndChangesNothing)
+{
+    const Ended ended = run({{"Script", leaving("sleep 0.3; " + script_report("0", "too late"))},
+                             {"Item", "sleep 1 report G 100 0 fine"}});
+    EXPECT_EQ(ended.status, 1);
+    EXPECT_THAT(outcomes(json()), ElementsAre("Script: no result", "Item: passed"));
+    const auto late = events_of(json(), "late");
+    ASSERT_EQ(late.size(), 1U);
+    EXPECT_EQ(late.at(0).at("item"), "Script");
+    EXPECT_EQ(late.at(0).at("description"), "too late");
+    EXPECT_THAT(ended.out, HasSubstr("G/Script: late report, result 0: too late; it changes "
+                                     "nothing\n"));
+}
+
 TEST_F(ItemEnd, WhatIsLeftRunningIsEndedBeforeTheNextRoundAndAtTheEnd)
 {
     const std::vector<device::PlanItem> items = {

@@ -4,8 +4,13 @@
 // Raw commands, one process for all of them.
 #include "fptest_runner.h"
 
+#include <chrono>
 #include <csignal>
+#include <fcntl.h>
 #include <filesystem>
+#include <sys/file.h>
+#include <thread>
+#include <unistd.h>
 
 using namespace fptest_runner;
 using device::kPlanFile;
@@ -152,6 +157,22 @@ TEST_F(Send, StopsAlsoWhatAnInterruptedGroupWouldStartNext)
     EXPECT_EQ(fptest.wait().status, 130);
     expect_items_to_end();
     EXPECT_TRUE(wait_for([] { return processes_named(FPTEST_PROGRAM).empty(); }, 20));
+}
+
+TEST_F(Send, WaitsForTheEndOfAReportBeforeItsPlanIsLoaded)
+{
+    const std::string text = plan_of({{"G", {{"Item", "note /tmp/scene/ran"}}}});
+    // a report empties the file, and holds its lock until all is written
+    write_file(kPlanFile, "");
+    const Descriptor report(open(kPlanFile, O_WRONLY | O_CLOEXEC));
+    ASSERT_EQ(flock(report.get(), LOCK_EX), 0);
+    FptestProcess fptest({"send", "XMLNodePath::P/G/Item"});
+    std::this_thread::sleep_for(std::chrono::milliseconds(300));
+    EXPECT_FALSE(fptest.has_ended());
+    ASSERT_EQ(write(report.get(), text.data(), text.size()), static_cast<ssize_t>(text.size()));
+    ASSERT_EQ(flock(report.get(), LOCK_UN), 0);
+    EXPECT_EQ(fptest.wait().status, 0);
+    EXPECT_TRUE(is_there("ran"));
 }
 
 TEST_F(Send, StopsAScriptAsWell)

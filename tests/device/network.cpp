@@ -4,12 +4,17 @@
 #include "network.h"
 
 #include <chrono>
+#include <filesystem>
 #include <fstream>
+#include <iterator>
 #include <poll.h>
+#include <set>
 #include <sstream>
 #include <sys/socket.h>
 #include <thread>
 #include <unistd.h>
+
+namespace fs = std::filesystem;
 
 namespace device
 {
@@ -59,20 +64,46 @@ std::string receive(const Socket &client)
     return text;
 }
 
+namespace
+{
+
+// The sockets of this process and of those that it has forked, as /proc/PID/fd
+// names them. A process in a container is not alone, and neither are its sockets.
+std::set<std::string> own_sockets()
+{
+    std::set<std::string> found;
+    for (const Process &process : processes()) {
+        if (process.pid != getpid() && process.parent != getpid()) {
+            continue;
+        }
+        // one that ends meanwhile has none any more
+        std::error_code gone;
+        fs::directory_iterator entry("/proc/" + std::to_string(process.pid) + "/fd", gone);
+        for (; !gone && entry != fs::directory_iterator(); entry.increment(gone)) {
+            std::error_code closed;
+            found.insert(fs::read_symlink(entry->path(), closed));
+        }
+    }
+    return found;
+}
+
+} // namespace
+
 Lines listeners()
 {
+    const std::string trigger_port = ":8888";
     Lines found;
+    const auto own = own_sockets();
     std::ifstream table("/proc/net/tcp");
     std::string line;
     std::getline(table, line); // the header
     while (std::getline(table, line)) {
-        std::istringstream columns(line);
-        std::string slot;
-        std::string local;
-        std::string remote;
-        std::string state;
-        columns >> slot >> local >> remote >> state;
-        if (state == "0A") {
+        std::istringstream stream(line);
+        const Lines columns{std::istream_iterator<std::string>(stream), {}};
+        const std::string &local = columns.at(1);
+        const bool is_listening = columns.at(3) == "0A";
+        if (is_listening &&
+            (local.ends_with(trigger_port) || own.contains("socket:[" + columns.at(9) + "]"))) {
             found.push_back(local);
         }
     }

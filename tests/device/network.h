@@ -46,7 +46,8 @@ Socket connect_to(unsigned short port);
 // "<closed>" is put behind it where the peer has closed.
 std::string receive(const Socket &client);
 
-// Local addresses and ports of listening sockets, as in "00000000:8888".
+// Local addresses and ports, as in "00000000:8888", of the sockets that listen at
+// the trigger port, and of those elsewhere that this process or a child of it has.
 Lines listeners();
 
 } // namespace device

@@ -1,0 +1,116 @@
+// SPDX-FileCopyrightText: 2026 The Quillmark authors
+// SPDX-License-Identifier: Apache-2.0
+
+// device/run as a person or a test runner starts it, and what comes of it.
+#pragma once
+
+#include <gtest/gtest.h>
+
+#include <filesystem>
+#include <functional>
+#include <map>
+#include <string>
+#include <vector>
+
+namespace launcher
+{
+
+namespace fs = std::filesystem;
+
+using Words = std::vector<std::string>;
+
+inline const fs::path tree = QUILLMARK_SOURCE_DIR;
+inline const fs::path build = QUILLMARK_BINARY_DIR;
+inline const std::string device_run = tree / "device/run";
+
+// ---- processes --------------------------------------------------------------
+
+struct Outcome {
+    int status = -1; // as a shell has it: 128 + N for signal N
+    std::string out;
+    std::string err;
+};
+
+struct Surroundings {
+    fs::path directory = tree;
+    std::map<std::string, std::string> variables{};
+    std::string input{};
+};
+
+int shell_status(int wait_status);
+
+// The last step of a child process.
+[[noreturn]] void become(const Words &words, const Surroundings &surroundings = {});
+
+Outcome run(const Words &words, const Surroundings &surroundings = {});
+
+Outcome on_device(const Words &command, const Words &options = {},
+                  const Surroundings &surroundings = {});
+
+Outcome shell(const std::string &script, const Words &options = {},
+              const Surroundings &surroundings = {});
+
+// What device/run has against the command line; it starts nothing then.
+Outcome refused(const Words &arguments, const Surroundings &surroundings = {});
+
+// This program itself as COMMAND: it says "ready" and what signals it gets, and ends with
+// 7 half a second after the last one.
+inline constexpr const char *say_signals_option = "--say-signals";
+int say_signals();
+
+// Tries for a while.
+bool eventually(const std::function<bool()> &condition);
+
+// ---- texts ------------------------------------------------------------------
+
+// What ps prints first.
+inline const std::string header = "USER     PID   PPID  VSIZE  RSS     WCHAN    PC         NAME";
+
+Words operator+(Words left, const Words &right);
+Words split(const std::string &text);
+Words lines(const std::string &text);
+std::string last_line(const std::string &text);
+
+// ---- files ------------------------------------------------------------------
+
+class TemporaryDirectory
+{
+  public:
+    explicit TemporaryDirectory(const fs::path &parent = fs::temp_directory_path());
+    TemporaryDirectory(const TemporaryDirectory &) = delete;
+    TemporaryDirectory &operator=(const TemporaryDirectory &) = delete;
+    ~TemporaryDirectory();
+
+    const fs::path &path() const
+    {
+        return path_;
+    }
+    fs::path program(const std::string &name, const std::string &script) const;
+
+  private:
+    fs::path path_;
+};
+
+std::string content(const fs::path &path);
+
+// ---- what the machine allows ------------------------------------------------
+
+enum class Way { namespaces, in_place, none };
+
+Way way();
+
+// Tests of what holds on any device.
+class Device : public testing::Test
+{
+  protected:
+    void SetUp() override;
+};
+
+// Tests of the device that has namespaces of its own.
+class NamespaceDevice : public Device
+{
+  protected:
+    void SetUp() override;
+};
+
+} // namespace launcher

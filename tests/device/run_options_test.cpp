@@ -1,0 +1,272 @@
+// SPDX-FileCopyrightText: 2026 The Quillmark authors
+// SPDX-License-Identifier: Apache-2.0
+
+// What goes onto the device and what comes from it: --bin, --data, --out.
+#include "launcher_runner.h"
+
+#include <fstream>
+
+using namespace launcher;
+
+namespace
+{
+
+// ---- directories that the device may write to ---------------------------------
+
+TEST(WritableDirectory, IsNoneOfTheSystems)
+{
+    for (const std::string option : {"--data", "--out"}) {
+        for (const std::string directory :
+             {"/", "//", "/usr", "/usr/../usr/local/x", "/etc/vorlane", "/bin", "/lib", "/dev",
+              "/home", "/tmp", "/var", "/var/lib", "/proc/self", "/opt"}) {
+            const Outcome outcome = refused({option, directory, "--", "true"});
+
+            EXPECT_EQ(outcome.status, 125);
+            EXPECT_EQ(outcome.err, "device/run: " + option + " " + directory +
+                                       ": a directory of the system; name one of your own\n");
+        }
+    }
+}
+
+TEST(WritableDirectory, IsNotMadeInADirectoryOfTheSystem)
+{
+    const fs::path directory = "/usr/quillmark-must-not-make-this";
+
+    EXPECT_EQ(refused({"--data", directory, "--", "true"}).status, 125);
+    EXPECT_FALSE(fs::exists(directory));
+}
+
+TEST(WritableDirectory, IsJudgedByWhereALinkLeads)
+{
+    const TemporaryDirectory host;
+    fs::create_directory_symlink("/", host.path() / "link");
+
+    EXPECT_EQ(refused({"--out", host.path() / "link", "--", "true"}).err,
+              "device/run: --out " + (host.path() / "link").string() +
+                  ": a directory of the system; name one of your own\n");
+}
+
+// ---- --out --------------------------------------------------------------------
+
+class Out : public Device
+{
+  protected:
+    void SetUp() override
+    {
+        Device::SetUp();
+        fs::create_directory(caller.path() / "plans");
+        fs::copy_file(tree / "plans/demo.xml", caller.path() / "plans/demo.xml");
+    }
+    Outcome from_caller(const Words &command, const Words &options) const
+    {
+        return on_device(command, options, {.directory = caller.path()});
+    }
+
+    const TemporaryDirectory caller;
+};
+
+TEST_F(Out, IsMadeAndIsTheWorkingDirectoryThatStays)
+{
+    const fs::path results = caller.path() / "made/results";
+
+    const Outcome outcome =
+        from_caller({"sh", "-c", "pwd; echo text >file"}, {"--out", "made/results"});
+
+    EXPECT_EQ(outcome.out, results.string() + "\n");
+    EXPECT_EQ(outcome.status, 0);
+    EXPECT_EQ(content(results / "file"), "text\n");
+}
+
+TEST_F(Out, MayBeTheCallersDirectory)
+{
+    EXPECT_EQ(from_caller({"sh", "-c", "cat plans/demo.xml >copy"}, {"--out", "."}).status, 0);
+    EXPECT_EQ(content(caller.path() / "copy"), content(tree / "plans/demo.xml"));
+}
+
+TEST_F(Out, IsWrittenThroughALink)
+{
+    fs::create_directory(caller.path() / "real");
+    fs::create_directory_symlink("real", caller.path() / "link");
+
+    EXPECT_EQ(from_caller({"touch", "file"}, {"--out", "link"}).status, 0);
+    EXPECT_TRUE(fs::exists(caller.path() / "real/file"));
+}
+
+TEST_F(Out, KeepsTheReportsOfAPlanInTheCallersDirectory)
+{
+    for (const std::string results : {"results", "."}) {
+        const Outcome outcome =
+            from_caller({"fptest", "run", "--plan", "plans/demo.xml", "--timeout", "30", "--junit",
+                         "results.xml", "--json", "results.jsonl", "demo/Bringup/SpiCheck"},
+                        {"--out", results});
+
+        EXPECT_EQ(outcome.status, 0) << outcome.err;
+        EXPECT_EQ(outcome.err.find("fptest: "), std::string::npos) << outcome.err;
+        EXPECT_NE(content(caller.path() / results / "results.xml").find("SpiCheck"),
+                  std::string::npos);
+        EXPECT_NE(content(caller.path() / results / "results.jsonl").find("SpiCheck"),
+                  std::string::npos);
+    }
+}
+
+TEST_F(Out, LetsFptestCheckAndShowPlansOfTheCallersDirectory)
+{
+    for (const std::string command : {"check", "show"}) {
+        const Outcome outcome =
+            from_caller({"fptest", command, "plans/demo.xml"}, {"--out", "results"});
+        EXPECT_EQ(outcome.status, 0) << outcome.err;
+    }
+}
+
+TEST_F(Out, TakesAFileOfItsOwnBeforeOneOfTheCallers)
+{
+    fs::create_directories(caller.path() / "results/plans");
+    std::ofstream(caller.path() / "results/plans/demo.xml") << "no plan";
+
+    EXPECT_EQ(from_caller({"fptest", "check", "plans/demo.xml"}, {"--out", "results"}).status, 1);
+}
+
+TEST_F(Out, LeavesACommandOfTheCallersDirectoryToBeFound)
+{
+    caller.program("mine", "#!/system/bin/sh\npwd\n");
+
+    EXPECT_EQ(from_caller({"./mine"}, {"--out", "results"}).out,
+              (caller.path() / "results").string() + "\n");
+}
+
+// ---- where reports go without it ------------------------------------------------
+
+class Reports : public Out
+{
+  protected:
+    Outcome run_with(const Words &reports, const Words &options = {}) const
+    {
+        return from_caller(Words{"fptest", "run", "--plan", "plans/demo.xml"} + reports +
+                               Words{"demo/Bringup/SpiCheck"},
+                           options);
+    }
+};
+
+TEST_F(Reports, CannotBeWrittenIntoAHostsDirectoryAndTheLineSaysWhatToDo)
+{
+    if (way() == Way::in_place) {
+        GTEST_SKIP() << "in place, the container's directories are as they were";
+    }
+    for (const std::string option : {"--junit", "--json", "--log"}) {
+        const Outcome outcome = run_with({option, "results"});
+
+        EXPECT_EQ(outcome.status, 3);
+        EXPECT_EQ(outcome.out, "");
+        EXPECT_EQ(outcome.err,
+                  "fptest: " + option +
+                      " results: the host's directories are read-only on the virtual device: "
+                      "write into the working directory that device/run --out DIR gives\n");
+    }
+}
+
+TEST_F(Reports, OnTheDevicesOwnDisksAreSaidToGoWithIt)
+{
+    const std::string line = " will be gone with the virtual device: what is written into the "
+                             "working directory that device/run --out DIR gives stays";
+
+    const Outcome outcome = run_with({"--junit", "/data/vorlane/r.xml"});
+    EXPECT_EQ(outcome.status, 0);
+    EXPECT_EQ(last_line(outcome.err), "fptest: --junit /data/vorlane/r.xml" + line);
+
+    if (way() == Way::namespaces) {
+        EXPECT_EQ(run_with({"--junit", "/tmp/r.xml", "--json", "/tmp/j"}).err,
+                  "fptest: --json /tmp/j and --junit /tmp/r.xml" + line + "\n");
+    }
+}
+
+TEST_F(Reports, ThatStayAreSaidNothingOf)
+{
+    const Outcome kept = run_with({"--junit", "/data/vorlane/r.xml", "--log", "/dev/null"},
+                                  {"--data", caller.path() / "data"});
+    EXPECT_EQ(kept.status, 0);
+    EXPECT_EQ(kept.err.find("fptest: "), std::string::npos) << kept.err;
+    EXPECT_TRUE(fs::exists(caller.path() / "data/r.xml"));
+}
+
+// ---- --bin ----------------------------------------------------------------------
+
+TEST(UsersPrograms, ThatAreLinksToNowhereAreRefused)
+{
+    const TemporaryDirectory own;
+    fs::create_symlink("gone/MyItem", own.path() / "MyItem");
+
+    const Outcome outcome = refused({"--bin", own.path(), "--", "true"});
+
+    EXPECT_EQ(outcome.status, 125);
+    EXPECT_EQ(outcome.err, "device/run: --bin " + own.path().string() +
+                               ": MyItem is a link that leads nowhere: to gone/MyItem\n");
+}
+
+class UsersProgram : public Device
+{
+};
+
+TEST_F(UsersProgram, ThatIsNotExecutableIsNamedAndLeftOut)
+{
+    const TemporaryDirectory own;
+    own.program("MyItem", "#!/system/bin/sh\necho mine\n");
+    std::ofstream(own.path() / "Other") << "#!/system/bin/sh\n";
+    std::ofstream(own.path() / "README") << "not a program";
+    fs::create_directory(own.path() / "sources");
+
+    const Outcome outcome = on_device({"MyItem"}, {"--bin", own.path()});
+
+    EXPECT_EQ(outcome.out, "mine\n");
+    const std::string line = "device/run: --bin " + own.path().string() +
+                             ": not executable, and left out: Other, README\n";
+    EXPECT_TRUE(outcome.err.starts_with(line)) << outcome.err;
+}
+
+TEST_F(UsersProgram, MayBeALinkToOneOutsideOfTheDirectory)
+{
+    const TemporaryDirectory elsewhere;
+    const TemporaryDirectory own;
+    elsewhere.program("built", "#!/system/bin/sh\necho ${0##*/}\n");
+    fs::create_symlink(elsewhere.path() / "built", own.path() / "MyItem");
+    fs::create_symlink("MyItem", own.path() / "MyItem_ca");
+
+    for (const std::string name : {"MyItem", "MyItem_ca"}) {
+        EXPECT_EQ(on_device({name}, {"--bin", own.path()}).out, name + "\n");
+    }
+}
+
+TEST_F(UsersProgram, NeedNotBeThere)
+{
+    const TemporaryDirectory own;
+    const Outcome outcome = on_device({"true"}, {"--bin", own.path()});
+
+    EXPECT_EQ(outcome.status, 0);
+    EXPECT_EQ(outcome.err.find("--bin"), std::string::npos) << outcome.err;
+}
+
+// ---- values ---------------------------------------------------------------------
+
+class Values : public Device
+{
+};
+
+TEST_F(Values, MayFollowAnEqualsSign)
+{
+    const TemporaryDirectory host;
+    fs::create_directory(host.path() / "own");
+    std::ofstream(host.path() / "own/MyItem") << "#!/system/bin/sh\necho x >file\n"
+                                                 "cp /etc/vorlane/sysparms/* /data/vorlane\n";
+    fs::permissions(host.path() / "own/MyItem", fs::perms::owner_all);
+    const std::string root = host.path();
+
+    const Outcome outcome =
+        run({device_run, "--bin=" + root + "/own", "--data=" + root + "/data",
+             "--out=" + root + "/out", "--vendor=2", "--build=" + build.string(), "MyItem"});
+
+    EXPECT_EQ(outcome.status, 0) << outcome.err;
+    EXPECT_EQ(content(host.path() / "out/file"), "x\n");
+    EXPECT_NE(content(host.path() / "data/vr_common_cfg.xml").find("<vendor>2<"),
+              std::string::npos);
+}
+
+} // namespace

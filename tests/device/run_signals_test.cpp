@@ -1,0 +1,462 @@
+// SPDX-FileCopyrightText: 2026 The Quillmark authors
+// SPDX-License-Identifier: Apache-2.0
+
+// How a device ends: by COMMAND, by signals, by keys typed at a terminal.
+#include "../quoted.h"
+#include "launcher_runner.h"
+
+#include <algorithm>
+#include <array>
+#include <cctype>
+#include <chrono>
+#include <csignal>
+#include <cstdio>
+#include <fcntl.h>
+#include <pty.h>
+#include <sys/wait.h>
+#include <thread>
+#include <unistd.h>
+#include <utility>
+
+using namespace launcher;
+using namespace std::chrono_literals;
+
+namespace
+{
+
+const std::map<std::string, int> ending_signals = {
+    {"HUP", SIGHUP}, {"INT", SIGINT}, {"QUIT", SIGQUIT}, {"TERM", SIGTERM}};
+
+} // namespace
+
+int launcher::say_signals()
+{
+    sigset_t set;
+    sigemptyset(&set);
+    for (const auto &[name, number] : ending_signals) {
+        sigaddset(&set, number);
+    }
+    sigprocmask(SIG_BLOCK, &set, nullptr);
+    std::puts("ready");
+    std::fflush(stdout);
+    timespec patience{30, 0};
+    for (int number = 0; (number = sigtimedwait(&set, nullptr, &patience)) > 0;) {
+        std::puts(sigabbrev_np(number));
+        std::fflush(stdout);
+        patience = {0, 500'000'000};
+    }
+    return 7;
+}
+
+namespace
+{
+
+// ---- what is left running ---------------------------------------------------
+
+// The processes of this machine with that word among their arguments.
+std::vector<pid_t> processes_with(const std::string &word)
+{
+    std::vector<pid_t> found;
+    for (const auto &entry : fs::directory_iterator("/proc")) {
+        const std::string id = entry.path().filename();
+        if (std::ranges::all_of(id, [](unsigned char c) { return std::isdigit(c); }) &&
+            ('\0' + content(entry.path() / "cmdline")).find('\0' + word + '\0') !=
+                std::string::npos) {
+            found.push_back(std::stoi(id));
+        }
+    }
+    return found;
+}
+
+// A length to sleep that nobody else on this machine has.
+std::string unique_length()
+{
+    static int count = 0;
+    return "9" + std::to_string(getpid()) + "." + std::to_string(++count);
+}
+
+// A device that has a program in front and one in the background.
+class RunningDevice
+{
+  public:
+    RunningDevice() : front_(unique_length()), behind_(unique_length())
+    {
+        pid_ = fork();
+        if (pid_ == 0) {
+            become({device_run, "sh", "-c", "sleep " + behind_ + " & sleep " + front_}, {});
+        }
+    }
+    RunningDevice(const RunningDevice &) = delete;
+    RunningDevice &operator=(const RunningDevice &) = delete;
+    ~RunningDevice()
+    {
+        if (pid_ > 0) {
+            end_by(SIGKILL);
+        }
+    }
+    bool has_started() const
+    {
+        return eventually([this] { return count() == 2; });
+    }
+    bool is_gone() const
+    {
+        return eventually([this] { return count() == 0; });
+    }
+    int end_by(int signal)
+    {
+        int status = 0;
+        kill(pid_, signal);
+        waitpid(std::exchange(pid_, -1), &status, 0);
+        return shell_status(status);
+    }
+
+  private:
+    std::size_t count() const
+    {
+        return processes_with(front_).size() + processes_with(behind_).size();
+    }
+    std::string front_;
+    std::string behind_;
+    pid_t pid_ = -1;
+};
+
+TEST_F(Device, SigtermEndsItAndEverythingOnIt)
+{
+    RunningDevice device;
+    ASSERT_TRUE(device.has_started());
+
+    EXPECT_EQ(device.end_by(SIGTERM), 143);
+    EXPECT_TRUE(device.is_gone());
+}
+
+TEST_F(NamespaceDevice, SigkillOfTheLauncherEndsItAndEverythingOnIt)
+{
+    RunningDevice device;
+    ASSERT_TRUE(device.has_started());
+
+    EXPECT_EQ(device.end_by(SIGKILL), 137);
+    EXPECT_TRUE(device.is_gone());
+}
+
+TEST_F(Device, WhatCommandLeavesRunningEndsWithIt)
+{
+    const std::string length = unique_length();
+
+    shell("sleep " + length + " >/dev/null 2>&1 &");
+
+    EXPECT_TRUE(eventually([&] { return processes_with(length).empty(); }));
+}
+
+// ---- keys -------------------------------------------------------------------
+
+// Runs a script on a device at a terminal, and types a key when it says "ready".
+Outcome at_a_terminal(const std::string &script, char key)
+{
+    int terminal = -1;
+    Outcome outcome;
+
+    const pid_t child = forkpty(&terminal, nullptr, nullptr, nullptr);
+    if (child == 0) {
+        become({device_run, "--", "sh", "-c", script}, {});
+    }
+    bool typed = false;
+    for (std::array<char, 4096> buffer{};;) {
+        const ssize_t got = read(terminal, buffer.data(), buffer.size());
+        if (got <= 0) {
+            break;
+        }
+        outcome.out.append(buffer.data(), static_cast<std::size_t>(got));
+        if (!typed && outcome.out.find("ready") != std::string::npos) {
+            typed = write(terminal, &key, 1) == 1;
+        }
+    }
+    int status = 0;
+    waitpid(child, &status, 0);
+    close(terminal);
+    outcome.status = shell_status(status);
+    return outcome;
+}
+
+constexpr char ctrl_c = '\x03';
+constexpr char ctrl_backslash = '\x1c';
+
+TEST_F(Device, CtrlCIsCommandsToHandle)
+{
+    const Outcome outcome = at_a_terminal(
+        "trap 'echo handled; exit 7' INT; echo ready; while :; do sleep 0.05; done", ctrl_c);
+
+    EXPECT_NE(outcome.out.find("handled"), std::string::npos) << outcome.out;
+    EXPECT_EQ(outcome.status, 7);
+}
+
+TEST_F(Device, CtrlCEndsACommandThatDoesNotHandleIt)
+{
+    // not said by the shell, which may lose the key on the way to becoming another program
+    const std::string sleeper = R"(exec /usr/bin/perl -e '$| = 1; alarm 9; print "ready"; sleep')";
+
+    EXPECT_EQ(at_a_terminal(sleeper, ctrl_c).status, 130);
+}
+
+TEST_F(Device, CtrlCDoesNotEndACommandThatIgnoresIt)
+{
+    const Outcome outcome = at_a_terminal("trap '' INT; echo ready; sleep 0.5; echo done", ctrl_c);
+
+    EXPECT_NE(outcome.out.find("done"), std::string::npos) << outcome.out;
+    EXPECT_EQ(outcome.status, 0);
+}
+
+TEST_F(Device, CtrlBackslashIsCommandsToHandle)
+{
+    EXPECT_EQ(at_a_terminal("trap 'exit 8' QUIT; echo ready; while :; do sleep 0.05; done",
+                            ctrl_backslash)
+                  .status,
+              8);
+}
+
+TEST_F(Device, ASignalThatTheCallerIgnoresStaysIgnored)
+{
+    const Outcome outcome =
+        run({"sh", "-c", "trap '' INT; exec \"$0\" sh -c 'kill -INT $$; echo on'", device_run});
+
+    EXPECT_EQ(outcome.out, "on\n");
+    EXPECT_EQ(outcome.status, 0);
+}
+
+const std::string this_program = fs::read_symlink("/proc/self/exe");
+
+TEST_F(Device, CtrlCComesToCommandOnce)
+{
+    const Outcome outcome =
+        at_a_terminal("exec " + quoted(this_program) + " " + say_signals_option, ctrl_c);
+
+    EXPECT_TRUE(outcome.out.ends_with("ready\r\n^CINT\r\n")) << outcome.out;
+    EXPECT_EQ(outcome.status, 7);
+}
+
+// ---- signals ----------------------------------------------------------------
+
+// A device in a process group of its own, started by a process that starts nothing
+// else. What it says goes to a file.
+class SignalledDevice
+{
+  public:
+    explicit SignalledDevice(const Words &command, const Words &options = {})
+    {
+        pid_ = fork();
+        if (pid_ == 0) {
+            setpgid(0, 0);
+            const int file = open(said().c_str(), O_WRONLY | O_CREAT | O_APPEND, 0600);
+            dup2(file, STDOUT_FILENO);
+            dup2(file, STDERR_FILENO);
+            close(file);
+            become(Words{device_run} + options + Words{"--"} + command,
+                   {.directory = directory_.path()});
+        }
+        setpgid(pid_, pid_);
+    }
+    SignalledDevice(const SignalledDevice &) = delete;
+    SignalledDevice &operator=(const SignalledDevice &) = delete;
+    ~SignalledDevice()
+    {
+        if (pid_ > 0) {
+            kill(pid_, SIGKILL);
+            wait();
+        }
+    }
+    const fs::path &directory() const
+    {
+        return directory_.path();
+    }
+    bool says(const std::string &text) const
+    {
+        return eventually([&] { return out().find(text) != std::string::npos; });
+    }
+    // But for what device/run says of being in place.
+    std::string out() const
+    {
+        std::string text;
+        for (const std::string &line : lines(content(said()))) {
+            text += line.starts_with("device/run: in place: ") ? "" : line + "\n";
+        }
+        return text;
+    }
+    void signal(int number) const
+    {
+        kill(pid_, number);
+    }
+    void signal_group(int number) const
+    {
+        kill(-pid_, number);
+    }
+    int wait()
+    {
+        int status = 0;
+        waitpid(std::exchange(pid_, -1), &status, 0);
+        return shell_status(status);
+    }
+
+  private:
+    fs::path said() const
+    {
+        return directory_.path() / "said";
+    }
+    TemporaryDirectory directory_;
+    pid_t pid_ = -1;
+};
+
+const Words signal_sayer = {this_program, say_signals_option};
+
+TEST_F(Device, SignalsToItAloneAreHandedOnToCommandOnce)
+{
+    for (const auto &[name, number] : ending_signals) {
+        SignalledDevice device(signal_sayer);
+        ASSERT_TRUE(device.says("ready"));
+
+        device.signal(number);
+
+        EXPECT_EQ(device.wait(), 7);
+        EXPECT_EQ(device.out(), "ready\n" + name + "\n");
+    }
+}
+
+TEST_F(Device, SignalsToItsGroupComeToCommandOnce)
+{
+    for (const auto &[name, number] : ending_signals) {
+        SignalledDevice device(signal_sayer);
+        ASSERT_TRUE(device.says("ready"));
+
+        device.signal_group(number);
+
+        EXPECT_EQ(device.wait(), 7);
+        EXPECT_EQ(device.out(), "ready\n" + name + "\n");
+    }
+}
+
+TEST_F(Device, SignalsToItAndThenToItsGroupComeToCommandOnce)
+{
+    // as timeout(1) sends them
+    SignalledDevice device(signal_sayer);
+    ASSERT_TRUE(device.says("ready"));
+
+    device.signal(SIGTERM);
+    device.signal_group(SIGTERM);
+
+    EXPECT_EQ(device.wait(), 7);
+    EXPECT_EQ(device.out(), "ready\nTERM\n");
+}
+
+TEST_F(Device, ASecondSignalIsHandedOnAsWell)
+{
+    SignalledDevice device(signal_sayer);
+    ASSERT_TRUE(device.says("ready"));
+
+    device.signal(SIGTERM);
+    ASSERT_TRUE(device.says("TERM\n"));
+    device.signal(SIGTERM);
+    ASSERT_TRUE(device.says("TERM\nTERM\n"));
+    device.signal(SIGHUP);
+
+    EXPECT_EQ(device.wait(), 7);
+    EXPECT_EQ(device.out(), "ready\nTERM\nTERM\nHUP\n");
+}
+
+TEST_F(Device, SignalsReachACommandThatHasLeftTheGroup)
+{
+    SignalledDevice device(Words{"/usr/bin/setsid", "-w"} + signal_sayer);
+    ASSERT_TRUE(device.says("ready"));
+
+    device.signal_group(SIGTERM);
+
+    EXPECT_EQ(device.wait(), 7);
+    EXPECT_EQ(device.out(), "ready\nTERM\n");
+}
+
+TEST_F(Device, ACommandThatGoesOnIsEndedWithItTenSecondsLater)
+{
+    for (const bool is_to_all : {false, true}) {
+        SignalledDevice device(
+            {"sh", "-c", "trap '' TERM; echo ready; while :; do sleep 0.1; done"});
+        ASSERT_TRUE(device.says("ready"));
+        const auto begin = std::chrono::steady_clock::now();
+
+        is_to_all ? device.signal_group(SIGTERM) : device.signal(SIGTERM);
+
+        EXPECT_EQ(device.wait(), 143);
+        EXPECT_GE(std::chrono::steady_clock::now() - begin, 10s);
+        EXPECT_EQ(device.out(), "ready\ndevice/run: COMMAND goes on 10 s after SIGTERM, and is "
+                                "ended with its device\n");
+    }
+}
+
+TEST_F(Device, ASignalBeforeCommandHasBegunEndsItAtOnce)
+{
+    for (const auto delay : {20ms, 60ms, 100ms}) {
+        SignalledDevice device({"sleep", "30"});
+        std::this_thread::sleep_for(delay);
+        const auto begin = std::chrono::steady_clock::now();
+
+        device.signal(SIGTERM);
+
+        EXPECT_EQ(device.wait(), 143);
+        EXPECT_LT(std::chrono::steady_clock::now() - begin, 9s);
+    }
+}
+
+TEST_F(Device, ATimeLimitLeavesWholeReports)
+{
+    SignalledDevice device({"fptest", "run", "--plan", tree / "plans/demo.xml", "--json", "results",
+                            "--junit", "results.xml", "demo/Endurance"},
+                           {"--out", "."});
+    ASSERT_TRUE(eventually([&] {
+        return content(device.directory() / "results").find("\"start\"") != std::string::npos;
+    }));
+
+    device.signal(SIGTERM);
+    device.signal_group(SIGTERM);
+
+    EXPECT_EQ(device.wait(), 130) << device.out();
+    EXPECT_NE(content(device.directory() / "results").find("\"finish\""), std::string::npos);
+    EXPECT_NE(content(device.directory() / "results.xml").find("</testsuites>"), std::string::npos);
+}
+
+TEST_F(NamespaceDevice, ItsCallersEndIsAHangUp)
+{
+    const TemporaryDirectory host;
+    const fs::path said = host.path() / "said";
+    const pid_t caller = fork();
+    if (caller == 0) {
+        become({"sh", "-c", "\"$0\" \"$1\" \"$2\" >\"$3\" 2>&1; :", device_run, this_program,
+                say_signals_option, said});
+    }
+    ASSERT_TRUE(eventually([&] { return content(said) == "ready\n"; }));
+
+    kill(caller, SIGKILL);
+    waitpid(caller, nullptr, 0);
+
+    EXPECT_TRUE(eventually([&] { return content(said) == "ready\nHUP\n"; })) << content(said);
+}
+
+TEST_F(Device, AClosedTerminalComesToCommandOnce)
+{
+    // the terminal's first process, which gets the signal, may be device/run or a shell
+    for (const std::string first : {"exec ", ""}) {
+        const TemporaryDirectory host;
+        const fs::path said = host.path() / "said";
+        int terminal = -1;
+        const pid_t child = forkpty(&terminal, nullptr, nullptr, nullptr);
+        if (child == 0) {
+            become({"sh", "-c", first + "\"$0\" \"$1\" \"$2\" >\"$3\" 2>&1; :", device_run,
+                    this_program, say_signals_option, said});
+        }
+        ASSERT_TRUE(eventually([&] { return last_line(content(said)) == "ready"; }));
+
+        close(terminal);
+
+        EXPECT_TRUE(eventually([&] { return last_line(content(said)) == "HUP"; }));
+        waitpid(child, nullptr, 0);
+        std::this_thread::sleep_for(700ms);
+        EXPECT_EQ(lines(content(said)).end()[-2], "ready") << content(said);
+    }
+}
+
+} // namespace
