@@ -4,6 +4,7 @@
 #include "markup.h"
 
 #include <algorithm>
+#include <charconv>
 
 namespace fptest
 {
@@ -12,6 +13,7 @@ namespace
 {
 
 constexpr std::string_view kBlanks = " \t\r\n";
+constexpr std::string_view kByteOrderMark = "\xEF\xBB\xBF";
 
 bool is_blank(char c)
 {
@@ -223,6 +225,19 @@ std::size_t character_length(std::string_view text, std::size_t at)
     return length;
 }
 
+// Bytes of UTF-8 that an entity stands for, from its '&' to its ';'.
+std::size_t entity_length(std::string_view entity)
+{
+    if (!entity.starts_with("&#")) {
+        return 1;
+    }
+    const bool is_hexadecimal = entity.starts_with("&#x");
+    unsigned long code = 0;
+    std::from_chars(entity.data() + (is_hexadecimal ? 3 : 2), entity.data() + entity.size() - 1,
+                    code, is_hexadecimal ? 16 : 10);
+    return code < 0x80 ? 1 : code < 0x800 ? 2 : code < 0x10000 ? 3 : 4;
+}
+
 } // namespace
 
 std::vector<Tag> scan(std::string_view text)
@@ -230,10 +245,31 @@ std::vector<Tag> scan(std::string_view text)
     return Scanner(text).scan();
 }
 
+std::size_t place_in_value(std::string_view text, const Attribute &attribute, std::size_t byte)
+{
+    std::size_t at = attribute.value_begin;
+    while (at < attribute.value_end) {
+        const std::string_view left = text.substr(at, attribute.value_end - at);
+        std::size_t taken = 1;
+        std::size_t read = 1;
+        if (left.starts_with(kByteOrderMark)) { // it is left out anywhere
+            taken = kByteOrderMark.size();
+            read = 0;
+        } else if (left.starts_with('&') && left.find(';') != left.npos) {
+            taken = left.find(';') + 1;
+            read = entity_length(left.substr(0, taken));
+        }
+        if (byte < read) {
+            break;
+        }
+        byte -= read;
+        at += taken;
+    }
+    return at;
+}
+
 Position position(std::string_view text, std::size_t offset)
 {
-    constexpr std::string_view kByteOrderMark = "\xEF\xBB\xBF";
-
     offset = std::min(offset, text.size());
     const std::string_view before = text.substr(0, offset);
     const std::size_t line_end = before.rfind('\n');

@@ -36,6 +36,10 @@ struct Tag {
 // The tags of a text in order; white space alone is no text.
 std::vector<Tag> scan(std::string_view text);
 
+// Where the byte of an attribute's value stands that is that many behind its first
+// one as Mini-XML reads it; for its end, behind its last.
+std::size_t place_in_value(std::string_view text, const Attribute &attribute, std::size_t byte);
+
 // Line and column, both from 1; a column is a character of UTF-8.
 struct Position {
     std::size_t line = 1;
