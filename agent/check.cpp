@@ -187,7 +187,7 @@ class SizeChecker
                 std::to_string(command_.size() - kPlanLimit) + " more than the " +
                 std::to_string(kPlanLimit) + " that a command stores: the plan would be cut here" +
                 (colon_ < kPlanLimit ? ", were it not cut at a ':' before" : fate("it")) +
-                "; shorten it");
+                "; shorten it, or have fptest run --plan place it as a file");
     }
 
     std::string stored_;
@@ -302,8 +302,10 @@ class FormChecker
     {
         const std::size_t offset = place_of(flaw);
         if (flaw.error == XML_ERROR_ABORTED) {
-            findings_.error(offset, "an entity is declared here: the module would not know it; "
-                                    "write its text where it is used");
+            findings_.error(offset,
+                            std::string("an entity is declared here: the module would not ") +
+                                (Plan::load(stored_) ? "know it" : "load the plan") +
+                                "; write its text where it is used");
             return;
         }
         findings_.error(offset, "not well-formed, " + reason(flaw.error, offset) +
@@ -451,8 +453,9 @@ class FormChecker
                                         kDeclaration);
             return;
         }
-        findings_.error(0, "well-formed, but the module would not load it: " +
-                               cut(one_line(why), 2 * kShownPath) + "; mend that");
+        findings_.error(undefined_entity(0), "well-formed, but the module would not load it: " +
+                                                 cut(one_line(why), 2 * kShownPath) +
+                                                 "; mend that");
     }
 
     // What stands beside the root element, where the library takes that for a
@@ -1226,61 +1229,6 @@ class PlanChecker
     std::unordered_set<std::string> names_; // of items
 };
 
-// --- messages -----------------------------------------------------------------------
-
-// Whether a byte goes on with a character.
-bool continues(char byte)
-{
-    return (static_cast<unsigned char>(byte) & 0xC0U) == 0x80U;
-}
-
-// The end of a clean text that takes at most that many columns.
-std::string_view end_of(std::string_view text, std::size_t width)
-{
-    std::size_t begin = text.size();
-    while (begin > 0) {
-        std::size_t next = begin - 1;
-        while (next > 0 && continues(text[next])) {
-            --next;
-        }
-        const std::size_t taken = columns(text.substr(next, begin - next));
-        if (taken > width) {
-            break;
-        }
-        width -= taken;
-        begin = next;
-    }
-    return text.substr(begin);
-}
-
-std::string shown(std::string_view source)
-{
-    std::string text(source);
-    std::ranges::replace(text, '\t', ' ');
-    return one_line(text);
-}
-
-// The line that the place is in: what stands before it, and the rest.
-std::pair<std::string, std::string> source_line(std::string_view text, std::size_t offset)
-{
-    constexpr std::string_view kByteOrderMark = "\xEF\xBB\xBF";
-    const std::size_t line_end = text.substr(0, offset).rfind('\n');
-    std::size_t begin = line_end == text.npos ? 0 : line_end + 1;
-    std::size_t end = std::min(text.find('\n', offset), text.size());
-    if (begin == 0 && text.starts_with(kByteOrderMark)) {
-        begin = kByteOrderMark.size();
-    }
-    if (end > begin && text[end - 1] == '\r') {
-        --end;
-    }
-    offset = std::clamp(offset, begin, std::max(begin, end));
-    while (offset > begin && offset < end && continues(text[offset]) &&
-           position(text, offset - 1).column == position(text, offset).column) {
-        --offset; // to the begin of the character that the place is in
-    }
-    return {shown(text.substr(begin, offset - begin)), shown(text.substr(offset, end - offset))};
-}
-
 } // namespace
 
 std::vector<Finding> check(const std::string &text, PlanUse use)
@@ -1301,22 +1249,6 @@ bool has_errors(const std::vector<Finding> &findings)
     return std::ranges::any_of(findings, [](const Finding &finding) {
         return finding.severity == Finding::Severity::error;
     });
-}
-
-std::string message(const std::string &file, const std::string &text, const Finding &finding)
-{
-    constexpr std::size_t kWidth = 80;
-    constexpr std::size_t kBehind = 40; // columns kept behind a place far to the right
-    const Position place = position(text, finding.offset);
-    auto [before, behind] = source_line(text, std::min(finding.offset, text.size()));
-    if (columns(before) + columns(behind) > kWidth && columns(before) > kWidth - kBehind) {
-        behind = cut(behind, kBehind);
-        before = "..." + std::string(end_of(before, kWidth - 3 - columns(behind)));
-    }
-    return one_line(file) + ":" + std::to_string(place.line) + ":" + std::to_string(place.column) +
-           (finding.severity == Finding::Severity::error ? ": error: " : ": warning: ") +
-           finding.text + "\n" + cut(before + behind, kWidth) + "\n" +
-           std::string(columns(before), ' ') + "^\n";
 }
 
 } // namespace fptest

@@ -33,7 +33,8 @@ std::string shell_characters(std::string_view name)
 // Whether the shell may read more in it than words.
 bool is_read_closely(std::string_view line)
 {
-    return line.find_first_of("\"'\\$`;&|<>()#\n\r") != line.npos;
+    return line.size() <= kCommandLimit && // else it is cut, and what is left of it changes
+           line.find_first_of("\"'\\$`;&|<>()#\n\r") != line.npos;
 }
 
 std::string reason(const Fault &fault)

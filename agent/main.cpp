@@ -110,6 +110,17 @@ CLI::Validator result_code()
             ""};
 }
 
+// How a plan comes into its place.
+CLI::Validator plan_use()
+{
+    return {[](std::string &text) {
+                return text == "command" || text == "file"
+                           ? std::string()
+                           : "'" + fptest::one_line(text) + "' is neither command nor file";
+            },
+            ""};
+}
+
 // A shell's variable that was meant to be set.
 CLI::Validator not_empty()
 {
@@ -203,6 +214,9 @@ class CommandLine
                          "without, the stored plan is run")
             ->type_name("FILE")
             ->check(not_empty());
+        command->add_flag("--as-sent", run_.as_sent,
+                          "store it by a command, which cuts it after\n"
+                          "2048 bytes, and never as a file");
         command->add_flag("--as-group", run_.as_group,
                           "one command for each group, not for each\n"
                           "item");
@@ -248,10 +262,19 @@ class CommandLine
     void add_check()
     {
         CLI::App *command = add("check", "Say what the module would make of a plan", kCheckExamples,
-                                [this] { return fptest::check_files(files_); });
-        command->add_option("FILE", files_, "test plans ('-': standard input)")
+                                [this] { return fptest::check_files(check_); });
+        command->add_option("FILE", check_.files, "test plans ('-': standard input)")
             ->type_name("")
             ->required();
+        command
+            ->add_option("--for", check_for_,
+                         "how it is to be stored: by a command, which\n"
+                         "cuts it, or as a file")
+            ->type_name("command|file")
+            ->check(plan_use())
+            ->each([this](const std::string &use) {
+                check_.use = use == "file" ? fptest::PlanUse::stored : fptest::PlanUse::to_send;
+            });
     }
 
     void add_show()
@@ -299,7 +322,8 @@ class CommandLine
                   "fptest"};
     std::function<Exit()> action_;
     fptest::RunOptions run_;
-    std::vector<std::string> files_;
+    fptest::CheckOptions check_;
+    std::string check_for_;
     std::string shown_;
     fptest::ReportOptions report_;
     fptest::SendOptions send_;

@@ -13,7 +13,6 @@ namespace
 {
 
 constexpr std::string_view kBlanks = " \t\r\n";
-constexpr std::string_view kByteOrderMark = "\xEF\xBB\xBF";
 
 bool is_blank(char c)
 {
@@ -268,22 +267,28 @@ std::size_t place_in_value(std::string_view text, const Attribute &attribute, st
     return at;
 }
 
-Position position(std::string_view text, std::size_t offset)
+Positions::Positions(std::string_view text) : text_(text)
 {
-    offset = std::min(offset, text.size());
-    const std::string_view before = text.substr(0, offset);
-    const std::size_t line_end = before.rfind('\n');
-    std::size_t at = line_end == before.npos ? 0 : line_end + 1;
-    Position place;
-    place.line += static_cast<std::size_t>(std::count(before.begin(), before.end(), '\n'));
-    if (at == 0 && text.substr(0, kByteOrderMark.size()) == kByteOrderMark) {
-        at = kByteOrderMark.size();
+    last_.begin = text.starts_with(kByteOrderMark) ? kByteOrderMark.size() : 0;
+}
+
+Position Positions::of(std::size_t offset)
+{
+    offset = std::min(offset, text_.size());
+    if (offset < last_.begin) {
+        *this = Positions(text_);
     }
-    while (at < offset) {
-        at += character_length(text, at);
-        place.column += at <= offset ? 1 : 0; // it may stand inside a character
+    while (last_.begin < offset) {
+        const std::size_t end = last_.begin + character_length(text_, last_.begin);
+        if (end > offset) {
+            break;
+        }
+        const bool is_line_end = text_[last_.begin] == '\n';
+        last_.line += is_line_end ? 1 : 0;
+        last_.column = is_line_end ? 1 : last_.column + 1;
+        last_.begin = end;
     }
-    return place;
+    return last_;
 }
 
 } // namespace fptest

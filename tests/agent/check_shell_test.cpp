@@ -3,7 +3,7 @@
 
 // What the plan checker says of command lines that the shell would take for more,
 // or less, than an item and its arguments.
-#include "check.h"
+#include "check_messages.h"
 
 #include "shell.h"
 
@@ -38,7 +38,7 @@ std::string messages(const std::string &text)
 {
     std::string all;
     for (const Finding &finding : check(text, PlanUse::stored)) {
-        all += fptest::message("p.xml", text, finding);
+        all += fptest::Messages("p.xml", text).of(finding);
     }
     return all;
 }
