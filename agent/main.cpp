@@ -5,6 +5,7 @@
 // own.
 #include "commands.h"
 #include "text.h"
+#include "usage.h"
 
 #include <CLI/CLI.hpp>
 
@@ -70,14 +71,6 @@ constexpr char kSendExamples[] =
     "  printf 'XMLFile::%s\\0XMLNodePath::demo/Bringup' \"$(cat plan.xml)\" |\n"
     "      adb shell -T fptest send -0";
 
-// One line, as every other error; the help that it names is that of the command.
-std::string one_line(const CLI::App *app, const CLI::Error &error)
-{
-    const std::vector<CLI::App *> commands = app->get_subcommands();
-    const std::string command = commands.empty() ? "" : " " + commands.front()->get_name();
-    return std::string("fptest: ") + error.what() + "; see fptest" + command + " --help\n";
-}
-
 // A whole number or fraction in that range. CLI11's own takes an empty text for 0.
 template <typename Number> CLI::Validator range(Number least, Number most)
 {
@@ -137,8 +130,9 @@ class CommandLine
     {
         app_.set_version_flag("--version", "fptest " FPTEST_VERSION, "Print the version and exit");
         app_.set_help_flag("-h,--help", "Print this help and exit");
-        app_.failure_message(one_line);
+        app_.failure_message(fptest::usage_line);
         app_.require_subcommand(1);
+        app_.option_defaults()->disable_flag_override();
         app_.footer(kExamples);
         app_.get_formatter()->column_width(24);
         add_run();
@@ -173,8 +167,7 @@ class CommandLine
             return;
         }
         if (word.starts_with('-')) {
-            throw fptest::Failure(Exit::usage, "The following argument was not expected: " +
-                                                   fptest::one_line(word) + "; see fptest --help");
+            throw fptest::Failure(Exit::usage, fptest::unknown_option(word, app_));
         }
         const std::string near = fptest::nearest(word, names);
         throw fptest::Failure(Exit::usage,
@@ -188,7 +181,7 @@ class CommandLine
     {
         CLI::App *command = app_.add_subcommand(name, purpose);
         command->footer(examples);
-        command->failure_message(one_line);
+        command->failure_message(fptest::usage_line);
         command->callback([this, action = std::move(action)] { action_ = action; });
         return command;
     }

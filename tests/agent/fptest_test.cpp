@@ -127,7 +127,7 @@ void expect_wrong(const std::vector<std::string> &arguments, const std::string &
 
 TEST_F(Fptest, SaysInOneLineWhatIsWrongWithItsArguments)
 {
-    expect_wrong({}, "fptest: A subcommand is required; see fptest --help");
+    expect_wrong({}, "fptest: no command is given; see fptest --help");
     expect_wrong({"bogus"}, "fptest: there is no command 'bogus'; the commands are run, check, "
                             "show, report and send");
     expect_wrong({"rum"}, "fptest: there is no command 'rum'; did you mean 'run'? The commands "
@@ -141,7 +141,7 @@ TEST_F(Fptest, SaysInOneLineWhatIsWrongWithItsArguments)
     }
     expect_wrong({"check"}, "fptest: FILE is required; see fptest check --help");
     expect_wrong({"show", "one", "two"},
-                 "fptest: The following argument was not expected: two; see fptest show --help");
+                 "fptest: 'two' is one argument too many; see fptest show --help");
 }
 
 TEST_F(Fptest, TakesNoValuesThatMakeNoSense)
