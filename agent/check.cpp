@@ -3,6 +3,8 @@
 
 #include "check.h"
 
+#include "check_shell.h"
+#include "findings.h"
 #include "markup.h"
 #include "plan.h"
 #include "text.h"
@@ -38,11 +40,6 @@ constexpr char kDeclaration[] = "<?xml version=\"1.0\"?>";
 
 // --- words ------------------------------------------------------------------------
 
-std::string quoted(std::string_view name)
-{
-    return "'" + cut(one_line(name), kShownName) + "'";
-}
-
 std::string path_of(const std::string &group)
 {
     return "'" + cut(one_line("root/" + group), kShownPath) + "'";
@@ -62,35 +59,13 @@ std::string names_of(const Run &run)
     std::size_t count = 0;
     for (const auto &element : run) {
         if (element && ++count == 1) {
-            first = quoted(element->name.value());
+            first = in_quotes(element->name.value());
         }
     }
     return count == 0   ? "nothing"
            : count == 1 ? first
                         : first + " and " + std::to_string(count - 1) + " more";
 }
-
-class Findings
-{
-  public:
-    void error(std::size_t offset, std::string text)
-    {
-        list_.push_back({Finding::Severity::error, offset, std::move(text)});
-    }
-    void warning(std::size_t offset, std::string text)
-    {
-        list_.push_back({Finding::Severity::warning, offset, std::move(text)});
-    }
-
-    std::vector<Finding> take()
-    {
-        std::ranges::stable_sort(list_, {}, &Finding::offset);
-        return std::move(list_);
-    }
-
-  private:
-    std::vector<Finding> list_;
-};
 
 // --- well-formedness ----------------------------------------------------------------
 
@@ -212,7 +187,7 @@ class SizeChecker
                 std::to_string(command_.size() - kPlanLimit) + " more than the " +
                 std::to_string(kPlanLimit) + " that a command stores: the plan would be cut here" +
                 (colon_ < kPlanLimit ? ", were it not cut at a ':' before" : fate("it")) +
-                "; shorten it");
+                "; shorten it, or have fptest run --plan place it as a file");
     }
 
     std::string stored_;
@@ -315,7 +290,7 @@ class FormChecker
         for (const Attribute *attribute : given_) {
             if (attribute->begin < up_to) {
                 findings_.error(attribute->begin,
-                                "attribute " + quoted(attribute->name) +
+                                "attribute " + in_quotes(attribute->name) +
                                     " has no value: the module would not load the plan; write " +
                                     cut(one_line(attribute->name), kShownName) +
                                     "=\"\" or leave it out");
@@ -327,8 +302,10 @@ class FormChecker
     {
         const std::size_t offset = place_of(flaw);
         if (flaw.error == XML_ERROR_ABORTED) {
-            findings_.error(offset, "an entity is declared here: the module would not know it; "
-                                    "write its text where it is used");
+            findings_.error(offset,
+                            std::string("an entity is declared here: the module would not ") +
+                                (Plan::load(stored_) ? "know it" : "load the plan") +
+                                "; write its text where it is used");
             return;
         }
         findings_.error(offset, "not well-formed, " + reason(flaw.error, offset) +
@@ -476,8 +453,9 @@ class FormChecker
                                         kDeclaration);
             return;
         }
-        findings_.error(0, "well-formed, but the module would not load it: " +
-                               cut(one_line(why), 2 * kShownPath) + "; mend that");
+        findings_.error(undefined_entity(0), "well-formed, but the module would not load it: " +
+                                                 cut(one_line(why), 2 * kShownPath) +
+                                                 "; mend that");
     }
 
     // What stands beside the root element, where the library takes that for a
@@ -530,19 +508,6 @@ std::string path_damage(std::string_view name)
 bool is_addressable(std::string_view name)
 {
     return !name.empty() && name.size() <= kNameLimit && path_damage(name).empty();
-}
-
-// The characters of a program's name that the shell does not take as they are.
-std::string shell_characters(std::string_view name)
-{
-    constexpr std::string_view kTaken = " \"'\\$`;&|<>()*?[{";
-    std::vector<std::string> found;
-    for (const char taken : kTaken) {
-        if (name.find(taken) != name.npos) {
-            found.push_back(taken == ' ' ? "a blank" : std::string("'") + taken + "'");
-        }
-    }
-    return listing(found);
 }
 
 struct VendorName {
@@ -608,7 +573,7 @@ std::string kind_of(mxml_node_t *node)
 class Places
 {
   public:
-    Places(const std::string &text, const Plan &plan) : tags_(element_tags(plan, text))
+    Places(const std::string &text, const Plan &plan) : text_(text), tags_(element_tags(plan, text))
     {
         if (!tags_.empty()) {
             note_texts(scan(text));
@@ -628,6 +593,15 @@ class Places
     {
         const Attribute *place = find(element, name);
         return place != nullptr && place->has_value ? place->value_begin : of(element);
+    }
+
+    // Of a byte of the value, as the module reads it.
+    [[nodiscard]] std::size_t inside(std::size_t element, std::string_view name,
+                                     std::size_t byte) const
+    {
+        const Attribute *place = find(element, name);
+        return place != nullptr && place->has_value ? place_in_value(text_, *place, byte)
+                                                    : of(element);
     }
 
     // Where the first text stands that is directly in the element.
@@ -679,6 +653,7 @@ class Places
         return found != attributes.end() ? &*found : nullptr;
     }
 
+    const std::string &text_;
     std::vector<Tag> tags_;
     std::unordered_map<std::size_t, std::size_t> texts_;
     std::vector<std::size_t> line_ends_;
@@ -771,7 +746,7 @@ class BehindChecker
                 continue;
             }
             first = item;
-            text = "group " + quoted(*earlier->name) + " has no item " + quoted(*item->name) +
+            text = "group " + in_quotes(*earlier->name) + " has no item " + in_quotes(*item->name) +
                    ", and finds this one behind it: " + path_of(*earlier->name, *item->name) +
                    " would run " + names_of({run}) + "; mind the group in paths to it";
         }
@@ -809,7 +784,7 @@ class PlanChecker
 {
   public:
     PlanChecker(const std::string &text, const Plan &plan, Findings &findings)
-        : plan_(plan), places_(text, plan), findings_(findings)
+        : plan_(plan), places_(text, plan), findings_(findings), shell_checker_(findings)
     {
     }
 
@@ -903,7 +878,7 @@ class PlanChecker
     [[nodiscard]] static std::string item_words(const Item &item)
     {
         return item.name.value_or("").empty() ? "an item without a name"
-                                              : "item " + quoted(*item.name);
+                                              : "item " + in_quotes(*item.name);
     }
 
     // --- names ---
@@ -941,14 +916,15 @@ class PlanChecker
                                                     "it; add name=\"...\"");
             }
         } else if (const std::string damage = path_damage(name); !damage.empty()) {
-            findings_.error(place, "group " + quoted(name) + " cannot be addressed: a node path " +
-                                       damage + ", and " + path_of(name) + " would run " +
+            findings_.error(place, "group " + in_quotes(name) +
+                                       " cannot be addressed: a node path " + damage + ", and " +
+                                       path_of(name) + " would run " +
                                        names_of(plan_.run_by(name)) + "; rename it");
         } else if (name.size() > kNameLimit) {
-            findings_.error(place, "group " + quoted(name) + too_long(name) +
+            findings_.error(place, "group " + in_quotes(name) + too_long(name) +
                                        names_of(plan_.run_by(name)) + "; shorten it");
         } else if (mxml_node_t *const first = plan_.find_group(name); first != group.node) {
-            findings_.error(place, "a second group " + quoted(name) + ": " + path_of(name) +
+            findings_.error(place, "a second group " + in_quotes(name) + ": " + path_of(name) +
                                        " finds the one in " + places_.line_of(plan_.number(first)) +
                                        ", and never this one; rename it");
         } else {
@@ -1000,17 +976,17 @@ class PlanChecker
         const std::size_t place = places_.of(item.number, "name");
         if (const std::string damage = path_damage(name); !damage.empty()) {
             const bool cuts_program = name.find_first_of("\t\n") != name.npos;
-            findings_.error(place, "item " + quoted(name) + " cannot be addressed: a node path " +
-                                       damage +
+            findings_.error(place, "item " + in_quotes(name) +
+                                       " cannot be addressed: a node path " + damage +
                                        (cuts_program ? ", as is the name of its program" : "") +
                                        ", and " + path_of(*group.name, name) + " would run " +
                                        run_of(group, name) + "; rename it");
         } else if (name.size() > kNameLimit) {
-            findings_.error(place, "item " + quoted(name) + too_long(name) + run_of(group, name) +
-                                       "; shorten it");
+            findings_.error(place, "item " + in_quotes(name) + too_long(name) +
+                                       run_of(group, name) + "; shorten it");
         } else if (first != nullptr) {
-            findings_.error(place, "a second item " + quoted(name) + " in group " +
-                                       quoted(*group.name) + ": " + path_of(*group.name, name) +
+            findings_.error(place, "a second item " + in_quotes(name) + " in group " +
+                                       in_quotes(*group.name) + ": " + path_of(*group.name, name) +
                                        " finds the one in " + places_.line_of(*first) +
                                        ", and so do reports; rename it");
         }
@@ -1031,7 +1007,7 @@ class PlanChecker
         }
         const std::size_t place = places_.of(item.number, "name");
         if (name.size() > kStopLimit && name.size() <= kNameLimit) {
-            findings_.warning(place, "item " + quoted(name) +
+            findings_.warning(place, "item " + in_quotes(name) +
                                          " may not be found to be stopped: ps is asked for the "
                                          "first " +
                                          std::to_string(kStopLimit) + " of the " +
@@ -1039,11 +1015,9 @@ class PlanChecker
                                          " bytes of its name, and finds another or none; shorten "
                                          "it");
         }
-        if (const std::string taken = shell_characters(name); !taken.empty()) {
-            findings_.warning(place, "item " + quoted(name) + " has " + taken +
-                                         " in its name, which the shell reads as its own: it would "
-                                         "not run a program of that name; rename it");
-        }
+        shell_checker_.check({name, item.args.value_or(""), place, [&](std::size_t at) {
+                                  return places_.inside(item.number, "args", at);
+                              }});
         check_vendors(item);
         check_command_line(item);
     }
@@ -1055,18 +1029,18 @@ class PlanChecker
         const auto vendor = vendor_name(name);
         const std::string gatherer = kGatherer;
         if (name == gatherer + "_qsee" || (vendor && vendor->name == gatherer)) {
-            findings_.warning(place, "item " + quoted(name) + " is not the gatherer: that is " +
-                                         quoted(gatherer) +
+            findings_.warning(place, "item " + in_quotes(name) + " is not the gatherer: that is " +
+                                         in_quotes(gatherer) +
                                          ", to which the module adds the vendor's suffix; leave "
                                          "it out");
         } else if (vendor) {
             const std::string under = " under vendor " + std::to_string(vendor->vendor);
-            const std::string twice = quoted(name + vendor->suffix) + under;
+            const std::string twice = in_quotes(name + vendor->suffix) + under;
             findings_.warning(place, names_.contains(vendor->name)
-                                         ? "item " + quoted(name) + " would be run as " + twice +
-                                               ", and item " + quoted(vendor->name) + " as " +
-                                               quoted(name) + "; rename one"
-                                         : "item " + quoted(name) + " would be run as " + twice +
+                                         ? "item " + in_quotes(name) + " would be run as " + twice +
+                                               ", and item " + in_quotes(vendor->name) + " as " +
+                                               in_quotes(name) + "; rename one"
+                                         : "item " + in_quotes(name) + " would be run as " + twice +
                                                ": the module adds the suffix; leave it out");
         }
     }
@@ -1076,10 +1050,10 @@ class PlanChecker
         if (!item.args) {
             const std::string line = command_line(*item.name, std::nullopt, "");
             findings_.error(places_.of(item.number),
-                            "item " + quoted(*item.name) +
+                            "item " + in_quotes(*item.name) +
                                 " has no args: its command line would "
                                 "be " +
-                                quoted(line) + ", which the shell refuses; add args=\"\"");
+                                in_quotes(line) + ", which the shell refuses; add args=\"\"");
             return;
         }
         std::vector<std::string> excesses;
@@ -1093,7 +1067,7 @@ class PlanChecker
         }
         if (!excesses.empty()) {
             findings_.error(places_.of(item.number, "args"),
-                            "the command line of item " + quoted(*item.name) + " is cut to " +
+                            "the command line of item " + in_quotes(*item.name) + " is cut to " +
                                 std::to_string(kCommandLimit) + " bytes, by " + listing(excesses) +
                                 "; shorten its " + (item.args->empty() ? "name" : "args"));
         }
@@ -1121,7 +1095,7 @@ class PlanChecker
     {
         if (group.items.empty() && group.nested.empty() && group.others.empty()) {
             findings_.warning(places_.of(group.number),
-                              "group " + quoted(*group.name) + " is empty: " +
+                              "group " + in_quotes(*group.name) + " is empty: " +
                                   path_of(*group.name) + " would run nothing, and an item of it " +
                                   "is looked for in the groups behind; put items into it");
         }
@@ -1131,7 +1105,7 @@ class PlanChecker
         const Run run = plan_.run_by(*group.name);
         const bool said = report_run_others(group, run) || !group.nested.empty();
         const std::vector<std::string> effects = shifts_of(group, run);
-        const std::string cause = kinds_of(group.others) + " in group " + quoted(*group.name);
+        const std::string cause = kinds_of(group.others) + " in group " + in_quotes(*group.name);
         const std::size_t place = place_of_others(group);
         if (!effects.empty()) {
             findings_.error(place, cause + ", which shifts the positions: " + some_of(effects) +
@@ -1153,7 +1127,7 @@ class PlanChecker
             }
             findings_.error(places_.of(element->number),
                             kind_of(plan_.elements()[element->number]) + " in group " +
-                                quoted(*group.name) + " has a name, by which " +
+                                in_quotes(*group.name) + " has a name, by which " +
                                 path_of(*group.name) +
                                 " would run it like an item; put it outside of the group");
             found = true;
@@ -1249,65 +1223,11 @@ class PlanChecker
     const Plan &plan_;
     Places places_;
     Findings &findings_;
+    ShellChecker shell_checker_;
     std::vector<Group> groups_;
     std::vector<Item> stray_;
     std::unordered_set<std::string> names_; // of items
 };
-
-// --- messages -----------------------------------------------------------------------
-
-// Whether a byte goes on with a character.
-bool continues(char byte)
-{
-    return (static_cast<unsigned char>(byte) & 0xC0U) == 0x80U;
-}
-
-// The end of a clean text that takes at most that many columns.
-std::string_view end_of(std::string_view text, std::size_t width)
-{
-    std::size_t begin = text.size();
-    while (begin > 0) {
-        std::size_t next = begin - 1;
-        while (next > 0 && continues(text[next])) {
-            --next;
-        }
-        const std::size_t taken = columns(text.substr(next, begin - next));
-        if (taken > width) {
-            break;
-        }
-        width -= taken;
-        begin = next;
-    }
-    return text.substr(begin);
-}
-
-std::string shown(std::string_view source)
-{
-    std::string text(source);
-    std::ranges::replace(text, '\t', ' ');
-    return one_line(text);
-}
-
-// The line that the place is in: what stands before it, and the rest.
-std::pair<std::string, std::string> source_line(std::string_view text, std::size_t offset)
-{
-    constexpr std::string_view kByteOrderMark = "\xEF\xBB\xBF";
-    const std::size_t line_end = text.substr(0, offset).rfind('\n');
-    std::size_t begin = line_end == text.npos ? 0 : line_end + 1;
-    std::size_t end = std::min(text.find('\n', offset), text.size());
-    if (begin == 0 && text.starts_with(kByteOrderMark)) {
-        begin = kByteOrderMark.size();
-    }
-    if (end > begin && text[end - 1] == '\r') {
-        --end;
-    }
-    offset = std::clamp(offset, begin, std::max(begin, end));
-    while (offset > begin && offset < end && continues(text[offset]) &&
-           position(text, offset - 1).column == position(text, offset).column) {
-        --offset; // to the begin of the character that the place is in
-    }
-    return {shown(text.substr(begin, offset - begin)), shown(text.substr(offset, end - offset))};
-}
 
 } // namespace
 
@@ -1329,22 +1249,6 @@ bool has_errors(const std::vector<Finding> &findings)
     return std::ranges::any_of(findings, [](const Finding &finding) {
         return finding.severity == Finding::Severity::error;
     });
-}
-
-std::string message(const std::string &file, const std::string &text, const Finding &finding)
-{
-    constexpr std::size_t kWidth = 80;
-    constexpr std::size_t kBehind = 40; // columns kept behind a place far to the right
-    const Position place = position(text, finding.offset);
-    auto [before, behind] = source_line(text, std::min(finding.offset, text.size()));
-    if (columns(before) + columns(behind) > kWidth && columns(before) > kWidth - kBehind) {
-        behind = cut(behind, kBehind);
-        before = "..." + std::string(end_of(before, kWidth - 3 - columns(behind)));
-    }
-    return one_line(file) + ":" + std::to_string(place.line) + ":" + std::to_string(place.column) +
-           (finding.severity == Finding::Severity::error ? ": error: " : ": warning: ") +
-           finding.text + "\n" + cut(before + behind, kWidth) + "\n" +
-           std::string(columns(before), ' ') + "^\n";
 }
 
 } // namespace fptest

@@ -30,9 +30,4 @@ std::vector<Finding> check(const std::string &text, PlanUse use);
 
 bool has_errors(const std::vector<Finding> &findings);
 
-// "FILE:LINE:COLUMN: error: TEXT", the source line and a caret under the place;
-// three lines, each with a line feed. A long source line is cut around the place
-// to fit 80 columns.
-std::string message(const std::string &file, const std::string &text, const Finding &finding);
-
 } // namespace fptest

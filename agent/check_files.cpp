@@ -1,63 +1,62 @@
 // SPDX-FileCopyrightText: 2026 The Quillmark authors
 // SPDX-License-Identifier: Apache-2.0
 
-#include "check.h"
+#include "check_messages.h"
 #include "commands.h"
 #include "files.h"
 #include "plan.h"
 #include "text.h"
 
 #include <algorithm>
-#include <cerrno>
 #include <cstdio>
-#include <cstring>
 
 namespace fptest
 {
 namespace
 {
 
-std::string size_of(const std::string &text)
+// What it holds is known of a plan that loads.
+std::string size_of(const std::string &text, PlanUse use)
 {
-    std::size_t groups = 0;
-    std::size_t items = 0;
+    std::string size = use == PlanUse::stored ? amount(text.size(), "byte")
+                                              : std::to_string(text.size()) + " of " +
+                                                    std::to_string(kPlanLimit) + " bytes";
     if (const auto plan = Plan::load(text)) {
-        for (const Plan::Group &group : plan->groups()) {
-            ++groups;
+        std::size_t items = 0;
+        const auto groups = plan->groups();
+        for (const Plan::Group &group : groups) {
             items += group.items.size();
         }
+        size = amount(groups.size(), "group") + ", " + amount(items, "item") + ", " + size;
     }
-    return amount(groups, "group") + ", " + amount(items, "item") + ", " +
-           std::to_string(text.size()) + " of " + std::to_string(kPlanLimit) + " bytes";
+    return size;
 }
 
 // False where the plan has errors.
-bool check_file(const std::string &file, const std::string &text)
+bool check_file(const std::string &file, const std::string &text, PlanUse use)
 {
     const std::string name = file == "-" ? "<stdin>" : one_line(file);
-    const auto findings = check(text, PlanUse::to_send);
-    for (const Finding &finding : findings) {
-        std::fputs(message(name, text, finding).c_str(), stdout);
-    }
+    const auto findings = check(text, use);
+    print(stdout, name, text, findings);
     const auto errors = static_cast<std::size_t>(
         std::ranges::count(findings, Finding::Severity::error, &Finding::severity));
     const std::size_t warnings = findings.size() - errors;
     std::printf("%s: %s, %s (%s)\n", name.c_str(), amount(errors, "error").c_str(),
-                amount(warnings, "warning").c_str(), size_of(text).c_str());
+                amount(warnings, "warning").c_str(), size_of(text, use).c_str());
     return errors == 0;
 }
 
 } // namespace
 
-Exit check_files(const std::vector<std::string> &files)
+Exit check_files(const CheckOptions &options)
 {
     bool sound = true;
     bool readable = true;
-    for (const std::string &file : files) {
+    for (const std::string &file : options.files) {
         if (const auto text = read_file(file)) {
-            sound = check_file(file, *text) && sound;
+            sound = check_file(file, *text, options.use) && sound;
         } else {
-            std::fprintf(stderr, "fptest: %s: %s\n", one_line(file).c_str(), std::strerror(errno));
+            std::fprintf(stderr, "fptest: %s: %s\n", one_line(file).c_str(), why_unread().c_str());
             readable = false;
         }
     }

@@ -5,6 +5,7 @@
 // to end, or throws a Failure.
 #pragma once
 
+#include "check.h"
 #include "failure.h"
 
 #include <optional>
@@ -17,6 +18,7 @@ namespace fptest
 struct RunOptions {
     std::string plan; // a file, "-" for standard input; empty: the stored plan
     std::vector<std::string> paths;
+    bool as_sent = false; // a plan of any length by a command, which may cut it
     bool as_group = false;
     bool list = false;
     bool force = false;
@@ -32,6 +34,11 @@ struct RunOptions {
     std::string junit; // files, "-" for standard output; empty for none
     std::string json;
     std::string log;
+};
+
+struct CheckOptions {
+    std::vector<std::string> files;
+    PlanUse use = PlanUse::to_send;
 };
 
 struct ReportOptions {
@@ -50,7 +57,7 @@ struct SendOptions {
 };
 
 Exit run(const RunOptions &options);
-Exit check_files(const std::vector<std::string> &files);
+Exit check_files(const CheckOptions &options);
 Exit show(const std::string &file); // empty: the stored plan
 Exit report(const ReportOptions &options);
 Exit send(const SendOptions &options);

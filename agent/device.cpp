@@ -73,6 +73,16 @@ void require_room(std::size_t bytes)
     }
 }
 
+void require_stored(const std::string &found, const std::string &wanted)
+{
+    if (found != wanted) {
+        throw Failure(Exit::environment,
+                      "the plan was not stored: " + std::to_string(found.size()) + " of " +
+                          std::to_string(wanted.size()) + " bytes are in " + kStoredPlan +
+                          "; make room and store it again");
+    }
+}
+
 Descriptor lock_device()
 {
     Descriptor directory(open(kDataDirectory, O_RDONLY | O_DIRECTORY | O_CLOEXEC));

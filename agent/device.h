@@ -25,6 +25,9 @@ void require_device();
 // That a plan of that size can be stored.
 void require_room(std::size_t bytes);
 
+// That the plan found is the one that was stored.
+void require_stored(const std::string &found, const std::string &wanted);
+
 // That nobody else runs a plan here, for as long as the descriptor is open.
 Descriptor lock_device();
 

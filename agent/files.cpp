@@ -38,7 +38,18 @@ std::optional<std::string> read_file(const std::string &path)
             return text;
         }
         text.append(buffer.data(), static_cast<std::size_t>(got));
+        if (text.size() > kFileLimit) {
+            errno = EFBIG;
+            return std::nullopt;
+        }
     }
+}
+
+std::string why_unread()
+{
+    return errno != EFBIG ? std::strerror(errno)
+                          : "longer than the " + std::to_string(kFileLimit >> 20U) +
+                                " MiB that are read of a test plan";
 }
 
 Descriptor lock_stored_plan()

@@ -6,14 +6,20 @@
 
 #include "descriptor.h"
 
+#include <cstddef>
 #include <optional>
 #include <string>
 
 namespace fptest
 {
 
-// The whole file; nothing where it cannot be read, errno then says why.
+// The whole file, "-" for standard input; nothing where it cannot be read, or is
+// longer than kFileLimit, errno then says why.
+inline constexpr std::size_t kFileLimit = 16U << 20U;
 std::optional<std::string> read_file(const std::string &path);
+
+// Why read_file() has just failed, for people.
+std::string why_unread();
 
 // The lock that those who report take on the stored plan, so that none writes
 // what another has just overwritten. Waits for it. A plan that is not there

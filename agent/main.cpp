@@ -6,6 +6,7 @@
 #include "commands.h"
 #include "desk_paths.h"
 #include "text.h"
+#include "usage.h"
 
 #include <CLI/CLI.hpp>
 
@@ -71,14 +72,6 @@ constexpr char kSendExamples[] =
     "  printf 'XMLFile::%s\\0XMLNodePath::demo/Bringup' \"$(cat plan.xml)\" |\n"
     "      adb shell -T fptest send -0";
 
-// One line, as every other error; the help that it names is that of the command.
-std::string one_line(const CLI::App *app, const CLI::Error &error)
-{
-    const std::vector<CLI::App *> commands = app->get_subcommands();
-    const std::string command = commands.empty() ? "" : " " + commands.front()->get_name();
-    return std::string("fptest: ") + error.what() + "; see fptest" + command + " --help\n";
-}
-
 // A whole number or fraction in that range. CLI11's own takes an empty text for 0.
 template <typename Number> CLI::Validator range(Number least, Number most)
 {
@@ -138,6 +131,17 @@ CLI::Validator result_code()
             ""};
 }
 
+// How a plan comes into its place.
+CLI::Validator plan_use()
+{
+    return {[](std::string &text) {
+                return text == "command" || text == "file"
+                           ? std::string()
+                           : "'" + fptest::one_line(text) + "' is neither command nor file";
+            },
+            ""};
+}
+
 // A shell's variable that was meant to be set.
 CLI::Validator not_empty()
 {
@@ -164,8 +168,9 @@ class CommandLine
     {
         app_.set_version_flag("--version", "fptest " FPTEST_VERSION, "Print the version and exit");
         app_.set_help_flag("-h,--help", "Print this help and exit");
-        app_.failure_message(one_line);
+        app_.failure_message(fptest::usage_line);
         app_.require_subcommand(1);
+        app_.option_defaults()->disable_flag_override();
         app_.footer(kExamples);
         app_.get_formatter()->column_width(24);
         add_run();
@@ -200,8 +205,7 @@ class CommandLine
             return;
         }
         if (word.starts_with('-')) {
-            throw fptest::Failure(Exit::usage, "The following argument was not expected: " +
-                                                   fptest::one_line(word) + "; see fptest --help");
+            throw fptest::Failure(Exit::usage, fptest::unknown_option(word, app_));
         }
         const std::string near = fptest::nearest(word, names);
         throw fptest::Failure(Exit::usage,
@@ -215,7 +219,7 @@ class CommandLine
     {
         CLI::App *command = app_.add_subcommand(name, purpose);
         command->footer(examples);
-        command->failure_message(one_line);
+        command->failure_message(fptest::usage_line);
         command->callback([this, action = std::move(action)] { action_ = action; });
         return command;
     }
@@ -242,6 +246,9 @@ class CommandLine
             ->type_name("FILE")
             ->transform(desk_file())
             ->check(not_empty());
+        command->add_flag("--as-sent", run_.as_sent,
+                          "store it by a command, which cuts it after\n"
+                          "2048 bytes, and never as a file");
         command->add_flag("--as-group", run_.as_group,
                           "one command for each group, not for each\n"
                           "item");
@@ -299,11 +306,20 @@ class CommandLine
     void add_check()
     {
         CLI::App *command = add("check", "Say what the module would make of a plan", kCheckExamples,
-                                [this] { return fptest::check_files(files_); });
-        command->add_option("FILE", files_, "test plans ('-': standard input)")
+                                [this] { return fptest::check_files(check_); });
+        command->add_option("FILE", check_.files, "test plans ('-': standard input)")
             ->type_name("")
             ->transform(desk_file())
             ->required();
+        command
+            ->add_option("--for", check_for_,
+                         "how it is to be stored: by a command, which\n"
+                         "cuts it, or as a file")
+            ->type_name("command|file")
+            ->check(plan_use())
+            ->each([this](const std::string &use) {
+                check_.use = use == "file" ? fptest::PlanUse::stored : fptest::PlanUse::to_send;
+            });
     }
 
     void add_show()
@@ -352,7 +368,8 @@ class CommandLine
                   "fptest"};
     std::function<Exit()> action_;
     fptest::RunOptions run_;
-    std::vector<std::string> files_;
+    fptest::CheckOptions check_;
+    std::string check_for_;
     std::string shown_;
     fptest::ReportOptions report_;
     fptest::SendOptions send_;

@@ -4,6 +4,7 @@
 #include "markup.h"
 
 #include <algorithm>
+#include <charconv>
 
 namespace fptest
 {
@@ -223,6 +224,19 @@ std::size_t character_length(std::string_view text, std::size_t at)
     return length;
 }
 
+// Bytes of UTF-8 that an entity stands for, from its '&' to its ';'.
+std::size_t entity_length(std::string_view entity)
+{
+    if (!entity.starts_with("&#")) {
+        return 1;
+    }
+    const bool is_hexadecimal = entity.starts_with("&#x");
+    unsigned long code = 0;
+    std::from_chars(entity.data() + (is_hexadecimal ? 3 : 2), entity.data() + entity.size() - 1,
+                    code, is_hexadecimal ? 16 : 10);
+    return code < 0x80 ? 1 : code < 0x800 ? 2 : code < 0x10000 ? 3 : 4;
+}
+
 } // namespace
 
 std::vector<Tag> scan(std::string_view text)
@@ -230,24 +244,51 @@ std::vector<Tag> scan(std::string_view text)
     return Scanner(text).scan();
 }
 
-Position position(std::string_view text, std::size_t offset)
+std::size_t place_in_value(std::string_view text, const Attribute &attribute, std::size_t byte)
 {
-    constexpr std::string_view kByteOrderMark = "\xEF\xBB\xBF";
+    std::size_t at = attribute.value_begin;
+    while (at < attribute.value_end) {
+        const std::string_view left = text.substr(at, attribute.value_end - at);
+        std::size_t taken = 1;
+        std::size_t read = 1;
+        if (left.starts_with(kByteOrderMark)) { // it is left out anywhere
+            taken = kByteOrderMark.size();
+            read = 0;
+        } else if (left.starts_with('&') && left.find(';') != left.npos) {
+            taken = left.find(';') + 1;
+            read = entity_length(left.substr(0, taken));
+        }
+        if (byte < read) {
+            break;
+        }
+        byte -= read;
+        at += taken;
+    }
+    return at;
+}
 
-    offset = std::min(offset, text.size());
-    const std::string_view before = text.substr(0, offset);
-    const std::size_t line_end = before.rfind('\n');
-    std::size_t at = line_end == before.npos ? 0 : line_end + 1;
-    Position place;
-    place.line += static_cast<std::size_t>(std::count(before.begin(), before.end(), '\n'));
-    if (at == 0 && text.substr(0, kByteOrderMark.size()) == kByteOrderMark) {
-        at = kByteOrderMark.size();
+Positions::Positions(std::string_view text) : text_(text)
+{
+    last_.begin = text.starts_with(kByteOrderMark) ? kByteOrderMark.size() : 0;
+}
+
+Position Positions::of(std::size_t offset)
+{
+    offset = std::min(offset, text_.size());
+    if (offset < last_.begin) {
+        *this = Positions(text_);
     }
-    while (at < offset) {
-        at += character_length(text, at);
-        place.column += at <= offset ? 1 : 0; // it may stand inside a character
+    while (last_.begin < offset) {
+        const std::size_t end = last_.begin + character_length(text_, last_.begin);
+        if (end > offset) {
+            break;
+        }
+        const bool is_line_end = text_[last_.begin] == '\n';
+        last_.line += is_line_end ? 1 : 0;
+        last_.column = is_line_end ? 1 : last_.column + 1;
+        last_.begin = end;
     }
-    return place;
+    return last_;
 }
 
 } // namespace fptest

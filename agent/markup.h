@@ -36,12 +36,30 @@ struct Tag {
 // The tags of a text in order; white space alone is no text.
 std::vector<Tag> scan(std::string_view text);
 
+// Where the byte of an attribute's value stands that is that many behind its first
+// one as Mini-XML reads it; for its end, behind its last.
+std::size_t place_in_value(std::string_view text, const Attribute &attribute, std::size_t byte);
+
+inline constexpr std::string_view kByteOrderMark = "\xEF\xBB\xBF";
+
 // Line and column, both from 1; a column is a character of UTF-8.
 struct Position {
     std::size_t line = 1;
     std::size_t column = 1;
+    std::size_t begin = 0; // of the character that the place is in
 };
 
-Position position(std::string_view text, std::size_t offset);
+// Of places in a text that are asked for in its order.
+class Positions
+{
+  public:
+    explicit Positions(std::string_view text);
+
+    Position of(std::size_t offset);
+
+  private:
+    std::string_view text_;
+    Position last_;
+};
 
 } // namespace fptest

@@ -9,6 +9,7 @@
 #include <algorithm>
 #include <cctype>
 #include <cerrno>
+#include <cstdlib>
 #include <cstring>
 #include <sys/mman.h>
 #include <sys/syscall.h>
@@ -83,6 +84,18 @@ class LibraryErrors
         return message;
     }
 };
+
+// The library counts a line end that it has read ahead: its line is not always the
+// one that is meant.
+std::string without_line(std::string message)
+{
+    constexpr std::string_view kLine = " on line ";
+    if (const std::size_t begin = message.find(kLine); begin != message.npos) {
+        const std::size_t end = message.find_first_not_of("0123456789", begin + kLine.size());
+        message.erase(begin, std::min(end, message.size()) - begin);
+    }
+    return message;
+}
 
 [[noreturn]] void throw_error(const char *what)
 {
@@ -265,7 +278,7 @@ std::optional<Plan> Plan::load(const std::string &text, std::string *why)
     Tree tree(mxmlLoadFd(nullptr, file.get(), nullptr), &mxmlDelete);
     if (!tree) {
         if (why != nullptr) {
-            *why = !errors.first().empty() ? errors.first()
+            *why = !errors.first().empty() ? without_line(errors.first())
                    : text.empty()          ? "it is empty"
                                            : "a tag in it is broken off or malformed";
         }
@@ -326,6 +339,17 @@ void Plan::note_positions()
             children_[parent].push_back(child);
         }
     }
+}
+
+std::string as_loaded(const std::string &value)
+{
+    const std::unique_ptr<mxml_node_t, decltype(&mxmlDelete)> node(
+        mxmlNewElement(MXML_NO_PARENT, "Cmd"), &mxmlDelete);
+    mxmlElementSetAttr(node.get(), "name", value.c_str());
+    const std::unique_ptr<char, decltype(&std::free)> saved(
+        mxmlSaveAllocString(node.get(), MXML_NO_CALLBACK), &std::free);
+    const auto plan = saved ? Plan::load(saved.get()) : std::nullopt;
+    return plan ? attribute(plan->top(), "name").value_or("") : value;
 }
 
 std::optional<Plan> Plan::read(std::string_view text)

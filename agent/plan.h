@@ -124,6 +124,10 @@ class Plan
     std::unordered_map<std::string, Numbers> items_named_;
 };
 
+// An attribute's value as the library gives it back once it is saved: it drops
+// characters that it writes.
+std::string as_loaded(const std::string &value);
+
 // The tags that a plan's elements were read from, in the same order; none where
 // the text has others than the library has seen.
 std::vector<Tag> element_tags(const Plan &plan, std::string_view text);

@@ -11,7 +11,6 @@
 #include <algorithm>
 #include <cerrno>
 #include <cstdio>
-#include <cstring>
 
 namespace fptest
 {
@@ -32,8 +31,7 @@ std::string read_stored()
                                              ", so nothing can be reported: store one with fptest "
                                              "run --plan FILE");
     }
-    throw Failure(Exit::environment,
-                  std::string(kStoredPlan) + " cannot be read: " + std::strerror(errno));
+    throw Failure(Exit::environment, std::string(kStoredPlan) + " cannot be read: " + why_unread());
 }
 
 Plan load_stored(const std::string &text)
@@ -107,7 +105,7 @@ Exit report(const ReportOptions &options)
     Report wanted;
     wanted.progress = std::to_string(options.progress);
     wanted.result = std::to_string(options.result);
-    wanted.description = description;
+    wanted.description = as_loaded(description);
     if (!written || !(written->report(number) == wanted)) {
         throw Failure(Exit::environment, std::string("the report is not in ") + kStoredPlan +
                                              ": is it writable? --log FILE tells what the module "

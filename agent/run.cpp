@@ -1,7 +1,7 @@
 // SPDX-FileCopyrightText: 2026 The Quillmark authors
 // SPDX-License-Identifier: Apache-2.0
 
-#include "check.h"
+#include "check_messages.h"
 #include "commands.h"
 #include "desk_paths.h"
 #include "device.h"
@@ -31,6 +31,7 @@ struct Source {
     std::string name; // of the file, for people
     std::string text;
     Plan plan;
+    PlanUse use;
 };
 
 // --- the plan -----------------------------------------------------------------
@@ -42,14 +43,21 @@ std::string read_plan(const std::string &file)
         return *text;
     }
     if (!file.empty()) {
-        throw Failure(Exit::usage, one_line(path) + ": " + std::strerror(errno));
+        throw Failure(Exit::usage, one_line(path) + ": " + why_unread());
     }
     if (errno == ENOENT) {
         throw Failure(Exit::environment, std::string("no plan is stored in ") + kStoredPlan +
                                              ": give one with --plan FILE");
     }
-    throw Failure(Exit::environment, std::string(kStoredPlan) + " cannot be read: " +
-                                         std::strerror(errno) + "; give a plan with --plan FILE");
+    throw Failure(Exit::environment, std::string(kStoredPlan) + " cannot be read: " + why_unread() +
+                                         "; give a plan with --plan FILE");
+}
+
+// A plan that a command cannot hold is put into its place as a file.
+PlanUse use_of(const RunOptions &options, const std::string &text)
+{
+    const bool is_sent = !options.plan.empty() && (options.as_sent || text.size() <= kPlanLimit);
+    return is_sent ? PlanUse::to_send : PlanUse::stored;
 }
 
 Source open_plan(const RunOptions &options)
@@ -58,18 +66,17 @@ Source open_plan(const RunOptions &options)
                              : options.plan == "-" ? std::string("<stdin>")
                                                    : options.plan;
     const std::string text = read_plan(options.plan);
-    const PlanUse use = options.plan.empty() ? PlanUse::stored : PlanUse::to_send;
+    const PlanUse use = use_of(options, text);
     const auto findings = check(text, use);
     if (has_errors(findings) && !options.force) {
-        for (const Finding &finding : findings) {
-            std::fputs(message(name, text, finding).c_str(), stderr);
-        }
+        print(stderr, name, text, findings);
         throw Failure(Exit::usage, "nothing was run, because the plan has errors; mend them, or "
                                    "run it as it is with --force");
     }
     if (!findings.empty() && !options.quiet) {
-        std::fprintf(stderr, "fptest: the plan has %s: see fptest check %s\n",
-                     has_errors(findings) ? "errors" : "warnings", one_line(name).c_str());
+        std::fprintf(stderr, "fptest: the plan has %s: see fptest check %s%s\n",
+                     has_errors(findings) ? "errors" : "warnings",
+                     use == PlanUse::stored ? "--for file " : "", one_line(name).c_str());
     }
     std::string why;
     auto plan = Plan::load(use == PlanUse::to_send ? stored_part(text) : text, &why);
@@ -77,7 +84,7 @@ Source open_plan(const RunOptions &options)
         throw Failure(Exit::usage,
                       one_line(name) + ": the module cannot load this plan: " + one_line(why));
     }
-    return {name, text, std::move(*plan)};
+    return {name, text, std::move(*plan), use};
 }
 
 // --- before the run -----------------------------------------------------------
@@ -119,12 +126,20 @@ void store(Host &host, const std::string &text)
     const std::string stored = stored_part(text);
     require_room(stored.size());
     send_and_wait(host, "XMLFile::" + text);
-    const std::string found = host.read_back();
-    if (found != stored) {
-        throw Failure(Exit::environment,
-                      "the plan was not stored: " + std::to_string(found.size()) + " of " +
-                          std::to_string(stored.size()) + " bytes are in " + kStoredPlan +
-                          "; make room and store it again");
+    require_stored(host.read_back(), stored);
+}
+
+// For a plan that is longer than what a command stores.
+void place(const Source &source, bool quiet)
+{
+    require_room(source.text.size());
+    const Descriptor lock = lock_stored_plan();
+    replace_stored_plan(source.text);
+    if (!quiet) {
+        std::fprintf(stderr,
+                     "fptest: %s: its %zu bytes are more than the %zu that a command stores, so "
+                     "it was placed as the file %s\n",
+                     one_line(source.name).c_str(), source.text.size(), kPlanLimit, kStoredPlan);
     }
 }
 
@@ -140,6 +155,9 @@ Descriptor ready_device()
 Exit run(const RunOptions &options)
 {
     require_different_outputs(options);
+    if (options.as_sent && options.plan.empty()) {
+        throw Failure(Exit::usage, "--as-sent is of no use without --plan FILE, which is sent");
+    }
     if (!options.list) {
         look_after_reports(
             {{"--json", options.json}, {"--junit", options.junit}, {"--log", options.log}});
@@ -157,8 +175,8 @@ Exit run(const RunOptions &options)
     }
     choose_log(options.log);
     Signals signals;
-    Host host;
-    const int vendor = ask_vendor(host);
+    std::optional<Host> host(std::in_place);
+    const int vendor = ask_vendor(*host);
     if (options.list) {
         list_items(paths.empty() ? all_paths(source.plan) : paths, source.plan,
                    vendor_suffix(vendor).value_or(""));
@@ -170,8 +188,11 @@ Exit run(const RunOptions &options)
         throw Failure(Exit::usage, "there is nothing to run: the groups named have no items");
     }
     require_programs(work, vendor, options.force);
-    if (!options.plan.empty()) {
-        store(host, source.text);
+    if (source.use == PlanUse::to_send) {
+        store(*host, source.text);
+    } else if (!options.plan.empty()) {
+        place(source, options.quiet);
+        host.emplace(); // the one before keeps the plan that was there when it was asked
     }
     Run run;
     run.plan = source.name;
@@ -183,7 +204,7 @@ Exit run(const RunOptions &options)
     run.until_fail = options.until_fail;
     run.pass_code = options.pass_code;
     run.vendor = vendor;
-    return run_rounds(options, host, signals, run, work);
+    return run_rounds(options, *host, signals, run, work);
 }
 
 } // namespace fptest

@@ -28,9 +28,8 @@ std::vector<std::string> read_commands()
     std::vector<std::string> commands;
     const auto input = read_file("-");
     if (!input || input->empty()) {
-        throw Failure(Exit::usage,
-                      "no command can be read from standard input" +
-                          (input ? std::string() : std::string(": ") + std::strerror(errno)));
+        throw Failure(Exit::usage, "no command can be read from standard input" +
+                                       (input ? std::string() : ": " + why_unread()));
     }
     const std::string &text = *input;
     for (std::size_t at = 0; at < text.size();) {
@@ -41,11 +40,29 @@ std::vector<std::string> read_commands()
     return commands;
 }
 
+// What the module takes for the command's head: colons in front of it are passed
+// over.
+std::string_view head_of(std::string_view command)
+{
+    command.remove_prefix(std::min(command.find_first_not_of(':'), command.size()));
+    return command.substr(0, command.find(':'));
+}
+
+// What a command stores as the plan; nothing where it stores none.
+std::optional<std::string> plan_of(std::string_view command)
+{
+    const std::string_view head = head_of(command);
+    if (!head.starts_with("XMLFile")) {
+        return std::nullopt;
+    }
+    return stored_part(command.substr(static_cast<std::size_t>(head.end() - command.begin())));
+}
+
 // The names of the items that a command may run, so that they can be stopped.
 std::vector<std::string> items_of(const std::string &command)
 {
     std::vector<std::string> names;
-    if (!command.starts_with("XMLNodePath")) {
+    if (!head_of(command).starts_with("XMLNodePath")) {
         return names;
     }
     if (const auto plan = Plan::load(read_file(kStoredPlan).value_or(""))) {
@@ -111,7 +128,7 @@ Exit send(const SendOptions &options)
     // as a run of its own, unless it touches nothing of one
     Descriptor lock(-1);
     if (std::ranges::any_of(commands, [](const std::string &command) {
-            return command.starts_with("XMLFile") || command.starts_with("XMLNodePath");
+            return plan_of(command) || head_of(command).starts_with("XMLNodePath");
         })) {
         lock = lock_device();
     }
@@ -125,6 +142,9 @@ Exit send(const SendOptions &options)
         std::fputc(options.from_input ? '\0' : '\n', stdout);
         if (std::fflush(stdout) != 0) {
             throw Failure(Exit::environment, "replies cannot be written to standard output");
+        }
+        if (const auto plan = plan_of(command)) {
+            require_stored(read_file(kStoredPlan).value_or(""), *plan);
         }
     }
     return Exit::success;

@@ -60,7 +60,7 @@ std::string read_shown(const std::string &file)
                                              "file to show");
     }
     throw Failure(file.empty() ? Exit::environment : Exit::usage,
-                  one_line(path) + ": " + std::strerror(errno));
+                  one_line(path) + ": " + why_unread());
 }
 
 } // namespace

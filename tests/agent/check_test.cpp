@@ -3,7 +3,7 @@
 
 // The plan checker: every message as it is printed, and what must hold of it for
 // whatever it is given.
-#include "check.h"
+#include "check_messages.h"
 
 #include "markup.h"
 #include "plan.h"
@@ -67,7 +67,7 @@ std::string messages(const std::string &text, PlanUse use)
 {
     std::string all;
     for (const Finding &finding : check(text, use)) {
-        all += fptest::message("p.xml", text, finding);
+        all += fptest::Messages("p.xml", text).of(finding);
     }
     return all;
 }
@@ -198,7 +198,8 @@ TEST(CheckedLength, SaysWhereAPlanIsCut)
         begin + std::string(2000 - begin.size(), ' ') + "\n" + group("B", cmd("x")) + "</P>\n";
     EXPECT_EQ(to_send(text),
               "p.xml:4:48: error: 2059 bytes are 11 more than the 2048 that a command stores: the "
-              "plan would be cut here, and the module would not load it; shorten it\n"
+              "plan would be cut here, and the module would not load it; shorten it, or have "
+              "fptest run --plan place it as a file\n"
               "<CmdGroup name=\"B\"><Cmd name=\"x\" args=\"\"/></CmdGroup></P>\n"
               "                                               ^\n");
     EXPECT_EQ(stored(text), "");
@@ -212,7 +213,8 @@ TEST(CheckedLength, SaysThatTheRestMayBeMissedOnly)
         begin + std::string(2047 - begin.size(), ' ') + "\n" + group("B", cmd("x")) + "</P>\n";
     EXPECT_EQ(to_send(text),
               "p.xml:3:1: error: 2106 bytes are 58 more than the 2048 that a command stores: the "
-              "plan would be cut here, and the module would load it without the rest; shorten it\n"
+              "plan would be cut here, and the module would load it without the rest; shorten it, "
+              "or have fptest run --plan place it as a file\n"
               "<CmdGroup name=\"B\"><Cmd name=\"x\" args=\"\"/></CmdGroup></P>\n"
               "^\n");
 }
@@ -223,7 +225,8 @@ TEST(CheckedLength, StandsAtTheCharacterThatIsCut)
     const std::string text = begin + std::string(2046 - begin.size(), ' ') + "\xE2\x82\xAC</P>";
     EXPECT_EQ(to_send(text),
               "p.xml:2:1990: error: 2053 bytes are 5 more than the 2048 that a command stores: the "
-              "plan would be cut here, and the module would load it without the rest; shorten it\n"
+              "plan would be cut here, and the module would load it without the rest; shorten it, "
+              "or have fptest run --plan place it as a file\n"
               "..." +
                   std::string(72, ' ') + "\xE2\x82\xAC</P>\n" + std::string(75, ' ') + "^\n");
 }
@@ -240,7 +243,8 @@ TEST(CheckedLength, YieldsToAColonInFrontOfIt)
         "<P a=\":\"><CmdGroup name=\"A\"><Cmd name=\"x\" args=\"\"/></CmdGroup>\n"
         "      ^\n"
         "p.xml:3:1: error: 2056 bytes are 8 more than the 2048 that a command stores: the plan "
-        "would be cut here, were it not cut at a ':' before; shorten it\n"
+        "would be cut here, were it not cut at a ':' before; shorten it, or have fptest run --plan "
+        "place it as a file\n"
         "<S/></P>\n"
         "^\n");
 }
@@ -251,7 +255,8 @@ TEST(CheckedLength, ComesInFrontOfAColonBehindIt)
     const std::string text = begin + std::string(2046 - begin.size(), ' ') + "\n<S a=\":\"/></P>";
     EXPECT_EQ(to_send(text),
               "p.xml:3:2: error: 2061 bytes are 13 more than the 2048 that a command stores: the "
-              "plan would be cut here, and the module would load it without the rest; shorten it\n"
+              "plan would be cut here, and the module would load it without the rest; shorten it, "
+              "or have fptest run --plan place it as a file\n"
               "<S a=\":\"/></P>\n"
               " ^\n"
               "p.xml:3:7: error: a command takes a plan up to its first ':', which is behind the "
@@ -477,11 +482,14 @@ TEST(CheckedForm, OfAnythingElse)
 TEST(CheckedForm, OfADeclaredEntity)
 {
     EXPECT_EQ(
-        stored("<!DOCTYPE P [\n<!ENTITY a \"b\">]>\n<P>" + group("A", cmd("x")) + "</P>"),
-        "p.xml:2:12: error: an entity is declared here: the module would not know it; write its "
-        "text where it is used\n"
+        stored("<!DOCTYPE P [\n<!ENTITY a \"b\">]>\n<P>&a;" + group("A", cmd("x")) + "</P>"),
+        "p.xml:2:12: error: an entity is declared here: the module would not load the plan; write "
+        "its text where it is used\n"
         "<!ENTITY a \"b\">]>\n"
         "           ^\n");
+    EXPECT_THAT(stored("<!DOCTYPE P [<!ENTITY a \"b\">]><P>" + group("A", cmd("x")) + "</P>"),
+                HasSubstr(": error: an entity is declared here: the module would not know it; "
+                          "write its text where it is used\n"));
 }
 
 TEST(CheckedForm, HasOneFindingWhateverFollowsFromIt)
@@ -650,10 +658,10 @@ TEST(CheckedRefusal, OfAnythingElseIsInTheLibrarysWords)
 {
     EXPECT_EQ(
         stored("<!DOCTYPE P SYSTEM \"p.dtd\">\n<P>&q;</P>"),
-        "p.xml:1:1: error: well-formed, but the module would not load it: Entity name 'q;' not "
-        "supported under parent <P> on line 2; mend that\n"
-        "<!DOCTYPE P SYSTEM \"p.dtd\">\n"
-        "^\n");
+        "p.xml:2:4: error: well-formed, but the module would not load it: Entity name 'q;' not "
+        "supported under parent <P>; mend that\n"
+        "<P>&q;</P>\n"
+        "   ^\n");
 }
 
 // --- groups
@@ -1340,7 +1348,7 @@ void expect_sound(const std::string &text)
             ASSERT_LE(before, finding.offset) << text;
             ASSERT_LE(finding.offset, text.size()) << text;
             before = finding.offset;
-            const std::string lines = fptest::message("p", text, finding);
+            const std::string lines = fptest::Messages("p", text).of(finding);
             ASSERT_EQ(std::count(lines.begin(), lines.end(), '\n'), 3) << text;
             ASSERT_EQ(lines.find('\r'), std::string::npos) << text;
             ASSERT_LE(finding.text.size(), 2000U) << text;
@@ -1496,23 +1504,27 @@ TEST(CheckedPlan, OfTenThousandItemsTakesNoTime)
 // --- messages
 // ----------------------------------------------------------------------------------------
 
+std::string message(const std::string &file, const std::string &text, const Finding &finding)
+{
+    return fptest::Messages(file, text).of(finding);
+}
+
 std::string shown(const std::string &text, std::size_t offset)
 {
-    return fptest::message("f", text, {Finding::Severity::warning, offset, "t"});
+    return message("f", text, {Finding::Severity::warning, offset, "t"});
 }
 
 TEST(Message, HasAPlaceASourceLineAndACaret)
 {
-    EXPECT_EQ(
-        fptest::message("a b.xml", "one\ntwo\nthree\n", {Finding::Severity::error, 5, "it is so"}),
-        "a b.xml:2:2: error: it is so\ntwo\n ^\n");
-    EXPECT_EQ(fptest::message("a", "one", {Finding::Severity::warning, 0, "it is so"}),
+    EXPECT_EQ(message("a b.xml", "one\ntwo\nthree\n", {Finding::Severity::error, 5, "it is so"}),
+              "a b.xml:2:2: error: it is so\ntwo\n ^\n");
+    EXPECT_EQ(message("a", "one", {Finding::Severity::warning, 0, "it is so"}),
               "a:1:1: warning: it is so\none\n^\n");
 }
 
 TEST(Message, ShowsAFileNameOnOneLine)
 {
-    EXPECT_EQ(fptest::message("a\n\x1B\xFF", "x", {Finding::Severity::error, 0, "t"}),
+    EXPECT_EQ(message("a\n\x1B\xFF", "x", {Finding::Severity::error, 0, "t"}),
               "a\u240A\u241B\uFFFD:1:1: error: t\nx\n^\n");
 }
 
@@ -1569,6 +1581,40 @@ TEST(Message, OfThePlaceBehindTheEnd)
     EXPECT_EQ(shown("ab", 2), "f:1:3: warning: t\nab\n  ^\n");
     EXPECT_EQ(shown("ab", 99), "f:1:3: warning: t\nab\n  ^\n");
     EXPECT_EQ(shown("", 0), "f:1:1: warning: t\n\n^\n");
+}
+
+TEST(Message, ComesInAnyOrder)
+{
+    fptest::Messages messages("f", "\xEF\xBB\xBF"
+                                   "a\n\xC3\xA9"
+                                   "b");
+    const auto place_of = [&messages](std::size_t offset) {
+        const std::string text = messages.of({Finding::Severity::warning, offset, "t"});
+        return text.substr(0, text.find(' '));
+    };
+    EXPECT_EQ(place_of(7), "f:2:2:");
+    EXPECT_EQ(place_of(6), "f:2:1:");
+    EXPECT_EQ(place_of(7), "f:2:2:");
+    EXPECT_EQ(place_of(3), "f:1:1:");
+    EXPECT_EQ(place_of(1), "f:1:1:");
+    EXPECT_EQ(place_of(8), "f:2:3:");
+}
+
+TEST(Message, OfALongLineTakesNoTime)
+{
+    const std::string item = cmd("\xC3\xA9");
+    std::string text;
+    for (int left = 30000; left > 0; --left) {
+        text += item;
+    }
+    const auto begin = std::chrono::steady_clock::now();
+    fptest::Messages messages("f", text);
+    std::size_t size = 0;
+    for (std::size_t at = 0; at < text.size(); at += item.size()) {
+        size += messages.of({Finding::Severity::error, at, "t"}).size();
+    }
+    EXPECT_GT(size, 100 * text.size() / item.size());
+    EXPECT_LT(std::chrono::steady_clock::now() - begin, std::chrono::seconds(10));
 }
 
 TEST(Message, CutsALongLineAroundThePlace)

@@ -99,12 +99,13 @@ TEST_F(Fptest, NamesItsCommandsAndExitCodesInItsHelp)
 
 TEST_F(Fptest, NamesEveryOptionInItsHelp)
 {
-    EXPECT_THAT(
-        options_of("run"),
-        IsSupersetOf({"--plan", "--as-group", "--timeout", "--repeat", "--list", "--junit",
-                      "--json", "--tap", "--pass-code", "--force", "--quiet", "--log", "--help"}));
+    EXPECT_THAT(options_of("run"),
+                IsSupersetOf({"--plan", "--as-sent", "--as-group", "--timeout", "--repeat",
+                              "--list", "--junit", "--json", "--tap", "--pass-code", "--force",
+                              "--quiet", "--log", "--help"}));
     EXPECT_THAT(options_of("report"),
                 IsSupersetOf({"--progress", "--result", "--description", "--log"}));
+    EXPECT_THAT(options_of("check"), IsSupersetOf({"--for"}));
     EXPECT_THAT(options_of("send"), IsSupersetOf({"-0", "--log"}));
     EXPECT_THAT(options_of(""), IsSupersetOf({"--version", "--help"}));
 }
@@ -126,7 +127,7 @@ void expect_wrong(const std::vector<std::string> &arguments, const std::string &
 
 TEST_F(Fptest, SaysInOneLineWhatIsWrongWithItsArguments)
 {
-    expect_wrong({}, "fptest: A subcommand is required; see fptest --help");
+    expect_wrong({}, "fptest: no command is given; see fptest --help");
     expect_wrong({"bogus"}, "fptest: there is no command 'bogus'; the commands are run, check, "
                             "show, report and send");
     expect_wrong({"rum"}, "fptest: there is no command 'rum'; did you mean 'run'? The commands "
@@ -140,7 +141,7 @@ TEST_F(Fptest, SaysInOneLineWhatIsWrongWithItsArguments)
     }
     expect_wrong({"check"}, "fptest: FILE is required; see fptest check --help");
     expect_wrong({"show", "one", "two"},
-                 "fptest: The following argument was not expected: two; see fptest show --help");
+                 "fptest: 'two' is one argument too many; see fptest show --help");
 }
 
 TEST_F(Fptest, TakesNoValuesThatMakeNoSense)
@@ -285,6 +286,13 @@ TEST_F(Fptest, ChecksWithAMessageASourceLineAndACaret)
     EXPECT_EQ(lines[2], std::string(column - 1, ' ') + "^");
     EXPECT_EQ(lines[3],
               "/tmp/scene/plan.xml: 1 error, 0 warnings (1 group, 1 item, 75 of 2048 bytes)");
+}
+
+TEST_F(Fptest, CountsNothingInAPlanThatDoesNotLoad)
+{
+    const Ended ended = run_fptest({"check", "-"}, "<P><CmdGroup name=\"G\"></P>");
+    EXPECT_EQ(ended.status, 1);
+    EXPECT_EQ(lines_of(ended.out).back(), "<stdin>: 1 error, 0 warnings (26 of 2048 bytes)");
 }
 
 TEST_F(Fptest, ChecksSeveralFilesAndStandardInput)

@@ -77,7 +77,7 @@ std::vector<std::string> attributes(std::string_view text)
 
 std::string place(std::string_view text, std::size_t offset)
 {
-    const Position position = fptest::position(text, offset);
+    const Position position = fptest::Positions(text).of(offset);
     return std::to_string(position.line) + ":" + std::to_string(position.column);
 }
 

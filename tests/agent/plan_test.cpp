@@ -279,14 +279,26 @@ TEST(LoadedPlan, IsNoneOfATextThatTheLibraryRefuses)
 {
     EXPECT_EQ(reason(""), "it is empty");
     EXPECT_EQ(reason("Plan"), "XML does not start with '<' (saw 'P').");
-    EXPECT_EQ(reason("<?xml?><P><a></b></P>"),
-              "Mismatched close tag </b> under parent <a> on line 1.");
+    EXPECT_EQ(reason("<?xml?><P><a></b></P>"), "Mismatched close tag </b> under parent <a>.");
     EXPECT_EQ(reason("<?xml?>\n<P>\n<Cmd name=\"x\" result/></P>"),
-              "Missing value for attribute 'result' in element Cmd on line 3.");
-    EXPECT_EQ(reason("<?xml?><P>"), "Missing close tag </P> under parent <?xml?> on line 1.");
+              "Missing value for attribute 'result' in element Cmd.");
+    EXPECT_EQ(reason("<?xml?><P>"), "Missing close tag </P> under parent <?xml?>.");
     EXPECT_EQ(reason("<P><Cmd name=\"x"), "a tag in it is broken off or malformed");
-    EXPECT_EQ(reason("<!-- c --><P/>"),
-              "<P> cannot be a second root node after <!-- c --> on line 1.");
+    EXPECT_EQ(reason("<!-- c --><P/>"), "<P> cannot be a second root node after <!-- c -->.");
+}
+
+// A value as the library has it after saving and loading.
+TEST(LoadedPlan, HasValuesAsTheyComeBackFromAFile)
+{
+    using namespace std::string_literals;
+    for (const std::string &value : {""s, " a  b "s, "\t\n\r"s, "<&>\"'"s, "&amp;&#10;"s,
+                                     "\xC3\xA9\U0001F600\u200B\u2028\uFFFE"s}) {
+        EXPECT_EQ(fptest::as_loaded(value), value);
+    }
+    EXPECT_EQ(fptest::as_loaded("a\uFEFF"
+                                "b"),
+              "ab");
+    EXPECT_EQ(fptest::as_loaded("\uFEFF\uFEFF"), "");
 }
 
 TEST(LoadedPlan, KeepsTheFirstReasonOfThisTextOnly)
@@ -294,7 +306,7 @@ TEST(LoadedPlan, KeepsTheFirstReasonOfThisTextOnly)
     EXPECT_EQ(reason("x"), "XML does not start with '<' (saw 'x').");
     EXPECT_EQ(reason("<P><Cmd name=\"x"), "a tag in it is broken off or malformed");
     // &q; has two things against it
-    EXPECT_EQ(reason("<P>&q;</P>"), "Entity name 'q;' not supported under parent <P> on line 1.");
+    EXPECT_EQ(reason("<P>&q;</P>"), "Entity name 'q;' not supported under parent <P>.");
     EXPECT_FALSE(Plan::load("x"));
 }
 

@@ -77,6 +77,23 @@ TEST_F(Report, WritesProgressResultAndDescription)
     EXPECT_EQ(row("DeadPixel"), "Bringup DeadPixel - - -");
 }
 
+// Mini-XML writes a byte order mark and does not read it again.
+TEST_F(Report, TakesADescriptionWithAByteOrderMark)
+{
+    for (const auto &[description, shown] :
+         std::vector<std::pair<std::string, std::string>>{{"a\uFEFF"
+                                                           "b",
+                                                           " ab"},
+                                                          {"\uFEFFx", " x"},
+                                                          {"\uFEFF", ""}}) {
+        const Ended ended = report({"Bringup", "SpiCheck", "--progress", "100", "--result", "0",
+                                    "--description", description});
+        EXPECT_EQ(ended.status, 0);
+        EXPECT_EQ(ended.err, "");
+        EXPECT_EQ(row("SpiCheck"), "Bringup SpiCheck 100 0" + shown);
+    }
+}
+
 TEST_F(Report, TakesItsOptionsInAnyPlace)
 {
     EXPECT_EQ(report({"--result=1", "Endurance", "--progress=100", "BurnIn"}).status, 0);

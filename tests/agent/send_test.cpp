@@ -54,6 +54,28 @@ TEST_F(Send, PassesCommandsOnAsTheyAre)
     EXPECT_THAT(paths_run(), ElementsAre("a/b c"));
 }
 
+TEST_F(Send, SaysThatAPlanWasNotStored)
+{
+    fill_disk();
+    const Ended ended = run_fptest({"send", "pingtest", "XMLFile::<P>::</P>", "XMLNodePath::P/G"});
+    EXPECT_EQ(ended.status, 3);
+    EXPECT_EQ(ended.out, "Ping Success!\n\n"); // no reply to what was not sent any more
+    EXPECT_EQ(ended.err, "fptest: the plan was not stored: 0 of 3 bytes are in "
+                         "/data/vorlane/src1.xml; make room and store it again\n");
+    EXPECT_THAT(paths_run(), ElementsAre());
+}
+
+TEST_F(Send, StoresWhatACommandCanHold)
+{
+    const std::string text = "<P>" + std::string(3000, ' ') + "</P>";
+    EXPECT_EQ(run_fptest({"send", "XMLFile::" + text}).status, 0);
+    EXPECT_EQ(read_file(kPlanFile), text.substr(0, 2048));
+    EXPECT_EQ(run_fptest({"send", ":XMLFiles:::a:b"}).status, 0);
+    EXPECT_EQ(read_file(kPlanFile), "a");
+    EXPECT_EQ(run_fptest({"send", "XMLFile"}).status, 0);
+    EXPECT_EQ(read_file(kPlanFile), "");
+}
+
 TEST_F(Send, ReadsAndWritesZeroBytesWhereThatIsWanted)
 {
     Ended ended = run_fptest({"send", "-0"}, "pingtest\0pingtest\0"s);

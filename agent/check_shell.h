@@ -1,0 +1,51 @@
+// SPDX-FileCopyrightText: 2026 The Quillmark authors
+// SPDX-License-Identifier: Apache-2.0
+
+// The part of the plan checker that looks at what the shell makes of an item's
+// name and args.
+#pragma once
+
+#include "findings.h"
+#include "shell.h"
+
+#include <cstddef>
+#include <functional>
+#include <string>
+#include <unordered_map>
+
+namespace fptest
+{
+
+class ShellChecker
+{
+  public:
+    struct Item {
+        std::string name;
+        std::string args;
+        std::size_t name_place = 0;
+        std::function<std::size_t(std::size_t)> args_place; // of a byte of the args
+    };
+
+    explicit ShellChecker(Findings &findings);
+
+    void check(const Item &item);
+
+  private:
+    struct Verdict {
+        ShellReading reading;
+        bool is_refused = false;
+        std::string why; // in the shell's words
+    };
+
+    Verdict judge(const std::string &line);
+    void report_name(const Item &item, const std::string &characters, bool is_refused);
+    void report_refusal(const Item &item, const Verdict &verdict, std::size_t args_begin);
+    void report_effect(const Item &item, const ShellReading::Effect &effect, std::size_t place);
+    void report_command(const Item &item, const ShellReading::Effect &effect, std::size_t place);
+
+    Findings &findings_;
+    Shell shell_;
+    std::unordered_map<std::string, Verdict> verdicts_; // by the line
+};
+
+} // namespace fptest

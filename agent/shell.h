@@ -1,0 +1,57 @@
+// SPDX-FileCopyrightText: 2026 The Quillmark authors
+// SPDX-License-Identifier: Apache-2.0
+
+// What a shell makes of an item's command line: "/system/bin/NAME ARGS" is its
+// text, and not only the first program of it is run.
+#pragma once
+
+#include <cstddef>
+#include <optional>
+#include <string>
+#include <string_view>
+#include <vector>
+
+namespace fptest
+{
+
+struct ShellReading {
+    // What keeps the shell from running anything.
+    struct Fault {
+        enum class Kind { no_end, unexpected, nothing_behind };
+        Kind kind = Kind::no_end;
+        std::size_t at = 0;
+        std::string mark; // the characters that stand there
+    };
+    // What the shell does besides starting the line's first command.
+    struct Effect {
+        enum class Kind { command, substitution, redirection, comment, function };
+        Kind kind = Kind::command;
+        std::size_t at = 0;
+        std::string mark;
+        std::string text; // what is run, and may be nothing; else all of it
+    };
+
+    std::optional<Fault> fault;  // the first
+    std::vector<Effect> effects; // of the first command, up to the one that ends it
+                                 // and the first line feed that does
+};
+
+// Reads a line as the shell of the device does, but for reserved words: a fault
+// that is only one of grammar it misses.
+ShellReading read_shell_line(std::string_view line);
+
+// The device's own shell, which is asked without running anything.
+class Shell
+{
+  public:
+    enum class Answer { accepted, refused, unknown };
+
+    // unknown where there is no such shell, or it has taken too long in all; why
+    // then is as it was, else what the shell says against the line.
+    Answer ask(const std::string &line, std::string &why);
+
+  private:
+    double left_ = 5; // seconds
+};
+
+} // namespace fptest
