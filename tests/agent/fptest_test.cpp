@@ -99,10 +99,10 @@ TEST_F(Fptest, NamesItsCommandsAndExitCodesInItsHelp)
 
 TEST_F(Fptest, NamesEveryOptionInItsHelp)
 {
-    EXPECT_THAT(
-        options_of("run"),
-        IsSupersetOf({"--plan", "--as-group", "--timeout", "--repeat", "--list", "--junit",
-                      "--json", "--tap", "--pass-code", "--force", "--quiet", "--log", "--help"}));
+    EXPECT_THAT(options_of("run"),
+                IsSupersetOf({"--plan", "--as-group", "--timeout", "--repeat", "--for",
+                              "--until-fail", "--list", "--junit", "--json", "--tap", "--pass-code",
+                              "--force", "--quiet", "--log", "--help"}));
     EXPECT_THAT(options_of("report"),
                 IsSupersetOf({"--progress", "--result", "--description", "--log"}));
     EXPECT_THAT(options_of("send"), IsSupersetOf({"-0", "--log"}));

@@ -118,6 +118,10 @@ class Playback
         now(place) = end(place);
         listener_.ended(now_, place);
     }
+    void report_late(Place place, const Report &report)
+    {
+        listener_.late(now_, place, report);
+    }
     void run_item(Place place)
     {
         start(place);
@@ -138,6 +142,11 @@ class Playback
         }
         plan();
         ++now_.round;
+    }
+    // What becomes of it from now on.
+    void end_as(const RunOfItems &end)
+    {
+        end_ = end;
     }
     void finish()
     {
