@@ -163,11 +163,23 @@ class Playback
     }
 
     // All of it.
-    void play()
+    void play(int rounds = 1)
     {
         begin();
         play_round();
+        for (; rounds > 1; --rounds) {
+            begin_next_round();
+            play_round();
+        }
         finish();
+    }
+    void pause()
+    {
+        listener_.paused(now_);
+    }
+    void resume()
+    {
+        listener_.resumed(now_);
     }
 
     void play_round()

@@ -111,6 +111,11 @@ void play_one(Playback &playback)
     playback.play();
 }
 
+void play_two(Playback &playback)
+{
+    playback.play(2);
+}
+
 // --- JSON -----------------------------------------------------------------------
 
 TEST_F(RoundReports, NumberTheEventsOfAllRoundsInJson)
@@ -167,13 +172,7 @@ TEST_F(RoundReports, SayInJsonWhatEndsTheRun)
 
 TEST_F(RoundReports, PlanAllRoundsInFrontWhereTapKnowsTheirNumber)
 {
-    const std::string text = tap(two_items(2), [](Playback &playback) {
-        playback.begin();
-        playback.play_round();
-        playback.begin_next_round();
-        playback.play_round();
-        playback.finish();
-    });
+    const std::string text = tap(two_items(2), play_two);
     const Tap read = parse_tap(text);
     EXPECT_THAT(text, ::testing::StartsWith("TAP version 14\n1..4\n"));
     std::vector<std::string> names;
@@ -191,13 +190,7 @@ TEST_F(RoundReports, PlanTheRoundsAtTheEndWhereTapDoesNotKnowTheirNumber)
 {
     RunOfItems run = two_items(std::nullopt);
     run.time_limit = 3600;
-    const std::string text = tap(run, [](Playback &playback) {
-        playback.begin();
-        playback.play_round();
-        playback.begin_next_round();
-        playback.play_round();
-        playback.finish();
-    });
+    const std::string text = tap(run, play_two);
     EXPECT_THAT(text, ::testing::StartsWith("TAP version 14\n# Subtest: G (round 1)\n"));
     EXPECT_THAT(text, HasSubstr("not ok 4 - H (round 2)\n1..4\n# ITEM"));
     EXPECT_EQ(parse_tap(text).planned, 4U);
@@ -327,11 +320,7 @@ TEST_F(RoundReports, GoThroughAPipeThatHoldsLessThanTheJunitDocument)
     {
         const auto report = junit_report(path("pipe"));
         Playback playback(*report, run);
-        playback.begin();
-        playback.play_round();
-        playback.begin_next_round();
-        playback.play_round();
-        playback.finish();
+        playback.play(2);
         EXPECT_EQ(report->failure(), "");
     }
     reader.join();
@@ -493,18 +482,51 @@ TEST_F(RoundReports, EndAViewWithATableOfTheItems)
     const std::string long_name(100, 'n');
     RunOfItems run = run_of({suite("G", {passed(long_name), failed("b")})});
     run.rounds = 2;
-    const std::string text = plain(run, [](Playback &playback) {
-        playback.begin();
-        playback.play_round();
-        playback.begin_next_round();
-        playback.play_round();
-        playback.finish();
-    });
+    const std::string text = plain(run, play_two);
     const std::string name = "G/" + std::string(40, 'n') + "...";
     EXPECT_THAT(text,
                 HasSubstr("\nITEM" + std::string(43, ' ') + "PASSED    LEAST   MEDIAN  LONGEST\n" +
                           name + "  2 of 2  0.301 s  0.301 s  0.301 s\nG/b" + std::string(42, ' ') +
                           "  0 of 2  0.301 s  0.301 s  0.301 s\n2 passed, 2 failed, "));
+}
+
+TEST_F(RoundReports, AreQuietButForWhatIsWrong)
+{
+    ItemRun left = passed("b");
+    left.left_running = {{"sh", 812}};
+    const RunOfItems run = run_of({suite("G", {passed("a"), left, failed("c")})});
+    EXPECT_EQ(written([&run](std::FILE *stream) {
+                  const auto view = plain_view(stream, true);
+                  Playback(*view, run).play(2);
+              }),
+              "G/b: passed, result 0, 0.3 s: chip answers\n"
+              "    left running: sh (pid 812)\n"
+              "G/c: failed, result 1, 0.3 s: 3 dead pixels\n"
+              "    | row 7\n"
+              "    | row 9\n"
+              "G/b: passed, result 0, 0.3 s: chip answers\n"
+              "    left running: sh (pid 812)\n"
+              "G/c: failed, result 1, 0.3 s: 3 dead pixels\n"
+              "    | row 7\n"
+              "    | row 9\n");
+}
+
+TEST_F(RoundReports, LeaveTheShellsLinesAloneAfterAPause)
+{
+    const std::string text = written([](std::FILE *stream) {
+        const auto view = live_view(stream, false);
+        Playback playback(*view, two_items(1));
+        playback.begin();
+        playback.start({0, 0});
+        playback.pause();
+        std::fputs("[1]+  Stopped\n$ fg\n", stream);
+        std::fflush(stream);
+        playback.resume();
+    });
+    const std::string frame = "  a        [        ]       0.0 s  running    -  \n"
+                              "0 passed, 0 failed, 2 to go, 0.0 s";
+    EXPECT_THAT(text, ::testing::EndsWith("G\n" + frame + "\n[1]+  Stopped\n$ fg\n" + frame))
+        << "what was drawn before the pause is not erased after it";
 }
 
 TEST_F(RoundReports, CutALineOfOutputThatIsTooLong)
