@@ -281,11 +281,11 @@ class JunitReport : public Listener
     // The whole document, in pieces. False where the sink says so.
     bool write(const Run &run, const Sink &sink) const
     {
+        const off_t end = spool_.size(); // the sink may be the spool itself
         const std::string how = junit_how_it_stands(run);
         if (!sink(junit_head(run, before_))) {
             return false;
         }
-        const off_t end = spool_.size(); // the sink may be the spool
         for (off_t at = 0; at < end;) {
             const std::string piece = spool_.piece(at, end);
             if (piece.empty() || !sink(filled_in(piece, how))) {

@@ -11,6 +11,7 @@
 #include <algorithm>
 #include <csignal>
 #include <cstdio>
+#include <poll.h>
 #include <thread>
 #include <unistd.h>
 
@@ -53,7 +54,10 @@ void Runner::read_signals()
         if (signal_ != 0) {
             // the reports are as far as they were written; the host's process
             // sees that this one is gone and stops what runs
-            std::fputs("\nfptest: left at once; what runs is asked to stop\n", stderr);
+            pollfd errors{STDERR_FILENO, POLLOUT, 0};
+            if (poll(&errors, 1, 0) > 0) { // a terminal may be stopped
+                std::fputs("\nfptest: left at once; what runs is asked to stop\n", stderr);
+            }
             _exit(static_cast<int>(128 + SIGINT));
         }
         signal_ = signal;

@@ -13,11 +13,19 @@ namespace fptest
 
 Signals::Signals()
 {
+    sigprocmask(SIG_BLOCK, nullptr, &before_);
     sigemptyset(&set_);
     for (const int signal : {SIGINT, SIGTERM, SIGHUP}) {
         sigaddset(&set_, signal);
     }
     receive();
+}
+
+Signals::~Signals()
+{
+    while (take() != 0) {
+    }
+    sigprocmask(SIG_SETMASK, &before_, nullptr);
 }
 
 void Signals::receive()

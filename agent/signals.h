@@ -17,6 +17,12 @@ class Signals
 {
   public:
     Signals();
+    // From here on they do again what they do by themselves; one that has come and was
+    // not taken is forgotten.
+    ~Signals();
+    Signals(const Signals &) = delete;
+    Signals &operator=(const Signals &) = delete;
+
     int descriptor() const;
     // The number of one that has come; 0 where none has.
     int take();
@@ -32,6 +38,7 @@ class Signals
     void receive();
 
     sigset_t set_{};
+    sigset_t before_{};
     Descriptor descriptor_{-1};
 };
 

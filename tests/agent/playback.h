@@ -118,6 +118,10 @@ class Playback
         now(place) = end(place);
         listener_.ended(now_, place);
     }
+    void report_late(Place place, const Report &report)
+    {
+        listener_.late(now_, place, report);
+    }
     void run_item(Place place)
     {
         start(place);
@@ -139,6 +143,11 @@ class Playback
         plan();
         ++now_.round;
     }
+    // What becomes of it from now on.
+    void end_as(const RunOfItems &end)
+    {
+        end_ = end;
+    }
     void finish()
     {
         RunOfItems last = end_;
@@ -154,11 +163,23 @@ class Playback
     }
 
     // All of it.
-    void play()
+    void play(int rounds = 1)
     {
         begin();
         play_round();
+        for (; rounds > 1; --rounds) {
+            begin_next_round();
+            play_round();
+        }
         finish();
+    }
+    void pause()
+    {
+        listener_.paused(now_);
+    }
+    void resume()
+    {
+        listener_.resumed(now_);
     }
 
     void play_round()
