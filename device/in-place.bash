@@ -65,7 +65,7 @@ put_back()
 	mapfile -t made 2>/dev/null <"$keep/made"
 	for path in "${made[@]}"; do
 		case $path in
-		/system/bin | /data/vorlane | /etc/vorlane) trees+=("$path") ;;
+		/system/bin | /dev/shm/quillmark-* | /data/vorlane | /etc/vorlane) trees+=("$path") ;;
 		*) empty=("$path" "${empty[@]}") ;;
 		esac
 	done
@@ -96,10 +96,19 @@ make_directories()
 	printf '%s\n' "${missing[@]}" >>"$keep/made" && mkdir -- "${missing[@]}"
 }
 
-# One process makes all the links; with ln it would be one for each.
-fill_system_bin()
+# Links alone, in memory where there is some: a disk takes its time for hundreds. One
+# process makes them all; with ln it would be one for each.
+make_system_bin()
 {
-	local name links=("$device/guard" /system/bin/sh)
+	local name links=() memory=/dev/shm/quillmark-$run_mark
+
+	if [[ -w /dev/shm ]]; then
+		make_directories "$memory" && echo /system/bin >>"$keep/made" &&
+			links=("$memory" /system/bin) || return
+	else
+		make_directories /system/bin || return
+	fi
+	links+=("$device/guard" /system/bin/sh)
 
 	for name in "${!program[@]}"; do
 		[[ $name = sh ]] || links+=("${program[$name]}" "/system/bin/$name")
@@ -115,7 +124,7 @@ point_shell_at_mksh()
 
 lay_out_container()
 {
-	local directories=(/system /system/bin /data /etc/vorlane /etc/vorlane/sysparms)
+	local directories=(/system /data /etc/vorlane /etc/vorlane/sysparms)
 
 	[[ -n $data ]] || directories+=(/data/vorlane)
 	mkdir -- "$keep" && echo "$run_mark" >"$keep/run" &&
@@ -123,7 +132,7 @@ lay_out_container()
 	if [[ -n $data ]]; then
 		echo /data/vorlane >>"$keep/made" && ln -s -- "$data" /data/vorlane || return
 	fi
-	fill_system_bin && point_shell_at_mksh
+	make_system_bin && point_shell_at_mksh
 }
 
 # Waits for the supervisor, which is asked by every signal that comes here.
