@@ -83,7 +83,7 @@ class RunningDevice
     {
         pid_ = fork();
         if (pid_ == 0) {
-            become({device_run, "sh", "-c", "sleep " + behind_ + " & sleep " + front_}, {});
+            become({device_run, "sh", "-c", "sleep " + behind_ + " & exec sleep " + front_}, {});
         }
     }
     RunningDevice(const RunningDevice &) = delete;
