@@ -52,7 +52,7 @@ put_shell_back()
 # Undoes what this run, or an interrupted one before it, has done.
 put_back()
 {
-	local path mark=''
+	local path mark='' made=() trees=() empty=()
 
 	[[ -d $keep ]] || return
 	trap '' HUP INT QUIT TERM
@@ -62,12 +62,15 @@ put_back()
 		printf 'device/run: in place: /bin/sh cannot be put back; it is kept in %s\n' "$keep" >&2
 		return
 	fi
-	while read -r path; do
+	mapfile -t made 2>/dev/null <"$keep/made"
+	for path in "${made[@]}"; do
 		case $path in
-		/system/bin | /data/vorlane | /etc/vorlane) rm -rf -- "$path" ;;
-		*) rmdir -- "$path" 2>/dev/null ;;
+		/system/bin | /dev/shm/quillmark-* | /data/vorlane | /etc/vorlane) trees+=("$path") ;;
+		*) empty=("$path" "${empty[@]}") ;;
 		esac
-	done < <(tac -- "$keep/made" 2>/dev/null)
+	done
+	rm -rf -- "${trees[@]}"
+	((${#empty[@]} > 0)) && rmdir -- "${empty[@]}" 2>/dev/null
 	rm -rf -- "$keep"
 }
 
@@ -82,22 +85,35 @@ take_the_container()
 	fi
 }
 
-# Notes a path before it is made, so that an interruption leaves none unnoted.
-make_directory()
+# Notes paths before they are made, so that an interruption leaves none unnoted.
+make_directories()
 {
-	[[ -d $1 ]] || { echo "$1" >>"$keep/made" && mkdir -- "$1"; }
+	local path missing=()
+
+	for path in "$@"; do
+		[[ -d $path ]] || missing+=("$path")
+	done
+	printf '%s\n' "${missing[@]}" >>"$keep/made" && mkdir -- "${missing[@]}"
 }
 
-# One process makes all the links; with ln it would be one for each.
-fill_system_bin()
+# Links alone, in memory where there is some: a disk takes its time for hundreds. One
+# process makes them all; with ln it would be one for each.
+make_system_bin()
 {
-	local name links=()
+	local name links=() memory=/dev/shm/quillmark-$run_mark
+
+	if [[ -w /dev/shm ]]; then
+		make_directories "$memory" && echo /system/bin >>"$keep/made" &&
+			links=("$memory" /system/bin) || return
+	else
+		make_directories /system/bin || return
+	fi
+	links+=("$device/guard" /system/bin/sh)
 
 	for name in "${!program[@]}"; do
 		[[ $name = sh ]] || links+=("${program[$name]}" "/system/bin/$name")
 	done
-	perl -e 'while (@ARGV) { symlink(shift, shift) or die "/system/bin: $!\n" }' -- "${links[@]}" &&
-		install -m 755 -- "$device/guard" /system/bin/sh
+	perl -e 'while (@ARGV) { symlink(shift, shift) or die "/system/bin: $!\n" }' -- "${links[@]}"
 }
 
 point_shell_at_mksh()
@@ -108,15 +124,15 @@ point_shell_at_mksh()
 
 lay_out_container()
 {
+	local directories=(/system /data /etc/vorlane /etc/vorlane/sysparms)
+
+	[[ -n $data ]] || directories+=(/data/vorlane)
 	mkdir -- "$keep" && echo "$run_mark" >"$keep/run" &&
-		make_directory /system && make_directory /system/bin && make_directory /data &&
-		make_directory /etc/vorlane && make_directory /etc/vorlane/sysparms || return
+		make_directories "${directories[@]}" || return
 	if [[ -n $data ]]; then
 		echo /data/vorlane >>"$keep/made" && ln -s -- "$data" /data/vorlane || return
-	else
-		make_directory /data/vorlane || return
 	fi
-	fill_system_bin && point_shell_at_mksh
+	make_system_bin && point_shell_at_mksh
 }
 
 # Waits for the supervisor, which is asked by every signal that comes here.

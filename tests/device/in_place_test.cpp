@@ -331,7 +331,7 @@ TEST_F(InPlace, EndsWhatCommandLeavesRunning)
 TEST_F(InPlace, EndsAndPutsBackOnSigterm)
 {
     const Outcome outcome = container.run(
-        running + "\"$1\" -- sh -c 'sleep 78 & touch /tmp/on; sleep 79' & "
+        running + "\"$1\" -- sh -c 'sleep 78 & touch /tmp/on; exec sleep 79' & "
                   "until [ -e /tmp/on ]; do sleep 0.05; done; kill $!; wait $!; echo $?; "
                   "running 'sleep 7.'; readlink /bin/sh; ls -d /system");
 

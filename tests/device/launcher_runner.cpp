@@ -230,10 +230,14 @@ std::string content(const fs::path &path)
 
 Way way()
 {
-    static const Outcome asked = on_device({"printenv", "QUILLMARK_DEVICE"});
-    return asked.out == "namespace\n"  ? Way::namespaces
-           : asked.out == "in-place\n" ? Way::in_place
-                                       : Way::none;
+    static const std::string asked = [] {
+        const char *known = std::getenv("QUILLMARK_TEST_WAY");
+        return known != nullptr ? known + std::string("\n")
+                                : on_device({"printenv", "QUILLMARK_DEVICE"}).out;
+    }();
+    return asked == "namespace\n"  ? Way::namespaces
+           : asked == "in-place\n" ? Way::in_place
+                                   : Way::none;
 }
 
 namespace

@@ -5,11 +5,13 @@
 // starts itself again there, so that it never touches the machine it is on.
 #include <gtest/gtest.h>
 
+#include <csignal>
 #include <cstdio>
 #include <cstdlib>
 #include <filesystem>
 #include <string>
 #include <string_view>
+#include <sys/prctl.h>
 #include <sys/wait.h>
 #include <unistd.h>
 #include <vector>
@@ -24,6 +26,7 @@ int run_on_device(const std::vector<std::string> &arguments)
 {
     const pid_t pid = fork();
     if (pid == 0) {
+        prctl(PR_SET_PDEATHSIG, SIGTERM); // nobody is to wait for what a time limit has ended
         std::vector<const char *> argv;
         for (const std::string &argument : arguments) {
             argv.push_back(argument.c_str());

@@ -83,7 +83,7 @@ class RunningDevice
     {
         pid_ = fork();
         if (pid_ == 0) {
-            become({device_run, "sh", "-c", "sleep " + behind_ + " & sleep " + front_}, {});
+            become({device_run, "sh", "-c", "sleep " + behind_ + " & exec sleep " + front_}, {});
         }
     }
     RunningDevice(const RunningDevice &) = delete;
@@ -374,6 +374,9 @@ TEST_F(Device, SignalsReachACommandThatHasLeftTheGroup)
 TEST_F(Device, ACommandThatGoesOnIsEndedWithItTenSecondsLater)
 {
     for (const bool is_to_all : {false, true}) {
+        if (is_to_all && way() == Way::in_place) {
+            break; // it is the same there, and the others wait
+        }
         SignalledDevice device(
             {"sh", "-c", "trap '' TERM; echo ready; while :; do sleep 0.1; done"});
         ASSERT_TRUE(device.says("ready"));
