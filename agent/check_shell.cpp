@@ -79,7 +79,11 @@ void ShellChecker::check(const Item &item)
             }
         }
     }
-    if (const std::size_t at = item.args.find('\r'); at != item.args.npos) {
+    // one mistake where it is in front of a line feed that is said
+    const bool ends_line = std::ranges::any_of(verdict.reading.effects, [&](const Effect &effect) {
+        return effect.mark == "\n" && line[effect.at - 1] == '\r';
+    });
+    if (const std::size_t at = item.args.find('\r'); at != item.args.npos && !ends_line) {
         findings_.warning(item.args_place(at),
                           "the shell takes the carriage return here for a character like any "
                           "other, and would hand it to item " +

@@ -60,7 +60,7 @@ void look_after_reports(const std::vector<std::pair<std::string, std::string>> &
             throw Failure(Exit::environment,
                           name +
                               ": the host's directories are read-only on the virtual device: "
-                              "write into the working directory that device/run --out DIR gives");
+                              "device/run --out DIR gives a working directory that can be written");
         }
         if (goes_with_device(directory, device)) {
             lost.push_back(name);
@@ -68,8 +68,8 @@ void look_after_reports(const std::vector<std::pair<std::string, std::string>> &
     }
     if (!lost.empty()) {
         std::fprintf(stderr,
-                     "fptest: %s will be gone with the virtual device: what is written into the "
-                     "working directory that device/run --out DIR gives stays\n",
+                     "fptest: %s goes with the virtual device when it ends; device/run --out DIR "
+                     "gives a working directory that stays\n",
                      listing(lost).c_str());
     }
 }

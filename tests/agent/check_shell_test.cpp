@@ -105,6 +105,9 @@ TEST(CheckedLineFeed, IsSaidBehindAnotherCommandAsWell)
 TEST(CheckedLineFeed, HasATabAndACarriageReturnBesideIt)
 {
     EXPECT_EQ(finding_of("a\tb&#9;c"), "");
+    EXPECT_EQ(finding_of("a\r\n  b"),
+              "p.xml:3:23: error: the shell would end the command of item 'X' at the line feed "
+              "here, and run 'b' as a command of its own; write a blank in its place");
     EXPECT_EQ(messages(plan_with("a b&#13;")),
               "p.xml:3:24: warning: the shell takes the carriage return here for a character like "
               "any other, and would hand it to item 'X'; leave it out\n"

@@ -296,6 +296,24 @@ TEST_F(Fptest, CountsNothingInAPlanThatDoesNotLoad)
     EXPECT_EQ(lines_of(ended.out).back(), "<stdin>: 1 error, 0 warnings (26 of 2048 bytes)");
 }
 
+TEST_F(Fptest, ChecksArgsWhereThereIsNoShellToAsk)
+{
+    const std::string before = "<P><CmdGroup name=\"G\"><Cmd name=\"X\" args=\"";
+    const std::string behind = "\"/></CmdGroup></P>";
+    Start start;
+    start.is_no_device = true;
+    start.arguments = {"check", "-"};
+    start.input = before + "it's" + behind;
+    EXPECT_EQ(lines_of(run_fptest(start).out).front(),
+              "<stdin>:1:45: error: the shell would refuse the command line of item 'X': it finds "
+              "no end of the ''' here; end it, or put a '\\' before it");
+    // a fault that only the shell knows
+    start.input = before + "a; if" + behind;
+    EXPECT_EQ(lines_of(run_fptest(start).out).front(),
+              "<stdin>:1:44: warning: the shell would run 'if' as a command of its own, after item "
+              "'X'; put the ';' in quotes if it is meant for the item");
+}
+
 TEST_F(Fptest, ChecksSeveralFilesAndStandardInput)
 {
     const std::string sound = file("sound.xml", plan_of({{"G", {{"Item", ""}}}}));

@@ -96,6 +96,7 @@ TerminalSession::TerminalSession(const std::vector<std::string> &arguments, int 
     if (pid_ == 0) {
         setenv("TERM", "xterm-256color", 1);
         unsetenv("NO_COLOR");
+        unsetenv("QUILLMARK_DEVICE"); // it would say at each start what goes with the device
         become(arguments, environment);
     }
 }

@@ -94,8 +94,9 @@ TEST_F(Trust, EndsTheRunWhenTheStoredPlanIsGone)
                              "<Cmd name=\"Other\" args=\"report G 100 0 fine\"/></CmdGroup></P>";
     const Ended ended = run_fptest({"run", "--json", work("json"), "--plan", plan(text), "P/G"});
     EXPECT_EQ(ended.status, 3);
-    EXPECT_EQ(lines_of(ended.err).back(), "fptest: the stored plan /data/vorlane/src1.xml is gone, "
-                                          "or not whole any more: store it again");
+    EXPECT_EQ(ended.err, "fptest: the plan has warnings: see fptest check /tmp/scene/plan.xml\n"
+                         "fptest: the stored plan /data/vorlane/src1.xml is gone, or not whole any "
+                         "more: store it again\n");
     EXPECT_THAT(outcomes(), ElementsAre("Item: no result", "Other: not run"));
 }
 

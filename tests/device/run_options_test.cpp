@@ -160,14 +160,14 @@ TEST_F(Reports, CannotBeWrittenIntoAHostsDirectoryAndTheLineSaysWhatToDo)
         EXPECT_EQ(outcome.err,
                   "fptest: " + option +
                       " results: the host's directories are read-only on the virtual device: "
-                      "write into the working directory that device/run --out DIR gives\n");
+                      "device/run --out DIR gives a working directory that can be written\n");
     }
 }
 
 TEST_F(Reports, OnTheDevicesOwnDisksAreSaidToGoWithIt)
 {
-    const std::string line = " will be gone with the virtual device: what is written into the "
-                             "working directory that device/run --out DIR gives stays";
+    const std::string line = " goes with the virtual device when it ends; device/run --out DIR "
+                             "gives a working directory that stays";
 
     const Outcome outcome = run_with({"--junit", "/data/vorlane/r.xml"});
     EXPECT_EQ(outcome.status, 0);
