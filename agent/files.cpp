@@ -9,11 +9,13 @@
 
 #include <array>
 #include <cerrno>
+#include <chrono>
 #include <cstdio>
 #include <cstring>
 #include <fcntl.h>
 #include <sys/file.h>
 #include <sys/stat.h>
+#include <thread>
 
 namespace fptest
 {
@@ -59,7 +61,9 @@ Descriptor lock_stored_plan()
         if (!plan.is_open()) {
             return plan;
         }
-        while (flock(plan.get(), LOCK_EX) != 0 && errno == EINTR) {
+        // one that hangs while it has it is not waited for without end
+        for (int tries = 0; flock(plan.get(), LOCK_EX | LOCK_NB) != 0 && tries < 5000; ++tries) {
+            std::this_thread::sleep_for(std::chrono::milliseconds(2));
         }
         // it may have been replaced while this waited
         struct stat held {

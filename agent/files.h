@@ -22,8 +22,8 @@ std::optional<std::string> read_file(const std::string &path);
 std::string why_unread();
 
 // The lock that those who report take on the stored plan, so that none writes
-// what another has just overwritten. Waits for it. A plan that is not there
-// needs none.
+// what another has just overwritten. Waits for it, 10 seconds at most. A plan that
+// is not there needs none.
 Descriptor lock_stored_plan();
 
 // Puts another text in the stored plan's place, whole or not at all. Throws a

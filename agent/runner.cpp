@@ -115,12 +115,16 @@ bool Runner::run(const Job &job)
             names.push_back(run_.suites[job.suite].items[target->item].name);
         }
     }
+    // a process that reports, such as a gatherer, truncates the plan before it writes it:
+    // the module may load it until it has come to the first item
+    Descriptor plan = lock_stored_plan();
     host_.command("XMLNodePath::" + job.path, names);
 
     std::size_t next = 0;
     bool runs = true;
     while ((runs || !active_.empty()) && !broken_) {
         if (const auto event = host_.wait(kTurn, signals_.descriptor())) {
+            plan = Descriptor(-1);
             handle(*event, job, next, runs);
         }
         watch(runs);

@@ -51,6 +51,9 @@ void Runner::read_signals()
             suspend();
             continue;
         }
+        if (signal_ != 0 && signal == SIGHUP) {
+            continue; // a terminal that closes sends it once more, or after its Ctrl-C
+        }
         if (signal_ != 0) {
             // the reports are as far as they were written; the host's process
             // sees that this one is gone and stops what runs

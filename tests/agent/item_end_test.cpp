@@ -10,6 +10,7 @@
 #include <csignal>
 #include <nlohmann/json.hpp>
 #include <thread>
+#include <unistd.h>
 
 using namespace fptest_runner;
 using device::kPlanFile;
@@ -26,6 +27,7 @@ using ::testing::Ge;
 using ::testing::HasSubstr;
 using ::testing::IsEmpty;
 using ::testing::Lt;
+using ::testing::Not;
 using ::testing::StartsWith;
 
 namespace
@@ -180,6 +182,24 @@ TEST_F(ItemEnd, SecondInterruptionLeavesNoItemThatIgnoresTheStop)
     EXPECT_TRUE(wait_for([] { return running_items().empty(); }, 20));
 }
 
+TEST_F(ItemEnd, HangUpAfterAnInterruptionIsTheSameInterruption)
+{
+    for (const int first : {SIGINT, SIGHUP}) {
+        FptestProcess fptest(with_plan({{"Stubborn", "note /tmp/scene/begun ignore-stop sleep 60"}},
+                                       {"--grace", "1"}));
+        ASSERT_TRUE(wait_for_file("begun"));
+        fptest.signal(first);
+        std::this_thread::sleep_for(std::chrono::milliseconds(200));
+        fptest.signal(SIGHUP);
+        const Ended ended = fptest.wait();
+        EXPECT_EQ(ended.status, 130);
+        EXPECT_EQ(ended.err, "");
+        EXPECT_THAT(outcomes(json()), ElementsAre("Stubborn: stopped"));
+        EXPECT_THAT(reason(0), StartsWith("killed by "));
+        unlink(work("begun").c_str());
+    }
+}
+
 // --- how the process ended -----------------------------------------------------------
 
 TEST_F(ItemEnd, DeathByASignalIsAFailureWhateverWasReported)
@@ -214,18 +234,17 @@ TEST_F(ItemEnd, ItemThatSignalsItsProcessGroupEndsAlone)
 
 // --- what is left running -----------------------------------------------------------------
 
-// A script that leaves this to a child of its own.
+// A script that leaves this to a child of its own the first time that it runs.
 std::string leaving(const std::string &text)
 {
-    return script("(" + text + ") &amp; echo x >/tmp/scene/left");
+    return script("if ! test -e /tmp/scene/left; then (" + text +
+                  ") &amp; fi; echo x >/tmp/scene/left; sleep 0.3");
 }
 
 TEST_F(ItemEnd, ChildOfAnEarlierRoundReportsIntoNoLaterOne)
 {
-    const std::string late = "if ! test -e /tmp/scene/left; then sleep 0.5; " +
-                             script_report("0", "of round 1") + "; fi";
-    const Ended ended = run({{"Script", leaving(late)}, {"Item", "sleep 0.2 report G 100 0 fine"}},
-                            {"--repeat", "3"});
+    const std::string late = "sleep 0.6; " + script_report("0", "of round 1");
+    const Ended ended = run({{"Script", leaving(late)}, {"Item", kPasses}}, {"--repeat", "3"});
     EXPECT_EQ(ended.status, 1);
     EXPECT_THAT(outcomes(json()),
                 ElementsAre("Script: no result", "Item: passed", "Script: no result",
@@ -253,7 +272,7 @@ TEST_F(ItemEnd, ChildOnlyJustEndingIsNotLeftRunning)
 
 TEST_F(ItemEnd, ReportAfterTheItemsEndIsToldAndChangesNothing)
 {
-    const Ended ended = run({{"Script", leaving("sleep 0.3; " + script_report("0", "too late"))},
+    const Ended ended = run({{"Script", leaving("sleep 0.6; " + script_report("0", "too late"))},
                              {"Item", "sleep 1 report G 100 0 fine"}});
     EXPECT_EQ(ended.status, 1);
     EXPECT_THAT(outcomes(json()), ElementsAre("Script: no result", "Item: passed"));
@@ -278,10 +297,18 @@ TEST_F(ItemEnd, WhatIsLeftRunningIsEndedBeforeTheNextRoundAndAtTheEnd)
 
 TEST_F(ItemEnd, ChildOfAnItemReportsIntoNoSecondRunOfItInTheSameRound)
 {
-    const std::string late = "if ! test -e /tmp/scene/left; then sleep 0.5; " +
-                             script_report("0", "of the first") + "; fi";
-    EXPECT_EQ(run({{"Script", leaving(late) + "; sleep 0.3"}}, {"P/G/Script"}).status, 1);
+    const std::string late = "sleep 0.6; " + script_report("0", "of the first");
+    EXPECT_EQ(run({{"Script", leaving(late)}}, {"P/G/Script"}).status, 1);
     EXPECT_THAT(outcomes(json()), ElementsAre("Script: no result", "Script: no result"));
+}
+
+TEST_F(ItemEnd, WhatIsLeftRunningIsGoneWhenTheNextRoundBegins)
+{
+    run({{"Script", script("ps Third >>/tmp/scene/seen; " + script_report("0", "fine"))},
+         {"Item", "report G 100 0 fine; /system/bin/Third sleep 60 &amp;"}},
+        {"--repeat", "2"});
+    EXPECT_THAT(ends().at(1).at("left_running").size(), 1U);
+    EXPECT_THAT(read_file(work("seen")), AllOf(HasSubstr("USER"), Not(HasSubstr("Third"))));
 }
 
 TEST_F(ItemEnd, WhatIsLeftRunningServesTheRestOfItsRound)
