@@ -99,11 +99,11 @@ TEST_F(Fptest, NamesItsCommandsAndExitCodesInItsHelp)
 
 TEST_F(Fptest, NamesEveryOptionInItsHelp)
 {
-    EXPECT_THAT(options_of("run"),
-                IsSupersetOf({"--plan", "--as-sent", "--as-group", "--timeout", "--grace",
-                              "--exit-status", "--repeat", "--for", "--until-fail", "--list",
-                              "--junit", "--json", "--tap", "--pass-code", "--force", "--quiet",
-                              "--log", "--help"}));
+    EXPECT_THAT(
+        options_of("run"),
+        IsSupersetOf({"--plan", "--as-sent", "--as-group", "--timeout", "--grace", "--exit-status",
+                      "--repeat", "--for", "--until-fail", "--list", "--junit", "--json", "--tap",
+                      "--pass-code", "--force", "--quiet", "--log", "--help"}));
     EXPECT_THAT(options_of("report"),
                 IsSupersetOf({"--progress", "--result", "--description", "--log"}));
     EXPECT_THAT(options_of("check"), IsSupersetOf({"--for"}));

@@ -1506,8 +1506,7 @@ TEST_F(CutOff, LosesTheItemInWhichTheModulesProcessEndedAndNoOther)
     const Ended ended = fptest.wait();
     EXPECT_EQ(ended.status, 1);
     EXPECT_EQ(ended.err, "");
-    EXPECT_THAT(outcomes(json()),
-                ElementsAre("Item: passed", "Other: no result", "Third: passed"));
+    EXPECT_THAT(outcomes(json()), ElementsAre("Item: passed", "Other: no result", "Third: passed"));
     EXPECT_EQ(reasons(json()).at(1), "the module's process ended by signal 9; --log FILE keeps "
                                      "what it says");
     EXPECT_EQ(tally_of_json(json()), (Tally{2, 1, 0}));
@@ -1518,8 +1517,8 @@ TEST_F(CutOff, LosesTheItemInWhichTheModulesProcessEndedAndNoOther)
 
 TEST_F(CutOff, LosesWhatTheModulesProcessWouldHaveComeToInAGroupsCommand)
 {
-    const std::string text = group_of({{"Item", "note /tmp/scene/begun sleep 60"},
-                                       {"Other", kItemPasses}});
+    const std::string text =
+        group_of({{"Item", "note /tmp/scene/begun sleep 60"}, {"Other", kItemPasses}});
     FptestProcess fptest(with_json({"--as-group", "--plan", plan(text), "P/G"}));
     ASSERT_TRUE(wait_for_file("begun"));
     kill(fptest.module(), SIGKILL);
