@@ -68,9 +68,9 @@ void look_after_reports(const std::vector<std::pair<std::string, std::string>> &
     }
     if (!lost.empty()) {
         std::fprintf(stderr,
-                     "fptest: %s goes with the virtual device when it ends; device/run --out DIR "
+                     "fptest: %s %s with the virtual device when it ends; device/run --out DIR "
                      "gives a working directory that stays\n",
-                     listing(lost).c_str());
+                     listing(lost).c_str(), lost.size() == 1 ? "goes" : "go");
     }
 }
 

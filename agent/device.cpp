@@ -33,7 +33,8 @@ void choose_log(const std::string &file)
         setenv("VR_LOG_FILE", "/dev/null", 0);
         return;
     }
-    const Descriptor log(open(file.c_str(), O_WRONLY | O_CREAT | O_APPEND | O_CLOEXEC, 0644));
+    const Descriptor log(
+        open(file.c_str(), O_WRONLY | O_CREAT | O_APPEND | O_NONBLOCK | O_CLOEXEC, 0644));
     if (!log.is_open()) {
         throw Failure(Exit::environment, "--log " + one_line(file) + " cannot be written: " +
                                              std::strerror(errno) + "; name another file");

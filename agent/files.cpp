@@ -19,10 +19,35 @@
 
 namespace fptest
 {
+namespace
+{
+
+bool standard_output_was_open = true;
+
+} // namespace
+
+void fill_standard_descriptors()
+{
+    standard_output_was_open = fcntl(STDOUT_FILENO, F_GETFD) >= 0;
+    int descriptor = 0;
+    do {
+        descriptor = open("/dev/null", O_RDWR | O_CLOEXEC);
+    } while (descriptor >= 0 && descriptor <= STDERR_FILENO);
+    if (descriptor >= 0) {
+        close(descriptor);
+    }
+}
+
+bool has_standard_output()
+{
+    return standard_output_was_open;
+}
+
 std::optional<std::string> read_file(const std::string &path)
 {
-    const Descriptor file(path == "-" ? dup(STDIN_FILENO)
-                                      : open(path.c_str(), O_RDONLY | O_CLOEXEC));
+    // an item may have put a FIFO in the stored plan's place
+    const int flags = O_RDONLY | O_CLOEXEC | (path == kStoredPlan ? O_NONBLOCK : 0);
+    const Descriptor file(path == "-" ? dup(STDIN_FILENO) : open(path.c_str(), flags));
     if (!file.is_open()) {
         return std::nullopt;
     }
@@ -57,7 +82,7 @@ std::string why_unread()
 Descriptor lock_stored_plan()
 {
     for (;;) {
-        Descriptor plan(open(kStoredPlan, O_RDONLY | O_CLOEXEC));
+        Descriptor plan(open(kStoredPlan, O_RDONLY | O_NONBLOCK | O_CLOEXEC));
         if (!plan.is_open()) {
             return plan;
         }

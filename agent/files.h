@@ -13,6 +13,12 @@
 namespace fptest
 {
 
+// What is opened later would get the number of a standard stream that is closed, and
+// what is meant for that: they are all opened.
+void fill_standard_descriptors();
+// Whether it was open before.
+bool has_standard_output();
+
 // The whole file, "-" for standard input; nothing where it cannot be read, or is
 // longer than kFileLimit, errno then says why.
 inline constexpr std::size_t kFileLimit = 16U << 20U;

@@ -96,6 +96,7 @@ Host::~Host()
     fcntl(output_.get(), F_ADD_SEALS, F_SEAL_GROW);
     shutdown(control_.get(), SHUT_RDWR);
     if (pid_ > 0) {
+        kill(pid_, SIGCONT); // an item may have suspended it
         while (waitpid(pid_, nullptr, 0) < 0 && errno == EINTR) {
         }
     }
@@ -141,18 +142,25 @@ void Host::restart()
     }
 }
 
+void Host::kill_module() const
+{
+    if (pid_ > 0) {
+        kill(pid_, SIGKILL);
+    }
+}
+
 // The module first, or it would start another item meanwhile.
 void Host::suspend()
 {
     if (pid_ > 0) {
         kill(pid_, SIGSTOP);
     }
-    processes().signal_items(SIGSTOP);
+    processes().signal_all(SIGSTOP);
 }
 
 void Host::resume()
 {
-    processes().signal_items(SIGCONT);
+    processes().signal_all(SIGCONT);
     if (pid_ > 0) {
         kill(pid_, SIGCONT);
     }

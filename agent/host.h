@@ -71,6 +71,9 @@ class Host
     // Takes another process for the module in place of one that has ended.
     void restart();
 
+    // Ends the module's process, where that does not answer.
+    void kill_module() const;
+
     // Suspends the module and its items, and lets them go on.
     void suspend();
     void resume();

@@ -5,6 +5,7 @@
 // own.
 #include "commands.h"
 #include "desk_paths.h"
+#include "files.h"
 #include "text.h"
 #include "usage.h"
 
@@ -375,19 +376,6 @@ class CommandLine
     fptest::SendOptions send_;
 };
 
-// What is opened later would get the number of a standard stream that is closed,
-// and what is meant for that.
-void fill_standard_descriptors()
-{
-    int descriptor = 0;
-    do {
-        descriptor = open("/dev/null", O_RDWR | O_CLOEXEC);
-    } while (descriptor >= 0 && descriptor <= STDERR_FILENO);
-    if (descriptor >= 0) {
-        close(descriptor);
-    }
-}
-
 Exit complain(Exit status, const std::string &text)
 {
     std::fflush(stdout);
@@ -399,7 +387,7 @@ Exit complain(Exit status, const std::string &text)
 
 int main(int argc, char **argv)
 {
-    fill_standard_descriptors();
+    fptest::fill_standard_descriptors();
     // a reader that has left is met as an error where it is written to
     std::signal(SIGPIPE, SIG_IGN);
     Exit status = Exit::success;

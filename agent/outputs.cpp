@@ -3,6 +3,7 @@
 
 #include "outputs.h"
 
+#include "files.h"
 #include "plan.h"
 #include "reports.h"
 #include "text.h"
@@ -71,9 +72,14 @@ void require_different_outputs(const RunOptions &options)
             }
         }
     }
-    if (const auto reports = reports_on_standard_output(options); reports.size() > 1) {
+    const auto reports = reports_on_standard_output(options);
+    if (reports.size() > 1) {
         throw Failure(Exit::usage,
                       listing(reports) + " each want standard output: give all but one a file");
+    }
+    if (!reports.empty() && !has_standard_output()) {
+        throw Failure(Exit::environment,
+                      reports.front() + " wants standard output, which is closed: open it");
     }
 }
 

@@ -113,17 +113,19 @@ bool is_named_gatherer(const Process &process)
     const auto matches = [](const std::string &name) {
         return name.starts_with(kGatherer) && !name.ends_with("_qsee");
     };
-    return matches(process.name) || (matches(process.script) && process.name != "grep");
+    return matches(process.name) || (matches(process.script) && process.name.ends_with("sh"));
 }
 
-bool comes_of_gatherer(const Processes &processes, pid_t pid)
+// Whether that holds for a process, or for one that it comes of.
+template <typename Predicate>
+bool comes_of(const Processes &processes, pid_t pid, const Predicate &predicate)
 {
     for (std::size_t steps = 0; steps < processes.size(); ++steps) {
         const auto found = processes.find(pid);
         if (found == processes.end()) {
             return false;
         }
-        if (is_named_gatherer(found->second)) {
+        if (predicate(*found)) {
             return true;
         }
         pid = found->second.parent;
@@ -131,18 +133,19 @@ bool comes_of_gatherer(const Processes &processes, pid_t pid)
     return false;
 }
 
-// What goes on for an item: a shell that waits for another program is one of them.
-std::map<pid_t, std::string> item_processes(pid_t module, pid_t ancestor)
+bool comes_of_gatherer(const Processes &processes, pid_t pid)
 {
-    std::map<pid_t, std::string> found;
-    const Processes processes = read_processes();
-    for (const auto &[pid, process] : processes) {
-        if (lives(process) && pid != module && process.group != module &&
-            is_below(processes, pid, ancestor) && !comes_of_gatherer(processes, pid)) {
-            found.emplace(pid, process.name);
-        }
-    }
-    return found;
+    return comes_of(processes, pid,
+                    [](const auto &entry) { return is_named_gatherer(entry.second); });
+}
+
+bool comes_of_any(const Processes &processes, pid_t pid, const std::vector<Leftover> &others)
+{
+    return comes_of(processes, pid, [&](const auto &entry) {
+        return std::ranges::any_of(others, [&](const Leftover &other) {
+            return entry.first == other.process || entry.second.group == other.group;
+        });
+    });
 }
 
 } // namespace
@@ -174,44 +177,57 @@ process_of_any(const std::vector<std::string> &programs)
     return std::nullopt;
 }
 
-std::vector<Leftover> ModuleProcesses::of_items() const
+std::vector<Leftover> ModuleProcesses::of_items(const std::vector<Leftover> &left_out) const
 {
     std::vector<Leftover> all;
-    for (const auto &[pid, name] : item_processes(module_, ancestor_)) {
-        all.push_back({name, pid});
+    const Processes processes = read_processes();
+    for (const auto &[pid, process] : processes) {
+        if (lives(process) && pid != module_ && process.group != module_ &&
+            is_below(processes, pid, ancestor_) && !comes_of_gatherer(processes, pid) &&
+            !comes_of_any(processes, pid, left_out)) {
+            all.push_back({process.name, pid, process.group});
+        }
     }
     return all;
 }
 
-bool ModuleProcesses::signal_items(int signal) const
+void ModuleProcesses::signal_all(int signal) const
+{
+    const Processes processes = read_processes();
+    for (const auto &[pid, process] : processes) {
+        if (lives(process) && pid != module_ &&
+            (is_below(processes, pid, ancestor_) || comes_of_gatherer(processes, pid))) {
+            kill(pid, signal);
+        }
+    }
+}
+
+bool signal_each(const std::vector<Leftover> &processes, int signal)
 {
     bool found = false;
-    for (const auto &[pid, name] : item_processes(module_, ancestor_)) {
-        found = kill(pid, signal) == 0 || found;
+    for (const Leftover &one : processes) {
+        found = kill(one.process, signal) == 0 || found;
     }
     return found;
 }
 
 bool ModuleProcesses::has_gatherer() const
 {
-    const Processes processes = read_processes();
-    return std::ranges::any_of(processes, [&](const auto &entry) {
-        const auto &[pid, process] = entry;
-        return lives(process) && pid != module_ &&
-               (is_named_gatherer(process) ||
-                (process.group == module_ && is_below(processes, pid, ancestor_)));
-    });
+    return !of_gatherer().empty();
 }
 
-void ModuleProcesses::kill_gatherer() const
+std::vector<Leftover> ModuleProcesses::of_gatherer() const
 {
+    std::vector<Leftover> all;
     const Processes processes = read_processes();
     for (const auto &[pid, process] : processes) {
-        if (lives(process) && pid != module_ && is_below(processes, pid, ancestor_) &&
-            comes_of_gatherer(processes, pid)) {
-            kill(pid, SIGKILL);
+        if (lives(process) && pid != module_ &&
+            (comes_of_gatherer(processes, pid) ||
+             (process.group == module_ && is_below(processes, pid, ancestor_)))) {
+            all.push_back({process.name, pid, process.group});
         }
     }
+    return all;
 }
 
 char state_of(pid_t process)

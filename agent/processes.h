@@ -36,22 +36,27 @@ class ModuleProcesses
     }
 
     // Those of items: everything but the gatherer, which the module starts in its
-    // own process group, and what the gatherer has started.
-    std::vector<Leftover> of_items() const;
+    // own process group, and what the gatherer has started. Some are left out, with
+    // all of their process groups and what they have started.
+    std::vector<Leftover> of_items(const std::vector<Leftover> &left_out = {}) const;
 
-    // Sends them a signal. False where there are none.
-    bool signal_items(int signal) const;
+    // Sends a signal to everything that a suspended run suspends: the items' processes
+    // and the gatherer, an earlier run's as well.
+    void signal_all(int signal) const;
 
     // Whether the gatherer runs, or is being started; also one of an earlier run.
     bool has_gatherer() const;
 
-    // Kills the gatherer, unless it is an earlier run's.
-    void kill_gatherer() const;
+    // Those of the gatherer, of an earlier run's as well.
+    std::vector<Leftover> of_gatherer() const;
 
   private:
     pid_t module_;
     pid_t ancestor_;
 };
+
+// Sends them a signal. False where none of them is there.
+bool signal_each(const std::vector<Leftover> &processes, int signal);
 
 // "D", "S", ...: the state of a process as ps shows it; '?' where it has gone.
 char state_of(pid_t process);

@@ -41,6 +41,7 @@ enum class Outcome {
 struct Leftover {
     std::string name; // of its program, without the path
     pid_t process = 0;
+    pid_t group = 0; // of processes
 };
 
 // One item of a run.

@@ -106,9 +106,8 @@ class Rounds
     void run_all()
     {
         while (run_one()) {
-            const std::chrono::duration<double> taken = Clock::now() - began_;
             if (run_.round == run_.rounds ||
-                (run_.time_limit && taken.count() >= *run_.time_limit)) {
+                (run_.time_limit && run_.seconds >= *run_.time_limit)) {
                 run_.finished = true;
                 return;
             }
@@ -168,7 +167,6 @@ class Rounds
     Run &run_;
     const std::vector<Listener *> &listeners_;
     const Work &work_;
-    Clock::time_point began_ = Clock::now();
 };
 
 // --- listeners ----------------------------------------------------------------
@@ -183,12 +181,16 @@ std::string first_failure(const std::vector<Listener *> &listeners)
     return {};
 }
 
-// Now that nothing runs any more, readers are waited for. False where a signal has
-// come first.
-bool flush(const std::vector<Listener *> &listeners, Signals &signals)
+// Now that nothing runs any more, readers are waited for: not for long where the run
+// was interrupted. False where a signal has come first, or the time is over.
+bool flush(const std::vector<Listener *> &listeners, Signals &signals, bool is_interrupted)
 {
+    const auto begin = Clock::now();
     const auto is_done = [](Listener *listener) { return listener->flush(); };
     while (!std::ranges::all_of(listeners, is_done)) {
+        if (is_interrupted && Clock::now() - begin > std::chrono::seconds(2)) {
+            return false;
+        }
         pollfd signal{signals.descriptor(), POLLIN, 0};
         poll(&signal, 1, 10);
         const int taken = signals.take();
@@ -258,10 +260,10 @@ Exit run_rounds(const RunOptions &options, Host &host, Signals &signals, Run &ru
         broken = true;
     }
     finish(run, listeners);
-    if (!flush(listeners, signals)) {
+    if (!flush(listeners, signals, runner.signal() != 0)) {
         return Exit::interrupted; // nobody reads why
     }
-    if (runner.signal() != 0) {
+    if (runner.signal() != 0 && !run.finished) {
         return Exit::interrupted;
     }
     if (const std::string failure = first_failure(listeners); !failure.empty()) {

@@ -7,6 +7,7 @@
 #include "stored_plan.h"
 #include "text.h"
 #include "trigger.h"
+#include "wording.h"
 
 #include <algorithm>
 #include <sys/wait.h>
@@ -92,7 +93,8 @@ Runner::TimePoint Runner::now() const
 
 Runner::TimePoint Runner::on_run_clock(TimePoint time) const
 {
-    return time - suspended_;
+    // what happened before the last suspension may be heard of after it
+    return time - (time < last_suspension_ ? suspended_ - last_suspended_ : suspended_);
 }
 
 void Runner::give_up(const std::string &why)
@@ -208,6 +210,7 @@ void Runner::lose_module(const Host::Event &event)
     if (!active_.empty()) {
         append_output(item(active_.back().place).output, host_.take_output(event.output));
     }
+    read_reports(whole_stored_plan());
     for (Active &active : active_) {
         finish(active, on_run_clock(event.time));
     }
@@ -289,7 +292,17 @@ void Runner::start_next(const Job &job, std::size_t &next, const Host::Event &ev
 void Runner::end_item(const Host::Event &event)
 {
     const std::string output = host_.take_output(event.output);
-    if (!active_.empty() && !active_.back().moved_on) {
+    const bool is_watched = !active_.empty() && !active_.back().moved_on;
+    if (is_watched) {
+        const std::string plan = whole_stored_plan();
+        read_reports(plan); // before what it has left can report again
+        active_.back().report_lost = !Plan::read(plan);
+    }
+    const std::vector<Leftover> left =
+        event.left_running
+            ? note_left_running(is_watched ? active_.back().target.element : kNoElement)
+            : std::vector<Leftover>();
+    if (is_watched) {
         Active &active = active_.back();
         ItemRun &result = item(active.place);
         append_output(result.output, output);
@@ -300,10 +313,7 @@ void Runner::end_item(const Host::Event &event)
         } else if (!active.was_stopped) { // else it is fptest's own, or the module's
             result.signal = WTERMSIG(event.value);
         }
-        if (event.left_running) {
-            note_left_running(active);
-        }
-        read_reports(whole_stored_plan());
+        result.left_running = left;
         finish(active, active.moved_on_at);
         tell_ended();
     }
@@ -327,7 +337,7 @@ void Runner::move_on(const Host::Event &event)
     active.moved_on_at = on_run_clock(event.time);
     read_reports(event.kind == Host::Event::Kind::returned ? host_.read_back()
                                                            : whole_stored_plan());
-    if (!gathers(active) || active.was_stopped || !active.gatherer_end.empty()) {
+    if (!gathers(active) || !active.gatherer_end.empty()) {
         finish(active, active.moved_on_at);
         tell_ended();
     }
@@ -346,6 +356,10 @@ void Runner::finish(Active &active, TimePoint end)
         active.stop = Outcome::timed_out; // over before that was seen
     }
     judge(active);
+    if (gathers(active) && !(result.report.progress == "100" && result.report.result)) {
+        gatherer_is_behind_ = true;
+        signal_each(host_.processes().of_gatherer(), SIGTERM);
+    }
     if (!result.left_running.empty() || gathers(active)) {
         judged_.push_back({active.place, active.target, result.report});
     }
@@ -366,9 +380,9 @@ void Runner::judge(const Active &active)
         result.reason = module_gone_;
     } else if (result.signal != 0) {
         result.outcome = Outcome::failed;
-        result.reason = "died by signal " + std::to_string(result.signal) +
+        result.reason = "died by " + name_of_signal(result.signal) +
                         (has_reported ? ", though it " + reported(report) : "");
-    } else if (!has_reported) {
+    } else if (!has_reported || active.report_lost) {
         result.outcome = Outcome::silent;
         result.reason = why_silent(active);
     } else if (limits_.exit_status && result.exit_status.value_or(0) != 0) {
@@ -385,13 +399,13 @@ void Runner::judge(const Active &active)
 
 std::string Runner::why_stopped(const Active &active)
 {
-    const std::string took = duration(*item(active.place).seconds);
     if (!active.was_stopped) {
-        return "ended by itself after " + took + ", past the limit of " +
-               duration(limits_.item->count());
+        return "ended by itself after " + fine_duration(*item(active.place).seconds) +
+               ", past the limit of " + duration(limits_.item->count());
     }
-    const std::string by =
-        active.stop == Outcome::stopped ? " by " + signal_name(signal_) : " after " + took;
+    const std::string by = active.stop == Outcome::stopped
+                               ? " by " + signal_name(signal_)
+                               : " after " + duration(*item(active.place).seconds);
     return (active.killed ? "killed" : "stopped") + by +
            (active.killed ? ", as it did not end when it was asked to" : "");
 }
@@ -412,6 +426,9 @@ std::string Runner::why_silent(const Active &active)
     if (active.overwritten) {
         return "a process with an old copy of the plan has written it over; what the plan says "
                "now is of an earlier run";
+    }
+    if (active.report_lost) {
+        return "what it reported is lost: the stored plan is gone, or not whole any more";
     }
     const std::string text = read_file(kStoredPlan).value_or("");
     std::string why;
@@ -465,7 +482,7 @@ void Runner::look()
         const Report &report = item(active.place).report;
         const bool has_ended = report.progress == "100" && report.result;
         if (active.moved_on && !active.done &&
-            (has_ended || active.was_stopped || !active.gatherer_end.empty() ||
+            (has_ended || !active.gatherer_end.empty() ||
              (!limits_.item && now() - active.moved_on_at > kGathering))) {
             finish(active, now());
         }
@@ -531,6 +548,13 @@ void Runner::read_late_report(Judged &judged, const Plan &plan)
 {
     const std::size_t number = judged.target.element;
     if (!is_item(plan, number, item(judged.place).name) || !bears_mark(plan, judged.target)) {
+        return;
+    }
+    const auto is_same = [&](const Active &active) {
+        return active.place.suite == judged.place.suite && active.place.item == judged.place.item;
+    };
+    if (std::ranges::any_of(active_, is_same)) {
+        plan_status_ = {}; // its end is told first: look again then
         return;
     }
     const Report report = plan.report(number);

@@ -93,6 +93,7 @@ class Runner
         bool was_stopped = false;    // a stop has met it
         bool killed = false;
         bool overwritten = false; // its element bears another mark
+        bool report_lost = false; // with the stored plan
         TimePoint stop_wanted_at;
         TimePoint stop_tried_at;
         TimePoint gatherer_looked_for;
@@ -100,11 +101,7 @@ class Runner
         std::string gatherer_end;
     };
 
-    // A process that the item at that element of the plan has left running.
-    struct Left {
-        std::size_t element = 0;
-        pid_t process = 0;
-    };
+    static constexpr std::size_t kNoElement = static_cast<std::size_t>(-1);
 
     // An item that has been judged while something that may report it goes on.
     struct Judged {
@@ -136,8 +133,11 @@ class Runner
     void stop_gatherer(Active &active, bool command_runs, SteadyClock::duration waited);
     void note_stop(const Host::Event &event);
     void cannot_stop(Active &active);
-    void note_left_running(Active &active);
+    std::vector<Leftover> item_processes() const;
+    std::vector<Leftover> note_left_running(std::size_t element);
     void end_left_running();
+    void end_gatherer();
+    template <typename Find> void end_all(const Find &find);
     void finish(Active &active, TimePoint end);
     void judge(const Active &active);
     std::string why_silent(const Active &active);
@@ -155,15 +155,20 @@ class Runner
     const std::vector<Listener *> &listeners_;
     Limits limits_;
     std::deque<Active> active_;
-    std::vector<Judged> judged_; // of this round
-    std::vector<Left> left_;
+    std::vector<Judged> judged_;             // of this round
+    std::vector<Leftover> left_;             // by items of this round
+    std::vector<std::size_t> left_elements_; // the items' elements
     struct stat plan_status_ {
     };
     SteadyClock::duration suspended_{};
+    TimePoint last_suspension_;
+    SteadyClock::duration last_suspended_{};
     TimePoint began_ = now();
     int signal_ = 0;
-    bool stop_asked_ = false; // and not yet answered
-    std::string module_gone_; // why, in the job in which its process ended
+    TimePoint signal_taken_at_;
+    bool stop_asked_ = false;         // and not yet answered
+    bool gatherer_is_behind_ = false; // it may still report what it was told in vain
+    std::string module_gone_;         // why, in the job in which its process ended
     bool broken_ = false;
     std::string advice_;
 };

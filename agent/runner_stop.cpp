@@ -64,6 +64,7 @@ void Runner::read_signals()
             _exit(static_cast<int>(128 + SIGINT));
         }
         signal_ = signal;
+        signal_taken_at_ = now();
         give_up("interrupted by " + signal_name(signal));
         for (Active &active : active_) {
             if (!active.stop) {
@@ -85,7 +86,9 @@ void Runner::suspend()
     host_.suspend();
     Signals::suspend();
     host_.resume();
-    suspended_ += SteadyClock::now() - begin;
+    last_suspension_ = begin;
+    last_suspended_ = SteadyClock::now() - begin;
+    suspended_ += last_suspended_;
     for (Listener *listener : listeners_) {
         listener->resumed(run_);
     }
@@ -104,7 +107,11 @@ void Runner::stop_what_is_due(bool command_runs)
     if (!active_.empty() && !active_.back().done && active_.back().stop) {
         press_stop(active_.back(), command_runs);
     }
-    // the module stops only what it started last: an earlier gatherer is left alone
+    if (active_.empty() && command_runs && signal_ != 0 &&
+        now() - signal_taken_at_ > limits_.grace + kBeforeGivingUp) {
+        host_.kill_module(); // it comes to no item, and does not return
+    }
+    // the module stops only what it started last: an earlier gatherer gets a signal
     for (Active &active : active_) {
         if (&active != &active_.back() && !active.done && active.stop) {
             active.was_stopped = true;
@@ -120,7 +127,11 @@ void Runner::press_stop(Active &active, bool command_runs)
     const auto waited = now() - active.stop_wanted_at;
     const bool gatherer = gathers(active);
     if (!gatherer && waited > limits_.grace + kBeforeGivingUp) {
-        cannot_stop(active);
+        if (item_processes().empty()) {
+            host_.kill_module(); // it is that which does not go on
+        } else {
+            cannot_stop(active);
+        }
         return;
     }
     if (active.stop_tried_at != TimePoint{} && now() - active.stop_tried_at < kBetweenStops) {
@@ -133,7 +144,7 @@ void Runner::press_stop(Active &active, bool command_runs)
     }
     if (gatherer) {
         stop_gatherer(active, command_runs, waited);
-    } else if (waited > limits_.grace && host_.processes().signal_items(SIGKILL)) {
+    } else if (waited > limits_.grace && signal_each(item_processes(), SIGKILL)) {
         active.was_stopped = true;
         active.killed = true;
     }
@@ -145,11 +156,13 @@ void Runner::stop_gatherer(Active &active, bool command_runs, SteadyClock::durat
         active.was_stopped = true;
         release_trigger();
     }
-    if (waited > limits_.grace) {
-        host_.processes().kill_gatherer(); // unless it is none of this host
+    const std::vector<Leftover> left = host_.processes().of_gatherer();
+    if (waited > limits_.grace && signal_each(left, SIGKILL)) {
         active.was_stopped = true;
+        active.killed = true;
     }
-    if (active.was_stopped && active.moved_on) {
+    if (active.moved_on && left.empty()) {
+        active.was_stopped = true;
         finish(active, now());
     }
 }
@@ -165,10 +178,11 @@ void Runner::note_stop(const Host::Event &event)
     Active &active = active_.back();
     if (event.value == 0) {
         active.was_stopped = true;
-    } else if (!gathers(active)) {
-        const ModuleProcesses processes = host_.processes();
-        if (processes.signal_items(SIGTERM)) {
-            processes.signal_items(SIGCONT); // one that is suspended would not see it
+    } else {
+        const std::vector<Leftover> processes =
+            gathers(active) ? host_.processes().of_gatherer() : item_processes();
+        if (signal_each(processes, SIGTERM)) {
+            signal_each(processes, SIGCONT); // one that is suspended would not see it
             active.was_stopped = true;
         }
     }
@@ -176,10 +190,10 @@ void Runner::note_stop(const Host::Event &event)
 
 void Runner::cannot_stop(Active &active)
 {
-    const std::vector<Leftover> left = host_.processes().of_items();
+    const std::vector<Leftover> left = item_processes();
     broken_ = true;
-    give_up(item(active.place).group + "/" + item(active.place).name + " cannot be killed: " +
-            (left.empty() ? "the module waits for it" : described(left) + " goes on running"));
+    give_up(item(active.place).group + "/" + item(active.place).name +
+            " cannot be killed: " + described(left) + " goes on running");
     active.was_stopped = true;
     active.killed = true;
     finish(active, now());
@@ -188,20 +202,48 @@ void Runner::cannot_stop(Active &active)
 
 // --- what they leave running ---------------------------------------------------
 
-void Runner::note_left_running(Active &active)
+// Those of the item that runs, and of no other that has left some.
+std::vector<Leftover> Runner::item_processes() const
 {
-    const ModuleProcesses processes = host_.processes();
-    std::vector<Leftover> found = processes.of_items();
+    return host_.processes().of_items(left_);
+}
+
+std::vector<Leftover> Runner::note_left_running(std::size_t element)
+{
+    std::vector<Leftover> found = item_processes();
     for (const auto begin = SteadyClock::now();
          !found.empty() && SteadyClock::now() - begin < kEnding;) {
         std::this_thread::sleep_for(kTurn);
-        found = processes.of_items();
+        found = item_processes();
     }
-    for (const Leftover &one : found) {
-        if (std::ranges::find(left_, one.process, &Left::process) == left_.end()) {
-            left_.push_back({active.target.element, one.process});
-            item(active.place).left_running.push_back(one);
+    if (!found.empty()) {
+        left_.insert(left_.end(), found.begin(), found.end());
+        left_elements_.push_back(element);
+    }
+    return found;
+}
+
+// Ends the processes that are found, until none is.
+template <typename Find> void Runner::end_all(const Find &find)
+{
+    const auto begin = now();
+    TimePoint asked;
+    for (auto left = find(); !left.empty(); left = find()) {
+        const auto waited = now() - begin;
+        if (waited > limits_.grace + kBeforeGivingUp) {
+            give_up(described(left) + " cannot be killed, and would report into the next round");
+            broken_ = true;
+            return;
         }
+        if (now() - asked > kBetweenStops) {
+            asked = now();
+            signal_each(left, waited > limits_.grace ? SIGKILL : SIGTERM);
+            signal_each(left, SIGCONT);
+        }
+        std::this_thread::sleep_for(kTurn);
+        read_signals();
+        look();
+        tick();
     }
 }
 
@@ -211,8 +253,14 @@ void Runner::make_way_for(const Job &job)
         return std::ranges::any_of(
             job.targets, [&](const auto &target) { return target && target->element == element; });
     };
-    if (std::ranges::any_of(left_, is_of_job, &Left::element)) {
+    if (std::ranges::any_of(left_elements_, is_of_job)) {
         end_left_running();
+    }
+    const auto is_gatherers = [&](const auto &target) {
+        return target && is_gatherer(run_.suites[job.suite].items[target->item].name, run_.vendor);
+    };
+    if (gatherer_is_behind_ && std::ranges::any_of(job.targets, is_gatherers)) {
+        end_gatherer();
     }
     look();
     std::erase_if(judged_, [&](const Judged &judged) { return is_of_job(judged.target.element); });
@@ -223,32 +271,24 @@ void Runner::end_round()
     if (!left_.empty()) {
         end_left_running();
     }
+    if (gatherer_is_behind_) {
+        end_gatherer();
+    }
     look();
     judged_.clear();
 }
 
 void Runner::end_left_running()
 {
-    const ModuleProcesses processes = host_.processes();
-    const auto begin = now();
-    for (TimePoint asked; !processes.of_items().empty(); std::this_thread::sleep_for(kTurn)) {
-        const auto waited = now() - begin;
-        if (waited > limits_.grace + kBeforeGivingUp) {
-            give_up(described(processes.of_items()) + " cannot be killed, and would report into "
-                                                      "the next round");
-            broken_ = true;
-            return;
-        }
-        if (now() - asked > kBetweenStops) {
-            asked = now();
-            processes.signal_items(waited > limits_.grace ? SIGKILL : SIGTERM);
-            processes.signal_items(SIGCONT);
-        }
-        read_signals();
-        look();
-        tick();
-    }
+    end_all([this] { return host_.processes().of_items(); });
     left_.clear();
+    left_elements_.clear();
+}
+
+void Runner::end_gatherer()
+{
+    end_all([this] { return host_.processes().of_gatherer(); });
+    gatherer_is_behind_ = false;
 }
 
 } // namespace fptest

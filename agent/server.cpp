@@ -75,6 +75,8 @@ class Server
         const std::lock_guard lock(mutex_);
         if (busy_) {
             stop(items_);
+        }
+        if (busy_ || holds_) {
             end_items();
         }
         _exit(EXIT_SUCCESS);
@@ -197,9 +199,9 @@ class Server
         using namespace std::chrono_literals;
         const ModuleProcesses processes(getpid(), getpid());
         const auto limit = std::chrono::steady_clock::now() + kGrace;
-        while (
-            processes.signal_items(std::chrono::steady_clock::now() < limit ? SIGTERM : SIGKILL)) {
-            processes.signal_items(SIGCONT);
+        processes.signal_all(SIGCONT); // the run may have been suspended
+        while (signal_each(processes.of_items(),
+                           std::chrono::steady_clock::now() < limit ? SIGTERM : SIGKILL)) {
             if (std::chrono::steady_clock::now() > limit + kGrace) {
                 return; // not even that helps
             }

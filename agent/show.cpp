@@ -31,9 +31,10 @@ std::vector<Row> table(const Plan &plan)
     for (const Plan::Group &group : plan.groups()) {
         for (const Plan::Element &item : group.items) {
             const Report &report = item.report;
-            rows.push_back({one_line(group.name), shown(item.name), shown(report.progress),
-                            report.result_without_value ? "?" : shown(report.result),
-                            shown(report.description)});
+            rows.push_back(
+                {one_line(group.name), shown(item.name), shown(report.progress),
+                 report.result_without_value || report.result == "" ? "?" : shown(report.result),
+                 shown(report.description)});
         }
     }
     return rows;

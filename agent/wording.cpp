@@ -129,6 +129,9 @@ std::string remark(const ItemRun &item)
     const bool explained = item.outcome == Outcome::silent || item.outcome == Outcome::timed_out ||
                            item.outcome == Outcome::stopped;
     std::string text = one_line(item.report.description.value_or(""));
+    if (text.empty() && item.signal != 0 && !explained) {
+        return {}; // how it ended is said already
+    }
     if (explained || text.empty()) {
         text = one_line(item.reason) + (text.empty() || item.reason.empty() ? "" : ": ") + text;
     }

@@ -276,11 +276,14 @@ class Supervisor
         }
         if (deadline_ && *deadline_ <= now) {
             deadline_.reset();
-            std::fprintf(stderr,
-                         "device/run: COMMAND goes on 10 s after SIG%s, and is ended with its "
-                         "device\n",
-                         sigabbrev_np(given_up_));
             end_by(given_up_);
+            pollfd errors{STDERR_FILENO, POLLOUT, 0};
+            if (poll(&errors, 1, 0) > 0) { // nobody may read them
+                std::fprintf(stderr,
+                             "device/run: COMMAND goes on 10 s after SIG%s, and is ended with "
+                             "its device\n",
+                             sigabbrev_np(given_up_));
+            }
         }
     }
 
@@ -313,9 +316,17 @@ class Supervisor
         }
     }
 
+    // bwrap's child ends with it only once it has said so: early on it would go on.
     void end_by(int number)
     {
         ended_by_ = number;
+        siginfo_t stopped{};
+        if (is_box_ && kill(pid_, SIGSTOP) == 0 &&
+            waitid(P_PID, static_cast<id_t>(pid_), &stopped, WSTOPPED | WEXITED | WNOWAIT) == 0) {
+            if (const pid_t init = first_child(pid_); init > 0) {
+                kill(init, SIGKILL);
+            }
+        }
         kill(pid_, SIGKILL);
     }
 

@@ -19,8 +19,9 @@
  * thread may call while FPTEST_RunTestCmd is blocked running an item.
  *
  * No function returns what became of its job: that is written to the maker's
- * log (vr_log_printf, tag "VRCODE"). The only line on standard output is
- * "vendor = N", once for each item run.
+ * log (vr_log_printf, tag "VRCODE"), a line for each step. On Linux it goes to
+ * standard error, or into the file that the variable VR_LOG_FILE names. The only
+ * line on standard output is "vendor = N", once for each item run.
  *
  * While the library starts something, SIGINT and SIGQUIT are ignored. A
  * suspension that meets the end of the item it wanted to stop may leave them

@@ -207,8 +207,8 @@ TEST_F(ItemEnd, DeathByASignalIsAFailureWhateverWasReported)
     const Ended ended = run({{"Item", "report G 100 0 fine crash"}, {"Other", "crash"}});
     EXPECT_EQ(ended.status, 1);
     EXPECT_THAT(outcomes(json()), ElementsAre("Item: failed", "Other: failed"));
-    EXPECT_EQ(reason(0), "died by signal 6, though it reported the result 0");
-    EXPECT_EQ(reason(1), "died by signal 6");
+    EXPECT_EQ(reason(0), "died by SIGABRT, though it reported the result 0");
+    EXPECT_EQ(reason(1), "died by SIGABRT");
 }
 
 TEST_F(ItemEnd, ExitStatusFailsAnItemWhereThatIsWanted)
@@ -229,7 +229,7 @@ TEST_F(ItemEnd, ItemThatSignalsItsProcessGroupEndsAlone)
         run({{"Script", script(script_report("0", "fine") + "; kill 0")}, {"Item", kPasses}});
     EXPECT_EQ(ended.err, "");
     EXPECT_THAT(outcomes(json()), ElementsAre("Script: failed", "Item: passed"));
-    EXPECT_EQ(reason(0), "died by signal 15, though it reported the result 0");
+    EXPECT_EQ(reason(0), "died by SIGTERM, though it reported the result 0");
 }
 
 // --- what is left running -----------------------------------------------------------------
@@ -331,6 +331,40 @@ TEST_F(ItemEnd, WhatIsLeftRunningIsKilledWhereItDoesNotEnd)
     EXPECT_THAT(running_items(), IsEmpty());
 }
 
+TEST_F(ItemEnd, WhatIsLeftRunningOutlivesTheTimeOutOfAnotherItem)
+{
+    run({{"Item", "report G 100 0 fine; /system/bin/Third sleep 60 &amp;"},
+         {"Script", script("sleep 60")},
+         {"Other", "report G 100 0 $(ps Third | grep -c Third)"}},
+        {"--timeout", "0.5"});
+    EXPECT_THAT(outcomes(json()),
+                ElementsAre("Item: passed", "Script: timed out", "Other: passed"));
+    EXPECT_EQ(ends().at(2).at("description"), "1");
+}
+
+TEST_F(ItemEnd, WhatIsLeftRunningIsNotTheNextItemsWhateverItStarts)
+{
+    run({{"Item", "report G 100 0 fine; while true; do sleep 0.05; done &amp;"},
+         {"Other", "sleep 0.3 report G 100 0 fine"}});
+    EXPECT_THAT(ends().at(0).at("left_running").size(), Ge(1U));
+    EXPECT_THAT(ends().at(1).at("left_running"), IsEmpty());
+}
+
+TEST_F(ItemEnd, WhatIsLeftRunningInASessionOfItsOwnIsFound)
+{
+    run({{"Item", "report G 100 0 fine; setsid /system/bin/Third sleep 60 &amp;"}});
+    EXPECT_THAT(ends().at(0).at("left_running").size(), 1U);
+    EXPECT_THAT(running_items(), IsEmpty());
+}
+
+TEST_F(ItemEnd, WhatIsLeftRunningEndsWithARunThatBreaksOff)
+{
+    const Ended ended = run({{"Item", "/system/bin/Third sleep 60 &amp; rm /data/vorlane/src1.xml"},
+                             {"Other", kPasses}});
+    EXPECT_EQ(ended.status, 3);
+    EXPECT_THAT(running_items(), IsEmpty());
+}
+
 // --- a plan that a report has spoiled ------------------------------------------------
 
 TEST_F(ItemEnd, DescriptionThatNoPlanCanHoldCostsNoOtherItem)
@@ -340,6 +374,42 @@ TEST_F(ItemEnd, DescriptionThatNoPlanCanHoldCostsNoOtherItem)
     EXPECT_EQ(ended.status, 0) << ended.err;
     EXPECT_THAT(outcomes(json()), ElementsAre("Item: passed", "Other: passed"));
     EXPECT_THAT(read_file(kPlanFile), HasSubstr("a\u2401b"));
+}
+
+TEST_F(ItemEnd, ItemThatDestroysThePlanHasNoResultWhateverItReported)
+{
+    for (const std::string way : {"rm", "truncate -s 3"}) {
+        run({{"Script", script(script_report("0", "fine") + "; sleep 0.1; " + way +
+                               " /data/vorlane/src1.xml")}});
+        EXPECT_THAT(outcomes(json()), ElementsAre("Script: no result"));
+        EXPECT_EQ(reason(0),
+                  "what it reported is lost: the stored plan is gone, or not whole any more");
+    }
+}
+
+TEST_F(ItemEnd, FifoInThePlansPlaceEndsTheRun)
+{
+    const Ended ended = run({{"Script", script("rm /data/vorlane/src1.xml; "
+                                               "mkfifo /data/vorlane/src1.xml")},
+                             {"Item", kPasses}});
+    EXPECT_EQ(ended.status, 3);
+    EXPECT_THAT(outcomes(json()), ElementsAre("Script: no result", "Item: not run"));
+}
+
+TEST_F(ItemEnd, ReportBeforeTheModulesProcessDiedIsRead)
+{
+    run({{"Script", script(script_report("0", "fine") + "; kill -KILL $PPID; sleep 60")},
+         {"Item", kPasses}});
+    EXPECT_THAT(outcomes(json()), ElementsAre("Script: failed", "Item: passed"));
+    EXPECT_EQ(ends().at(0).at("description"), "fine");
+}
+
+TEST_F(ItemEnd, ModulesProcessThatIsSuspendedIsReplaced)
+{
+    const Ended ended = run({{"Script", script("kill -STOP $PPID")}, {"Item", kPasses}},
+                            {"--timeout", "0.3", "--grace", "0.3"});
+    EXPECT_EQ(ended.status, 1);
+    EXPECT_THAT(outcomes(json()), ElementsAre("Script: timed out", "Item: passed"));
 }
 
 // --- the gatherer ------------------------------------------------------------------------
@@ -373,6 +443,34 @@ TEST_F(ItemEnd, GathererThatEndsWithoutAReportIsNotWaitedFor)
     EXPECT_LT(ended.seconds, 8);
 }
 
+TEST_F(ItemEnd, GathererThatDidNotReportInTimeReportsIntoNothingLater)
+{
+    const std::vector<device::PlanItem> items = {{"SensorProbe", "--group G --seconds 2"},
+                                                 {"Item", "sleep 3 report G 100 0 fine"}};
+    for (const std::string way : {"--quiet", "--as-group"}) {
+        SCOPED_TRACE(way);
+        run(items, {way, "--timeout", "1", "--grace", "0.5", "P/G/SensorProbe", "--repeat", "2"});
+        for (const Json &end : ends()) {
+            EXPECT_EQ(end.at("outcome"), "timed out");
+        }
+        EXPECT_THAT(processes_named("/system/bin/SensorProbe"), IsEmpty());
+    }
+}
+
+TEST_F(ItemEnd, GathererThatIsSuspendedIsKilled)
+{
+    FptestProcess fptest(with_plan({{"SensorProbe", "--group G --seconds 60"}},
+                                   {"--timeout", "1", "--grace", "0.5"}));
+    ASSERT_TRUE(
+        wait_for([] { return processes_named("/system/bin/SensorProbe").size() == 1; }, 20));
+    for (const device::Process &process : processes_named("/system/bin/SensorProbe")) {
+        kill(process.pid, SIGSTOP);
+    }
+    EXPECT_EQ(fptest.wait().status, 1);
+    EXPECT_THAT(outcomes(json()), ElementsAre("SensorProbe: timed out"));
+    EXPECT_THAT(processes_named("/system/bin/SensorProbe"), IsEmpty());
+}
+
 // --- a run that is suspended ---------------------------------------------------------
 
 TEST_F(ItemEnd, SuspendedRunSuspendsItsItemsAndNoTimePasses)
@@ -392,6 +490,23 @@ TEST_F(ItemEnd, SuspendedRunSuspendsItsItemsAndNoTimePasses)
     fptest.signal(SIGCONT);
     EXPECT_EQ(fptest.wait().status, 0);
     EXPECT_THAT(outcomes(json()), ElementsAre("Item: passed"));
+}
+
+TEST_F(ItemEnd, SuspendedRunSuspendsTheGatherer)
+{
+    Start start;
+    start.arguments = with_plan({{"SensorProbe", "--group G --seconds 1.5"}}, {"--timeout", "10"});
+    start.has_own_group = true;
+    FptestProcess fptest(start);
+    ASSERT_TRUE(
+        wait_for([] { return processes_named("/system/bin/SensorProbe").size() == 1; }, 20));
+    fptest.signal(SIGTSTP);
+    ASSERT_TRUE(wait_for([&] { return is_suspended(fptest.pid()); }, 20));
+    for (const device::Process &process : processes_named("/system/bin/SensorProbe")) {
+        EXPECT_TRUE(wait_for([&] { return is_suspended(process.pid); }, 20));
+    }
+    fptest.signal(SIGCONT);
+    EXPECT_EQ(fptest.wait().status, 0);
 }
 
 TEST_F(ItemEnd, RunThatNobodyCouldResumeIsNotSuspended)

@@ -578,8 +578,8 @@ TEST_F(Run, TellsAnItemThatCrashesFromOneThatPasses)
         {{"Item", "report G 50 -2 half crash"}, {"Other", "crash"}, {"Third", kItemPasses}});
     EXPECT_EQ(run({"--plan", plan(text), "P/G"}).status, 1);
     EXPECT_THAT(outcomes(json()), ElementsAre("Item: failed", "Other: failed", "Third: passed"));
-    EXPECT_THAT(reasons(json()), ElementsAre("died by signal 6, though it reported the result -2",
-                                             "died by signal 6", ""));
+    EXPECT_THAT(reasons(json()), ElementsAre("died by SIGABRT, though it reported the result -2",
+                                             "died by SIGABRT", ""));
 }
 
 TEST_F(Run, TakesTheCodeThatIsSaidToMeanPassed)
