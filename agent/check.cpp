@@ -1234,6 +1234,10 @@ class PlanChecker
 std::vector<Finding> check(const std::string &text, PlanUse use)
 {
     Findings findings;
+    if (text.starts_with("\xFF\xFE") || text.starts_with("\xFE\xFF")) {
+        findings.error(0, "the plan is UTF-16: save it as UTF-8");
+        return findings.take();
+    }
     if (use == PlanUse::to_send) {
         SizeChecker(text, findings).check();
     }

@@ -61,7 +61,7 @@ void ShellChecker::check(const Item &item)
 {
     const std::string line = command_line(item.name, item.args, "");
     const std::size_t args_begin = line.size() - item.args.size();
-    const Verdict verdict = is_read_closely(line) ? judge(line) : Verdict{};
+    const Verdict verdict = is_read_closely(line) ? judge(item, line) : Verdict{};
     const std::string characters = shell_characters(item.name);
     const bool is_of_name = verdict.is_refused && verdict.reading.fault
                                 ? verdict.reading.fault->at < args_begin
@@ -92,7 +92,7 @@ void ShellChecker::check(const Item &item)
 }
 
 // The shell's word counts where there is one.
-ShellChecker::Verdict ShellChecker::judge(const std::string &line)
+ShellChecker::Verdict ShellChecker::judge(const Item &item, const std::string &line)
 {
     const auto [place, is_new] = verdicts_.try_emplace(line);
     Verdict &verdict = place->second;
@@ -101,6 +101,15 @@ ShellChecker::Verdict ShellChecker::judge(const std::string &line)
         const Shell::Answer answer = shell_.ask(line, verdict.why);
         verdict.is_refused = answer == Shell::Answer::unknown ? verdict.reading.fault.has_value()
                                                               : answer == Shell::Answer::refused;
+        if (answer == Shell::Answer::unknown && shell_.is_out_of_time() && !is_limit_told_) {
+            is_limit_told_ = true;
+            findings_.warning(item.name_place,
+                              "the device's shell has been asked for as long as fptest waits for "
+                              "it: from item " +
+                                  in_quotes(item.name) +
+                                  " on, what it would refuse may be missed; check the rest as a "
+                                  "plan of its own");
+        }
     }
     return verdict;
 }

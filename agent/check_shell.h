@@ -37,7 +37,7 @@ class ShellChecker
         std::string why; // in the shell's words
     };
 
-    Verdict judge(const std::string &line);
+    Verdict judge(const Item &item, const std::string &line);
     void report_name(const Item &item, const std::string &characters, bool is_refused);
     void report_refusal(const Item &item, const Verdict &verdict, std::size_t args_begin);
     void report_effect(const Item &item, const ShellReading::Effect &effect, std::size_t place);
@@ -45,6 +45,7 @@ class ShellChecker
 
     Findings &findings_;
     Shell shell_;
+    bool is_limit_told_ = false;
     std::unordered_map<std::string, Verdict> verdicts_; // by the line
 };
 

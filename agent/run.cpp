@@ -60,6 +60,18 @@ PlanUse use_of(const RunOptions &options, const std::string &text)
     return is_sent ? PlanUse::to_send : PlanUse::stored;
 }
 
+// --as-sent is what keeps a long plan from being placed.
+void advise_to_place(std::vector<Finding> &findings)
+{
+    constexpr std::string_view kOther = "have fptest run --plan place it as a file";
+    for (Finding &finding : findings) {
+        if (finding.text.ends_with(kOther)) {
+            finding.text.replace(finding.text.size() - kOther.size(), kOther.size(),
+                                 "leave --as-sent out");
+        }
+    }
+}
+
 Source open_plan(const RunOptions &options)
 {
     const std::string name = options.plan.empty()  ? std::string(kStoredPlan)
@@ -67,7 +79,10 @@ Source open_plan(const RunOptions &options)
                                                    : options.plan;
     const std::string text = read_plan(options.plan);
     const PlanUse use = use_of(options, text);
-    const auto findings = check(text, use);
+    auto findings = check(text, use);
+    if (options.as_sent) {
+        advise_to_place(findings);
+    }
     if (has_errors(findings) && !options.force) {
         print(stderr, name, text, findings);
         throw Failure(Exit::usage, "nothing was run, because the plan has errors; mend them, or "

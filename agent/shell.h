@@ -46,12 +46,24 @@ class Shell
   public:
     enum class Answer { accepted, refused, unknown };
 
+    // It is asked for so long in all, its start and end included.
+    explicit Shell(double seconds = 5) : left_(seconds)
+    {
+    }
+
     // unknown where there is no such shell, or it has taken too long in all; why
     // then is as it was, else what the shell says against the line.
     Answer ask(const std::string &line, std::string &why);
 
+    [[nodiscard]] bool is_out_of_time() const
+    {
+        return left_ <= 0;
+    }
+
   private:
-    double left_ = 5; // seconds
+    Answer ask_once(const std::string &line, std::string &why) const;
+
+    double left_; // seconds
 };
 
 } // namespace fptest

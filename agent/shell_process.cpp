@@ -20,11 +20,12 @@ namespace fptest
 namespace
 {
 
+using Clock = std::chrono::steady_clock;
+
 // What a process writes until it closes its end, or nothing where that takes
-// longer; seconds is then what is left.
-std::optional<std::string> read_all(int descriptor, double &seconds)
+// longer.
+std::optional<std::string> read_all(int descriptor, double seconds)
 {
-    using Clock = std::chrono::steady_clock;
     const auto end = Clock::now() + std::chrono::duration<double>(seconds);
     std::string text;
     for (;;) {
@@ -50,6 +51,14 @@ std::optional<std::string> read_all(int descriptor, double &seconds)
 } // namespace
 
 Shell::Answer Shell::ask(const std::string &line, std::string &why)
+{
+    const auto begin = Clock::now();
+    const Answer answer = ask_once(line, why);
+    left_ -= std::chrono::duration<double>(Clock::now() - begin).count();
+    return answer;
+}
+
+Shell::Answer Shell::ask_once(const std::string &line, std::string &why) const
 {
     std::array<int, 2> ends{};
     if (left_ <= 0 || access("/system/bin/sh", X_OK) != 0 || pipe2(ends.data(), O_CLOEXEC) != 0) {

@@ -10,6 +10,7 @@
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
 
+#include <chrono>
 #include <random>
 #include <string>
 #include <unistd.h>
@@ -189,6 +190,24 @@ TEST(CheckedGrammar, IsJudgedWithoutRunningAnything)
     }
 }
 
+TEST(CheckedGrammar, IsAskedOfTheShellForFiveSecondsInAll)
+{
+    std::string items;
+    for (int number = 0; number < 20000; ++number) {
+        items += "<Cmd name=\"X\" args=\"'" + std::to_string(number) + "'\"/>\n";
+    }
+    const auto begin = std::chrono::steady_clock::now();
+    const auto findings =
+        check("<P>\n<CmdGroup name=\"A\">\n" + items + "</CmdGroup>\n</P>\n", PlanUse::stored);
+    EXPECT_LT(std::chrono::steady_clock::now() - begin, std::chrono::seconds(12));
+    EXPECT_EQ(std::ranges::count(findings,
+                                 "the device's shell has been asked for as long as fptest waits "
+                                 "for it: from item 'X' on, what it would refuse may be missed; "
+                                 "check the rest as a plan of its own",
+                                 &Finding::text),
+              1);
+}
+
 // --- what is run besides ------------------------------------------------------------
 
 TEST(CheckedCommand, BeginsAtAnOperator)
@@ -310,7 +329,7 @@ TEST(CheckedArgs, OfAnyKindAreErrorsWhereTheShellRefusesThem)
                                              "}",   "(", ")", ";",  "&",  "|",  "<",  ">",
                                              "<<E", "#", "$", "$'", "((", "@(", "!",  "2>"};
     std::mt19937 random(11);
-    Shell shell;
+    Shell shell(60);
     std::size_t refused = 0;
     std::size_t known = 0;
     for (int round = 0; round < 600; ++round) {

@@ -277,18 +277,35 @@ TEST(CheckedLength, MeetsAColonAtTheLimit)
 
 TEST(CheckedLength, EndsAtAZeroByte)
 {
-    std::string text = "\xFF\xFE";
+    std::string text; // in UTF-16, without a mark of it
     for (const char c : plan_of(group("A", cmd("x")))) {
         text += c;
         text += '\0';
     }
-    EXPECT_EQ(stored(text), "");
     EXPECT_THAT(to_send(text),
-                HasSubstr("error: a command takes a plan up to its first zero byte, so 3 bytes "
-                          "would be stored, and the module would not load them; "
+                HasSubstr("error: a command takes a plan up to its first zero byte, so 1 byte "
+                          "would be stored, and the module would load them without the rest; "
                           "save it as UTF-8\n"));
     // one that is no XML for its zero byte has that said of it once
     EXPECT_EQ(check("<P>\0</P>"s, PlanUse::to_send).size(), 1U);
+}
+
+TEST(CheckedEncoding, OfUtf16IsAnErrorHoweverItIsStored)
+{
+    for (const std::string mark : {"\xFF\xFE", "\xFE\xFF"}) {
+        for (const std::size_t size : {0U, 40U, 5000U}) {
+            std::string text = mark;
+            for (const char c : plan_of(group("A", cmd("x"))) + std::string(size, '\n')) {
+                text += mark[0] == '\xFF' ? std::string{c, '\0'} : std::string{'\0', c};
+            }
+            for (const PlanUse use : {PlanUse::to_send, PlanUse::stored}) {
+                const auto findings = check(text, use);
+                ASSERT_EQ(findings.size(), 1U);
+                EXPECT_EQ(findings[0].severity, Finding::Severity::error);
+                EXPECT_EQ(findings[0].text, "the plan is UTF-16: save it as UTF-8");
+            }
+        }
+    }
 }
 
 // --- well-formedness --------------------------------------------------------------------------
@@ -1285,7 +1302,7 @@ TEST(Findings, AreErrorsOrWarnings)
 TEST(Findings, StandInTheFirstLineWhereTheirPlaceIsNotKnown)
 {
     // in UTF-16 the tags are not found
-    std::string text = "\xFF\xFE";
+    std::string text;
     for (const char c : plan_of("\n" + group("", cmd("x") + "text"))) {
         text += c;
         text += '\0';
@@ -1293,8 +1310,8 @@ TEST(Findings, StandInTheFirstLineWhereTheirPlaceIsNotKnown)
     const auto findings = check(text, PlanUse::stored);
     ASSERT_EQ(findings.size(), 1U);
     EXPECT_EQ(findings[0].offset, 0U);
-    EXPECT_EQ(findings[0].text,
-              "the name of a group is empty: no node path leads to it; write one");
+    EXPECT_EQ(findings[0].text, "no CmdGroup in it: the module would find nothing to run; put the "
+                                "items into <CmdGroup name=\"...\">");
 }
 
 // --- any plan, any bytes

@@ -122,8 +122,7 @@ TEST_F(LongPlan, KeepsToTheCommandWhereThatIsAskedFor)
     EXPECT_EQ(ended.out, "");
     EXPECT_THAT(ended.err, HasSubstr(" more than the 2048 that a command stores: the plan would be "
                                      "cut here, and the module would "));
-    EXPECT_THAT(ended.err,
-                HasSubstr("; shorten it, or have fptest run --plan place it as a file\n"));
+    EXPECT_THAT(ended.err, HasSubstr("; shorten it, or leave --as-sent out\n"));
     EXPECT_FALSE(fs::exists(kPlanFile));
 
     // cut where it still loads
