@@ -166,12 +166,9 @@ void Runner::require_all_started(const Job &job, std::size_t next)
 // Without a stored plan nothing that comes can report.
 void Runner::require_plan()
 {
-    for (int tries = 0; tries < 20; ++tries) { // it may just be written
-        const std::string text = read_file(kStoredPlan).value_or("");
-        if (Plan::read(text) || Plan::load(text)) {
-            return;
-        }
-        std::this_thread::sleep_for(10ms);
+    const std::string text = whole_stored_plan();
+    if (Plan::read(text) || Plan::load(text)) {
+        return;
     }
     give_up(std::string("the stored plan ") + kStoredPlan +
             " is gone, or not whole any more: store it again");

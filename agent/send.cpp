@@ -6,7 +6,7 @@
 #include "files.h"
 #include "host.h"
 #include "plan.h"
-#include "runner.h"
+#include "signals.h"
 
 #include <algorithm>
 #include <cerrno>
@@ -82,7 +82,8 @@ class Sender
     std::optional<std::string> send(const std::string &command)
     {
         // the module waits for nobody who is just writing the plan that it loads
-        Descriptor plan = command.starts_with("XMLNodePath") ? lock_stored_plan() : Descriptor(-1);
+        Descriptor plan =
+            head_of(command).starts_with("XMLNodePath") ? lock_stored_plan() : Descriptor(-1);
         const auto items = items_of(command);
         host_.command(command, items);
         for (;;) {

@@ -17,7 +17,7 @@ std::string whole_stored_plan()
     std::string text;
     for (int tries = 0; tries < 20; ++tries) {
         text = read_file(kStoredPlan).value_or("");
-        if (Plan::read(text)) {
+        if (Plan::read(text) || Plan::load(text)) {
             break;
         }
         std::this_thread::sleep_for(std::chrono::milliseconds(10));
