@@ -71,13 +71,10 @@ class Spool
     // In one of the directories. False where there is no room.
     bool open(const std::vector<std::string> &directories)
     {
-        for (const std::string &directory : directories) {
+        return std::ranges::any_of(directories, [this](const std::string &directory) {
             file_ = unnamed_file(directory);
-            if (file_.is_open()) {
-                return true;
-            }
-        }
-        return false;
+            return file_.is_open();
+        });
     }
 
     bool add(std::string_view text)

@@ -135,18 +135,16 @@ class Rounds
 
     bool has_failed(const Job &job)
     {
-        for (const auto &target : job.targets) {
-            if (!target) {
-                continue;
-            }
-            const ItemRun &item = item_at(run_, {job.suite, target->item});
-            if (item.outcome != Outcome::passed) {
-                run_.why_ended =
-                    item.group + "/" + item.name + of_round(run_) + " did not pass (--until-fail)";
-                return true;
-            }
+        const auto failed = std::ranges::find_if(job.targets, [&](const auto &target) {
+            return target && item_at(run_, {job.suite, target->item}).outcome != Outcome::passed;
+        });
+        if (failed == job.targets.end()) {
+            return false;
         }
-        return false;
+        const ItemRun &item = item_at(run_, {job.suite, (*failed)->item});
+        run_.why_ended =
+            item.group + "/" + item.name + of_round(run_) + " did not pass (--until-fail)";
+        return true;
     }
 
     void begin_next()

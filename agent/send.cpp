@@ -55,7 +55,8 @@ std::optional<std::string> plan_of(std::string_view command)
     if (!head.starts_with("XMLFile")) {
         return std::nullopt;
     }
-    return stored_part(command.substr(static_cast<std::size_t>(head.end() - command.begin())));
+    return stored_part(
+        command.substr(static_cast<std::size_t>(head.data() + head.size() - command.data())));
 }
 
 // The names of the items that a command may run, so that they can be stopped.

@@ -63,7 +63,7 @@ void Signals::suspend()
     sigset_t suspension;
     sigemptyset(&suspension);
     sigaddset(&suspension, SIGTSTP);
-    raise(SIGTSTP);
+    kill(getpid(), SIGTSTP);
     sigprocmask(SIG_UNBLOCK, &suspension, nullptr); // here it takes effect
     sigprocmask(SIG_BLOCK, &suspension, nullptr);
 }

@@ -139,7 +139,7 @@ void Writer::start()
     is_patient_ = state_->changed.wait_for(lock, kPrompt, [this] { return state_->opened; });
 }
 
-void Writer::write(std::string text)
+void Writer::write(const std::string &text)
 {
     if (!has_thread_) {
         write_now(text);

@@ -29,7 +29,7 @@ class Writer
 
     // In the order of the calls. So much waits at most; more of it is a failure.
     // After a failure nothing is written.
-    void write(std::string text);
+    void write(const std::string &text);
     static constexpr std::size_t kMostWaiting = std::size_t{16} << 20;
 
     // Whether some of it is still to be written.

@@ -23,7 +23,6 @@ using fptest::PlanUse;
 using fptest::read_shell_line;
 using fptest::Shell;
 using fptest::ShellReading;
-using testing::IsEmpty;
 
 namespace
 {

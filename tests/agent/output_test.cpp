@@ -25,7 +25,6 @@ using report_files::outcomes;
 using report_files::parse_xml;
 using ::testing::ElementsAre;
 using ::testing::HasSubstr;
-using ::testing::IsEmpty;
 using ::testing::SizeIs;
 
 namespace

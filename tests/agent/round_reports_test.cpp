@@ -26,7 +26,6 @@ using namespace report_files;
 using namespace std::chrono_literals;
 using ::testing::ElementsAre;
 using ::testing::HasSubstr;
-using ::testing::IsEmpty;
 using ::testing::Not;
 using Json = nlohmann::json;
 

@@ -23,7 +23,6 @@ using report_files::parse_xml;
 using report_files::verdict_of;
 using ::testing::ElementsAre;
 using ::testing::HasSubstr;
-using ::testing::MatchesRegex;
 using ::testing::StartsWith;
 
 namespace
