@@ -213,7 +213,7 @@ class JunitReport : public Listener
             if (piece.empty()) {
                 rest_.reset();
             } else {
-                direct_->write(std::move(piece));
+                direct_->write(piece);
             }
         }
         return !rest_ && !direct_->is_pending();
