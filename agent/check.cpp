@@ -128,7 +128,8 @@ class SizeChecker
         if (colon_ != kNone) {
             check_colons();
         }
-        if (command_.size() > kPlanLimit) {
+        // blanks may be cut
+        if (command_.find_first_not_of(" \t\r\n", kPlanLimit) != command_.npos) {
             check_length();
         }
         if (zero_ && colon_ == kNone && command_.size() <= kPlanLimit) {

@@ -51,6 +51,19 @@ std::string reason(const Fault &fault)
     return {};
 }
 
+// What the shell runs for the text between backticks.
+std::string without_escapes(const std::string &text)
+{
+    std::string plain;
+    for (std::size_t at = 0; at < text.size(); ++at) {
+        const bool is_escape =
+            text[at] == '\\' && at + 1 < text.size() &&
+            std::string_view("$`\\").find(text[at + 1]) != std::string_view::npos;
+        plain += text[is_escape ? ++at : at];
+    }
+    return plain;
+}
+
 } // namespace
 
 ShellChecker::ShellChecker(Findings &findings) : findings_(findings)
@@ -114,6 +127,13 @@ ShellChecker::Verdict ShellChecker::judge(const Item &item, const std::string &l
     return verdict;
 }
 
+// With -n the shell does not look between backticks.
+bool ShellChecker::is_refused(const std::string &backticks, std::string &why)
+{
+    return backticks.find("\\\"") == backticks.npos && // where quotes round it change what is meant
+           shell_.ask(without_escapes(backticks), why) == Shell::Answer::refused;
+}
+
 void ShellChecker::report_name(const Item &item, const std::string &characters, bool is_refused)
 {
     const std::string text = "item " + in_quotes(item.name) + " has " + characters +
@@ -141,11 +161,23 @@ void ShellChecker::report_effect(const Item &item, const Effect &effect, std::si
     const std::string name = in_quotes(item.name);
     const std::string unless =
         "; put the " + in_quotes(effect.mark) + " in quotes if it is meant for the item";
+    const std::string refusal = "the shell would refuse the command line of item " + name + ": ";
     switch (effect.kind) {
     case Effect::Kind::command:
         report_command(item, effect, place);
         break;
+    case Effect::Kind::expansion:
+        findings_.error(place, refusal + in_quotes(effect.text) +
+                                   " is a bad substitution; put a "
+                                   "'\\' before its '$' if it is meant "
+                                   "for the item");
+        break;
     case Effect::Kind::substitution:
+        if (std::string why; effect.mark == "`" && is_refused(effect.text, why)) {
+            findings_.error(place, refusal + "between the backticks here, " + one_line(why) +
+                                       "; put a '\\' before them if they are meant for the item");
+            break;
+        }
         findings_.warning(place, "the shell would run " + in_quotes(effect.text) +
                                      " as a command of its own before item " + name +
                                      ", and put what that prints here; put a '\\' before it if "

@@ -24,11 +24,12 @@ struct ShellReading {
     };
     // What the shell does besides starting the line's first command.
     struct Effect {
-        enum class Kind { command, substitution, redirection, comment, function };
+        enum class Kind { command, substitution, expansion, redirection, comment, function };
         Kind kind = Kind::command;
         std::size_t at = 0;
         std::string mark;
         std::string text; // what is run, and may be nothing; else all of it
+        // An expansion is noted only where the shell would give up at it.
     };
 
     std::optional<Fault> fault;  // the first

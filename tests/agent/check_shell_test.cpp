@@ -11,8 +11,10 @@
 #include <gtest/gtest.h>
 
 #include <chrono>
+#include <fcntl.h>
 #include <random>
 #include <string>
+#include <sys/wait.h>
 #include <unistd.h>
 #include <utility>
 #include <vector>
@@ -48,6 +50,41 @@ std::string finding_of(const std::string &args, const std::string &name = "X")
 {
     std::string text = messages(plan_with(args, name));
     return text.substr(0, text.find('\n'));
+}
+
+bool has_error(const std::string &args)
+{
+    return fptest::has_errors(check(plan_with(args), PlanUse::stored));
+}
+
+// What stands for a text in an attribute.
+std::string escaped(const std::string &text)
+{
+    std::string escaped;
+    for (const char c : text) {
+        escaped += c == '<' ? "&lt;" : c == '&' ? "&amp;" : c == '"' ? "&quot;" : std::string(1, c);
+    }
+    return escaped;
+}
+
+// Whether the shell does run a line with these args, written as in an attribute.
+bool runs(std::string args)
+{
+    for (std::size_t at = 0; (at = args.find("&quot;", at)) != args.npos;) {
+        args.replace(at, 6, "\"");
+    }
+    const std::string line = "true " + args + "\necho done";
+    const pid_t process = fork();
+    if (process == 0) {
+        const int null = open("/dev/null", O_RDWR);
+        dup2(null, STDIN_FILENO);
+        dup2(null, STDERR_FILENO);
+        execl("/system/bin/sh", "sh", "-c", ("(" + line + ") | grep -q done").c_str(), nullptr);
+        _exit(127);
+    }
+    int status = -1;
+    waitpid(process, &status, 0);
+    return status == 0;
 }
 
 // --- a line feed ------------------------------------------------------------------
@@ -174,6 +211,49 @@ TEST(CheckedGrammar, IsTheShellsToJudge)
     ASSERT_TRUE(read_shell_line("/system/bin/X \\<<\\\n<<E").fault);
     ASSERT_EQ(Shell().ask("/system/bin/X \\<<\\\n<<E", why), Shell::Answer::accepted);
     EXPECT_EQ(finding_of("\\&lt;&lt;\\\n&lt;&lt;E").find("error"), std::string::npos);
+}
+
+// With -n it accepts these all the same.
+TEST(CheckedGrammar, IsTheShellsBetweenBackticksToo)
+{
+    EXPECT_EQ(messages(plan_with("a `if` b")),
+              "p.xml:3:23: error: the shell would refuse the command line of item 'X': between the "
+              "backticks here, syntax error: unmatched 'if'; put a '\\' before them if they are "
+              "meant for the item\n"
+              "<Cmd name=\"X\" args=\"a `if` b\"/>\n"
+              "                      ^\n");
+    for (const std::string args : {"`&quot;`", "&quot;`(`&quot;", "``(``"}) {
+        EXPECT_TRUE(has_error(args)) << args;
+        EXPECT_FALSE(runs(args)) << args;
+    }
+    for (const std::string args :
+         {"``", "`echo \\`echo b\\``", "`echo \\`(\\``", "`echo '(' \\$HOME`",
+          "&quot;`echo \\&quot;a b\\&quot;`&quot;"}) {
+        EXPECT_FALSE(has_error(args)) << args;
+        EXPECT_TRUE(runs(args)) << args;
+    }
+}
+
+TEST(CheckedExpansion, IsAnErrorWhereTheShellGivesUpAtIt)
+{
+    EXPECT_EQ(messages(plan_with("a ${b c} d")),
+              "p.xml:3:23: error: the shell would refuse the command line of item 'X': '${b c}' is "
+              "a bad substitution; put a '\\' before its '$' if it is meant for the item\n"
+              "<Cmd name=\"X\" args=\"a ${b c} d\"/>\n"
+              "                      ^\n");
+    for (const std::string args : {"${}", "${x;y}", "&quot;${a b}&quot;", "${a^}", "${.}", "${a,}",
+                                   "${a.b}", "$((1 + ${a b}))"}) {
+        EXPECT_TRUE(has_error(args)) << args;
+        EXPECT_FALSE(runs(args)) << args;
+    }
+    for (const std::string args :
+         {"${a}",     "${a:-b c}", "${a-${b c}}x",  "${#a}", "${a#b}",  "${a%%b}", "${a/b/c}",
+          "${a@Q}",   "${a:0:1}",  "${1}",          "${10}", "${*}",    "${@}",    "${#}",
+          "${?}",     "${$}",      "${!}",          "${-}",  "${a[1]}", "${a[*]}", "$'${'",
+          "\\${a b}", "'${a b}'",  "x || : ${a b}", "${!a}", "${%a}"}) {
+        EXPECT_FALSE(has_error(args)) << args;
+        EXPECT_TRUE(runs("; a=b; : " + args)) << args;
+    }
 }
 
 TEST(CheckedGrammar, IsJudgedWithoutRunningAnything)
@@ -313,15 +393,6 @@ TEST(CheckedName, IsToldFromArgsThatDoSo)
 
 // --- any args -------------------------------------------------------------------------
 
-bool has_error(const std::string &args)
-{
-    std::string text;
-    for (const char c : args) {
-        text += c == '<' ? "&lt;" : c == '&' ? "&amp;" : c == '"' ? "&quot;" : std::string(1, c);
-    }
-    return fptest::has_errors(check(plan_with(text), PlanUse::stored));
-}
-
 TEST(CheckedArgs, OfAnyKindAreErrorsWhereTheShellRefusesThem)
 {
     const std::vector<std::string> pieces = {"a",   " ", "'", "\"", "`",  "\\", "$(", "${",
@@ -341,11 +412,14 @@ TEST(CheckedArgs, OfAnyKindAreErrorsWhereTheShellRefusesThem)
         const Shell::Answer answer = shell.ask(line, why);
         ASSERT_NE(answer, Shell::Answer::unknown);
         const ShellReading reading = read_shell_line(line);
-        const bool is_function =
-            std::ranges::any_of(reading.effects, [](const ShellReading::Effect &effect) {
-                return effect.kind == ShellReading::Effect::Kind::function;
+        const bool is_error =
+            std::ranges::any_of(reading.effects, [&](const ShellReading::Effect &effect) {
+                return effect.kind == ShellReading::Effect::Kind::function ||
+                       effect.kind == ShellReading::Effect::Kind::expansion ||
+                       (effect.mark == "`" &&
+                        shell.ask(effect.text, why) == Shell::Answer::refused);
             });
-        EXPECT_EQ(has_error(args), answer == Shell::Answer::refused || is_function) << line;
+        EXPECT_EQ(has_error(escaped(args)), answer == Shell::Answer::refused || is_error) << line;
         if (answer == Shell::Answer::accepted) {
             EXPECT_FALSE(reading.fault) << line;
         } else {

@@ -128,6 +128,10 @@ TEST_F(LongPlan, KeepsToTheCommandWhereThatIsAskedFor)
     // cut where it still loads
     std::string cut = plan_of({{"G", {{"Item", "report G 100 0 a"}}}});
     cut += std::string(kLimit, ' ') + "\n";
+    ended = run_fptest({"run", "--as-sent", "--plan", plan(cut), "P/G"});
+    EXPECT_EQ(ended.status, 0) << ended.err;
+    EXPECT_EQ(ended.err, "");
+    cut += "<!-- -->";
     ended = run_fptest({"run", "--as-sent", "--force", "--plan", plan(cut), "P/G"});
     EXPECT_EQ(ended.status, 0) << ended.err;
     EXPECT_EQ(ended.err, "fptest: the plan has errors: see fptest check /tmp/scene/plan.xml\n");
