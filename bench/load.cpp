@@ -6,7 +6,7 @@
 #include "plan.h"
 #include "unit.h"
 
-#include "device/descriptor.h"
+#include "common/descriptor.h"
 
 #include <fcntl.h>
 #include <mxml.h>

@@ -8,7 +8,7 @@
 #include "sockwrap.h"
 #include "unit.h"
 
-#include "device/descriptor.h"
+#include "common/descriptor.h"
 
 #include <array>
 #include <netinet/in.h>

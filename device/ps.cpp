@@ -8,7 +8,7 @@
 // kernel's name for it where it has no arguments (a zombie, for one). The NAME
 // column shows argv[0] alone: a query piped into grep never finds its own grep.
 
-#include "descriptor.h"
+#include "common/descriptor.h"
 
 #include <algorithm>
 #include <array>

@@ -15,7 +15,7 @@
 // is not to get that twice: a second SIGTERM may mean "at once". So a witness is kept
 // in the group, which blocks every signal: what is pending there was sent to all.
 
-#include "descriptor.h"
+#include "common/descriptor.h"
 
 #include <algorithm>
 #include <array>

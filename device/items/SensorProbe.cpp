@@ -8,7 +8,7 @@
 // Vendor 2's variant is started like any other item and never told anything, so
 // it gathers once and ends.
 
-#include "descriptor.h"
+#include "common/descriptor.h"
 #include "item.h"
 
 #include <array>

@@ -3,7 +3,7 @@
 
 #include "item.h"
 
-#include "descriptor.h"
+#include "common/descriptor.h"
 #include "quillmark.h"
 
 #include <CLI/CLI.hpp>

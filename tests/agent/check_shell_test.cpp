@@ -3,9 +3,9 @@
 
 // What the plan checker says of command lines that the shell would take for more,
 // or less, than an item and its arguments.
-#include "check_messages.h"
+#include "check/messages.h"
 
-#include "shell.h"
+#include "check/shell_reader.h"
 
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>

@@ -3,10 +3,10 @@
 
 // The plan checker: every message as it is printed, and what must hold of it for
 // whatever it is given.
-#include "check_messages.h"
+#include "check/messages.h"
 
-#include "markup.h"
-#include "plan.h"
+#include "plan/markup.h"
+#include "plan/plan.h"
 
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>

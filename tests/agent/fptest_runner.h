@@ -5,7 +5,7 @@
 // input, and what comes of it. Waited for, or left running to be signalled.
 #pragma once
 
-#include "descriptor.h"
+#include "common/descriptor.h"
 #include "device_test.h"
 
 #include <chrono>

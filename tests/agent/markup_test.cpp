@@ -2,7 +2,7 @@
 // SPDX-License-Identifier: Apache-2.0
 
 // The scanner: which tags a text has, and where.
-#include "markup.h"
+#include "plan/markup.h"
 
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>

@@ -3,7 +3,7 @@
 
 // Test plans as the module sees them. What it runs is compared with its own
 // lookups, done on the same tree by the same calls of the library.
-#include "plan.h"
+#include "plan/plan.h"
 
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
@@ -21,8 +21,8 @@
 #include <unistd.h>
 #include <vector>
 
+using fptest::ItemReport;
 using fptest::Plan;
-using fptest::Report;
 using fptest::Tag;
 using testing::ElementsAre;
 using testing::IsEmpty;
@@ -759,13 +759,13 @@ TEST(ReadPlan, TellsWhatEveryItemHasReported)
     const auto groups = plan->groups();
     ASSERT_EQ(groups.size(), 1U);
     ASSERT_EQ(groups[0].items.size(), 4U);
-    EXPECT_EQ(groups[0].items[0].report, (Report{"100", "0", false, "chip \"7\" >"}));
-    EXPECT_EQ(groups[0].items[1].report, (Report{"50", std::nullopt, true, ""}));
-    EXPECT_EQ(groups[0].items[2].report, (Report{"5", "-2", false, std::nullopt}));
-    EXPECT_EQ(groups[0].items[3].report, Report{});
+    EXPECT_EQ(groups[0].items[0].report, (ItemReport{"100", "0", false, "chip \"7\" >"}));
+    EXPECT_EQ(groups[0].items[1].report, (ItemReport{"50", std::nullopt, true, ""}));
+    EXPECT_EQ(groups[0].items[2].report, (ItemReport{"5", "-2", false, std::nullopt}));
+    EXPECT_EQ(groups[0].items[3].report, ItemReport{});
     EXPECT_EQ(plan->report(groups[0].items[1].number), groups[0].items[1].report);
-    EXPECT_EQ(plan->report(1), Report{}); // has no attributes
-    EXPECT_EQ(plan->report(999), Report{});
+    EXPECT_EQ(plan->report(1), ItemReport{}); // has no attributes
+    EXPECT_EQ(plan->report(999), ItemReport{});
 }
 
 TEST(ReadPlan, IsNoneOfATextThatIsNotWhole)
@@ -837,7 +837,8 @@ TEST(ReadPlan, TellsAnEmptyResultFromOneWithoutValue)
     const auto plan =
         Plan::read("<P><CmdGroup name=\"A\"><Cmd name=\"x\" result=\"\"/></CmdGroup></P>");
     ASSERT_TRUE(plan);
-    EXPECT_EQ(plan->groups()[0].items[0].report, (Report{std::nullopt, "", false, std::nullopt}));
+    EXPECT_EQ(plan->groups()[0].items[0].report,
+              (ItemReport{std::nullopt, "", false, std::nullopt}));
 }
 
 // --- places of elements ---------------------------------------------------------------------

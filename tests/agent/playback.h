@@ -4,7 +4,7 @@
 // Runs that are not run: what listeners are told of them.
 #pragma once
 
-#include "results.h"
+#include "run/results.h"
 
 #include <gtest/gtest.h>
 
@@ -108,7 +108,7 @@ class Playback
         now(place).start = end(place).start;
         listener_.started(now_, place);
     }
-    void progress(Place place, const Report &report)
+    void progress(Place place, const ItemReport &report)
     {
         now(place).report = report;
         listener_.progressed(now_, place);
@@ -118,7 +118,7 @@ class Playback
         now(place) = end(place);
         listener_.ended(now_, place);
     }
-    void report_late(Place place, const Report &report)
+    void report_late(Place place, const ItemReport &report)
     {
         listener_.late(now_, place, report);
     }

@@ -4,7 +4,7 @@
 // What a run leaves in files, read back by other programs' parsers.
 #include "playback.h"
 #include "report_files.h"
-#include "reports.h"
+#include "reporters/reporters.h"
 
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>

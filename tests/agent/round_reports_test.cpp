@@ -4,9 +4,9 @@
 // What reports say of rounds, of breaks, and of how items ended.
 #include "playback.h"
 #include "report_files.h"
-#include "reports.h"
-#include "view.h"
-#include "wording.h"
+#include "reporters/reporters.h"
+#include "reporters/views.h"
+#include "reporters/wording.h"
 
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>

@@ -2,7 +2,7 @@
 // SPDX-License-Identifier: Apache-2.0
 
 // Text for people and for files.
-#include "text.h"
+#include "util/text.h"
 
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>

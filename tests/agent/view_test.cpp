@@ -4,7 +4,7 @@
 // The live view, on a terminal as people have it.
 #include "device_test.h"
 #include "terminal_session.h"
-#include "text.h"
+#include "util/text.h"
 
 #include <algorithm>
 #include <fstream>

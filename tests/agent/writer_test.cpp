@@ -2,9 +2,9 @@
 // SPDX-License-Identifier: Apache-2.0
 
 // What is written to readers that do not read.
-#include "writer.h"
+#include "reporters/writer.h"
 
-#include "descriptor.h"
+#include "common/descriptor.h"
 #include "report_files.h"
 
 #include <gmock/gmock.h>

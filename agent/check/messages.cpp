@@ -1,0 +1,117 @@
+// SPDX-FileCopyrightText: 2026 The Quillmark authors
+// SPDX-License-Identifier: Apache-2.0
+
+#include "check/messages.h"
+
+#include "util/text.h"
+
+#include <algorithm>
+#include <cstddef>
+#include <utility>
+
+namespace fptest
+{
+
+namespace
+{
+
+// Whether a byte goes on with a character.
+bool continues(char byte)
+{
+    return (static_cast<unsigned char>(byte) & 0xC0U) == 0x80U;
+}
+
+// The end of a clean text that takes at most that many columns.
+std::string_view end_of(std::string_view text, std::size_t width)
+{
+    std::size_t begin = text.size();
+    while (begin > 0) {
+        std::size_t next = begin - 1;
+        while (next > 0 && continues(text[next])) {
+            --next;
+        }
+        const std::size_t taken = columns(text.substr(next, begin - next));
+        if (taken > width) {
+            break;
+        }
+        width -= taken;
+        begin = next;
+    }
+    return text.substr(begin);
+}
+
+std::string shown(std::string_view source)
+{
+    std::string text(source);
+    std::ranges::replace(text, '\t', ' ');
+    return one_line(text);
+}
+
+// The line that the place is in: what stands before it, and the rest; of a long one
+// what is near it, which is more than is shown.
+std::pair<std::string, std::string> source_line(std::string_view text, std::size_t offset)
+{
+    constexpr std::size_t kNear = 512; // bytes
+    const std::size_t first = offset - std::min(offset, kNear);
+    const std::size_t line_end = text.substr(first, offset - first).rfind('\n');
+    std::size_t begin = line_end == text.npos ? first : first + line_end + 1;
+    const std::string_view rest = text.substr(offset, kNear);
+    std::size_t end = offset + std::min(rest.find('\n'), rest.size());
+    if (begin == 0 && text.starts_with(kByteOrderMark)) {
+        begin = std::min(kByteOrderMark.size(), end);
+    }
+    if (begin == first && begin > 0) { // not in the middle of a character
+        begin += static_cast<std::size_t>(
+            std::find_if_not(text.begin() + static_cast<std::ptrdiff_t>(begin),
+                             text.begin() + static_cast<std::ptrdiff_t>(offset), continues) -
+            (text.begin() + static_cast<std::ptrdiff_t>(begin)));
+    }
+    while (end < text.size() && end > offset && continues(text[end])) {
+        --end;
+    }
+    if (end > begin && text[end - 1] == '\r') {
+        --end;
+    }
+    offset = std::clamp(offset, begin, std::max(begin, end));
+    return {shown(text.substr(begin, offset - begin)), shown(text.substr(offset, end - offset))};
+}
+
+} // namespace
+
+Messages::Messages(const std::string &file, std::string_view text)
+    : file_(one_line(file)), text_(text), positions_(text)
+{
+}
+
+std::string Messages::of(const Finding &finding)
+{
+    constexpr std::size_t kWidth = 80;
+    constexpr std::size_t kBehind = 40; // columns kept behind a place far to the right
+    const Position place = positions_.of(finding.offset);
+    auto [before, behind] = source_line(text_, place.begin);
+    if (columns(before) + columns(behind) > kWidth && columns(before) > kWidth - kBehind) {
+        behind = cut(behind, kBehind);
+        before = "..." + std::string(end_of(before, kWidth - 3 - columns(behind)));
+    }
+    return file_ + ":" + std::to_string(place.line) + ":" + std::to_string(place.column) +
+           (finding.severity == Finding::Severity::error ? ": error: " : ": warning: ") +
+           finding.text + "\n" + cut(before + behind, kWidth) + "\n" +
+           std::string(columns(before), ' ') + "^\n";
+}
+
+void print(std::FILE *stream, const std::string &file, std::string_view text,
+           const std::vector<Finding> &findings)
+{
+    constexpr std::size_t kShown = 1000;
+    Messages messages(file, text);
+    const std::size_t shown = std::min(findings.size(), kShown);
+    for (std::size_t index = 0; index < shown; ++index) {
+        std::fputs(messages.of(findings[index]).c_str(), stream);
+    }
+    if (findings.size() > shown) {
+        std::fprintf(stream, "%s: %zu more are not shown\n", one_line(file).c_str(),
+                     findings.size() - shown);
+    }
+}
+
+} // namespace fptest

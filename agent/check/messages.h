@@ -1,0 +1,40 @@
+// SPDX-FileCopyrightText: 2026 The Quillmark authors
+// SPDX-License-Identifier: Apache-2.0
+
+// The findings of the plan checker as they are printed.
+#pragma once
+
+#include "check/check.h"
+#include "plan/markup.h"
+
+#include <cstdio>
+#include <string>
+#include <string_view>
+#include <vector>
+
+namespace fptest
+{
+
+// For a file's findings in the order of its text, which they come to quickly.
+class Messages
+{
+  public:
+    // The text is not copied.
+    Messages(const std::string &file, std::string_view text);
+
+    // "FILE:LINE:COLUMN: error: TEXT", the source line and a caret under the place;
+    // three lines, each with a line feed. A long source line is cut around the place
+    // to fit 80 columns.
+    std::string of(const Finding &finding);
+
+  private:
+    std::string file_;
+    std::string_view text_;
+    Positions positions_;
+};
+
+// Prints the messages of a file's findings, the first thousand of them.
+void print(std::FILE *stream, const std::string &file, std::string_view text,
+           const std::vector<Finding> &findings);
+
+} // namespace fptest

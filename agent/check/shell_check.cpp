@@ -1,0 +1,231 @@
+// SPDX-FileCopyrightText: 2026 The Quillmark authors
+// SPDX-License-Identifier: Apache-2.0
+
+#include "check/shell_check.h"
+
+#include "plan/plan.h"
+
+#include <algorithm>
+#include <vector>
+
+namespace fptest
+{
+
+namespace
+{
+
+using Fault = ShellReading::Fault;
+using Effect = ShellReading::Effect;
+
+// The characters of a program's name that the shell does not take as they are.
+std::string shell_characters(std::string_view name)
+{
+    constexpr std::string_view kTaken = " \"'\\$`;&|<>()*?[{";
+    std::vector<std::string> found;
+    for (const char taken : kTaken) {
+        if (name.find(taken) != name.npos) {
+            found.push_back(taken == ' ' ? "a blank" : std::string("'") + taken + "'");
+        }
+    }
+    return listing(found);
+}
+
+// Whether the shell may read more in it than words.
+bool is_read_closely(std::string_view line)
+{
+    return line.size() <= kCommandLimit && // else it is cut, and what is left of it changes
+           line.find_first_of("\"'\\$`;&|<>()#\n\r") != line.npos;
+}
+
+std::string reason(const Fault &fault)
+{
+    const std::string mark = in_quotes(fault.mark);
+    switch (fault.kind) {
+    case Fault::Kind::no_end:
+        return "it finds no end of the " + mark + " here; end it, or put a '\\' before it";
+    case Fault::Kind::unexpected:
+        return "it takes no " + mark + " here; put it in quotes, or leave it out";
+    case Fault::Kind::nothing_behind:
+        return "nothing follows the " + mark + " here; put it in quotes, or leave it out";
+    }
+    return {};
+}
+
+// What the shell runs for the text between backticks.
+std::string without_escapes(const std::string &text)
+{
+    std::string plain;
+    for (std::size_t at = 0; at < text.size(); ++at) {
+        const bool is_escape =
+            text[at] == '\\' && at + 1 < text.size() &&
+            std::string_view("$`\\").find(text[at + 1]) != std::string_view::npos;
+        plain += text[is_escape ? ++at : at];
+    }
+    return plain;
+}
+
+} // namespace
+
+ShellChecker::ShellChecker(Findings &findings) : findings_(findings)
+{
+}
+
+void ShellChecker::check(const Item &item)
+{
+    const std::string line = command_line(item.name, item.args, "");
+    const std::size_t args_begin = line.size() - item.args.size();
+    const Verdict verdict = is_read_closely(line) ? judge(item, line) : Verdict{};
+    const std::string characters = shell_characters(item.name);
+    const bool is_of_name = verdict.is_refused && verdict.reading.fault
+                                ? verdict.reading.fault->at < args_begin
+                                : !characters.empty() && !is_read_closely(item.args);
+    if (!characters.empty()) {
+        report_name(item, characters, verdict.is_refused && is_of_name);
+    }
+    if (verdict.is_refused && !is_of_name) {
+        report_refusal(item, verdict, args_begin);
+    }
+    if (!verdict.is_refused) {
+        for (const Effect &effect : verdict.reading.effects) {
+            if (effect.at >= args_begin) {
+                report_effect(item, effect, item.args_place(effect.at - args_begin));
+            }
+        }
+    }
+    // one mistake where it is in front of a line feed that is said
+    const bool ends_line = std::ranges::any_of(verdict.reading.effects, [&](const Effect &effect) {
+        return effect.mark == "\n" && line[effect.at - 1] == '\r';
+    });
+    if (const std::size_t at = item.args.find('\r'); at != item.args.npos && !ends_line) {
+        findings_.warning(item.args_place(at),
+                          "the shell takes the carriage return here for a character like any "
+                          "other, and would hand it to item " +
+                              in_quotes(item.name) + "; leave it out");
+    }
+}
+
+// The shell's word counts where there is one.
+ShellChecker::Verdict ShellChecker::judge(const Item &item, const std::string &line)
+{
+    const auto [place, is_new] = verdicts_.try_emplace(line);
+    Verdict &verdict = place->second;
+    if (is_new) {
+        verdict.reading = read_shell_line(line);
+        const Shell::Answer answer = shell_.ask(line, verdict.why);
+        verdict.is_refused = answer == Shell::Answer::unknown ? verdict.reading.fault.has_value()
+                                                              : answer == Shell::Answer::refused;
+        if (answer == Shell::Answer::unknown && shell_.is_out_of_time() && !is_limit_told_) {
+            is_limit_told_ = true;
+            findings_.warning(item.name_place,
+                              "the device's shell has been asked for as long as fptest waits for "
+                              "it: from item " +
+                                  in_quotes(item.name) +
+                                  " on, what it would refuse may be missed; check the rest as a "
+                                  "plan of its own");
+        }
+    }
+    return verdict;
+}
+
+// With -n the shell does not look between backticks.
+bool ShellChecker::is_refused(const std::string &backticks, std::string &why)
+{
+    return backticks.find("\\\"") == backticks.npos && // where quotes round it change what is meant
+           shell_.ask(without_escapes(backticks), why) == Shell::Answer::refused;
+}
+
+void ShellChecker::report_name(const Item &item, const std::string &characters, bool is_refused)
+{
+    const std::string text = "item " + in_quotes(item.name) + " has " + characters +
+                             " in its name, which the shell reads as its own: it would ";
+    if (is_refused) {
+        findings_.error(item.name_place, text + "refuse the command line; rename it");
+    } else {
+        findings_.warning(item.name_place, text + "not run a program of that name; rename it");
+    }
+}
+
+void ShellChecker::report_refusal(const Item &item, const Verdict &verdict, std::size_t args_begin)
+{
+    const std::string text =
+        "the shell would refuse the command line of item " + in_quotes(item.name) + ": ";
+    if (const auto &fault = verdict.reading.fault) {
+        findings_.error(item.args_place(fault->at - args_begin), text + reason(*fault));
+    } else {
+        findings_.error(item.args_place(0), text + one_line(verdict.why) + "; mend its args");
+    }
+}
+
+void ShellChecker::report_effect(const Item &item, const Effect &effect, std::size_t place)
+{
+    const std::string name = in_quotes(item.name);
+    const std::string unless =
+        "; put the " + in_quotes(effect.mark) + " in quotes if it is meant for the item";
+    const std::string refusal = "the shell would refuse the command line of item " + name + ": ";
+    switch (effect.kind) {
+    case Effect::Kind::command:
+        report_command(item, effect, place);
+        break;
+    case Effect::Kind::expansion:
+        findings_.error(place, refusal + in_quotes(effect.text) +
+                                   " is a bad substitution; put a "
+                                   "'\\' before its '$' if it is meant "
+                                   "for the item");
+        break;
+    case Effect::Kind::substitution:
+        if (std::string why; effect.mark == "`" && is_refused(effect.text, why)) {
+            findings_.error(place, refusal + "between the backticks here, " + one_line(why) +
+                                       "; put a '\\' before them if they are meant for the item");
+            break;
+        }
+        findings_.warning(place, "the shell would run " + in_quotes(effect.text) +
+                                     " as a command of its own before item " + name +
+                                     ", and put what that prints here; put a '\\' before it if "
+                                     "it is meant for the item");
+        break;
+    case Effect::Kind::redirection:
+        findings_.warning(place, "the shell would redirect item " + name + " by " +
+                                     in_quotes(effect.text) + ", and not hand it that" + unless);
+        break;
+    case Effect::Kind::comment:
+        findings_.warning(place, "the shell would take " + in_quotes(effect.text) +
+                                     " for a comment, and not hand it to item " + name + unless);
+        break;
+    case Effect::Kind::function:
+        findings_.error(place, "the shell would make a function of item " + name +
+                                   " here, and run nothing" + unless);
+        break;
+    }
+}
+
+// What ends the item's own command.
+void ShellChecker::report_command(const Item &item, const Effect &effect, std::size_t place)
+{
+    const std::string name = in_quotes(item.name);
+    const std::string unless =
+        "; put the " + in_quotes(effect.mark) + " in quotes if it is meant for the item";
+    const std::string second = "run " + in_quotes(effect.text) + " as a command of its own";
+    if (effect.mark == "\n") {
+        findings_.error(place, "the shell would end the command of item " + name +
+                                   " at the line feed here, and " + second +
+                                   "; write a blank in its place");
+    } else if (effect.mark == "&" || effect.mark == "|&") {
+        findings_.warning(place,
+                          "the shell would run item " + name + " in the background" +
+                              (effect.text.empty() ? ", so that it ends at once for the module"
+                                                   : ", and " + second) +
+                              unless);
+    } else if (effect.text.empty()) {
+        findings_.warning(place, "the shell would end the command of item " + name +
+                                     " here, and not hand it the " + in_quotes(effect.mark) +
+                                     unless);
+    } else {
+        const std::string when = effect.mark == "&&"   ? " where item " + name + " succeeds"
+                                 : effect.mark == "||" ? " where item " + name + " fails"
+                                 : effect.mark == "|"  ? " on what item " + name + " prints"
+                                                       : ", after item " + name;
+        findings_.warning(place, "the shell would " + second + when + unless);
+    }
+}
+
+} // namespace fptest

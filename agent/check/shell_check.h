@@ -1,0 +1,53 @@
+// SPDX-FileCopyrightText: 2026 The Quillmark authors
+// SPDX-License-Identifier: Apache-2.0
+
+// The part of the plan checker that looks at what the shell makes of an item's
+// name and args.
+#pragma once
+
+#include "check/findings.h"
+#include "check/shell_reader.h"
+
+#include <cstddef>
+#include <functional>
+#include <string>
+#include <unordered_map>
+
+namespace fptest
+{
+
+class ShellChecker
+{
+  public:
+    struct Item {
+        std::string name;
+        std::string args;
+        std::size_t name_place = 0;
+        std::function<std::size_t(std::size_t)> args_place; // of a byte of the args
+    };
+
+    explicit ShellChecker(Findings &findings);
+
+    void check(const Item &item);
+
+  private:
+    struct Verdict {
+        ShellReading reading;
+        bool is_refused = false;
+        std::string why; // in the shell's words
+    };
+
+    Verdict judge(const Item &item, const std::string &line);
+    bool is_refused(const std::string &backticks, std::string &why);
+    void report_name(const Item &item, const std::string &characters, bool is_refused);
+    void report_refusal(const Item &item, const Verdict &verdict, std::size_t args_begin);
+    void report_effect(const Item &item, const ShellReading::Effect &effect, std::size_t place);
+    void report_command(const Item &item, const ShellReading::Effect &effect, std::size_t place);
+
+    Findings &findings_;
+    Shell shell_;
+    bool is_limit_told_ = false;
+    std::unordered_map<std::string, Verdict> verdicts_; // by the line
+};
+
+} // namespace fptest

@@ -1,0 +1,110 @@
+// SPDX-FileCopyrightText: 2026 The Quillmark authors
+// SPDX-License-Identifier: Apache-2.0
+
+#include "check/shell_reader.h"
+#include "common/descriptor.h"
+
+#include <array>
+#include <cerrno>
+#include <chrono>
+#include <csignal>
+#include <fcntl.h>
+#include <poll.h>
+#include <spawn.h>
+#include <sys/wait.h>
+#include <unistd.h>
+
+namespace fptest
+{
+
+namespace
+{
+
+using Clock = std::chrono::steady_clock;
+
+// What a process writes until it closes its end, or nothing where that takes
+// longer.
+std::optional<std::string> read_all(int descriptor, double seconds)
+{
+    const auto end = Clock::now() + std::chrono::duration<double>(seconds);
+    std::string text;
+    for (;;) {
+        seconds = std::chrono::duration<double>(end - Clock::now()).count();
+        if (seconds <= 0) {
+            return std::nullopt;
+        }
+        pollfd waiting{descriptor, POLLIN, 0};
+        if (poll(&waiting, 1, static_cast<int>(seconds * 1000) + 1) <= 0) {
+            continue;
+        }
+        std::array<char, 4096> buffer;
+        const ssize_t got = read(descriptor, buffer.data(), buffer.size());
+        if (got == 0) {
+            return text;
+        }
+        if (got > 0) {
+            text.append(buffer.data(), static_cast<std::size_t>(got));
+        }
+    }
+}
+
+} // namespace
+
+Shell::Answer Shell::ask(const std::string &line, std::string &why)
+{
+    const auto begin = Clock::now();
+    const Answer answer = ask_once(line, why);
+    left_ -= std::chrono::duration<double>(Clock::now() - begin).count();
+    return answer;
+}
+
+Shell::Answer Shell::ask_once(const std::string &line, std::string &why) const
+{
+    std::array<int, 2> ends{};
+    if (left_ <= 0 || access("/system/bin/sh", X_OK) != 0 || pipe2(ends.data(), O_CLOEXEC) != 0) {
+        return Answer::unknown;
+    }
+    const Descriptor output(ends[0]);
+    Descriptor errors(ends[1]);
+    posix_spawn_file_actions_t actions{};
+    posix_spawn_file_actions_init(&actions);
+    posix_spawn_file_actions_addopen(&actions, STDIN_FILENO, "/dev/null", O_RDONLY, 0);
+    posix_spawn_file_actions_addopen(&actions, STDOUT_FILENO, "/dev/null", O_WRONLY, 0);
+    posix_spawn_file_actions_adddup2(&actions, errors.get(), STDERR_FILENO);
+    std::string name = "sh";
+    std::string reads_only = "-n";
+    std::string takes_text = "-c";
+    std::string text = line;
+    const std::array<char *, 5> arguments = {name.data(), reads_only.data(), takes_text.data(),
+                                             text.data(), nullptr};
+    const std::array<char *, 1> environment = {nullptr};
+    pid_t process = -1;
+    const int error = posix_spawn(&process, "/system/bin/sh", &actions, nullptr, arguments.data(),
+                                  environment.data());
+    posix_spawn_file_actions_destroy(&actions);
+    if (error != 0) {
+        return Answer::unknown;
+    }
+    errors = Descriptor(-1);
+    const auto said = read_all(output.get(), left_);
+    if (!said) {
+        kill(process, SIGKILL);
+    }
+    int status = 0;
+    while (waitpid(process, &status, 0) < 0 && errno == EINTR) {
+    }
+    if (!said || !WIFEXITED(status)) {
+        return Answer::unknown;
+    }
+    if (WEXITSTATUS(status) == 0) {
+        return Answer::accepted;
+    }
+    // "E: sh: syntax error: ...", "sh: ..."
+    why = said->substr(0, said->find('\n'));
+    if (const std::size_t begin = why.find("sh: "); begin != why.npos) {
+        why.erase(0, begin + 4);
+    }
+    return Answer::refused;
+}
+
+} // namespace fptest

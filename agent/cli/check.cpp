@@ -1,0 +1,69 @@
+// SPDX-FileCopyrightText: 2026 The Quillmark authors
+// SPDX-License-Identifier: Apache-2.0
+
+#include "check/messages.h"
+#include "cli/commands.h"
+#include "plan/plan.h"
+#include "util/files.h"
+#include "util/text.h"
+
+#include <algorithm>
+#include <cstdio>
+
+namespace fptest
+{
+namespace
+{
+
+// What it holds is known of a plan that loads.
+std::string size_of(const std::string &text, PlanUse use)
+{
+    std::string size = use == PlanUse::stored ? amount(text.size(), "byte")
+                                              : std::to_string(text.size()) + " of " +
+                                                    std::to_string(kPlanLimit) + " bytes";
+    if (const auto plan = Plan::load(text)) {
+        std::size_t items = 0;
+        const auto groups = plan->groups();
+        for (const Plan::Group &group : groups) {
+            items += group.items.size();
+        }
+        size = amount(groups.size(), "group") + ", " + amount(items, "item") + ", " + size;
+    }
+    return size;
+}
+
+// False where the plan has errors.
+bool check_file(const std::string &file, const std::string &text, PlanUse use)
+{
+    const std::string name = file == "-" ? "<stdin>" : one_line(file);
+    const auto findings = check(text, use);
+    print(stdout, name, text, findings);
+    const auto errors = static_cast<std::size_t>(
+        std::ranges::count(findings, Finding::Severity::error, &Finding::severity));
+    const std::size_t warnings = findings.size() - errors;
+    std::printf("%s: %s, %s (%s)\n", name.c_str(), amount(errors, "error").c_str(),
+                amount(warnings, "warning").c_str(), size_of(text, use).c_str());
+    return errors == 0;
+}
+
+} // namespace
+
+Exit check_files(const CheckOptions &options)
+{
+    bool sound = true;
+    bool readable = true;
+    for (const std::string &file : options.files) {
+        if (const auto text = read_file(file)) {
+            sound = check_file(file, *text, options.use) && sound;
+        } else {
+            std::fprintf(stderr, "fptest: %s: %s\n", one_line(file).c_str(), why_unread().c_str());
+            readable = false;
+        }
+    }
+    if (!readable) {
+        return Exit::usage;
+    }
+    return sound ? Exit::success : Exit::items_failed;
+}
+
+} // namespace fptest

@@ -1,0 +1,118 @@
+// SPDX-FileCopyrightText: 2026 The Quillmark authors
+// SPDX-License-Identifier: Apache-2.0
+
+#include "cli/commands.h"
+#include "module/preflight.h"
+#include "module/stored_plan.h"
+#include "plan/plan.h"
+#include "quillmark.h"
+#include "util/files.h"
+#include "util/text.h"
+
+#include <algorithm>
+#include <cerrno>
+#include <cstdio>
+
+namespace fptest
+{
+namespace
+{
+
+// What the report adds to the file, at the most: each byte as an entity.
+constexpr std::size_t kLongestEntity = 6;
+constexpr std::size_t kAttributes = 64;
+
+std::string read_stored()
+{
+    if (auto text = read_stored_plan()) {
+        return *text;
+    }
+    if (errno == ENOENT) {
+        throw Failure(Exit::environment, std::string("no plan is stored in ") + kStoredPlan +
+                                             ", so nothing can be reported: store one with fptest "
+                                             "run --plan FILE");
+    }
+    throw Failure(Exit::environment, std::string(kStoredPlan) + " cannot be read: " + why_unread());
+}
+
+Plan load_stored(const std::string &text)
+{
+    std::string why;
+    auto plan = Plan::load(text, &why);
+    if (!plan) {
+        throw Failure(Exit::environment, std::string(kStoredPlan) + " does not load (" +
+                                             one_line(why) + "): store the plan again");
+    }
+    return std::move(*plan);
+}
+
+[[noreturn]] void unknown(const std::string &where, const std::string &what,
+                          const std::string &name, const std::vector<std::string> &names)
+{
+    const std::string near = nearest(name, names);
+    std::vector<std::string> shown;
+    for (const std::string &one : names) {
+        shown.push_back(one_line(one));
+    }
+    throw Failure(Exit::usage,
+                  where + " has no " + what + " '" + one_line(name) + "'" +
+                      (near.empty() ? "; it" : "; did you mean '" + one_line(near) + "'? It") +
+                      (shown.empty() ? " has none at all" : " has " + listing(shown)));
+}
+
+// The item's number in the plan. Only its own group is looked at: the module
+// would go on into the groups behind it, and annotate another item.
+std::size_t find_item(const Plan &plan, const ReportOptions &options)
+{
+    const auto groups = plan.groups();
+    const auto group = std::ranges::find(groups, options.group, &Plan::Group::name);
+    if (group == groups.end()) {
+        std::vector<std::string> names;
+        for (const Plan::Group &one : groups) {
+            names.push_back(one.name);
+        }
+        unknown("the stored plan", "group", options.group, names);
+    }
+    std::vector<std::string> names;
+    for (const Plan::Element &item : group->items) {
+        if (item.name == options.item) {
+            return item.number;
+        }
+        names.push_back(item.name.value_or(""));
+    }
+    unknown("group '" + one_line(options.group) + "' of the stored plan", "item", options.item,
+            names);
+}
+
+} // namespace
+
+Exit report(const ReportOptions &options)
+{
+    choose_log(options.log);
+    const Descriptor lock = lock_stored_plan();
+    const std::string text = read_stored();
+    const Plan plan = load_stored(text);
+    const std::size_t number = find_item(plan, options);
+    // the library would not load such a plan again
+    const std::string description = clean(options.description);
+    if (description != options.description) {
+        std::fputs("fptest: bytes of the description that no plan can hold are replaced\n", stderr);
+    }
+    require_room(text.size() + kAttributes + kLongestEntity * description.size());
+    FPTEST_SetTransation(options.group.c_str(), options.item.c_str(), options.progress,
+                         options.result, description.c_str());
+
+    const auto written = Plan::load(read_stored());
+    ItemReport wanted;
+    wanted.progress = std::to_string(options.progress);
+    wanted.result = std::to_string(options.result);
+    wanted.description = as_loaded(description);
+    if (!written || !(written->report(number) == wanted)) {
+        throw Failure(Exit::environment, std::string("the report is not in ") + kStoredPlan +
+                                             ": is it writable? --log FILE tells what the module "
+                                             "met");
+    }
+    return Exit::success;
+}
+
+} // namespace fptest

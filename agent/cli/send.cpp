@@ -1,0 +1,156 @@
+// SPDX-FileCopyrightText: 2026 The Quillmark authors
+// SPDX-License-Identifier: Apache-2.0
+
+#include "cli/commands.h"
+#include "module/module_process.h"
+#include "module/preflight.h"
+#include "module/stored_plan.h"
+#include "plan/plan.h"
+#include "run/signals.h"
+#include "util/files.h"
+
+#include <algorithm>
+#include <cerrno>
+#include <chrono>
+#include <cstdio>
+#include <cstring>
+#include <unistd.h>
+
+namespace fptest
+{
+namespace
+{
+
+using namespace std::chrono_literals;
+
+// Commands separated by zero bytes; one behind the last may be there or not.
+std::vector<std::string> read_commands()
+{
+    std::vector<std::string> commands;
+    const auto input = read_file("-");
+    if (!input || input->empty()) {
+        throw Failure(Exit::usage, "no command can be read from standard input" +
+                                       (input ? std::string() : ": " + why_unread()));
+    }
+    const std::string &text = *input;
+    for (std::size_t at = 0; at < text.size();) {
+        const std::size_t end = std::min(text.find('\0', at), text.size());
+        commands.push_back(text.substr(at, end - at));
+        at = end + 1;
+    }
+    return commands;
+}
+
+// What the module takes for the command's head: colons in front of it are passed
+// over.
+std::string_view head_of(std::string_view command)
+{
+    command.remove_prefix(std::min(command.find_first_not_of(':'), command.size()));
+    return command.substr(0, command.find(':'));
+}
+
+// What a command stores as the plan; nothing where it stores none.
+std::optional<std::string> plan_of(std::string_view command)
+{
+    const std::string_view head = head_of(command);
+    if (!head.starts_with("XMLFile")) {
+        return std::nullopt;
+    }
+    return stored_part(
+        command.substr(static_cast<std::size_t>(head.data() + head.size() - command.data())));
+}
+
+// The names of the items that a command may run, so that they can be stopped.
+std::vector<std::string> items_of(const std::string &command)
+{
+    std::vector<std::string> names;
+    if (!head_of(command).starts_with("XMLNodePath")) {
+        return names;
+    }
+    if (const auto plan = Plan::load(read_stored_plan().value_or(""))) {
+        for (const Plan::Group &group : plan->groups()) {
+            for (const Plan::Element &item : group.items) {
+                names.push_back(item.name.value_or(""));
+            }
+        }
+    }
+    return names;
+}
+
+class Sender
+{
+  public:
+    // The reply, or nothing where the command was interrupted.
+    std::optional<std::string> send(const std::string &command)
+    {
+        // the module waits for nobody who is just writing the plan that it loads
+        Descriptor plan =
+            head_of(command).starts_with("XMLNodePath") ? lock_stored_plan() : Descriptor(-1);
+        const auto items = items_of(command);
+        host_.command(command, items);
+        for (;;) {
+            const auto event = host_.wait(100ms, signals_.descriptor());
+            if (event) {
+                plan = Descriptor(-1); // it is loaded before the first item is told
+                host_.pass_output(stderr, event->output);
+            }
+            if (event && event->kind == Host::Event::Kind::item) {
+                std::fprintf(stderr, "vendor = %d\n", event->value);
+            }
+            host_.pass_output(stderr);
+            if (event && event->kind == Host::Event::Kind::gone) {
+                throw Failure(Exit::environment, gone_text(*event));
+            }
+            if (event && event->kind == Host::Event::Kind::returned) {
+                return interrupted_ ? std::nullopt : std::optional(event->text);
+            }
+            interrupted_ = interrupted_ || signals_.take() != 0;
+            if (interrupted_) {
+                return std::nullopt; // with the host's end its item is stopped
+            }
+        }
+    }
+
+  private:
+    Signals signals_;
+    Host host_;
+    bool interrupted_ = false;
+};
+
+} // namespace
+
+Exit send(const SendOptions &options)
+{
+    if (options.commands.empty() != options.from_input) {
+        throw Failure(Exit::usage, "give COMMANDs as arguments, or with -0 on standard input");
+    }
+    require_device();
+    choose_log(options.log);
+    const std::vector<std::string> commands =
+        options.from_input ? read_commands() : options.commands;
+    // as a run of its own, unless it touches nothing of one
+    Descriptor lock(-1);
+    if (std::ranges::any_of(commands, [](const std::string &command) {
+            return plan_of(command) || head_of(command).starts_with("XMLNodePath");
+        })) {
+        lock = lock_device();
+    }
+    Sender sender;
+    for (const std::string &command : commands) {
+        const auto reply = sender.send(command);
+        if (!reply) {
+            return Exit::interrupted;
+        }
+        std::fwrite(reply->data(), 1, reply->size(), stdout);
+        std::fputc(options.from_input ? '\0' : '\n', stdout);
+        if (std::fflush(stdout) != 0) {
+            throw Failure(Exit::environment, "replies cannot be written to standard output");
+        }
+        if (const auto plan = plan_of(command)) {
+            require_stored(read_stored_plan().value_or(""), *plan);
+        }
+    }
+    return Exit::success;
+}
+
+} // namespace fptest

@@ -1,0 +1,85 @@
+// SPDX-FileCopyrightText: 2026 The Quillmark authors
+// SPDX-License-Identifier: Apache-2.0
+
+#include "cli/commands.h"
+#include "plan/plan.h"
+#include "util/files.h"
+#include "util/terminal.h"
+#include "util/text.h"
+
+#include <cerrno>
+#include <cstdio>
+#include <cstring>
+#include <unistd.h>
+#include <vector>
+
+namespace fptest
+{
+namespace
+{
+
+using Row = std::vector<std::string>;
+
+std::string shown(const std::optional<std::string> &text)
+{
+    return one_line(text.value_or("-"));
+}
+
+std::vector<Row> table(const Plan &plan)
+{
+    std::vector<Row> rows = {{"GROUP", "ITEM", "PROGRESS", "RESULT", "DESCRIPTION"}};
+    for (const Plan::Group &group : plan.groups()) {
+        for (const Plan::Element &item : group.items) {
+            const ItemReport &report = item.report;
+            rows.push_back(
+                {one_line(group.name), shown(item.name), shown(report.progress),
+                 report.result_without_value || report.result == "" ? "?" : shown(report.result),
+                 shown(report.description)});
+        }
+    }
+    return rows;
+}
+
+// A terminal's lines are cut to its width.
+void print(const std::vector<Row> &rows)
+{
+    for (const std::string &line : aligned(rows, {false, false, true, true, false})) {
+        const bool is_cut = isatty(STDOUT_FILENO) != 0;
+        std::printf("%s\n", is_cut ? cut(line, terminal_width(stdout)).c_str() : line.c_str());
+    }
+}
+
+std::string read_shown(const std::string &file)
+{
+    const std::string path = file.empty() ? kStoredPlan : file;
+    if (auto text = read_file(path)) {
+        return *text;
+    }
+    if (file.empty() && errno == ENOENT) {
+        throw Failure(Exit::environment, std::string("no plan is stored in ") + kStoredPlan +
+                                             ": run one with fptest run --plan FILE, or name a "
+                                             "file to show");
+    }
+    throw Failure(file.empty() ? Exit::environment : Exit::usage,
+                  one_line(path) + ": " + why_unread());
+}
+
+} // namespace
+
+Exit show(const std::string &file)
+{
+    const std::string name = file.empty() ? kStoredPlan : file == "-" ? "<stdin>" : one_line(file);
+    const auto plan = Plan::read(read_shown(file));
+    if (!plan) {
+        throw Failure(Exit::usage,
+                      name + " is no whole test plan: fptest check says what is wrong");
+    }
+    const auto rows = table(*plan);
+    if (rows.size() == 1) {
+        throw Failure(Exit::usage, name + " has no items: fptest check says more");
+    }
+    print(rows);
+    return Exit::success;
+}
+
+} // namespace fptest

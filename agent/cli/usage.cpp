@@ -1,0 +1,104 @@
+// SPDX-FileCopyrightText: 2026 The Quillmark authors
+// SPDX-License-Identifier: Apache-2.0
+
+#include "cli/usage.h"
+
+#include "util/text.h"
+
+#include <algorithm>
+#include <vector>
+
+namespace fptest
+{
+
+namespace
+{
+
+// The parser's error names an option in front of what it says of it, a flag without
+// its dashes.
+const CLI::Option *option_of(const CLI::App &command, const std::string &text)
+{
+    for (const CLI::Option *option : command.get_options()) {
+        const std::string name = option->get_name();
+        const std::string word = name.substr(std::min(name.find_first_not_of('-'), name.size()));
+        if (text.starts_with(name + ":") || text.starts_with(word + " ")) {
+            return option;
+        }
+    }
+    return nullptr;
+}
+
+std::string mismatch(const CLI::App &command, const std::string &text)
+{
+    const CLI::Option *option = option_of(command, text);
+    if (option == nullptr) {
+        return text;
+    }
+    const std::string name = option->get_name();
+    if (option->get_expected_max() == 0) {
+        return name + " takes no value";
+    }
+    return option->count() > 1
+               ? name + " is given " + std::to_string(option->count()) + " times: give it once"
+               : name + " lacks its value: give it as " + name + " " + option->get_type_name();
+}
+
+std::string without_option(const CLI::App &command, const std::string &word)
+{
+    std::vector<std::string> names;
+    for (const CLI::Option *option : command.get_options()) {
+        if (option->get_name().starts_with('-')) {
+            names.push_back(option->get_name());
+        }
+    }
+    const std::string near = nearest(word, names);
+    return "there is no option '" + one_line(word) + "'" +
+           (near.empty() ? "" : "; did you mean '" + near + "'?");
+}
+
+std::string surplus(const CLI::App &app, const CLI::App &command, const std::string &text)
+{
+    const std::vector<std::string> words = app.remaining(true);
+    if (words.empty()) {
+        return text;
+    }
+    return words.front().starts_with('-') && words.front() != "-"
+               ? without_option(command, words.front())
+               : "'" + one_line(words.front()) + "' is one argument too many";
+}
+
+std::string with_help(const std::string &text, const std::string &command)
+{
+    return text + (text.ends_with('?') ? " See" : "; see") + " fptest" +
+           (command.empty() ? "" : " " + command) + " --help";
+}
+
+} // namespace
+
+std::string unknown_option(const std::string &word, const CLI::App &app)
+{
+    return with_help(without_option(app, word), "");
+}
+
+std::string usage_line(const CLI::App *app, const CLI::Error &error)
+{
+    const std::vector<CLI::App *> commands = app->get_subcommands();
+    const CLI::App &command = commands.empty() ? *app : *commands.front();
+    std::string text = error.what();
+    switch (static_cast<CLI::ExitCodes>(error.get_exit_code())) {
+    case CLI::ExitCodes::ArgumentMismatch:
+        text = mismatch(command, text);
+        break;
+    case CLI::ExitCodes::ExtrasError:
+        text = surplus(*app, command, text);
+        break;
+    case CLI::ExitCodes::RequiredError:
+        text = commands.empty() ? "no command is given" : text;
+        break;
+    default:
+        break;
+    }
+    return "fptest: " + with_help(text, commands.empty() ? "" : command.get_name()) + "\n";
+}
+
+} // namespace fptest

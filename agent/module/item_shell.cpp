@@ -1,0 +1,139 @@
+// SPDX-FileCopyrightText: 2026 The Quillmark authors
+// SPDX-License-Identifier: Apache-2.0
+
+#include "module/item_shell.h"
+
+#include <array>
+#include <cerrno>
+#include <csignal>
+#include <cstdlib>
+#include <spawn.h>
+#include <string_view>
+#include <sys/wait.h>
+#include <unistd.h>
+#include <utility>
+
+#ifdef __ANDROID__
+#include <sys/auxv.h>
+#endif
+
+namespace fptest
+{
+namespace
+{
+
+std::function<void(int)> status_told;
+
+// The shell that the C library's system() would run.
+const char *shell()
+{
+#ifdef __ANDROID__
+    const auto *program = reinterpret_cast<const char *>(getauxval(AT_EXECFN));
+    if (program != nullptr && std::string_view(program).starts_with("/vendor/") &&
+        access("/vendor/bin/sh", X_OK) == 0) {
+        return "/vendor/bin/sh";
+    }
+    return "/system/bin/sh";
+#else
+    return "/bin/sh";
+#endif
+}
+
+// What a shell gets of this process's signals: the mask as it was, and the default
+// for those that system() ignores meanwhile, unless they were ignored before.
+class SpawnAttributes
+{
+  public:
+    SpawnAttributes(const sigset_t &mask, const sigset_t &defaults)
+    {
+        posix_spawnattr_init(&attributes_);
+        posix_spawnattr_setsigmask(&attributes_, &mask);
+        posix_spawnattr_setsigdefault(&attributes_, &defaults);
+        short flags = POSIX_SPAWN_SETSIGMASK | POSIX_SPAWN_SETSIGDEF;
+        if (status_told) {
+            posix_spawnattr_setpgroup(&attributes_, 0);
+            flags |= POSIX_SPAWN_SETPGROUP;
+        }
+        posix_spawnattr_setflags(&attributes_, flags);
+    }
+    ~SpawnAttributes()
+    {
+        posix_spawnattr_destroy(&attributes_);
+    }
+    SpawnAttributes(const SpawnAttributes &) = delete;
+    SpawnAttributes &operator=(const SpawnAttributes &) = delete;
+
+    const posix_spawnattr_t *get() const
+    {
+        return &attributes_;
+    }
+
+  private:
+    posix_spawnattr_t attributes_{};
+};
+
+// The status of the command; that of an exit with 127 where there is no shell.
+int run_by_shell(const char *command, const SpawnAttributes &attributes)
+{
+    const std::array<const char *, 4> arguments{"sh", "-c", command, nullptr};
+    pid_t child = -1;
+    const int error = posix_spawn(&child, shell(), nullptr, attributes.get(),
+                                  const_cast<char *const *>(arguments.data()), environ);
+    if (error == EAGAIN || error == ENOMEM) {
+        errno = error;
+        return -1;
+    }
+    if (error != 0) {
+        return 127 << 8;
+    }
+    int status = -1;
+    while (waitpid(child, &status, 0) < 0) {
+        if (errno != EINTR) {
+            return -1;
+        }
+    }
+    return status;
+}
+
+} // namespace
+
+void tell_item_status(std::function<void(int)> told)
+{
+    status_told = std::move(told);
+}
+
+} // namespace fptest
+
+extern "C" int system(const char *command)
+{
+    if (command == nullptr) {
+        return access(fptest::shell(), X_OK) == 0 ? 1 : 0;
+    }
+    sigset_t child_signal;
+    sigset_t mask;
+    sigset_t defaults;
+    sigemptyset(&child_signal);
+    sigaddset(&child_signal, SIGCHLD);
+    sigemptyset(&defaults);
+    struct sigaction ignored {
+    };
+    ignored.sa_handler = SIG_IGN;
+    std::array<struct sigaction, 2> before{};
+    const std::array<int, 2> signals{SIGINT, SIGQUIT};
+    for (std::size_t at = 0; at < signals.size(); ++at) {
+        sigaction(signals[at], &ignored, &before[at]);
+        if (before[at].sa_handler != SIG_IGN) {
+            sigaddset(&defaults, signals[at]);
+        }
+    }
+    pthread_sigmask(SIG_BLOCK, &child_signal, &mask);
+    const int status = fptest::run_by_shell(command, fptest::SpawnAttributes(mask, defaults));
+    pthread_sigmask(SIG_SETMASK, &mask, nullptr);
+    for (std::size_t at = 0; at < signals.size(); ++at) {
+        sigaction(signals[at], &before[at], nullptr);
+    }
+    if (fptest::status_told) {
+        fptest::status_told(status);
+    }
+    return status;
+}

@@ -1,0 +1,301 @@
+// SPDX-FileCopyrightText: 2026 The Quillmark authors
+// SPDX-License-Identifier: Apache-2.0
+
+#include "module/module_process.h"
+
+#include "module/messages.h"
+#include "module/processes.h"
+#include "module/server.h"
+
+#include <algorithm>
+#include <array>
+#include <cerrno>
+#include <csignal>
+#include <cstdio>
+#include <cstdlib>
+#include <fcntl.h>
+#include <poll.h>
+#include <sys/mman.h>
+#include <sys/prctl.h>
+#include <sys/socket.h>
+#include <sys/stat.h>
+#include <sys/syscall.h>
+#include <sys/wait.h>
+#include <system_error>
+#include <unistd.h>
+
+namespace fptest
+{
+namespace
+{
+
+constexpr off_t kOutputKept = off_t{64} * 1024;
+
+[[noreturn]] void fail(const char *what)
+{
+    throw std::system_error(errno, std::generic_category(), what);
+}
+
+int make_output()
+{
+    // not by the C library's name, which old Androids lack
+    const int fd = static_cast<int>(
+        syscall(SYS_memfd_create, "fptest-output", MFD_CLOEXEC | MFD_ALLOW_SEALING));
+    if (fd < 0) {
+        fail("no memory for what items print");
+    }
+    fcntl(fd, F_SETFL, O_APPEND);
+    return fd;
+}
+
+// "NANOSECONDS OUTPUT TEXT"
+Host::Event with_moment(Host::Event::Kind kind, const std::string &text)
+{
+    Host::Event event{};
+    event.kind = kind;
+    char *end = nullptr;
+    const std::chrono::nanoseconds time(std::strtoll(text.c_str(), &end, 10));
+    event.time = std::chrono::steady_clock::time_point(time);
+    event.output = std::strtoll(end, &end, 10);
+    event.text = end + 1;
+    return event;
+}
+
+} // namespace
+
+Host::Host() : output_(make_output())
+{
+    // what outlives the module's process comes to this one, and can be found
+    prctl(PR_SET_CHILD_SUBREAPER, 1);
+    start();
+}
+
+void Host::start()
+{
+    std::array<int, 2> control{};
+    if (socketpair(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0, control.data()) != 0) {
+        fail("no socket to the module's process");
+    }
+    control_ = Descriptor(control[0]);
+    const Descriptor their_control(control[1]);
+    std::fflush(nullptr);
+    pid_ = fork();
+    if (pid_ < 0) {
+        fail("no process for the module");
+    }
+    leader_ = pid_;
+    if (pid_ == 0) {
+        close(control_.get());
+        serve_module(their_control.get(), output_.get());
+    }
+}
+
+Host::~Host()
+{
+    // a gatherer stays behind with this for its output: it must not fill the memory
+    fcntl(output_.get(), F_ADD_SEALS, F_SEAL_GROW);
+    shutdown(control_.get(), SHUT_RDWR);
+    if (pid_ > 0) {
+        kill(pid_, SIGCONT); // an item may have suspended it
+        while (waitpid(pid_, nullptr, 0) < 0 && errno == EINTR) {
+        }
+    }
+}
+
+void Host::command(const std::string &text, const std::vector<std::string> &items)
+{
+    std::string message = text.c_str(); // commands are zero-terminated
+    for (const std::string &item : items) {
+        message += '\0' + item;
+    }
+    send_message(control_.get(), {MessageKind::command, message});
+}
+
+void Host::stop(const std::string &item)
+{
+    send_message(control_.get(), {MessageKind::stop, item});
+}
+
+void Host::hold_at_ends()
+{
+    holds_ = true;
+    send_message(control_.get(), {MessageKind::hold, ""});
+}
+
+void Host::go_on()
+{
+    send_message(control_.get(), {MessageKind::go_on, ""});
+}
+
+ModuleProcesses Host::processes() const
+{
+    return {leader_, pid_ > 0 ? pid_ : getpid()};
+}
+
+void Host::restart()
+{
+    if (pid_ < 0) {
+        start();
+        if (holds_) {
+            hold_at_ends();
+        }
+    }
+}
+
+void Host::kill_module() const
+{
+    if (pid_ > 0) {
+        kill(pid_, SIGKILL);
+    }
+}
+
+// The module first, or it would start another item meanwhile.
+void Host::suspend()
+{
+    if (pid_ > 0) {
+        kill(pid_, SIGSTOP);
+    }
+    processes().signal_all(SIGSTOP);
+}
+
+void Host::resume()
+{
+    processes().signal_all(SIGCONT);
+    if (pid_ > 0) {
+        kill(pid_, SIGCONT);
+    }
+}
+
+std::string Host::read_back()
+{
+    has_plan_ = false;
+    send_message(control_.get(), {MessageKind::read_back, ""});
+    while (!has_plan_ && pid_ > 0) {
+        read_control();
+    }
+    return std::move(plan_);
+}
+
+bool Host::has_news(std::chrono::milliseconds longest, int other) const
+{
+    std::array<pollfd, 2> polled{pollfd{control_.get(), POLLIN, 0}, pollfd{other, POLLIN, 0}};
+    poll(polled.data(), polled.size(), static_cast<int>(longest.count()));
+    return polled[0].revents != 0;
+}
+
+std::optional<Host::Event> Host::wait(std::chrono::milliseconds longest, int other)
+{
+    if (events_.empty() && pid_ > 0 && has_news(longest, other)) {
+        read_control();
+    }
+    if (events_.empty()) {
+        return std::nullopt;
+    }
+    Event event = std::move(events_.front());
+    events_.pop_front();
+    return event;
+}
+
+void Host::read_control()
+{
+    Message message;
+    if (!receive_message(control_.get(), message)) {
+        lose();
+        return;
+    }
+    Event event{};
+    switch (message.kind) {
+    case MessageKind::item:
+        event = with_moment(Event::Kind::item, message.text);
+        event.value = std::atoi(event.text.c_str());
+        break;
+    case MessageKind::ended: {
+        event = with_moment(Event::Kind::ended, message.text);
+        char *end = nullptr;
+        event.value = static_cast<int>(std::strtol(event.text.c_str(), &end, 10));
+        event.left_running = std::strtol(end, nullptr, 10) != 0;
+        break;
+    }
+    case MessageKind::returned:
+        event = with_moment(Event::Kind::returned, message.text);
+        break;
+    case MessageKind::stopped:
+        event.kind = Event::Kind::stopped;
+        event.value = std::atoi(message.text.c_str());
+        break;
+    default:
+        plan_ = std::move(message.text);
+        has_plan_ = true;
+        return;
+    }
+    events_.push_back(std::move(event));
+}
+
+void Host::lose()
+{
+    int status = 0;
+    while (waitpid(pid_, &status, 0) < 0 && errno == EINTR) {
+    }
+    pid_ = -1;
+    const std::string how = WIFSIGNALED(status)
+                                ? "by signal " + std::to_string(WTERMSIG(status))
+                                : "with status " + std::to_string(WEXITSTATUS(status));
+    Event event{};
+    event.kind = Event::Kind::gone;
+    event.text = how;
+    event.time = std::chrono::steady_clock::now();
+    event.output = output_size();
+    events_.push_back(std::move(event));
+}
+
+off_t Host::output_size() const
+{
+    struct stat status {
+    };
+    return fstat(output_.get(), &status) == 0 ? status.st_size : 0;
+}
+
+std::string Host::take_output()
+{
+    const off_t size = output_size();
+    return has_events() ? "" : take_output(size);
+}
+
+// What has been printed behind an event that is still to come is not what was
+// printed before it.
+bool Host::has_events() const
+{
+    return !events_.empty() || has_news(std::chrono::milliseconds(0), -1);
+}
+
+void Host::pass_output(std::FILE *stream)
+{
+    const off_t size = output_size();
+    if (!has_events()) {
+        pass_output(stream, size);
+    }
+}
+
+void Host::pass_output(std::FILE *stream, off_t end)
+{
+    while (taken_ < end) {
+        const std::string piece = take_output(std::min(end, taken_ + kOutputKept));
+        std::fwrite(piece.data(), 1, piece.size(), stream);
+    }
+}
+
+std::string Host::take_output(off_t end)
+{
+    if (end <= taken_) {
+        return {};
+    }
+    const off_t begin = std::max(taken_, end - kOutputKept);
+    std::string text(static_cast<std::size_t>(end - begin), '\0');
+    const ssize_t got = pread(output_.get(), text.data(), text.size(), begin);
+    text.resize(static_cast<std::size_t>(std::max<ssize_t>(got, 0)));
+    taken_ = end;
+    fallocate(output_.get(), FALLOC_FL_PUNCH_HOLE | FALLOC_FL_KEEP_SIZE, 0, taken_);
+    return text;
+}
+
+} // namespace fptest

@@ -1,0 +1,119 @@
+// SPDX-FileCopyrightText: 2026 The Quillmark authors
+// SPDX-License-Identifier: Apache-2.0
+
+// The module in a process of its own, which the agent asks by messages. A
+// terminal's Ctrl-C reaches the agent and not the items, a module that dies
+// takes no results along, and while a command runs this process calls nothing:
+// the suspension goes through the other one.
+#pragma once
+
+#include "common/descriptor.h"
+#include "module/processes.h"
+
+#include <chrono>
+#include <cstddef>
+#include <cstdio>
+#include <deque>
+#include <optional>
+#include <string>
+#include <sys/types.h>
+#include <vector>
+
+namespace fptest
+{
+
+class Host
+{
+  public:
+    struct Event {
+        enum class Kind {
+            item,     // the command has come to an item; value is the vendor
+            ended,    // that item's process has ended; value is its wait status
+            returned, // the command has returned; text is its reply
+            stopped,  // a stop has returned; value is what it returned, or kNothingToStop
+            gone,     // the process has ended; text says how
+        };
+        Kind kind;
+        int value = 0;
+        std::string text;
+        // when it happened, and how much had been printed by then; not of a stop
+        std::chrono::steady_clock::time_point time;
+        off_t output = 0;
+        bool left_running = false; // of ended: whether there may be processes left
+    };
+
+    // Throws std::system_error where the process cannot be made.
+    // What the module and its items print is kept for take_output(); input they get
+    // none.
+    Host();
+    // Ends the process. An item that it still runs is stopped.
+    ~Host();
+    Host(const Host &) = delete;
+    Host &operator=(const Host &) = delete;
+
+    // Starts a command that runs items of these names. The one before must have
+    // returned.
+    void command(const std::string &text, const std::vector<std::string> &items = {});
+
+    // Asks for FPTEST_SuspendItemExecute, which is called where a process of the
+    // item is there to be stopped: before any has been started, the module would
+    // stop the first process of the system.
+    void stop(const std::string &item);
+
+    // Holds the module at the end of each item, from here on, until go_on() is called:
+    // what it left can be looked at before anything else starts.
+    void hold_at_ends();
+    void go_on();
+
+    // What runs for the module; also what a module's process that has ended left.
+    ModuleProcesses processes() const;
+
+    // Takes another process for the module in place of one that has ended.
+    void restart();
+
+    // Ends the module's process, where that does not answer.
+    void kill_module() const;
+
+    // Suspends the module and its items, and lets them go on.
+    void suspend();
+    void resume();
+
+    static constexpr int kNothingToStop = -2;
+
+    // The next event, waited for that long, or until the other descriptor can be
+    // read.
+    std::optional<Event> wait(std::chrono::milliseconds longest, int other = -1);
+
+    // The stored plan, as FPTEST_ExtractResultMsg gives it. Only between commands.
+    std::string read_back();
+
+    // What was printed since the last call, up to now or up to where an event says,
+    // or the last 64 KiB of it. Nothing while there are events to come first.
+    std::string take_output();
+    std::string take_output(off_t end);
+
+    // Writes what was printed since the last call, all of it, up to now or up to
+    // where an event says. Nothing while there are events to come first.
+    void pass_output(std::FILE *stream);
+    void pass_output(std::FILE *stream, off_t end);
+
+  private:
+    void start();
+    bool has_news(std::chrono::milliseconds longest, int other) const;
+    bool has_events() const;
+    void read_control();
+    void lose();
+    off_t output_size() const;
+
+    pid_t pid_ = -1;    // none when it has ended
+    pid_t leader_ = -1; // of the process group that it had
+    Descriptor control_{-1};
+    Descriptor output_{-1};
+    bool holds_ = false;
+    off_t taken_ = 0;
+    std::deque<Event> events_;
+    std::string plan_;
+    bool has_plan_ = false;
+};
+
+} // namespace fptest

@@ -1,0 +1,163 @@
+// SPDX-FileCopyrightText: 2026 The Quillmark authors
+// SPDX-License-Identifier: Apache-2.0
+
+#include "module/preflight.h"
+
+#include "module/processes.h"
+#include "plan/plan.h"
+#include "util/failure.h"
+#include "util/text.h"
+
+#include <cerrno>
+#include <cstdlib>
+#include <cstring>
+#include <fcntl.h>
+#include <netinet/in.h>
+#include <sys/file.h>
+#include <sys/socket.h>
+#include <sys/stat.h>
+#include <sys/statvfs.h>
+
+namespace fptest
+{
+namespace
+{
+
+constexpr char kDataDirectory[] = "/data/vorlane";
+
+} // namespace
+
+void choose_log(const std::string &file)
+{
+    if (file.empty()) {
+        setenv("VR_LOG_FILE", "/dev/null", 0);
+        return;
+    }
+    const Descriptor log(
+        open(file.c_str(), O_WRONLY | O_CREAT | O_APPEND | O_NONBLOCK | O_CLOEXEC, 0644));
+    if (!log.is_open()) {
+        throw Failure(Exit::environment, "--log " + one_line(file) + " cannot be written: " +
+                                             std::strerror(errno) + "; name another file");
+    }
+    setenv("VR_LOG_FILE", file.c_str(), 1);
+}
+
+void require_device()
+{
+    if (access("/system/bin/sh", X_OK) != 0) {
+        throw Failure(Exit::environment, "this machine is no device: there is no /system/bin/sh; "
+                                         "on a desk, run it as: device/run -- fptest ...");
+    }
+    if (access(kDataDirectory, W_OK | X_OK) != 0) {
+        throw Failure(Exit::environment, std::string(kDataDirectory) +
+                                             " is not writable: " + std::strerror(errno) +
+                                             "; make it, or run this as another user");
+    }
+}
+
+void require_room(std::size_t bytes)
+{
+    struct statvfs disk {
+    };
+    struct stat old {
+    };
+    if (statvfs(kDataDirectory, &disk) != 0) {
+        return;
+    }
+    // the file that is there is overwritten, its blocks are as good as free
+    const std::size_t freed =
+        stat(kStoredPlan, &old) == 0 ? static_cast<std::size_t>(old.st_blocks) * 512 : 0;
+    if (static_cast<std::size_t>(disk.f_bavail) * disk.f_frsize + freed < bytes) {
+        throw Failure(Exit::environment, std::string("the disk of ") + kDataDirectory +
+                                             " is full: make room for " + std::to_string(bytes) +
+                                             " bytes; the stored plan is as it was");
+    }
+}
+
+void require_stored(const std::string &found, const std::string &wanted)
+{
+    if (found != wanted) {
+        throw Failure(Exit::environment,
+                      "the plan was not stored: " + std::to_string(found.size()) + " of " +
+                          std::to_string(wanted.size()) + " bytes are in " + kStoredPlan +
+                          "; make room and store it again");
+    }
+}
+
+Descriptor lock_device()
+{
+    Descriptor directory(open(kDataDirectory, O_RDONLY | O_DIRECTORY | O_CLOEXEC));
+    if (directory.is_open() && flock(directory.get(), LOCK_EX | LOCK_NB) != 0 &&
+        errno == EWOULDBLOCK) {
+        throw Failure(Exit::environment, "another fptest is running a plan on this device: "
+                                         "wait for its end, or stop it");
+    }
+    return directory;
+}
+
+void require_trigger_port()
+{
+    const Descriptor probe(socket(AF_INET, SOCK_STREAM | SOCK_CLOEXEC, 0));
+    const int on = 1;
+    sockaddr_in address{};
+    address.sin_family = AF_INET;
+    address.sin_port = htons(kTriggerPort);
+    setsockopt(probe.get(), SOL_SOCKET, SO_REUSEADDR, &on, sizeof on);
+    if (probe.is_open() &&
+        bind(probe.get(), reinterpret_cast<const sockaddr *>(&address), sizeof address) != 0) {
+        throw Failure(Exit::environment,
+                      "port " + std::to_string(kTriggerPort) +
+                          " cannot be had: " + std::strerror(errno) +
+                          "; the gatherer's run would never end: stop what listens there "
+                          "(netstat -ltnp names it)");
+    }
+}
+
+std::string gone_text(const Host::Event &event)
+{
+    return "the module's process ended " + event.text + "; --log FILE keeps what it says";
+}
+
+int send_and_wait(Host &host, const std::string &command)
+{
+    int vendor = 0;
+    host.command(command);
+    for (;;) {
+        const auto event = host.wait(std::chrono::seconds(1));
+        if (event && event->kind == Host::Event::Kind::item) {
+            vendor = event->value;
+        }
+        if (event && event->kind == Host::Event::Kind::returned) {
+            return vendor;
+        }
+        if (event && event->kind == Host::Event::Kind::gone) {
+            throw Failure(Exit::environment, gone_text(*event));
+        }
+    }
+}
+
+void require_no_leftovers(const std::vector<std::string> &programs)
+{
+    if (const auto found = process_of_any(programs)) {
+        throw Failure(Exit::environment, one_line(found->first) +
+                                             " of an earlier run is still running, as process " +
+                                             std::to_string(found->second) +
+                                             ", and would report into this one: end it first");
+    }
+}
+
+int ask_vendor(Host &host)
+{
+    // a path that leads nowhere: the selector is read and told before that shows
+    const int vendor = send_and_wait(host, "XMLNodePath::-/fptest asks for the vendor/-");
+    if (!vendor_suffix(vendor)) {
+        throw Failure(
+            Exit::environment,
+            "the vendor selector is " + std::to_string(vendor) +
+                ", and the module runs nothing then: set device/SysParam/Quillmark/vendor "
+                "to 0, 1 or 2 in /etc/vorlane/sysparms/vr_common_cfg.xml");
+    }
+    return vendor;
+}
+
+} // namespace fptest

@@ -1,0 +1,51 @@
+// SPDX-FileCopyrightText: 2026 The Quillmark authors
+// SPDX-License-Identifier: Apache-2.0
+
+// What a device must have before something is run on it. Each function throws a
+// Failure that says what to do where it has not.
+#pragma once
+
+#include "common/descriptor.h"
+#include "module/module_process.h"
+
+#include <cstddef>
+#include <string>
+#include <vector>
+
+namespace fptest
+{
+
+// Where the module's log goes: to that file, else where VR_LOG_FILE says, else
+// nowhere. To be called before the module is.
+void choose_log(const std::string &file);
+
+// That this is a device at all.
+void require_device();
+
+// That a plan of that size can be stored.
+void require_room(std::size_t bytes);
+
+// That the plan found is the one that was stored.
+void require_stored(const std::string &found, const std::string &wanted);
+
+// That nobody else runs a plan here, for as long as the descriptor is open.
+Descriptor lock_device();
+
+// That the module will be able to listen for the gatherer.
+void require_trigger_port();
+
+// The vendor that the module reads; nothing is run to learn it.
+int ask_vendor(Host &host);
+
+// Sends a command that runs nothing, and waits for its end. Gives the vendor that
+// the module read for it; 0 where it read none.
+int send_and_wait(Host &host, const std::string &command);
+
+// Says that the module's process has ended, and what to do.
+std::string gone_text(const Host::Event &event);
+
+// That no program of an item is still running from an earlier run: it would report
+// into this one.
+void require_no_leftovers(const std::vector<std::string> &programs);
+
+} // namespace fptest

@@ -1,0 +1,239 @@
+// SPDX-FileCopyrightText: 2026 The Quillmark authors
+// SPDX-License-Identifier: Apache-2.0
+
+#include "module/processes.h"
+
+#include "plan/plan.h"
+
+#include <algorithm>
+#include <charconv>
+#include <csignal>
+#include <cstdlib>
+#include <filesystem>
+#include <fstream>
+#include <map>
+#include <optional>
+#include <sstream>
+#include <system_error>
+
+namespace fptest
+{
+namespace
+{
+
+struct Process {
+    pid_t parent = 0;
+    pid_t group = 0;
+    char state = '?';
+    std::string program; // as it was started, or the kernel's name for it
+    std::string name;    // without the path
+    std::string script;  // its first argument, without the path: of a script its name
+};
+
+using Processes = std::map<pid_t, Process>;
+
+std::string last_part(const std::string &path)
+{
+    return path.substr(path.rfind('/') + 1);
+}
+
+std::string file_text(const std::filesystem::path &path)
+{
+    const std::ifstream file(path, std::ios::binary);
+    std::ostringstream text; // makes nothing of a process that has ended
+    text << file.rdbuf();
+    return text.str();
+}
+
+std::optional<Process> read_process(const std::filesystem::path &directory)
+{
+    const std::string stat = file_text(directory / "stat");
+    const auto open = stat.find('(');
+    const auto close = stat.rfind(')');
+    if (open == std::string::npos || close == std::string::npos || close + 4 > stat.size()) {
+        return std::nullopt;
+    }
+    Process process;
+    process.state = stat[close + 2];
+    char *end = nullptr;
+    process.parent = static_cast<pid_t>(std::strtol(stat.c_str() + close + 3, &end, 10));
+    process.group = static_cast<pid_t>(std::strtol(end, nullptr, 10));
+    const std::string arguments = file_text(directory / "cmdline");
+    const std::string command = arguments.c_str();
+    process.program = command.empty() ? stat.substr(open + 1, close - open - 1) : command;
+    process.name = last_part(process.program);
+    if (arguments.size() > command.size() + 1) {
+        process.script = last_part(arguments.c_str() + command.size() + 1);
+    }
+    return process;
+}
+
+Processes read_processes()
+{
+    Processes processes;
+    std::error_code gone;
+    for (const auto &entry : std::filesystem::directory_iterator("/proc", gone)) {
+        const std::string name = entry.path().filename();
+        pid_t pid = 0;
+        const auto [end, error] = std::from_chars(name.data(), name.data() + name.size(), pid);
+        if (error != std::errc{} || end != name.data() + name.size()) {
+            continue;
+        }
+        if (auto process = read_process(entry.path())) {
+            processes.emplace(pid, std::move(*process));
+        }
+    }
+    return processes;
+}
+
+bool is_below(const Processes &processes, pid_t pid, pid_t ancestor)
+{
+    for (std::size_t steps = 0; steps < processes.size(); ++steps) {
+        const auto found = processes.find(pid);
+        if (found == processes.end()) {
+            return false;
+        }
+        pid = found->second.parent;
+        if (pid == ancestor) {
+            return true;
+        }
+    }
+    return false;
+}
+
+bool lives(const Process &process)
+{
+    return process.state != 'Z' && process.state != 'X';
+}
+
+// By its name: a script is its shell's first argument. Vendor 2's is an item like
+// any other.
+bool is_named_gatherer(const Process &process)
+{
+    const auto matches = [](const std::string &name) {
+        return name.starts_with(kGatherer) && !name.ends_with("_qsee");
+    };
+    return matches(process.name) || (matches(process.script) && process.name.ends_with("sh"));
+}
+
+// Whether that holds for a process, or for one that it comes of.
+template <typename Predicate>
+bool comes_of(const Processes &processes, pid_t pid, const Predicate &predicate)
+{
+    for (std::size_t steps = 0; steps < processes.size(); ++steps) {
+        const auto found = processes.find(pid);
+        if (found == processes.end()) {
+            return false;
+        }
+        if (predicate(*found)) {
+            return true;
+        }
+        pid = found->second.parent;
+    }
+    return false;
+}
+
+bool comes_of_gatherer(const Processes &processes, pid_t pid)
+{
+    return comes_of(processes, pid,
+                    [](const auto &entry) { return is_named_gatherer(entry.second); });
+}
+
+bool comes_of_any(const Processes &processes, pid_t pid, const std::vector<Leftover> &others)
+{
+    return comes_of(processes, pid, [&](const auto &entry) {
+        return std::ranges::any_of(others, [&](const Leftover &other) {
+            return entry.first == other.process || entry.second.group == other.group;
+        });
+    });
+}
+
+} // namespace
+
+bool runs_below(pid_t ancestor, const std::vector<std::string> &items)
+{
+    const auto processes = read_processes();
+    for (const auto &[pid, process] : processes) {
+        if (!lives(process) || !is_below(processes, pid, ancestor)) {
+            continue;
+        }
+        for (const std::string &item : items) {
+            if (!item.empty() && process.name.starts_with(item.substr(0, kStopLimit))) {
+                return true;
+            }
+        }
+    }
+    return false;
+}
+
+std::optional<std::pair<std::string, pid_t>>
+process_of_any(const std::vector<std::string> &programs)
+{
+    for (const auto &[pid, process] : read_processes()) {
+        if (lives(process) && std::ranges::find(programs, process.program) != programs.end()) {
+            return std::pair(process.program, pid);
+        }
+    }
+    return std::nullopt;
+}
+
+std::vector<Leftover> ModuleProcesses::of_items(const std::vector<Leftover> &left_out) const
+{
+    std::vector<Leftover> all;
+    const Processes processes = read_processes();
+    for (const auto &[pid, process] : processes) {
+        if (lives(process) && pid != module_ && process.group != module_ &&
+            is_below(processes, pid, ancestor_) && !comes_of_gatherer(processes, pid) &&
+            !comes_of_any(processes, pid, left_out)) {
+            all.push_back({process.name, pid, process.group});
+        }
+    }
+    return all;
+}
+
+void ModuleProcesses::signal_all(int signal) const
+{
+    const Processes processes = read_processes();
+    for (const auto &[pid, process] : processes) {
+        if (lives(process) && pid != module_ &&
+            (is_below(processes, pid, ancestor_) || comes_of_gatherer(processes, pid))) {
+            kill(pid, signal);
+        }
+    }
+}
+
+bool signal_each(const std::vector<Leftover> &processes, int signal)
+{
+    bool found = false;
+    for (const Leftover &one : processes) {
+        found = kill(one.process, signal) == 0 || found;
+    }
+    return found;
+}
+
+bool ModuleProcesses::has_gatherer() const
+{
+    return !of_gatherer().empty();
+}
+
+std::vector<Leftover> ModuleProcesses::of_gatherer() const
+{
+    std::vector<Leftover> all;
+    const Processes processes = read_processes();
+    for (const auto &[pid, process] : processes) {
+        if (lives(process) && pid != module_ &&
+            (comes_of_gatherer(processes, pid) ||
+             (process.group == module_ && is_below(processes, pid, ancestor_)))) {
+            all.push_back({process.name, pid, process.group});
+        }
+    }
+    return all;
+}
+
+char state_of(pid_t process)
+{
+    const auto found = read_process("/proc/" + std::to_string(process));
+    return found ? found->state : '?';
+}
+
+} // namespace fptest

@@ -1,0 +1,311 @@
+// SPDX-FileCopyrightText: 2026 The Quillmark authors
+// SPDX-License-Identifier: Apache-2.0
+
+#include "module/server.h"
+
+#include "common/descriptor.h"
+#include "module/item_shell.h"
+#include "module/messages.h"
+#include "module/module_process.h"
+#include "module/processes.h"
+#include "plan/plan.h"
+#include "quillmark.h"
+
+#include <array>
+#include <atomic>
+#include <chrono>
+#include <condition_variable>
+#include <csignal>
+#include <cstdio>
+#include <cstdlib>
+#include <fcntl.h>
+#include <mutex>
+#include <sstream>
+#include <string>
+#include <sys/prctl.h>
+#include <sys/resource.h>
+#include <sys/stat.h>
+#include <sys/wait.h>
+#include <thread>
+#include <unistd.h>
+#include <vector>
+
+namespace fptest
+{
+namespace
+{
+
+constexpr std::size_t kReplyRoom = 1025;
+constexpr std::chrono::seconds kGrace{2}; // for items to end when the agent has gone
+
+class Server
+{
+  public:
+    explicit Server(int socket) : socket_(socket)
+    {
+        print_to(*this);
+        tell_item_status([this](int status) { tell_ended(status); });
+    }
+
+    // Ends with the agent, whatever has become of it; an item that is running
+    // then is stopped, so that nothing goes on without anybody who knows.
+    [[noreturn]] void serve()
+    {
+        Message message;
+        while (receive_message(socket_, message)) {
+            switch (message.kind) {
+            case MessageKind::command:
+                start(message.text);
+                break;
+            case MessageKind::stop:
+                answer_stop(message.text);
+                break;
+            case MessageKind::hold:
+                holds_ = true;
+                break;
+            case MessageKind::go_on:
+                leave_item();
+                break;
+            default:
+                answer({MessageKind::plan, read_back()});
+                break;
+            }
+        }
+        // held to the end, so that the command comes to no further item
+        const std::lock_guard lock(mutex_);
+        if (busy_) {
+            stop(items_);
+        }
+        if (busy_ || holds_) {
+            end_items();
+        }
+        _exit(EXIT_SUCCESS);
+    }
+
+  private:
+    void answer(const Message &message)
+    {
+        const std::lock_guard lock(mutex_);
+        send_message(socket_, message);
+    }
+
+    // An item that has been stopped ends at once, but its end is told behind this.
+    void answer_stop(const std::string &item)
+    {
+        const std::lock_guard lock(mutex_);
+        send_message(socket_, {MessageKind::stopped, std::to_string(stop({item}))});
+    }
+
+    // What the module itself prints, "vendor = N" for each item that it comes to,
+    // goes to the agent, which learns by it when the item began and what of the
+    // output was before. The items are started with descriptor 1.
+    static void print_to(Server &server)
+    {
+        std::fflush(stdout);
+#ifdef __BIONIC__
+        std::FILE *own = funopen(
+            &server, nullptr,
+            [](void *user, const char *text, int size) {
+                static_cast<Server *>(user)->tell_item(
+                    std::string(text, static_cast<size_t>(size)));
+                return size;
+            },
+            nullptr, nullptr);
+#else
+        cookie_io_functions_t functions{};
+        functions.write = [](void *user, const char *text, std::size_t size) {
+            static_cast<Server *>(user)->tell_item(std::string(text, size));
+            return static_cast<ssize_t>(size);
+        };
+        std::FILE *own = fopencookie(&server, "w", functions);
+#endif
+        if (own == nullptr) {
+            _exit(EXIT_FAILURE);
+        }
+        std::setvbuf(own, nullptr, _IOLBF, 256);
+        stdout = own;
+    }
+
+    void tell_item(const std::string &line)
+    {
+        const auto number = line.find_first_of("-0123456789");
+        answer({MessageKind::item,
+                moment() + (number == std::string::npos ? "0" : line.substr(number))});
+    }
+
+    // Where that is wanted, the module is held until the agent has read what the item
+    // reported, and looked for what it has left running.
+    void tell_ended(int status)
+    {
+        std::unique_lock lock(mutex_);
+        at_end_ = holds_;
+        send_message(socket_, {MessageKind::ended,
+                               moment() + std::to_string(status) + (has_children() ? " 1" : " 0")});
+        left_.wait(lock, [this] { return !at_end_; });
+    }
+
+    void leave_item()
+    {
+        const std::lock_guard lock(mutex_);
+        at_end_ = false;
+        left_.notify_all();
+    }
+
+    // What an item has left running is this process's own by now. The finished ones
+    // among them, and those that stops have left behind, are nobody's to wait for.
+    static bool has_children()
+    {
+        pid_t child = 0;
+        do {
+            child = waitpid(-1, nullptr, WNOHANG);
+        } while (child > 0);
+        return child == 0;
+    }
+
+    // This moment on the clock that all processes share, and in the output.
+    static std::string moment()
+    {
+        using namespace std::chrono;
+        struct stat output {
+        };
+        fstat(STDOUT_FILENO, &output); // the other one is elsewhere during a stop
+        const auto now = steady_clock::now().time_since_epoch();
+        return std::to_string(duration_cast<nanoseconds>(now).count()) + " " +
+               std::to_string(output.st_size) + " ";
+    }
+
+    // The shell that runs the stop complains of process 9, which its command names
+    // and which is nobody: that is no output of the item's.
+    static int stop(const std::vector<std::string> &items)
+    {
+        if (!runs_below(getpid(), items)) {
+            return Host::kNothingToStop;
+        }
+        const Descriptor output(fcntl(STDERR_FILENO, F_DUPFD_CLOEXEC, 0));
+        const Descriptor null(open("/dev/null", O_WRONLY | O_CLOEXEC));
+        if (!output.is_open() || !null.is_open()) {
+            return FPTEST_SuspendItemExecute();
+        }
+        dup2(null.get(), STDERR_FILENO);
+        const int stopped = FPTEST_SuspendItemExecute();
+        dup2(output.get(), STDERR_FILENO);
+        return stopped;
+    }
+
+    // Again and again, because a script may just be starting another program; and
+    // in the end without asking.
+    static void end_items()
+    {
+        using namespace std::chrono_literals;
+        const ModuleProcesses processes(getpid(), getpid());
+        const auto limit = std::chrono::steady_clock::now() + kGrace;
+        processes.signal_all(SIGCONT); // the run may have been suspended
+        while (signal_each(processes.of_items(),
+                           std::chrono::steady_clock::now() < limit ? SIGTERM : SIGKILL)) {
+            if (std::chrono::steady_clock::now() > limit + kGrace) {
+                return; // not even that helps
+            }
+            std::this_thread::sleep_for(10ms);
+        }
+    }
+
+    // The command and the names of its items, a zero byte between each.
+    void start(const std::string &message)
+    {
+        std::istringstream fields(message);
+        std::string command;
+        std::getline(fields, command, '\0');
+        items_.clear();
+        for (std::string item; std::getline(fields, item, '\0');) {
+            items_.push_back(item);
+        }
+        if (command_.joinable()) {
+            command_.join();
+        }
+        // Nobody else waits for the gatherer and for what stops left behind, and a
+        // finished process of an item's name would be found in place of the item.
+        static_cast<void>(has_children());
+        busy_ = true;
+        command_ = std::thread([this, command] { run(command); });
+    }
+
+    void run(const std::string &command)
+    {
+        std::array<char, kReplyRoom> reply{};
+        FPTEST_RunTestCmd(command.c_str(), reply.data(), static_cast<int>(reply.size()));
+        busy_ = false;
+        answer({MessageKind::returned, moment() + reply.data()});
+    }
+
+    static std::string read_back()
+    {
+        struct stat status {
+        };
+        if (stat(kStoredPlan, &status) != 0 || !S_ISREG(status.st_mode)) {
+            return {}; // what cannot be read is tried again without end
+        }
+        std::string text(static_cast<std::size_t>(status.st_size), '\0');
+        FPTEST_ExtractResultMsg(text.data(), static_cast<int>(text.size()));
+        return text;
+    }
+
+    int socket_;
+    std::mutex mutex_;
+    std::condition_variable left_;
+    bool at_end_ = false; // of an item, and held there
+    std::atomic<bool> holds_ = false;
+    std::thread command_;
+    std::vector<std::string> items_;
+    std::atomic<bool> busy_ = false;
+};
+
+void move_descriptor(int from, int to)
+{
+    if (from != to) {
+        dup2(from, to);
+    } else {
+        fcntl(from, F_SETFD, 0);
+    }
+}
+
+// Signals as in a program that was just started: the items inherit them.
+void reset_signals()
+{
+    for (const int signal : {SIGINT, SIGQUIT, SIGTERM, SIGHUP, SIGTSTP, SIGWINCH}) {
+        std::signal(signal, SIG_DFL);
+    }
+    // not ignored, because items would inherit that
+    std::signal(SIGPIPE, [](int) {});
+    sigset_t none;
+    sigemptyset(&none);
+    sigprocmask(SIG_SETMASK, &none, nullptr);
+}
+
+// The module leaves descriptors open with each trigger and each stop.
+void raise_descriptor_limit()
+{
+    rlimit limit{};
+    if (getrlimit(RLIMIT_NOFILE, &limit) == 0) {
+        limit.rlim_cur = limit.rlim_max;
+        setrlimit(RLIMIT_NOFILE, &limit);
+    }
+}
+
+} // namespace
+
+void serve_module(int socket, int output)
+{
+    reset_signals();
+    raise_descriptor_limit();
+    prctl(PR_SET_CHILD_SUBREAPER, 1); // what an item leaves behind stays below
+    // a suspended agent suspends this process; one that is killed then cannot resume it
+    prctl(PR_SET_PDEATHSIG, SIGCONT);
+    setsid();
+    const int null = open("/dev/null", O_RDONLY | O_CLOEXEC);
+    move_descriptor(null, STDIN_FILENO);
+    move_descriptor(output, STDERR_FILENO);
+    move_descriptor(STDERR_FILENO, STDOUT_FILENO);
+    Server(socket).serve();
+}
+
+} // namespace fptest

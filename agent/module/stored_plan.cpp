@@ -1,0 +1,90 @@
+// SPDX-FileCopyrightText: 2026 The Quillmark authors
+// SPDX-License-Identifier: Apache-2.0
+
+#include "module/stored_plan.h"
+
+#include "plan/plan.h"
+#include "util/failure.h"
+#include "util/files.h"
+#include "util/write.h"
+
+#include <cerrno>
+#include <chrono>
+#include <cstdio>
+#include <cstring>
+#include <fcntl.h>
+#include <sys/file.h>
+#include <sys/stat.h>
+#include <thread>
+
+namespace fptest
+{
+
+std::optional<std::string> read_stored_plan()
+{
+    // an item may have put a FIFO in its place
+    return read_file(kStoredPlan, O_NONBLOCK);
+}
+
+std::string whole_stored_plan()
+{
+    std::string text;
+    for (int tries = 0; tries < 20; ++tries) {
+        text = read_stored_plan().value_or("");
+        if (Plan::read(text) || Plan::load(text)) {
+            break;
+        }
+        std::this_thread::sleep_for(std::chrono::milliseconds(10));
+    }
+    return text;
+}
+
+void mend_stored_plan()
+{
+    if (!mended(read_stored_plan().value_or(""))) {
+        return;
+    }
+    const Descriptor lock = lock_stored_plan();
+    if (const auto text = mended(whole_stored_plan())) {
+        replace_stored_plan(*text);
+    }
+}
+
+Descriptor lock_stored_plan()
+{
+    for (;;) {
+        Descriptor plan(open(kStoredPlan, O_RDONLY | O_NONBLOCK | O_CLOEXEC));
+        if (!plan.is_open()) {
+            return plan;
+        }
+        // one that hangs while it has it is not waited for without end
+        for (int tries = 0; flock(plan.get(), LOCK_EX | LOCK_NB) != 0 && tries < 5000; ++tries) {
+            std::this_thread::sleep_for(std::chrono::milliseconds(2));
+        }
+        // it may have been replaced while this waited
+        struct stat held {
+        };
+        struct stat named {
+        };
+        if (fstat(plan.get(), &held) != 0 || stat(kStoredPlan, &named) != 0 ||
+            (held.st_ino == named.st_ino && held.st_dev == named.st_dev)) {
+            return plan;
+        }
+    }
+}
+
+void replace_stored_plan(const std::string &text)
+{
+    const std::string aside = std::string(kStoredPlan) + ".new";
+    const Descriptor file(open(aside.c_str(), O_WRONLY | O_CREAT | O_TRUNC | O_CLOEXEC, 0666));
+    if (!file.is_open() || write_text(file.get(), text) < text.size() || fsync(file.get()) != 0 ||
+        std::rename(aside.c_str(), kStoredPlan) != 0) {
+        const int error = errno;
+        unlink(aside.c_str());
+        throw Failure(Exit::environment, std::string(kStoredPlan) +
+                                             " cannot be written: " + std::strerror(error) +
+                                             "; the old plan is still there");
+    }
+}
+
+} // namespace fptest

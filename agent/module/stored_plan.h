@@ -1,0 +1,36 @@
+// SPDX-FileCopyrightText: 2026 The Quillmark authors
+// SPDX-License-Identifier: Apache-2.0
+
+// The stored plan, into which items report while it is read.
+#pragma once
+
+#include "common/descriptor.h"
+
+#include <optional>
+#include <string>
+
+namespace fptest
+{
+
+// Its text as it is; nothing where it cannot be read, errno then says why.
+std::optional<std::string> read_stored_plan();
+
+// Its text, read again for a while where somebody is just writing it; then as it is.
+std::string whole_stored_plan();
+
+// Makes one load again that a report has spoiled, so that the next items can
+// report: a result that the module has no text for, or a null description, is left
+// without a value, and control characters and bytes that are no UTF-8 are kept as
+// they came. Throws a Failure where it cannot be written.
+void mend_stored_plan();
+
+// The lock that those who report take on the stored plan, so that none writes
+// what another has just overwritten. Waits for it, 10 seconds at most. A plan that
+// is not there needs none.
+Descriptor lock_stored_plan();
+
+// Puts another text in the stored plan's place, whole or not at all. Throws a
+// Failure where it cannot.
+void replace_stored_plan(const std::string &text);
+
+} // namespace fptest

@@ -1,0 +1,23 @@
+// SPDX-FileCopyrightText: 2026 The Quillmark authors
+// SPDX-License-Identifier: Apache-2.0
+
+#pragma once
+
+#include <optional>
+#include <string>
+
+namespace fptest
+{
+
+// What an item has reported, as it stands in the test plan.
+struct ItemReport {
+    std::optional<std::string> progress;
+    // An attribute without a value is a result that is none of 0, 1 and -2.
+    std::optional<std::string> result;
+    bool result_without_value = false;
+    std::optional<std::string> description;
+
+    bool operator==(const ItemReport &) const = default;
+};
+
+} // namespace fptest

@@ -1,0 +1,294 @@
+// SPDX-FileCopyrightText: 2026 The Quillmark authors
+// SPDX-License-Identifier: Apache-2.0
+
+#include "plan/markup.h"
+
+#include <algorithm>
+#include <charconv>
+
+namespace fptest
+{
+
+namespace
+{
+
+constexpr std::string_view kBlanks = " \t\r\n";
+
+bool is_blank(char c)
+{
+    return kBlanks.find(c) != std::string_view::npos;
+}
+
+// Tags end where Mini-XML sees their end, so that its elements and these tags
+// go together: also at the first '>' of a declaration, and not at the end of a
+// comment that has nothing in it.
+class Scanner
+{
+  public:
+    explicit Scanner(std::string_view text) : text_(text)
+    {
+    }
+
+    std::vector<Tag> scan()
+    {
+        skip_blanks();
+        while (!at_end()) {
+            tag_ = Tag{};
+            tag_.begin = at_;
+            if (text_[at_] == '<') {
+                read_markup();
+                tag_.end = at_;
+            } else {
+                read_text();
+            }
+            tags_.push_back(std::move(tag_));
+            skip_blanks();
+        }
+        return std::move(tags_);
+    }
+
+  private:
+    [[nodiscard]] bool at_end() const
+    {
+        return at_ >= text_.size();
+    }
+    [[nodiscard]] bool looking_at(std::string_view what) const
+    {
+        return text_.compare(at_, what.size(), what) == 0;
+    }
+    [[nodiscard]] bool looking_at_any(std::string_view characters) const
+    {
+        return !at_end() && characters.find(text_[at_]) != std::string_view::npos;
+    }
+
+    void skip_blanks()
+    {
+        at_ = std::min(text_.find_first_not_of(kBlanks, at_), text_.size());
+    }
+
+    // Passes over what comes before the first of these characters, and gives it.
+    std::string read_until_any(std::string_view characters)
+    {
+        const std::size_t begin = at_;
+        at_ = std::min(text_.find_first_of(characters, at_), text_.size());
+        return std::string(text_.substr(begin, at_ - begin));
+    }
+
+    // Ends the tag behind the next such text.
+    void end_behind(std::string_view mark, std::size_t from)
+    {
+        const std::size_t place = text_.find(mark, from);
+        tag_.complete = place != text_.npos;
+        at_ = tag_.complete ? place + mark.size() : text_.size();
+    }
+
+    void read_text()
+    {
+        tag_.kind = Tag::Kind::text;
+        at_ = std::min(text_.find('<', at_), text_.size());
+        tag_.end = at_;
+        while (is_blank(text_[tag_.end - 1])) {
+            --tag_.end;
+        }
+    }
+
+    void read_markup()
+    {
+        if (looking_at("<!--")) {
+            tag_.kind = Tag::Kind::comment;
+            read_comment();
+        } else if (looking_at("<![CDATA[")) {
+            tag_.kind = Tag::Kind::cdata;
+            end_behind("]]>", at_ + 9);
+        } else if (looking_at("<!")) {
+            tag_.kind = Tag::Kind::declaration;
+            end_behind(">", at_ + 2);
+        } else if (looking_at("<?")) {
+            read_instruction();
+        } else if (looking_at("</")) {
+            tag_.kind = Tag::Kind::close;
+            at_ += 2;
+            tag_.name = read_until_any(" \t\r\n/><");
+            end_behind(">", at_);
+        } else {
+            read_element();
+        }
+    }
+
+    void read_comment()
+    {
+        std::size_t end = text_.find("-->", at_ + 4);
+        while (end != text_.npos && text_[end - 1] == '-') {
+            end = text_.find("-->", end + 1);
+        }
+        tag_.complete = end != text_.npos;
+        at_ = tag_.complete ? end + 3 : text_.size();
+    }
+
+    void read_instruction()
+    {
+        tag_.kind = Tag::Kind::instruction;
+        const std::size_t begin = at_;
+        at_ += 2;
+        tag_.name = read_until_any(" \t\r\n?>");
+        end_behind("?>", begin + 1);
+    }
+
+    void read_element()
+    {
+        tag_.kind = Tag::Kind::open;
+        ++at_;
+        tag_.name = read_until_any(" \t\r\n/><");
+        for (;;) {
+            skip_blanks();
+            if (at_end() || looking_at("<")) {
+                tag_.complete = false;
+                return;
+            }
+            if (looking_at(">")) {
+                ++at_;
+                return;
+            }
+            if (looking_at("/>") || looking_at("?>")) {
+                tag_.kind = Tag::Kind::empty;
+                at_ += 2;
+                return;
+            }
+            if (looking_at_any("/?")) {
+                ++at_;
+            } else {
+                read_attribute();
+            }
+        }
+    }
+
+    void read_attribute()
+    {
+        Attribute attribute;
+        attribute.begin = at_;
+        if (looking_at_any("\"'")) {
+            const std::size_t close = text_.find(text_[at_], at_ + 1);
+            at_ = close != text_.npos ? close + 1 : text_.size();
+        } else {
+            // the first character, whatever it is, so that it goes on
+            at_ = std::min(text_.find_first_of(" \t\r\n=/>?", at_ + 1), text_.size());
+        }
+        attribute.name = text_.substr(attribute.begin, at_ - attribute.begin);
+        attribute.end = at_;
+        skip_blanks();
+        if (looking_at("=")) {
+            ++at_;
+            skip_blanks();
+            read_value(attribute);
+        }
+        tag_.attributes.push_back(std::move(attribute));
+    }
+
+    void read_value(Attribute &attribute)
+    {
+        attribute.has_value = true;
+        if (looking_at_any("\"'")) {
+            attribute.value_begin = at_ + 1;
+            const std::size_t close = text_.find(text_[at_], at_ + 1);
+            attribute.value_end = std::min(close, text_.size());
+            at_ = close != text_.npos ? close + 1 : text_.size();
+        } else {
+            attribute.value_begin = at_;
+            at_ = std::min(text_.find_first_of(" \t\r\n=/>", at_ + 1), text_.size());
+            attribute.value_end = at_;
+        }
+        attribute.end = at_;
+    }
+
+    std::string_view text_;
+    std::size_t at_ = 0;
+    Tag tag_;
+    std::vector<Tag> tags_;
+};
+
+bool is_continuation(char byte)
+{
+    return (static_cast<unsigned char>(byte) & 0xC0) == 0x80;
+}
+
+// Bytes of the character there; 1 for what is no UTF-8.
+std::size_t character_length(std::string_view text, std::size_t at)
+{
+    const auto lead = static_cast<unsigned char>(text[at]);
+    const std::size_t length = lead >= 0xF0 ? 4 : lead >= 0xE0 ? 3 : lead >= 0xC2 ? 2 : 1;
+    for (std::size_t i = 1; i < length; ++i) {
+        if (at + i >= text.size() || !is_continuation(text[at + i])) {
+            return 1;
+        }
+    }
+    return length;
+}
+
+// Bytes of UTF-8 that an entity stands for, from its '&' to its ';'.
+std::size_t entity_length(std::string_view entity)
+{
+    if (!entity.starts_with("&#")) {
+        return 1;
+    }
+    const bool is_hexadecimal = entity.starts_with("&#x");
+    unsigned long code = 0;
+    std::from_chars(entity.data() + (is_hexadecimal ? 3 : 2), entity.data() + entity.size() - 1,
+                    code, is_hexadecimal ? 16 : 10);
+    return code < 0x80 ? 1 : code < 0x800 ? 2 : code < 0x10000 ? 3 : 4;
+}
+
+} // namespace
+
+std::vector<Tag> scan(std::string_view text)
+{
+    return Scanner(text).scan();
+}
+
+std::size_t place_in_value(std::string_view text, const Attribute &attribute, std::size_t byte)
+{
+    std::size_t at = attribute.value_begin;
+    while (at < attribute.value_end) {
+        const std::string_view left = text.substr(at, attribute.value_end - at);
+        std::size_t taken = 1;
+        std::size_t read = 1;
+        if (left.starts_with(kByteOrderMark)) { // it is left out anywhere
+            taken = kByteOrderMark.size();
+            read = 0;
+        } else if (left.starts_with('&') && left.find(';') != left.npos) {
+            taken = left.find(';') + 1;
+            read = entity_length(left.substr(0, taken));
+        }
+        if (byte < read) {
+            break;
+        }
+        byte -= read;
+        at += taken;
+    }
+    return at;
+}
+
+Positions::Positions(std::string_view text) : text_(text)
+{
+    last_.begin = text.starts_with(kByteOrderMark) ? kByteOrderMark.size() : 0;
+}
+
+Position Positions::of(std::size_t offset)
+{
+    offset = std::min(offset, text_.size());
+    if (offset < last_.begin) {
+        *this = Positions(text_);
+    }
+    while (last_.begin < offset) {
+        const std::size_t end = last_.begin + character_length(text_, last_.begin);
+        if (end > offset) {
+            break;
+        }
+        const bool is_line_end = text_[last_.begin] == '\n';
+        last_.line += is_line_end ? 1 : 0;
+        last_.column = is_line_end ? 1 : last_.column + 1;
+        last_.begin = end;
+    }
+    return last_;
+}
+
+} // namespace fptest

@@ -1,0 +1,610 @@
+// SPDX-FileCopyrightText: 2026 The Quillmark authors
+// SPDX-License-Identifier: Apache-2.0
+
+#include "plan/plan.h"
+
+#include "common/descriptor.h"
+#include "util/text.h"
+
+#include <algorithm>
+#include <cctype>
+#include <cerrno>
+#include <cstdlib>
+#include <cstring>
+#include <sys/mman.h>
+#include <sys/syscall.h>
+#include <system_error>
+#include <unistd.h>
+#include <utility>
+
+namespace fptest
+{
+
+namespace
+{
+
+// --- text as the module cuts it ---------------------------------------------
+
+constexpr std::size_t kPathLimit = 2047;
+constexpr std::size_t kProgramLimit = 1023; // characters of a name that are run
+constexpr char kBlanks[] = " \t\n\v\f\r";
+
+std::string up_to_any(std::string_view text, std::string_view ends)
+{
+    return std::string(text.substr(0, text.find_first_of(ends)));
+}
+
+// The name as it is run, without a suffix.
+std::string program_name(std::string_view name)
+{
+    return up_to_any(name.substr(0, kProgramLimit), std::string_view("\t\n\0", 3));
+}
+
+// The components that the module sees in the path of this group, or of this
+// item. A name that holds a '/' is two, an empty one is none.
+std::vector<std::string> components(const std::string &names)
+{
+    const std::string path =
+        up_to_any(("root/" + names).substr(0, kPathLimit), std::string_view(":\t\n\0", 4));
+    std::vector<std::string> parts;
+    std::size_t at = path.find_first_not_of('/');
+    while (at != path.npos) {
+        const std::size_t end = std::min(path.find('/', at), path.size());
+        parts.push_back(path.substr(at, std::min(end - at, kNameLimit)));
+        at = path.find_first_not_of('/', end);
+    }
+    return parts;
+}
+
+// --- Mini-XML ---------------------------------------------------------------
+
+// What the library says while this exists, which it would print otherwise.
+class LibraryErrors
+{
+  public:
+    LibraryErrors()
+    {
+        first().clear();
+        mxmlSetErrorCallback([](const char *message) {
+            if (first().empty()) {
+                first() = message;
+            }
+        });
+    }
+    LibraryErrors(const LibraryErrors &) = delete;
+    LibraryErrors &operator=(const LibraryErrors &) = delete;
+    ~LibraryErrors()
+    {
+        mxmlSetErrorCallback(nullptr);
+    }
+
+    static std::string &first()
+    {
+        thread_local std::string message;
+        return message;
+    }
+};
+
+// The library counts a line end that it has read ahead: its line is not always the
+// one that is meant.
+std::string without_line(std::string message)
+{
+    constexpr std::string_view kLine = " on line ";
+    if (const std::size_t begin = message.find(kLine); begin != message.npos) {
+        const std::size_t end = message.find_first_not_of("0123456789", begin + kLine.size());
+        message.erase(begin, std::min(end, message.size()) - begin);
+    }
+    return message;
+}
+
+[[noreturn]] void throw_error(const char *what)
+{
+    throw std::system_error(errno, std::generic_category(), what);
+}
+
+// A descriptor that reads this text: the library takes a text in memory for
+// ended where a file is not, and reads behind the end of one in UTF-16.
+Descriptor descriptor_of(std::string_view text)
+{
+    Descriptor file(static_cast<int>(syscall(SYS_memfd_create, "fptest-plan", MFD_CLOEXEC)));
+    if (file.get() < 0) {
+        throw_error("no memory for a test plan");
+    }
+    while (!text.empty()) {
+        const ssize_t written = write(file.get(), text.data(), text.size());
+        if (written < 0) {
+            throw_error("no memory for a test plan");
+        }
+        text.remove_prefix(static_cast<std::size_t>(written));
+    }
+    if (lseek(file.get(), 0, SEEK_SET) != 0) {
+        throw_error("no memory for a test plan");
+    }
+    return file;
+}
+
+bool is_element(mxml_node_t *node)
+{
+    return mxmlGetType(node) == MXML_ELEMENT;
+}
+
+bool is_lone_whitespace(mxml_node_t *node)
+{
+    if (mxmlGetType(node) != MXML_TEXT) {
+        return false;
+    }
+    const char *text = mxmlGetText(node, nullptr);
+    return text[std::strspn(text, kBlanks)] == '\0';
+}
+
+std::optional<std::string> attribute(mxml_node_t *node, const char *name)
+{
+    const char *value = mxmlElementGetAttr(node, name);
+    return value != nullptr ? std::optional<std::string>(value) : std::nullopt;
+}
+
+bool has_valueless(mxml_node_t *node, const char *name)
+{
+    const char *found = nullptr;
+    for (int index = 0; index < mxmlElementGetAttrCount(node); ++index) {
+        const char *value = mxmlElementGetAttrByIndex(node, index, &found);
+        if (std::strcmp(found, name) == 0) {
+            return value == nullptr;
+        }
+    }
+    return false;
+}
+
+bool has_name(mxml_node_t *node)
+{
+    const char *name = mxmlElementGetAttr(node, "name");
+    return name != nullptr && *name != '\0';
+}
+
+// --- reading what is being written -------------------------------------------
+
+bool makes_element(const Tag &tag)
+{
+    return tag.kind != Tag::Kind::close && tag.kind != Tag::Kind::text;
+}
+
+// Whether the text goes on to the end of its first element.
+bool is_whole(const std::vector<Tag> &tags)
+{
+    std::size_t depth = 0;
+    for (const Tag &tag : tags) {
+        depth += tag.kind == Tag::Kind::open ? 1 : 0;
+        depth -= tag.kind == Tag::Kind::close && depth > 0 ? 1 : 0;
+        if (depth == 0 && (tag.kind == Tag::Kind::close || tag.kind == Tag::Kind::empty)) {
+            return tag.complete;
+        }
+    }
+    return false;
+}
+
+std::string with_values(std::string_view text, const std::vector<Tag> &tags)
+{
+    std::string repaired;
+    std::size_t done = 0;
+    for (const Tag &tag : tags) {
+        for (const Attribute &place : tag.attributes) {
+            if (!place.has_value) {
+                repaired += text.substr(done, place.end - done);
+                repaired += "=\"\"";
+                done = place.end;
+            }
+        }
+    }
+    return repaired += text.substr(done);
+}
+
+bool belongs(const Tag &tag, mxml_node_t *node)
+{
+    const std::string_view name = mxmlGetElement(node);
+    switch (tag.kind) {
+    case Tag::Kind::open:
+    case Tag::Kind::empty:
+        return name == tag.name;
+    case Tag::Kind::comment:
+        return name.substr(0, 3) == "!--";
+    case Tag::Kind::cdata:
+        return name.substr(0, 8) == "![CDATA[";
+    case Tag::Kind::instruction:
+        return name.substr(0, 1) == "?";
+    case Tag::Kind::declaration:
+        return name.substr(0, 1) == "!";
+    case Tag::Kind::close:
+    case Tag::Kind::text:
+        break;
+    }
+    return false;
+}
+
+} // namespace
+
+// --- what the module makes of texts -------------------------------------------
+
+std::string stored_part(std::string_view text)
+{
+    text.remove_prefix(std::min(text.find_first_not_of(':'), text.size()));
+    return up_to_any(text, std::string_view(":\0", 2)).substr(0, kPlanLimit);
+}
+
+std::optional<std::string> vendor_suffix(int vendor)
+{
+    switch (vendor) {
+    case 0:
+        return "";
+    case 1:
+        return "_ca";
+    case 2:
+        return "_ca_qsee";
+    default:
+        return std::nullopt;
+    }
+}
+
+bool is_gatherer(std::string_view name, int vendor)
+{
+    return (vendor == 0 || vendor == 1) && program_name(name) == kGatherer;
+}
+
+std::string program_of(std::string_view name, std::string_view suffix)
+{
+    std::string program = program_name(name);
+    program += suffix.substr(0, kCommandLimit - program.size());
+    return "/system/bin/" + program;
+}
+
+bool is_plain_name(std::string_view name)
+{
+    return std::ranges::all_of(name, [](unsigned char c) {
+        return std::isalnum(c) != 0 || c >= 0x80 || std::strchr("_-.,+@%", c) != nullptr;
+    });
+}
+
+std::string command_line(std::string_view name, const std::optional<std::string> &args,
+                         std::string_view suffix)
+{
+    return program_of(name, suffix) + " " + args.value_or("(null)");
+}
+
+// --- plans ----------------------------------------------------------------------
+
+std::optional<Plan> Plan::load(const std::string &text, std::string *why)
+{
+    const Descriptor file = descriptor_of(text);
+    const LibraryErrors errors;
+    Tree tree(mxmlLoadFd(nullptr, file.get(), nullptr), &mxmlDelete);
+    if (!tree) {
+        if (why != nullptr) {
+            *why = !errors.first().empty() ? without_line(errors.first())
+                   : text.empty()          ? "it is empty"
+                                           : "a tag in it is broken off or malformed";
+        }
+        return std::nullopt;
+    }
+    return Plan(std::move(tree));
+}
+
+Plan::Plan(Tree tree) : tree_(std::move(tree))
+{
+    mxml_node_t *node = tree_.get();
+    while (node != nullptr) {
+        mxml_node_t *next = mxmlWalkNext(node, top(), MXML_DESCEND);
+        if (is_lone_whitespace(node)) {
+            mxmlDelete(node);
+        } else if (is_element(node)) {
+            elements_.push_back(node);
+        }
+        node = next;
+    }
+    note_names();
+    note_positions();
+}
+
+// The library finds an element by going through the whole tree, and a position by
+// going from node to node: too slow for asking after every item of a long plan.
+void Plan::note_names()
+{
+    for (mxml_node_t *&place : elements_) {
+        mxmlSetUserData(place, &place);
+        const std::string_view tag = mxmlGetElement(place);
+        const char *name = mxmlElementGetAttr(place, "name");
+        if (place == top()) {
+            continue; // every search begins below it
+        }
+        if (tag == "CmdGroup" && name != nullptr) {
+            groups_.try_emplace(name, place);
+        }
+        if (tag == "Cmd") {
+            items_.push_back(number(place));
+            if (name != nullptr) {
+                items_named_[name].push_back(items_.back());
+            }
+        }
+    }
+}
+
+void Plan::note_positions()
+{
+    children_.resize(elements_.size());
+    positions_.resize(elements_.size());
+    for (std::size_t parent = 0; parent < elements_.size(); ++parent) {
+        for (mxml_node_t *child = mxmlGetFirstChild(elements_[parent]); child != nullptr;
+             child = mxmlGetNextSibling(child)) {
+            if (is_element(child)) {
+                positions_[number(child)] = children_[parent].size();
+            }
+            children_[parent].push_back(child);
+        }
+    }
+}
+
+std::string as_loaded(const std::string &value)
+{
+    const std::unique_ptr<mxml_node_t, decltype(&mxmlDelete)> node(
+        mxmlNewElement(MXML_NO_PARENT, "Cmd"), &mxmlDelete);
+    mxmlElementSetAttr(node.get(), "name", value.c_str());
+    const std::unique_ptr<char, decltype(&std::free)> saved(
+        mxmlSaveAllocString(node.get(), MXML_NO_CALLBACK), &std::free);
+    const auto plan = saved ? Plan::load(saved.get()) : std::nullopt;
+    return plan ? attribute(plan->top(), "name").value_or("") : value;
+}
+
+std::optional<Plan> Plan::read(std::string_view text)
+{
+    const std::string cleaned = clean(text);
+    const std::vector<Tag> tags = scan(cleaned);
+    if (!is_whole(tags)) {
+        return std::nullopt;
+    }
+    std::optional<Plan> plan = load(with_values(cleaned, tags));
+    if (!plan) {
+        return std::nullopt;
+    }
+    // as the module has them in its tree: these two it leaves without a value
+    const std::vector<Tag> places = element_tags(*plan, cleaned);
+    for (std::size_t number = 0; number < places.size(); ++number) {
+        for (const Attribute &place : places[number].attributes) {
+            if (!place.has_value && (place.name == "result" || place.name == "description")) {
+                mxmlElementSetAttr(plan->elements_[number], place.name.c_str(), nullptr);
+            }
+        }
+    }
+    return plan;
+}
+
+mxml_node_t *Plan::top() const
+{
+    return tree_.get();
+}
+
+const std::vector<mxml_node_t *> &Plan::elements() const
+{
+    return elements_;
+}
+
+std::size_t Plan::number(mxml_node_t *node) const
+{
+    const auto *place = static_cast<mxml_node_t **>(mxmlGetUserData(node));
+    return static_cast<std::size_t>(place - elements_.data());
+}
+
+ItemReport Plan::report(std::size_t number) const
+{
+    ItemReport report;
+    if (number < elements_.size()) {
+        mxml_node_t *const node = elements_[number];
+        report.progress = attribute(node, "progress");
+        report.result = attribute(node, "result");
+        report.result_without_value = has_valueless(node, "result");
+        report.description = attribute(node, "description");
+    }
+    return report;
+}
+
+Plan::Element Plan::element(mxml_node_t *node) const
+{
+    Element element;
+    element.tag = mxmlGetElement(node);
+    element.name = attribute(node, "name");
+    element.args = attribute(node, "args");
+    element.number = number(node);
+    element.report = report(element.number);
+    return element;
+}
+
+std::vector<Plan::Group> Plan::groups() const
+{
+    std::vector<Group> groups;
+    for (mxml_node_t *node = top(); node != nullptr;) {
+        node = mxmlFindElement(node, top(), "CmdGroup", "name", nullptr, MXML_DESCEND);
+        if (node == nullptr || !has_name(node)) {
+            continue;
+        }
+        Group group;
+        group.name = mxmlElementGetAttr(node, "name");
+        group.number = number(node);
+        for (mxml_node_t *child = mxmlGetFirstChild(node); child != nullptr;
+             child = mxmlGetNextSibling(child)) {
+            if (is_element(child) && has_name(child) &&
+                std::strcmp(mxmlGetElement(child), "Cmd") == 0) {
+                group.items.push_back(element(child));
+            }
+        }
+        groups.push_back(std::move(group));
+    }
+    return groups;
+}
+
+mxml_node_t *Plan::find_group(const std::string &group) const
+{
+    const auto found = groups_.find(group);
+    return found != groups_.end() ? found->second : nullptr;
+}
+
+mxml_node_t *Plan::behind(mxml_node_t *group, const Numbers &items) const
+{
+    const auto found = std::upper_bound(items.begin(), items.end(), number(group));
+    return found != items.end() ? elements_[*found] : nullptr;
+}
+
+std::vector<std::optional<Plan::Element>> Plan::run_by(const std::string &group) const
+{
+    const std::vector<std::string> path = components(group);
+    if (path.size() > 2) {
+        return {run_item(path[1], path[2])};
+    }
+    return path.size() == 2 ? run_group(path[1]) : std::vector<std::optional<Element>>();
+}
+
+std::optional<Plan::Element> Plan::run_by(const std::string &group, const std::string &item) const
+{
+    const std::vector<std::string> path = components(group + "/" + item);
+    return path.size() > 2 ? run_item(path[1], path[2]) : std::nullopt;
+}
+
+std::vector<std::optional<Plan::Element>> Plan::run_group(const std::string &name) const
+{
+    std::vector<std::optional<Element>> run;
+    mxml_node_t *const group = find_group(name);
+    if (group == nullptr) {
+        return run;
+    }
+    mxml_node_t *item = behind(group, items_); // the first item, of whatever group
+    for (mxml_node_t *child = mxmlGetFirstChild(group); child != nullptr;
+         child = mxmlGetNextSibling(child)) {
+        run.push_back(item != nullptr && has_name(item) ? std::optional(element(item))
+                                                        : std::nullopt);
+        item = mxmlGetNextSibling(item);
+    }
+    return run;
+}
+
+std::optional<Plan::Element> Plan::run_item(const std::string &group, const std::string &name) const
+{
+    mxml_node_t *const start = find_group(group);
+    const auto places = items_named_.find(name);
+    if (start == nullptr || places == items_named_.end()) {
+        return std::nullopt;
+    }
+    mxml_node_t *const named = behind(start, places->second);
+    if (named == nullptr) {
+        return std::nullopt;
+    }
+    // as many steps from the first item as the named one is behind its siblings
+    mxml_node_t *const first = behind(start, items_);
+    const auto &siblings = children_[number(mxmlGetParent(first))];
+    const std::size_t position = positions_[number(first)] + positions_[number(named)];
+    return position < siblings.size() && has_name(siblings[position])
+               ? std::optional(element(siblings[position]))
+               : std::nullopt;
+}
+
+// --- texts of plans -------------------------------------------------------------
+
+std::vector<Tag> element_tags(const Plan &plan, std::string_view text)
+{
+    std::vector<Tag> tags = scan(text);
+    std::erase_if(tags, [](const Tag &tag) { return !makes_element(tag); });
+    const auto &elements = plan.elements();
+    return std::equal(tags.begin(), tags.end(), elements.begin(), elements.end(), belongs)
+               ? tags
+               : std::vector<Tag>();
+}
+
+namespace
+{
+
+// Copies a text, leaving out attributes with the blanks in front of them.
+class Cutter
+{
+  public:
+    explicit Cutter(const std::string &text) : text_(text)
+    {
+    }
+    void cut(const Attribute &place, const std::string &replacement)
+    {
+        const std::size_t end = text_.find_last_not_of(kBlanks, place.begin - 1) + 1;
+        left_.append(text_, done_, end - done_);
+        left_ += replacement;
+        done_ = place.end;
+    }
+    std::string rest()
+    {
+        return left_.append(text_, done_);
+    }
+
+  private:
+    const std::string &text_;
+    std::string left_;
+    std::size_t done_ = 0;
+};
+
+// The tags of the text's elements; nothing where it is not whole.
+std::optional<std::vector<Tag>> whole_tags(const std::string &text)
+{
+    const std::optional<Plan> plan = Plan::read(text);
+    return plan ? std::optional(element_tags(*plan, text)) : std::nullopt;
+}
+
+} // namespace
+
+std::optional<ClearedPlan> without_reports(const std::string &text,
+                                           const std::vector<std::size_t> &numbers,
+                                           const std::string &mark)
+{
+    const auto tags = whole_tags(text);
+    if (!tags) {
+        return std::nullopt;
+    }
+    ClearedPlan cleared;
+    Cutter cutter(text);
+    for (std::size_t number = 0; number < tags->size(); ++number) {
+        if (std::find(numbers.begin(), numbers.end(), number) == numbers.end()) {
+            continue;
+        }
+        bool marked = false;
+        for (const Attribute &place : (*tags)[number].attributes) {
+            if (place.name == "progress" || place.name == "result" || place.name == "description" ||
+                place.name == kMark) {
+                cutter.cut(place, marked ? "" : std::string(" ") + kMark + "=\"" + mark + "\"");
+                marked = true;
+            }
+        }
+        if (marked) {
+            cleared.marked.push_back(number);
+        }
+    }
+    cleared.text = cutter.rest();
+    return cleared;
+}
+
+std::optional<std::string> mended(const std::string &text)
+{
+    if (Plan::load(text) || !Plan::read(text)) {
+        return std::nullopt;
+    }
+    const std::string cleaned = clean(text);
+    return with_values(cleaned, scan(cleaned));
+}
+
+std::optional<std::string> without_marks(const std::string &text)
+{
+    const auto tags = whole_tags(text);
+    if (!tags) {
+        return std::nullopt;
+    }
+    Cutter cutter(text);
+    for (const Tag &tag : *tags) {
+        for (const Attribute &place : tag.attributes) {
+            if (place.name == kMark) {
+                cutter.cut(place, "");
+            }
+        }
+    }
+    return cutter.rest();
+}
+
+} // namespace fptest

@@ -1,0 +1,159 @@
+// SPDX-FileCopyrightText: 2026 The Quillmark authors
+// SPDX-License-Identifier: Apache-2.0
+
+// Test plans as the module sees them: the same library loads them, and the same
+// lookups tell which item a command really runs.
+#pragma once
+
+#include "plan/item_report.h"
+#include "plan/markup.h"
+
+#include <cstddef>
+#include <memory>
+#include <mxml.h>
+#include <optional>
+#include <string>
+#include <string_view>
+#include <unordered_map>
+#include <vector>
+
+namespace fptest
+{
+
+inline constexpr char kStoredPlan[] = "/data/vorlane/src1.xml";
+inline constexpr std::size_t kPlanLimit = 2048;    // bytes that a command stores of a plan
+inline constexpr std::size_t kPathLimit = 2047;    // bytes of a node path
+inline constexpr std::size_t kNameLimit = 63;      // characters of a name in a node path
+inline constexpr std::size_t kStopLimit = 28;      // characters of a name that ps is asked for
+inline constexpr std::size_t kCommandLimit = 1024; // characters of an item's command line
+inline constexpr char kGatherer[] = "SensorProbe";
+inline constexpr unsigned short kTriggerPort = 34952;
+
+// What an "XMLFile" command stores of this text: it ends at the first ':' (those
+// at its very start are passed over) or zero byte, and holds 2048 bytes at most.
+std::string stored_part(std::string_view text);
+
+// "", "_ca" or "_ca_qsee"; nothing for a vendor that runs no item.
+std::optional<std::string> vendor_suffix(int vendor);
+
+// Whether the item of that name is started in the background and triggered.
+bool is_gatherer(std::string_view name, int vendor);
+
+// The program of an item: the module cuts its name at a tab or line feed.
+std::string program_of(std::string_view name, std::string_view suffix);
+
+// Whether the shell takes the name as it stands; else the program is another one.
+bool is_plain_name(std::string_view name);
+
+// The command line that the module runs for an item, whole; it runs the first
+// 1024 characters.
+std::string command_line(std::string_view name, const std::optional<std::string> &args,
+                         std::string_view suffix);
+
+class Plan
+{
+  public:
+    // One element, as the module reads it.
+    struct Element {
+        std::string tag;                 // "Cmd" for an item
+        std::optional<std::string> name; // nothing where it has no such attribute
+        std::optional<std::string> args;
+        ItemReport report;
+        std::size_t number = 0; // among all elements of the document, comments included
+    };
+
+    // Nothing where the library does not load it; why then says what it has
+    // against it, in the library's words.
+    static std::optional<Plan> load(const std::string &text, std::string *why = nullptr);
+
+    // As load(), but for reading results: control characters and bytes that are
+    // no UTF-8 are made visible first, and attributes may lack their value.
+    // Nothing where the text is not whole, as while it is being written.
+    static std::optional<Plan> read(std::string_view text);
+
+    struct Group {
+        std::string name;
+        std::vector<Element> items; // its direct children named Cmd
+        std::size_t number = 0;
+    };
+    // In document order; groups and items without a name are left out.
+    std::vector<Group> groups() const;
+
+    // The first group of that name; null where there is none.
+    mxml_node_t *find_group(const std::string &group) const;
+
+    // What the module runs for root/group: an entry for each of its calls,
+    // nothing where a call would find nothing to run. The path is taken as the
+    // module takes it: a '/' in the name makes one of an item.
+    std::vector<std::optional<Element>> run_by(const std::string &group) const;
+
+    // What the module runs for root/group/item, nothing where that is nothing.
+    std::optional<Element> run_by(const std::string &group, const std::string &item) const;
+
+    // Every element of the document in order, comments and the like included.
+    const std::vector<mxml_node_t *> &elements() const;
+
+    // What an element has reported.
+    ItemReport report(std::size_t number) const;
+
+    // The place of an element of this plan in that order.
+    std::size_t number(mxml_node_t *node) const;
+
+    mxml_node_t *top() const;
+
+  private:
+    using Tree = std::unique_ptr<mxml_node_t, void (*)(mxml_node_t *)>;
+    using Numbers = std::vector<std::size_t>;
+
+    explicit Plan(Tree tree);
+
+    void note_names();
+    void note_positions();
+    Element element(mxml_node_t *node) const;
+    // The first of these behind the start of that group.
+    mxml_node_t *behind(mxml_node_t *group, const Numbers &items) const;
+    std::vector<std::optional<Element>> run_group(const std::string &name) const;
+    std::optional<Element> run_item(const std::string &group, const std::string &name) const;
+
+    Tree tree_;
+    std::vector<mxml_node_t *> elements_;
+    std::vector<std::vector<mxml_node_t *>> children_;      // of each element
+    Numbers positions_;                                     // of each element, among its siblings
+    std::unordered_map<std::string, mxml_node_t *> groups_; // the first of each name
+    Numbers items_;
+    std::unordered_map<std::string, Numbers> items_named_;
+};
+
+// An attribute's value as the library gives it back once it is saved: it drops
+// characters that it writes.
+std::string as_loaded(const std::string &value);
+
+// The tags that a plan's elements were read from, in the same order; none where
+// the text has others than the library has seen.
+std::vector<Tag> element_tags(const Plan &plan, std::string_view text);
+
+// An attribute by which an item's element is known to be as fptest has left it: a
+// process that saves an old copy of the plan brings back one without.
+inline constexpr char kMark[] = "fptest-run";
+
+struct ClearedPlan {
+    std::string text;
+    std::vector<std::size_t> marked; // the elements that got the mark
+};
+
+// The text without the progress, result and description of these elements, which
+// get the mark in their place; otherwise byte for byte as it was. Nothing where
+// the text is not whole.
+std::optional<ClearedPlan> without_reports(const std::string &text,
+                                           const std::vector<std::size_t> &numbers,
+                                           const std::string &mark);
+
+// The text made loadable, where it is whole but does not load: attributes without a
+// value get an empty one, what no plan can hold is made visible. Nothing where it
+// need not or cannot be done.
+std::optional<std::string> mended(const std::string &text);
+
+// The text without any marks. Nothing where it is not whole.
+std::optional<std::string> without_marks(const std::string &text);
+
+} // namespace fptest

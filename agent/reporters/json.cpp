@@ -1,0 +1,256 @@
+// SPDX-FileCopyrightText: 2026 The Quillmark authors
+// SPDX-License-Identifier: Apache-2.0
+
+#include "reporters/reporters.h"
+
+#include "reporters/wording.h"
+#include "reporters/writer.h"
+#include "util/text.h"
+
+#include <cmath>
+#include <fcntl.h>
+#include <nlohmann/json.hpp>
+#include <optional>
+#include <unistd.h>
+#include <utility>
+#include <vector>
+
+namespace fptest
+{
+
+namespace
+{
+
+using Json = nlohmann::ordered_json;
+
+constexpr int kFormat = 2; // one more whenever a reader would have to be changed
+
+Json text_or_null(const std::optional<std::string> &text)
+{
+    return text ? Json(clean(*text)) : Json();
+}
+
+Json words_or_null(const std::string &words)
+{
+    return words.empty() ? Json() : Json(clean(words));
+}
+
+// In milliseconds: the digits behind them are noise.
+Json seconds_or_null(const std::optional<double> &seconds)
+{
+    return seconds ? Json(std::round(*seconds * 1000) / 1000) : Json();
+}
+
+Json event(const char *name)
+{
+    return {{"event", name}};
+}
+
+void add_report(Json &json, const ItemReport &report)
+{
+    json["progress"] = text_or_null(report.progress);
+    json["result"] = report.result_without_value ? Json("") : text_or_null(report.result);
+    json["description"] = text_or_null(report.description);
+}
+
+Json start_of(const ItemRun &item)
+{
+    return item.start ? Json(timestamp(*item.start)) : Json();
+}
+
+// How its process ended.
+void add_end(Json &json, const ItemRun &item)
+{
+    json["exit_status"] = item.exit_status ? Json(*item.exit_status) : Json();
+    json["signal"] = item.signal != 0 ? Json(name_of_signal(item.signal)) : Json();
+    Json left = Json::array();
+    for (const Leftover &one : item.left_running) {
+        left.push_back({{"name", clean(one.name)}, {"pid", one.process}});
+    }
+    json["left_running"] = std::move(left);
+}
+
+Json summary_of(const Run &run)
+{
+    Json items = Json::array();
+    for (const Summary &one : run.summary) {
+        const Times &times = one.times;
+        Json json = {{"group", clean(one.group)},
+                     {"item", clean(one.name)},
+                     {"run", times.count()},
+                     {"passed", one.passed}};
+        const bool is_run = times.count() > 0;
+        json["least"] = is_run ? seconds_or_null(times.least()) : Json();
+        json["median"] = is_run ? seconds_or_null(times.median()) : Json();
+        json["longest"] = is_run ? seconds_or_null(times.longest()) : Json();
+        items.push_back(std::move(json));
+    }
+    return items;
+}
+
+class JsonReport : public Listener
+{
+  public:
+    explicit JsonReport(std::string path) : path_(std::move(path))
+    {
+    }
+
+    void begin(const Run &run) override
+    {
+        if (path_ == "-") {
+            writer_.emplace("standard output", STDOUT_FILENO);
+        } else {
+            writer_.emplace(path_, O_WRONLY | O_CREAT | O_TRUNC | O_APPEND, 0666);
+        }
+        Json items = Json::array();
+        for (const Suite &suite : run.suites) {
+            first_of_.push_back(ended_.size());
+            ended_.resize(ended_.size() + suite.items.size(), false);
+            for (const ItemRun &item : suite.items) {
+                items.push_back({{"group", clean(item.group)}, {"item", clean(item.name)}});
+            }
+        }
+        Json json = event("run");
+        json["format"] = kFormat;
+        json["program"] = "fptest";
+        json["version"] = FPTEST_VERSION;
+        json["plan"] = clean(run.plan);
+        json["vendor"] = run.vendor;
+        json["rounds"] = run.rounds ? Json(*run.rounds) : Json();
+        json["time_limit"] = seconds_or_null(run.time_limit);
+        json["until_fail"] = run.until_fail;
+        json["pass_code"] = run.pass_code;
+        json["start"] = timestamp(run.start);
+        json["items"] = std::move(items);
+        write(json);
+    }
+
+    void started(const Run &run, Place place) override
+    {
+        Json json = event_of("start", run, place);
+        json["start"] = start_of(item_at(run, place));
+        write(json);
+    }
+
+    void progressed(const Run &run, Place place) override
+    {
+        Json json = event_of("progress", run, place);
+        json["time"] = now();
+        add_report(json, item_at(run, place).report);
+        write(json);
+    }
+
+    void ended(const Run &run, Place place) override
+    {
+        ended_[first_of_[place.suite] + place.item] = true;
+        const ItemRun &item = item_at(run, place);
+        Json json = event_of("end", run, place);
+        json["outcome"] = word(item.outcome);
+        add_report(json, item.report);
+        json["reason"] = words_or_null(item.reason);
+        json["start"] = start_of(item);
+        json["seconds"] = seconds_or_null(item.seconds);
+        add_end(json, item);
+        json["output"] = clean(item.output);
+        write(json);
+    }
+
+    void late(const Run &run, Place place, const ItemReport &report) override
+    {
+        Json json = event_of("late", run, place);
+        json["time"] = now();
+        add_report(json, report);
+        write(json);
+    }
+
+    void paused(const Run & /* run */) override
+    {
+        write({{"event", "paused"}, {"time", now()}});
+    }
+
+    void resumed(const Run & /* run */) override
+    {
+        write({{"event", "resumed"}, {"time", now()}});
+    }
+
+    void round_over(const Run & /* run */) override
+    {
+        ended_.assign(ended_.size(), false);
+    }
+
+    void finish(const Run &run) override
+    {
+        end_the_rest(run);
+        const Counts counts = count(run);
+        Json json = event("finish");
+        json["finished"] = run.finished;
+        json["reason"] = words_or_null(run.finished ? run.why_ended : run.why_unfinished);
+        json["rounds"] = run.round;
+        json["passed"] = counts.passed;
+        json["failed"] = counts.failed;
+        json["not_run"] = counts.to_go;
+        json["seconds"] = seconds_or_null(run.seconds);
+        json["summary"] = summary_of(run);
+        write(json);
+    }
+
+    bool flush() override
+    {
+        return !writer_ || !writer_->is_pending();
+    }
+
+    std::string failure() const override
+    {
+        return writer_ ? writer_->failure() : "";
+    }
+
+  private:
+    static std::string now()
+    {
+        return timestamp(std::chrono::system_clock::now());
+    }
+
+    // Which item of which round it is about.
+    Json event_of(const char *name, const Run &run, Place place) const
+    {
+        const ItemRun &item = item_at(run, place);
+        const auto rounds_before = static_cast<std::size_t>(run.round) - 1;
+        return {{"event", name},
+                {"index", rounds_before * ended_.size() + first_of_[place.suite] + place.item},
+                {"group", clean(item.group)},
+                {"item", clean(item.name)},
+                {"round", run.round}};
+    }
+
+    // So that every item of a round that was begun has its end in the file of a run
+    // that was not killed.
+    void end_the_rest(const Run &run)
+    {
+        for (std::size_t suite = 0; suite < first_of_.size(); ++suite) {
+            for (std::size_t item = 0; item < run.suites[suite].items.size(); ++item) {
+                if (!ended_[first_of_[suite] + item]) {
+                    ended(run, {suite, item});
+                }
+            }
+        }
+    }
+
+    void write(const Json &json)
+    {
+        writer_->write(json.dump() + "\n");
+    }
+
+    std::string path_;
+    std::optional<Writer> writer_;
+    std::vector<std::size_t> first_of_; // each suite, of a round's items
+    std::vector<bool> ended_;           // each item of the round
+};
+
+} // namespace
+
+std::unique_ptr<Listener> json_report(const std::string &path)
+{
+    return std::make_unique<JsonReport>(path);
+}
+
+} // namespace fptest

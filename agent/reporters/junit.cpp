@@ -1,0 +1,320 @@
+// SPDX-FileCopyrightText: 2026 The Quillmark authors
+// SPDX-License-Identifier: Apache-2.0
+
+#include "reporters/reporters.h"
+
+#include "common/descriptor.h"
+#include "reporters/junit_document.h"
+#include "reporters/wording.h"
+#include "reporters/writer.h"
+#include "util/write.h"
+
+#include <algorithm>
+#include <cerrno>
+#include <chrono>
+#include <cstdio>
+#include <cstdlib>
+#include <fcntl.h>
+#include <functional>
+#include <optional>
+#include <string_view>
+#include <sys/stat.h>
+#include <utility>
+#include <vector>
+
+namespace fptest
+{
+
+namespace
+{
+
+// Whether a file can be put in that one's place. A pipe or a device cannot be
+// replaced, and what has a name only as a descriptor is somebody else's.
+bool is_replaceable(const std::string &path)
+{
+    for (const char *descriptor : {"/dev/std", "/dev/fd/", "/proc/"}) {
+        if (path.starts_with(descriptor)) {
+            return false;
+        }
+    }
+    struct stat status {
+    };
+    return stat(path.c_str(), &status) != 0 || S_ISREG(status.st_mode);
+}
+
+// Behind a symbolic link, which is to stay.
+std::string real_path(const std::string &path)
+{
+    const std::unique_ptr<char, decltype(&std::free)> real(realpath(path.c_str(), nullptr),
+                                                           &std::free);
+    return real ? real.get() : path;
+}
+
+// A file without a name, gone with this process.
+Descriptor unnamed_file(const std::string &directory)
+{
+    Descriptor file(open(directory.c_str(), O_TMPFILE | O_RDWR | O_CLOEXEC, 0600));
+    if (!file.is_open()) { // not every file system has such files
+        std::string name = directory + "/fptest-XXXXXX";
+        file = Descriptor(mkostemp(name.data(), O_CLOEXEC));
+        if (file.is_open()) {
+            unlink(name.c_str());
+        }
+    }
+    return file;
+}
+
+// The rounds that are over, as they are in the document.
+class Spool
+{
+  public:
+    // In one of the directories. False where there is no room.
+    bool open(const std::vector<std::string> &directories)
+    {
+        return std::ranges::any_of(directories, [this](const std::string &directory) {
+            file_ = unnamed_file(directory);
+            return file_.is_open();
+        });
+    }
+
+    bool add(std::string_view text)
+    {
+        size_ += static_cast<off_t>(text.size());
+        return write_text(file_.get(), text) == text.size();
+    }
+
+    off_t size() const
+    {
+        return size_;
+    }
+
+    // The piece there, as far as it is there; empty at the end.
+    std::string piece(off_t at, off_t end) const
+    {
+        std::string text(static_cast<std::size_t>(std::min<off_t>(kPiece, end - at)), '\0');
+        const ssize_t got = pread(file_.get(), text.data(), text.size(), at);
+        text.resize(static_cast<std::size_t>(std::max<ssize_t>(got, 0)));
+        return text;
+    }
+
+  private:
+    static constexpr off_t kPiece = 1 << 20;
+
+    Descriptor file_{-1};
+    off_t size_ = 0;
+};
+
+std::string filled_in(const std::string &text, const std::string &how_it_stands)
+{
+    std::string whole;
+    std::size_t at = 0;
+    for (std::size_t mark = text.find(kHowItStands); mark != std::string::npos;
+         mark = text.find(kHowItStands, at)) {
+        whole.append(text, at, mark - at).append(how_it_stands);
+        at = mark + 1;
+    }
+    return whole.append(text, at);
+}
+
+std::string directory_of(const std::string &path)
+{
+    const std::size_t slash = path.rfind('/');
+    return slash == std::string::npos ? "." : path.substr(0, slash + 1);
+}
+
+class JunitReport : public Listener
+{
+  public:
+    explicit JunitReport(std::string path) : path_(std::move(path))
+    {
+    }
+
+    void begin(const Run &run) override
+    {
+        if (path_ == "-") {
+            direct_.emplace("standard output", STDOUT_FILENO);
+        } else if (is_replaceable(path_)) {
+            target_ = real_path(path_);
+        } else {
+            direct_.emplace(path_, O_WRONLY | O_APPEND, 0);
+        }
+        if (has_rounds(run) && !spool_.open(spool_directories())) {
+            fail();
+        }
+        if (!direct_) {
+            replace(run);
+        }
+    }
+
+    void started(const Run &run, Place /* place */) override
+    {
+        change(run);
+    }
+
+    void progressed(const Run &run, Place /* place */) override
+    {
+        change(run);
+    }
+
+    void ended(const Run &run, Place /* place */) override
+    {
+        change(run);
+    }
+
+    void late(const Run &run, Place place, const ItemReport &report) override
+    {
+        late_.push_back({place.suite, late_report(item_at(run, place), report)});
+        change(run);
+    }
+
+    void tick(const Run &run) override
+    {
+        if (changed_ && Clock::now() >= next_) {
+            replace(run);
+        }
+    }
+
+    void round_over(const Run &run) override
+    {
+        if (failure_.empty() && !spool_.add(junit_round(run, late_))) {
+            fail();
+        }
+        before_ += tests_of_round(run);
+        late_.clear();
+    }
+
+    void finish(const Run &run) override
+    {
+        if (!direct_) {
+            replace(run);
+        } else if (spool_.size() == 0) {
+            write(run, [this](std::string_view text) {
+                direct_->write(std::string(text));
+                return true;
+            });
+        } else {
+            // there may be no room for it where it waits for its reader
+            rest_ = spool_.size();
+            if (!write(run, [this](std::string_view text) { return spool_.add(text); })) {
+                fail();
+            }
+            flush();
+        }
+    }
+
+    bool flush() override
+    {
+        if (!direct_ || !failure().empty()) {
+            return true;
+        }
+        while (rest_ && !direct_->is_pending()) {
+            std::string piece = spool_.piece(*rest_, spool_.size());
+            *rest_ += static_cast<off_t>(piece.size());
+            if (piece.empty()) {
+                rest_.reset();
+            } else {
+                direct_->write(piece);
+            }
+        }
+        return !rest_ && !direct_->is_pending();
+    }
+
+    std::string failure() const override
+    {
+        return failure_.empty() && direct_ ? direct_->failure() : failure_;
+    }
+
+  private:
+    using Clock = std::chrono::steady_clock;
+    using Sink = std::function<bool(std::string_view)>;
+
+    std::vector<std::string> spool_directories() const
+    {
+        if (!direct_) {
+            return {directory_of(target_)};
+        }
+        const char *const chosen = std::getenv("TMPDIR");
+        return {chosen != nullptr ? chosen : "/tmp", "/tmp", "/data/local/tmp"};
+    }
+
+    void change(const Run &run)
+    {
+        changed_ = !direct_;
+        tick(run);
+    }
+
+    // The more there is to write, the less often: a long run is not to be held up.
+    void replace(const Run &run)
+    {
+        if (!failure_.empty()) {
+            return;
+        }
+        const auto start = Clock::now();
+        if (!replace_file(run)) {
+            fail();
+        }
+        changed_ = false;
+        const auto end = Clock::now();
+        next_ = end + std::max<Clock::duration>(std::chrono::seconds(1), 20 * (end - start));
+    }
+
+    bool replace_file(const Run &run) const
+    {
+        const std::string aside = target_ + "." + std::to_string(getpid()) + ".tmp";
+        const int flags = O_WRONLY | O_CREAT | O_TRUNC | O_NOFOLLOW | O_CLOEXEC;
+        const Descriptor file(open(aside.c_str(), flags, 0666));
+        const bool is_written = file.is_open() && write(run, [&file](std::string_view text) {
+                                    return write_text(file.get(), text) == text.size();
+                                });
+        if (is_written && std::rename(aside.c_str(), target_.c_str()) == 0) {
+            return true;
+        }
+        const int error = errno;
+        unlink(aside.c_str());
+        errno = error;
+        return false;
+    }
+
+    // The whole document, in pieces. False where the sink says so.
+    bool write(const Run &run, const Sink &sink) const
+    {
+        const off_t end = spool_.size(); // the sink may be the spool itself
+        const std::string how = junit_how_it_stands(run);
+        if (!sink(junit_head(run, before_))) {
+            return false;
+        }
+        for (off_t at = 0; at < end;) {
+            const std::string piece = spool_.piece(at, end);
+            if (piece.empty() || !sink(filled_in(piece, how))) {
+                return false;
+            }
+            at += static_cast<off_t>(piece.size());
+        }
+        return sink(filled_in(junit_round(run, late_), how)) && sink(junit_tail(run));
+    }
+
+    void fail()
+    {
+        failure_ = failure_of(path_, errno);
+    }
+
+    std::string path_;
+    std::string target_;
+    std::optional<Writer> direct_; // in place of the target
+    Spool spool_;
+    std::optional<off_t> rest_; // from where on the spool has the document
+    std::vector<Late> late_;    // of the round
+    Tests before_;              // of the rounds before it
+    bool changed_ = false;
+    Clock::time_point next_;
+    std::string failure_;
+};
+
+} // namespace
+
+std::unique_ptr<Listener> junit_report(const std::string &path)
+{
+    return std::make_unique<JunitReport>(path);
+}
+
+} // namespace fptest

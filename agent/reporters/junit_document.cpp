@@ -1,0 +1,320 @@
+// SPDX-FileCopyrightText: 2026 The Quillmark authors
+// SPDX-License-Identifier: Apache-2.0
+
+#include "reporters/junit_document.h"
+
+#include "reporters/wording.h"
+#include "util/text.h"
+
+#include <array>
+#include <chrono>
+#include <cmath>
+#include <cstdio>
+#include <optional>
+#include <string_view>
+
+namespace fptest
+{
+
+namespace
+{
+
+// --- XML ---------------------------------------------------------------------
+
+std::string escaped(std::string_view text)
+{
+    static constexpr Replacement kEscapes[] = {
+        {"&", "&amp;"},
+        {"<", "&lt;"},
+        {">", "&gt;"},
+        {"\"", "&quot;"},
+        {"\r", "&#13;"},
+        // Unicode has them, XML has not
+        {"\xEF\xBF\xBE", "\uFFFD"},
+        {"\xEF\xBF\xBF", "\uFFFD"},
+    };
+    return replaced(clean(text), kEscapes);
+}
+
+// A reader makes blanks of the tabs and line feeds in attributes.
+std::string attribute(const char *name, std::string_view value)
+{
+    static constexpr Replacement kEscapes[] = {{"\t", "&#9;"}, {"\n", "&#10;"}};
+    return std::string(" ") + name + "=\"" + replaced(escaped(value), kEscapes) + "\"";
+}
+
+std::string attribute(const char *name, std::size_t value)
+{
+    return attribute(name, std::to_string(value));
+}
+
+std::string time_attribute(double seconds)
+{
+    const long long milliseconds = std::llround(seconds * 1000);
+    std::array<char, 40> text{};
+    std::snprintf(text.data(), text.size(), "%lld.%03lld", milliseconds / 1000,
+                  milliseconds % 1000);
+    return attribute("time", text.data());
+}
+
+// In whole seconds and without a zone, as the format has it.
+std::string timestamp_attribute(std::chrono::system_clock::time_point time)
+{
+    return attribute("timestamp", timestamp(time).substr(0, 19));
+}
+
+std::string property(const std::string &indent, const char *name,
+                     const std::optional<std::string> &value)
+{
+    return value ? indent + "<property" + attribute("name", name) + attribute("value", *value) +
+                       "/>\n"
+                 : "";
+}
+
+std::string properties(const std::string &indent, const std::string &inside)
+{
+    return inside.empty() ? "" : indent + "<properties>\n" + inside + indent + "</properties>\n";
+}
+
+// --- its pieces --------------------------------------------------------------
+
+void add(Tests &tests, const Run &run, const Suite &suite)
+{
+    for (const ItemRun &item : suite.items) {
+        ++tests.all;
+        switch (item.outcome) {
+        case Outcome::passed:
+            break;
+        case Outcome::not_run:
+            ++(run.finished ? tests.skipped : tests.errors);
+            break;
+        case Outcome::failed:
+            ++tests.failures;
+            break;
+        case Outcome::silent:
+        case Outcome::timed_out:
+        case Outcome::stopped:
+            ++tests.errors;
+            break;
+        }
+    }
+}
+
+std::string attributes(const Tests &tests)
+{
+    return attribute("tests", tests.all) + attribute("failures", tests.failures) +
+           attribute("errors", tests.errors) + attribute("skipped", tests.skipped);
+}
+
+// Why there is no outcome of an item, or of a round.
+std::string why_not_run(const Run &run, bool was_running)
+{
+    if (run.finished) {
+        return run.why_ended.empty() ? "not run" : run.why_ended;
+    }
+    if (!run.why_unfinished.empty()) {
+        return run.why_unfinished;
+    }
+    return was_running ? "was running when this was written" : "not run yet when this was written";
+}
+
+// What is known of an item that has not passed, for readers that show no
+// properties.
+std::string details(const ItemRun &item)
+{
+    const ItemReport &report = item.report;
+    std::string text;
+    if (report.result) {
+        text += "result: " + *report.result + "\n";
+    }
+    if (report.progress) {
+        text += "progress: " + *report.progress + "\n";
+    }
+    if (report.description) {
+        text += "description: " + *report.description + "\n";
+    }
+    if (item.exit_status) {
+        text += "exit status: " + std::to_string(*item.exit_status) + "\n";
+    }
+    if (item.signal != 0) {
+        text += "signal: " + name_of_signal(item.signal) + "\n";
+    }
+    if (!item.left_running.empty()) {
+        text += "left running: " + left_running(item) + "\n";
+    }
+    return text;
+}
+
+std::string not_run(const Run &run, const std::string &reason, bool was_running)
+{
+    const std::string message =
+        attribute("message", reason.empty() ? why_not_run(run, was_running) : reason);
+    return run.finished ? "      <skipped" + message + "/>\n"
+                        : "      <error" + attribute("type", was_running ? "running" : "not run") +
+                              message + "/>\n";
+}
+
+std::string verdict(const Run &run, const ItemRun &item)
+{
+    if (item.outcome == Outcome::passed) {
+        return "";
+    }
+    if (item.outcome == Outcome::not_run) {
+        return not_run(run, item.reason, item.start.has_value());
+    }
+    const std::string element = item.outcome == Outcome::failed ? "failure" : "error";
+    const char *const type = item.outcome == Outcome::failed ? "result" : word(item.outcome);
+    return "      <" + element + attribute("type", type) +
+           attribute("message", item.reason.empty() ? word(item.outcome) : item.reason) + ">" +
+           escaped(details(item)) + "</" + element + ">\n";
+}
+
+std::string test_case(const Run &run, const ItemRun &item)
+{
+    const std::string indent(8, ' ');
+    const ItemReport &report = item.report;
+    using Value = std::optional<std::string>;
+    const Value result = report.result_without_value ? Value("") : report.result;
+    const Value status = item.exit_status ? Value(std::to_string(*item.exit_status)) : Value();
+    const Value signal = item.signal != 0 ? Value(name_of_signal(item.signal)) : Value();
+    const Value left = item.left_running.empty() ? Value() : Value(left_running(item));
+    std::string text = "    <testcase" + attribute("classname", item.group) +
+                       attribute("name", item.name + of_round(run)) +
+                       time_attribute(item.seconds.value_or(0)) + ">\n";
+    text += properties("      ", property(indent, "progress", report.progress) +
+                                     property(indent, "result", result) +
+                                     property(indent, "description", report.description) +
+                                     property(indent, "exit_status", status) +
+                                     property(indent, "signal", signal) +
+                                     property(indent, "left_running", left));
+    text += verdict(run, item);
+    if (!item.output.empty()) {
+        text += "      <system-out>" + escaped(item.output) + "</system-out>\n";
+    }
+    return text + "    </testcase>\n";
+}
+
+// Each item over its rounds.
+std::string summary_properties(const Run &run, const std::string &indent)
+{
+    std::string text;
+    for (const Summary &one : run.summary) {
+        const Times &times = one.times;
+        std::string value =
+            std::to_string(one.passed) + " of " + std::to_string(times.count()) + " passed";
+        if (times.count() > 0) {
+            value += ", least " + fine_duration(times.least()) + ", median " +
+                     fine_duration(times.median()) + ", longest " + fine_duration(times.longest());
+        }
+        text += property(indent, ("summary " + one.group + "/" + one.name).c_str(), value);
+    }
+    return text;
+}
+
+std::string test_suite(const Run &run, std::size_t number, const std::vector<Late> &late)
+{
+    const Suite &suite = run.suites[number];
+    Tests tests;
+    add(tests, run, suite);
+    double seconds = 0;
+    auto start = run.start;
+    for (std::size_t at = suite.items.size(); at-- > 0;) {
+        seconds += suite.items[at].seconds.value_or(0);
+        start = suite.items[at].start.value_or(start);
+    }
+    std::string text = "  <testsuite" + attribute("name", title(run, suite)) + attributes(tests) +
+                       time_attribute(seconds) + timestamp_attribute(start) + ">\n";
+    const std::string indent(6, ' ');
+    std::string inside = property(indent, "plan", run.plan) +
+                         property(indent, "vendor", std::to_string(run.vendor)) +
+                         property(indent, "pass_code", std::to_string(run.pass_code)) +
+                         kHowItStands;
+    for (const Late &one : late) {
+        if (one.suite == number) {
+            inside += property(indent, "late_report", one.text);
+        }
+    }
+    const bool has_ended = run.finished || !run.why_unfinished.empty();
+    if (has_ended && run.round > 1 && number + 1 == run.suites.size()) {
+        inside += summary_properties(run, indent);
+    }
+    text += properties("    ", inside);
+    for (const ItemRun &item : suite.items) {
+        text += test_case(run, item);
+    }
+    return text + "  </testsuite>\n";
+}
+
+} // namespace
+
+Tests &Tests::operator+=(const Tests &more)
+{
+    all += more.all;
+    failures += more.failures;
+    errors += more.errors;
+    skipped += more.skipped;
+    return *this;
+}
+
+Tests tests_of_round(const Run &run)
+{
+    Tests tests;
+    for (const Suite &suite : run.suites) {
+        add(tests, run, suite);
+    }
+    return tests;
+}
+
+std::string junit_head(const Run &run, const Tests &before)
+{
+    Tests tests = before;
+    tests += tests_of_round(run);
+    if (rounds_to_come(run) > 0) {
+        ++tests.all;
+        ++tests.errors;
+    }
+    return "<?xml version=\"1.0\" encoding=\"UTF-8\"?>\n<testsuites" + attribute("name", "fptest") +
+           attributes(tests) + time_attribute(run.seconds) + timestamp_attribute(run.start) + ">\n";
+}
+
+std::string junit_round(const Run &run, const std::vector<Late> &late)
+{
+    std::string text;
+    for (std::size_t number = 0; number < run.suites.size(); ++number) {
+        text += test_suite(run, number, late);
+    }
+    return text;
+}
+
+std::string junit_how_it_stands(const Run &run)
+{
+    const std::string indent(6, ' ');
+    std::string text = property(indent, "finished", run.finished ? "true" : "false");
+    if (!run.finished) {
+        const bool has_ended = !run.why_unfinished.empty();
+        text += property(indent, "reason",
+                         has_ended ? run.why_unfinished : "the run went on when this was written");
+    }
+    return text;
+}
+
+std::string junit_tail(const Run &run)
+{
+    std::string text;
+    if (const std::size_t rounds = rounds_to_come(run); rounds > 0) {
+        const int first = run.round + 1;
+        const std::string name =
+            rounds == 1 ? "round " + std::to_string(first)
+                        : "rounds " + std::to_string(first) + " to " + std::to_string(*run.rounds);
+        Tests tests;
+        tests.all = 1;
+        tests.errors = 1;
+        text = "  <testsuite" + attribute("name", name) + attributes(tests) + time_attribute(0) +
+               timestamp_attribute(run.start) + ">\n    <testcase" +
+               attribute("classname", "rounds") + attribute("name", name) + time_attribute(0) +
+               ">\n" + not_run(run, "", false) + "    </testcase>\n  </testsuite>\n";
+    }
+    return text + "</testsuites>\n";
+}
+
+} // namespace fptest

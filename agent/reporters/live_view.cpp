@@ -1,0 +1,363 @@
+// SPDX-FileCopyrightText: 2026 The Quillmark authors
+// SPDX-License-Identifier: Apache-2.0
+
+#include "reporters/views.h"
+
+#include "reporters/wording.h"
+#include "reporters/writer.h"
+#include "util/terminal.h"
+#include "util/text.h"
+
+#include <algorithm>
+#include <charconv>
+#include <chrono>
+#include <numeric>
+#include <string>
+#include <utility>
+#include <vector>
+
+namespace fptest
+{
+namespace
+{
+
+using Clock = std::chrono::steady_clock;
+using namespace std::chrono_literals;
+
+constexpr std::size_t kNarrowest = 40; // in which an item's result can still be seen
+
+enum class Colour { none, red, green, yellow, cyan };
+
+Colour colour_of(Outcome outcome)
+{
+    switch (outcome) {
+    case Outcome::passed:
+        return Colour::green;
+    case Outcome::failed:
+    case Outcome::timed_out:
+        return Colour::red;
+    default:
+        return Colour::yellow;
+    }
+}
+
+// A line as it grows, with its width in columns and not in bytes.
+class Line
+{
+  public:
+    Line(std::size_t room, bool coloured) : room_(room), coloured_(coloured)
+    {
+    }
+
+    std::size_t room() const
+    {
+        return room_ - width_;
+    }
+
+    void add(const std::string &text, Colour colour = Colour::none)
+    {
+        const std::string shown = cut(text, room());
+        if (coloured_ && colour != Colour::none && !shown.empty()) {
+            static constexpr const char *codes[] = {"", "31", "32", "33", "36"};
+            text_ +=
+                std::string("\x1b[") + codes[static_cast<int>(colour)] + "m" + shown + "\x1b[0m";
+        } else {
+            text_ += shown;
+        }
+        width_ += columns(shown);
+    }
+
+    const std::string &text() const
+    {
+        return text_;
+    }
+    std::size_t width() const
+    {
+        return width_;
+    }
+
+  private:
+    std::size_t room_;
+    bool coloured_;
+    std::string text_;
+    std::size_t width_ = 0;
+};
+
+class LiveView : public Listener
+{
+  public:
+    LiveView(std::FILE *terminal, bool coloured)
+        : terminal_(terminal), writer_("standard output", fileno(terminal)), coloured_(coloured)
+    {
+    }
+
+    void begin(const Run &run) override
+    {
+        for (const Suite &suite : run.suites) {
+            for (const ItemRun &item : suite.items) {
+                name_width_ = std::max(name_width_, columns(one_line(item.name)));
+            }
+        }
+        name_width_ = std::min<std::size_t>(name_width_, 28);
+        keep_text(heading(run));
+        draw(run);
+    }
+
+    void started(const Run &run, Place place) override
+    {
+        if (suite_ != place.suite) {
+            suite_ = place.suite;
+            const Suite &suite = run.suites[place.suite];
+            keep_text(one_line(suite.group) + of_round(run));
+        }
+        running_.push_back(place);
+        draw(run);
+    }
+
+    void progressed(const Run &run, Place /* place */) override
+    {
+        draw(run);
+    }
+
+    void tick(const Run &run) override
+    {
+        if (Clock::now() - drawn_at_ >= 100ms) {
+            draw(run);
+        }
+    }
+
+    void ended(const Run &run, Place place) override
+    {
+        std::erase_if(running_, [&](Place other) {
+            return other.suite == place.suite && other.item == place.item;
+        });
+        const ItemRun &item = item_at(run, place);
+        std::string said = how_it_ended(item);
+        const std::string more = remark(item);
+        said += (said.empty() || more.empty() ? "" : ": ") + more;
+        Line line = item_line(item);
+        const bool has_room = columns(said) <= line.room();
+        line.add(has_room ? said : "");
+        keep(line);
+        if (!has_room) {
+            keep_text("      " + said);
+        }
+        if (!item.left_running.empty()) {
+            keep_text("      left running: " + one_line(left_running(item)), Colour::yellow);
+        }
+        if (item.outcome != Outcome::passed) {
+            for (const std::string &text : last_lines(item.output)) {
+                keep_text("    | " + text);
+            }
+        }
+        draw(run);
+    }
+
+    void late(const Run &run, Place place, const ItemReport &report) override
+    {
+        keep_text(late_report(item_at(run, place), report), Colour::yellow);
+        draw(run);
+    }
+
+    void round_over(const Run & /* run */) override
+    {
+        suite_ = std::string::npos;
+    }
+
+    // The shell writes next.
+    void paused(const Run & /* run */) override
+    {
+        if (!drawn_.empty()) {
+            writer_.write("\n");
+            drawn_.clear();
+        }
+    }
+
+    // What stands there now is the shell's.
+    void resumed(const Run &run) override
+    {
+        drawn_.clear();
+        draw(run);
+    }
+
+    void finish(const Run &run) override
+    {
+        running_.clear();
+        if (!run.finished) {
+            keep_text("not finished: " + one_line(run.why_unfinished), Colour::yellow);
+        }
+        if (!run.why_ended.empty()) {
+            keep_text("ended: " + one_line(run.why_ended), Colour::yellow);
+        }
+        for (const std::string &line : summary_table(run)) {
+            keep_text(line);
+        }
+        write_frame(run);
+        writer_.write("\n");
+    }
+
+    bool flush() override
+    {
+        return !writer_.is_pending();
+    }
+
+    std::string failure() const override
+    {
+        return writer_.failure();
+    }
+
+  private:
+    // The last column stays free: some terminals wrap as soon as it is written.
+    Line new_line() const
+    {
+        return {terminal_width(terminal_) - 1, coloured_};
+    }
+
+    // All of an item but its description.
+    Line item_line(const ItemRun &item) const
+    {
+        const bool runs = !item.seconds;
+        Line line = new_line();
+        const std::size_t width = line.room();
+        const std::size_t bar = width >= 95 ? 16 : width >= 60 ? 8 : 0;
+        line.add("  " + fit(one_line(item.name), std::min(name_width_, width / 3)) + " ");
+        add_progress(line, item.report, bar);
+        line.add(right(duration(item.seconds.value_or(item.running)), 6) + "  ");
+        line.add(fit(runs ? (item.stopping ? "stopping" : "running") : word(item.outcome), 9),
+                 runs ? Colour::cyan : colour_of(item.outcome));
+        line.add(" " + right(result_of(item.report), 2) + "  ");
+        return line;
+    }
+
+    static void add_progress(Line &line, const ItemReport &report, std::size_t bar)
+    {
+        const std::string text = one_line(report.progress.value_or(""));
+        int progress = 0;
+        const auto [end, error] = std::from_chars(text.data(), text.data() + text.size(), progress);
+        const bool is_share = error == std::errc{} && end == text.data() + text.size() &&
+                              progress >= 0 && progress <= 100;
+        if (bar > 0) {
+            const std::size_t full = is_share ? bar * static_cast<std::size_t>(progress) / 100 : 0;
+            line.add("[" + std::string(full, '#') + std::string(bar - full, ' ') + "] ");
+        }
+        line.add(right(is_share ? text + "%" : text, 4) + " ");
+    }
+
+    static std::string right(const std::string &text, std::size_t width)
+    {
+        const std::size_t taken = columns(text);
+        return (taken < width ? std::string(width - taken, ' ') : "") + text;
+    }
+
+    Line total_line(const Run &run) const
+    {
+        const Counts counts = count(run);
+        Line line = new_line();
+        line.add(std::to_string(counts.passed) + " passed",
+                 counts.passed > 0 ? Colour::green : Colour::none);
+        line.add(", ");
+        line.add(std::to_string(counts.failed) + " failed",
+                 counts.failed > 0 ? Colour::red : Colour::none);
+        const std::string all = total(run);
+        // the rest of it, from the comma behind the failed ones
+        line.add(all.substr(all.find(',', all.find(',') + 1)));
+        if (!running_.empty() && !run.why_unfinished.empty()) {
+            line.add("; Ctrl-C again leaves at once");
+        }
+        return line;
+    }
+
+    // Puts a line above those that are redrawn, when they are.
+    void keep(const Line &line)
+    {
+        if (writer_.failure().empty()) {
+            kept_ += line.text() + "\n";
+        }
+    }
+
+    void keep_text(const std::string &text, Colour colour = Colour::none)
+    {
+        Line line = new_line();
+        line.add(text, colour);
+        keep(line);
+    }
+
+    // What takes the drawn lines away and leaves the cursor where they began. A
+    // terminal that was made narrower has wrapped them.
+    std::string erase()
+    {
+        if (drawn_.empty()) {
+            return {};
+        }
+        const std::size_t width = terminal_width(terminal_);
+        const std::size_t rows = std::accumulate(
+            drawn_.begin(), drawn_.end(), std::size_t{0}, [&](std::size_t sum, std::size_t line) {
+                return sum + std::max<std::size_t>(1, (line + width - 1) / width);
+            });
+        drawn_.clear();
+        return "\r" + (rows > 1 ? "\x1b[" + std::to_string(rows - 1) + "A" : "") + "\x1b[J";
+    }
+
+    // While the terminal does not take what it was given, frames are left out.
+    void draw(const Run &run)
+    {
+        if (!writer_.is_pending() || kept_.size() > kMostKept) {
+            write_frame(run);
+        }
+    }
+
+    void write_frame(const Run &run)
+    {
+        std::string frame = erase() + std::exchange(kept_, {});
+        for (const Place place : running_) {
+            const ItemRun &item = item_at(run, place);
+            Line line = item_line(item);
+            line.add(item.report.description ? one_line(*item.report.description)
+                                             : last_line(item.output));
+            frame += line.text() + "\n";
+            drawn_.push_back(line.width());
+        }
+        const Line line = total_line(run);
+        drawn_.push_back(line.width());
+        writer_.write(frame + line.text());
+        drawn_at_ = Clock::now();
+    }
+
+    // What an item said last, as far as it says things in lines.
+    static std::string last_line(const std::string &output)
+    {
+        const auto lines =
+            last_lines(output.substr(output.size() - std::min(output.size(), kTail)));
+        return lines.empty() ? "" : lines.back();
+    }
+
+    static constexpr std::size_t kMostKept = 65536;
+    static constexpr std::size_t kTail = 400;
+
+    std::FILE *terminal_;
+    Writer writer_;
+    bool coloured_;
+    std::size_t name_width_ = 8;
+    std::size_t suite_ = std::string::npos;
+    std::vector<Place> running_;
+    std::vector<std::size_t> drawn_; // the widths of the lines that are redrawn
+    std::string kept_;               // lines that are above the next frame
+    Clock::time_point drawn_at_;
+};
+
+} // namespace
+
+std::unique_ptr<Listener> live_view(std::FILE *terminal, bool colour)
+{
+    return std::make_unique<LiveView>(terminal, colour);
+}
+
+std::unique_ptr<Listener> suitable_view(std::FILE *stream, bool quiet)
+{
+    if (quiet || !is_smart_terminal(stream) || terminal_width(stream) < kNarrowest) {
+        return plain_view(stream, quiet);
+    }
+    return live_view(stream, wants_colour());
+}
+
+} // namespace fptest

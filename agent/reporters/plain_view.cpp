@@ -1,0 +1,166 @@
+// SPDX-FileCopyrightText: 2026 The Quillmark authors
+// SPDX-License-Identifier: Apache-2.0
+
+#include "reporters/views.h"
+
+#include "reporters/wording.h"
+#include "reporters/writer.h"
+#include "util/text.h"
+
+#include <algorithm>
+#include <chrono>
+#include <string>
+#include <string_view>
+
+namespace fptest
+{
+namespace
+{
+
+using Clock = std::chrono::steady_clock;
+
+constexpr std::chrono::seconds kBetweenProgressLines(10);
+
+class PlainView : public Listener
+{
+  public:
+    PlainView(std::FILE *stream, bool quiet)
+        : writer_("standard output", fileno(stream)), quiet_(quiet)
+    {
+    }
+
+    void begin(const Run &run) override
+    {
+        if (!quiet_) {
+            print(heading(run));
+        }
+    }
+
+    void started(const Run & /* run */, Place place) override
+    {
+        place_ = place;
+        said_ = Clock::now();
+        output_said_.clear();
+        runs_ = true;
+    }
+
+    void progressed(const Run & /* run */, Place /* place */) override
+    {
+    }
+
+    void tick(const Run &run) override
+    {
+        if (!runs_ || quiet_ || Clock::now() - said_ < kBetweenProgressLines) {
+            return;
+        }
+        said_ = Clock::now();
+        const ItemRun &item = item_at(run, place_);
+        std::string text = name_of(run, item) + (item.stopping ? ": stopping" : ": running");
+        if (item.report.progress) {
+            text += ", progress " + one_line(*item.report.progress);
+        }
+        print(text + ", " + duration(item.running));
+        print_output(new_output(item.output));
+        output_said_ = item.output;
+    }
+
+    void ended(const Run &run, Place place) override
+    {
+        runs_ = runs_ && (place.suite != place_.suite || place.item != place_.item);
+        const ItemRun &item = item_at(run, place);
+        const bool passed = item.outcome == Outcome::passed;
+        if (quiet_ && passed && item.left_running.empty()) {
+            return;
+        }
+        std::string text =
+            name_of(run, item) + ": " + word(item.outcome) + reported_result(item.report);
+        if (const std::string how = how_it_ended(item); !how.empty()) {
+            text += ", " + how;
+        }
+        if (item.seconds) {
+            text += ", " + duration(*item.seconds);
+        }
+        const std::string said = remark(item);
+        print(text + (said.empty() ? "" : ": " + said));
+        if (!item.left_running.empty()) {
+            print("    left running: " + one_line(left_running(item)));
+        }
+        if (!passed) {
+            print_output(item.output);
+        }
+    }
+
+    void late(const Run &run, Place place, const ItemReport &report) override
+    {
+        print(late_report(item_at(run, place), report));
+    }
+
+    void finish(const Run &run) override
+    {
+        if (!run.finished) {
+            print("not finished: " + one_line(run.why_unfinished));
+        }
+        if (quiet_) {
+            return;
+        }
+        if (!run.why_ended.empty()) {
+            print("ended: " + one_line(run.why_ended));
+        }
+        for (const std::string &line : summary_table(run)) {
+            print(line);
+        }
+        print(total(run));
+    }
+
+    bool flush() override
+    {
+        return !writer_.is_pending();
+    }
+
+    std::string failure() const override
+    {
+        return writer_.failure();
+    }
+
+  private:
+    static std::string name_of(const Run &run, const ItemRun &item)
+    {
+        return one_line(item.group) + "/" + one_line(item.name) + of_round(run);
+    }
+
+    // What has come to it since it was shown. Of one that is longer than what is kept
+    // that is not known, and its last lines are shown again.
+    std::string_view new_output(const std::string &output) const
+    {
+        const bool is_more = output.starts_with(output_said_);
+        return std::string_view(output).substr(is_more ? output_said_.size() : 0);
+    }
+
+    void print_output(std::string_view output)
+    {
+        for (const std::string &line : last_lines(output)) {
+            print("    | " + line);
+        }
+    }
+
+    void print(const std::string &text)
+    {
+        writer_.write(text + "\n");
+    }
+
+    Writer writer_;
+    bool quiet_;
+    Place place_;
+    bool runs_ = false;
+    Clock::time_point said_;
+    std::string output_said_;
+};
+
+} // namespace
+
+std::unique_ptr<Listener> plain_view(std::FILE *stream, bool quiet)
+{
+    return std::make_unique<PlainView>(stream, quiet);
+}
+
+} // namespace fptest

@@ -1,0 +1,271 @@
+// SPDX-FileCopyrightText: 2026 The Quillmark authors
+// SPDX-License-Identifier: Apache-2.0
+
+#include "reporters/reporters.h"
+
+#include "reporters/wording.h"
+#include "reporters/writer.h"
+#include "util/text.h"
+
+#include <algorithm>
+#include <cmath>
+#include <cstdlib>
+#include <optional>
+#include <string_view>
+#include <utility>
+#include <vector>
+
+namespace fptest
+{
+
+namespace
+{
+
+constexpr char kIndent[] = "    "; // of a subtest
+
+std::string escaped(std::string_view text)
+{
+    static constexpr Replacement kEscapes[] = {{"#", "\\#"}, {"\\", "\\\\"}};
+    return replaced(one_line(text), kEscapes);
+}
+
+// A text between double quotes, as both YAML and JSON read it. YAML has no room
+// for some characters that a clean text may hold: they break a line there, or
+// are none at all.
+std::string quoted(std::string_view text)
+{
+    static constexpr Replacement kEscapes[] = {
+        {"\"", "\\\""},
+        {"\\", "\\\\"},
+        {"\n", "\\n"},
+        {"\r", "\\r"},
+        {"\t", "\\t"},
+        {"\u2028", "\\u2028"},
+        {"\u2029", "\\u2029"},
+        {"\uFEFF", "\\uFEFF"},
+        {"\xEF\xBF\xBE", "\\uFFFE"},
+        {"\xEF\xBF\xBF", "\\uFFFF"},
+    };
+    return '"' + replaced(clean(text), kEscapes) + '"';
+}
+
+std::string plan_line(std::size_t points)
+{
+    return "1.." + std::to_string(points) + (points == 0 ? " # SKIP nothing to run\n" : "\n");
+}
+
+std::string point(bool ok, std::size_t number, const std::string &name)
+{
+    return (ok ? "ok " : "not ok ") + std::to_string(number) + " - " + escaped(name);
+}
+
+std::string skipped(const Run &run, const ItemRun &item)
+{
+    const std::string &why = run.finished ? run.why_ended : run.why_unfinished;
+    const std::string &reason = item.reason.empty() ? why : item.reason;
+    return " # SKIP not run" + (reason.empty() ? "" : ": " + escaped(reason));
+}
+
+std::string entry(const char *name, const std::string &value)
+{
+    return std::string(kIndent) + "  " + name + ": " + value + "\n";
+}
+
+std::string entry(const char *name, const std::optional<std::string> &text)
+{
+    return text ? entry(name, quoted(*text)) : "";
+}
+
+// What is known of an item that has been run.
+std::string diagnosis(const ItemRun &item)
+{
+    const ItemReport &report = item.report;
+    const std::string left = left_running(item);
+    std::string text = std::string(kIndent) + "  ---\n";
+    text += entry("outcome", quoted(word(item.outcome)));
+    if (!item.reason.empty()) {
+        text += entry("reason", quoted(item.reason));
+    }
+    text += entry("progress", report.progress);
+    text +=
+        report.result_without_value ? entry("result", quoted("")) : entry("result", report.result);
+    text += entry("description", report.description);
+    if (item.seconds) {
+        text += entry("duration_ms", std::to_string(std::llround(*item.seconds * 1000)));
+    }
+    if (item.exit_status) {
+        text += entry("exit_status", std::to_string(*item.exit_status));
+    }
+    if (item.signal != 0) {
+        text += entry("signal", quoted(name_of_signal(item.signal)));
+    }
+    if (!left.empty()) {
+        text += entry("left_running", quoted(left));
+    }
+    return text + kIndent + "  ...\n";
+}
+
+std::string item_point(const Run &run, const ItemRun &item, std::size_t number)
+{
+    const bool ran = item.outcome != Outcome::not_run;
+    const bool ok = !ran || item.outcome == Outcome::passed;
+    return kIndent + point(ok, number, item.name) +
+           (ran ? "\n" + diagnosis(item) : skipped(run, item) + "\n");
+}
+
+std::string suite_point(const Run &run, const Suite &suite, std::size_t number)
+{
+    const Counts counts = count(suite.items);
+    std::string text = point(counts.failed == 0, number, title(run, suite));
+    if (suite.items.empty()) {
+        text += " # SKIP nothing to run";
+    } else if (counts.to_go == suite.items.size()) {
+        text += skipped(run, suite.items.front());
+    }
+    return text + "\n";
+}
+
+class TapReport : public Listener
+{
+  public:
+    explicit TapReport(std::FILE *stream) : writer_("the TAP output", fileno(stream))
+    {
+    }
+
+    void begin(const Run &run) override
+    {
+        begin_round(run);
+        // Perl's Test::Harness, which runs many a bench, refuses 14 up to its 3.44. What
+        // is written is the same: to 13 a subtest is lines that it does not know.
+        const bool harness = std::getenv("HARNESS_ACTIVE") != nullptr;
+        write(harness ? "TAP version 13\n" : "TAP version 14\n");
+        if (has_fixed_rounds(run)) {
+            write(plan_line(run.suites.size() * static_cast<std::size_t>(*run.rounds)));
+        }
+    }
+
+    void started(const Run &run, Place place) override
+    {
+        begun_ = std::max(begun_, place.suite + 1);
+        write(next_lines(run, false));
+    }
+
+    void progressed(const Run & /* run */, Place /* place */) override
+    {
+    }
+
+    void ended(const Run &run, Place place) override
+    {
+        begun_ = std::max(begun_, place.suite + 1);
+        ended_[place.suite][place.item] = true;
+        write(next_lines(run, false));
+    }
+
+    void late(const Run &run, Place place, const ItemReport &report) override
+    {
+        write((open_ ? kIndent : "") + comment(late_report(item_at(run, place), report)));
+    }
+
+    void round_over(const Run &run) override
+    {
+        write(next_lines(run, true));
+        begin_round(run);
+    }
+
+    void finish(const Run &run) override
+    {
+        const Counts counts = count(run);
+        std::string text = next_lines(run, true);
+        if (run.finished && !has_fixed_rounds(run)) {
+            text += plan_line(points_);
+        }
+        for (const std::string &line : summary_table(run)) {
+            text += comment(line);
+        }
+        text += comment(std::to_string(counts.passed) + " passed, " +
+                        std::to_string(counts.failed) + " failed, " + std::to_string(counts.to_go) +
+                        " not run in " + duration(run.seconds));
+        if (!run.finished) {
+            text += "Bail out!  " +
+                    one_line(run.why_unfinished.empty() ? "the run did not finish"
+                                                        : run.why_unfinished) +
+                    "\n";
+        }
+        write(text);
+    }
+
+    bool flush() override
+    {
+        return !writer_.is_pending();
+    }
+
+    std::string failure() const override
+    {
+        return writer_.failure();
+    }
+
+  private:
+    static std::string comment(const std::string &text)
+    {
+        return "# " + text + "\n";
+    }
+
+    void begin_round(const Run &run)
+    {
+        ended_.clear();
+        for (const Suite &suite : run.suites) {
+            ended_.emplace_back(suite.items.size(), false);
+        }
+        begun_ = 0;
+        suite_ = 0;
+    }
+
+    // The lines that are due. Points stand in the order of the plan, or a harness
+    // complains: one that has ended early waits for those before it.
+    std::string next_lines(const Run &run, bool all)
+    {
+        std::string text;
+        while (suite_ < run.suites.size() && (all || suite_ < begun_)) {
+            const Suite &suite = run.suites[suite_];
+            if (!std::exchange(open_, true)) {
+                text += "# Subtest: " + escaped(title(run, suite)) + "\n";
+                text += kIndent + plan_line(suite.items.size());
+            }
+            for (; item_ < suite.items.size() && (all || ended_[suite_][item_]); ++item_) {
+                text += item_point(run, suite.items[item_], item_ + 1);
+            }
+            if (item_ < suite.items.size()) {
+                break;
+            }
+            text += suite_point(run, suite, ++points_);
+            ++suite_;
+            item_ = 0;
+            open_ = false;
+        }
+        return text;
+    }
+
+    void write(const std::string &text)
+    {
+        if (!text.empty()) {
+            writer_.write(text);
+        }
+    }
+
+    Writer writer_;
+    std::vector<std::vector<bool>> ended_;
+    std::size_t points_ = 0; // of suites, written
+    std::size_t begun_ = 0;  // suites of the round
+    std::size_t suite_ = 0;  // the next point to be written
+    std::size_t item_ = 0;
+    bool open_ = false; // its subtest
+};
+
+} // namespace
+
+std::unique_ptr<Listener> tap_report(std::FILE *stream)
+{
+    return std::make_unique<TapReport>(stream);
+}
+
+} // namespace fptest

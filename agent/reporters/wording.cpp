@@ -1,0 +1,189 @@
+// SPDX-FileCopyrightText: 2026 The Quillmark authors
+// SPDX-License-Identifier: Apache-2.0
+
+#include "reporters/wording.h"
+
+#include "util/text.h"
+
+#include <algorithm>
+#include <array>
+#include <csignal>
+#include <string_view>
+#include <utility>
+
+namespace fptest
+{
+namespace
+{
+
+constexpr std::size_t kOutputLines = 10;
+constexpr std::size_t kOutputColumns = 200;
+constexpr std::size_t kTableColumns = 80;
+
+// "2 h", in the largest unit that it is a whole number of.
+std::string time_limit(double seconds)
+{
+    static constexpr std::pair<long long, const char *> kUnits[] = {
+        {86400, " d"}, {3600, " h"}, {60, " min"}, {1, " s"}};
+    const auto whole = static_cast<long long>(seconds);
+    for (const auto &[size, unit] : kUnits) {
+        if (static_cast<double>(whole) == seconds && whole % size == 0) {
+            return std::to_string(whole / size) + unit;
+        }
+    }
+    return fine_duration(seconds);
+}
+
+// "3 rounds", "rounds for 2 h or until an item fails"
+std::string rounds(const Run &run)
+{
+    std::string text =
+        run.rounds ? amount(static_cast<std::size_t>(*run.rounds), "round") : "rounds";
+    if (run.rounds && !has_fixed_rounds(run)) {
+        text = "at most " + text;
+    }
+    if (run.time_limit) {
+        text += " for " + time_limit(*run.time_limit);
+    }
+    if (run.until_fail) {
+        text += std::string(run.time_limit ? " or" : "") + " until an item fails";
+    }
+    return text;
+}
+
+} // namespace
+
+std::string heading(const Run &run)
+{
+    std::size_t items = 0;
+    for (const Suite &suite : run.suites) {
+        items += suite.items.size();
+    }
+    return one_line(run.plan) + ": " + amount(items, "item") + ", vendor " +
+           std::to_string(run.vendor) + (has_rounds(run) ? ", " + rounds(run) : "");
+}
+
+std::string total(const Run &run)
+{
+    const Counts counts = count(run);
+    std::string text =
+        std::to_string(counts.passed) + " passed, " + std::to_string(counts.failed) + " failed";
+    const bool has_ended = run.finished || !run.why_unfinished.empty();
+    if (has_ended && (counts.to_go > 0 || !run.finished)) {
+        text += ", " + std::to_string(counts.to_go) + " not run";
+    } else if (!has_ended && has_fixed_rounds(run)) {
+        text += ", " + std::to_string(counts.to_go) + " to go";
+    } else if (!has_ended) {
+        text += ", round " + std::to_string(run.round);
+    }
+    return text + ", " + duration(run.seconds);
+}
+
+std::string name_of_signal(int signal)
+{
+    // the C library's own table has no name that all of them have
+    static constexpr std::pair<int, const char *> kNames[] = {
+        {SIGHUP, "SIGHUP"},   {SIGINT, "SIGINT"},   {SIGQUIT, "SIGQUIT"}, {SIGILL, "SIGILL"},
+        {SIGTRAP, "SIGTRAP"}, {SIGABRT, "SIGABRT"}, {SIGBUS, "SIGBUS"},   {SIGFPE, "SIGFPE"},
+        {SIGKILL, "SIGKILL"}, {SIGUSR1, "SIGUSR1"}, {SIGSEGV, "SIGSEGV"}, {SIGUSR2, "SIGUSR2"},
+        {SIGPIPE, "SIGPIPE"}, {SIGALRM, "SIGALRM"}, {SIGTERM, "SIGTERM"}, {SIGXCPU, "SIGXCPU"},
+        {SIGXFSZ, "SIGXFSZ"}, {SIGSYS, "SIGSYS"},
+    };
+    const auto *const found =
+        std::ranges::find(kNames, signal, &std::pair<int, const char *>::first);
+    return found != std::end(kNames) ? found->second : "signal " + std::to_string(signal);
+}
+
+std::string how_it_ended(const ItemRun &item)
+{
+    const bool was_ended = item.outcome == Outcome::timed_out || item.outcome == Outcome::stopped;
+    if (item.signal != 0 && !(was_ended && item.signal == SIGTERM)) {
+        return "died by " + name_of_signal(item.signal);
+    }
+    const int status = item.exit_status.value_or(0);
+    return status != 0 ? "exit status " + std::to_string(status) : "";
+}
+
+std::string left_running(const ItemRun &item)
+{
+    std::string text;
+    for (const Leftover &one : item.left_running) {
+        text +=
+            (text.empty() ? "" : ", ") + one.name + " (pid " + std::to_string(one.process) + ")";
+    }
+    return text;
+}
+
+std::string result_of(const ItemReport &report)
+{
+    return report.result_without_value ? "?" : one_line(report.result.value_or("-"));
+}
+
+std::string reported_result(const ItemReport &report)
+{
+    return report.result || report.result_without_value ? ", result " + result_of(report) : "";
+}
+
+std::string remark(const ItemRun &item)
+{
+    const bool explained = item.outcome == Outcome::silent || item.outcome == Outcome::timed_out ||
+                           item.outcome == Outcome::stopped;
+    std::string text = one_line(item.report.description.value_or(""));
+    if (text.empty() && item.signal != 0 && !explained) {
+        return {}; // how it ended is said already
+    }
+    if (explained || text.empty()) {
+        text = one_line(item.reason) + (text.empty() || item.reason.empty() ? "" : ": ") + text;
+    }
+    return text;
+}
+
+std::string late_report(const ItemRun &item, const ItemReport &report)
+{
+    std::string text = one_line(item.group) + "/" + one_line(item.name) + ": late report" +
+                       reported_result(report);
+    if (!report.result && !report.result_without_value && report.progress) {
+        text += ", progress " + one_line(*report.progress);
+    }
+    const std::string said = one_line(report.description.value_or(""));
+    return text + (said.empty() ? "" : ": " + said) + "; it changes nothing";
+}
+
+std::vector<std::string> last_lines(std::string_view output)
+{
+    std::vector<std::string> lines;
+    for (std::size_t at = 0; at < output.size();) {
+        const std::size_t end = std::min(output.find('\n', at), output.size());
+        std::string_view line = output.substr(at, end - at);
+        if (line.ends_with('\r')) {
+            line.remove_suffix(1);
+        }
+        lines.push_back(cut(one_line(line), kOutputColumns));
+        at = end + 1;
+    }
+    if (lines.size() > kOutputLines) {
+        const std::size_t left_out = lines.size() - kOutputLines;
+        lines.erase(lines.begin(), lines.end() - kOutputLines);
+        lines.insert(lines.begin(), "(" + amount(left_out, "line") + " before)");
+    }
+    return lines;
+}
+
+std::vector<std::string> summary_table(const Run &run)
+{
+    if (run.round == 1) {
+        return {};
+    }
+    std::vector<std::vector<std::string>> rows = {{"ITEM", "PASSED", "LEAST", "MEDIAN", "LONGEST"}};
+    for (const Summary &one : run.summary) {
+        const Times &times = one.times;
+        rows.push_back({one_line(one.group) + "/" + one_line(one.name),
+                        std::to_string(one.passed) + " of " + std::to_string(times.count())});
+        for (const double seconds : {times.least(), times.median(), times.longest()}) {
+            rows.back().push_back(times.count() > 0 ? fine_duration(seconds) : "-");
+        }
+    }
+    return aligned(rows, {false, true, true, true, true}, kTableColumns);
+}
+
+} // namespace fptest

@@ -1,0 +1,199 @@
+// SPDX-FileCopyrightText: 2026 The Quillmark authors
+// SPDX-License-Identifier: Apache-2.0
+
+#include "reporters/writer.h"
+
+#include "common/descriptor.h"
+#include "util/write.h"
+
+#include <chrono>
+#include <condition_variable>
+#include <csignal>
+#include <fcntl.h>
+#include <mutex>
+#include <sys/stat.h>
+#include <thread>
+#include <utility>
+
+namespace fptest
+{
+namespace
+{
+
+// How long a reader may take before it is one that is not waited for.
+constexpr std::chrono::milliseconds kPrompt(100);
+
+bool is_regular(int descriptor)
+{
+    struct stat status {
+    };
+    return fstat(descriptor, &status) == 0 && S_ISREG(status.st_mode);
+}
+
+// Whether opening it may take until somebody reads it.
+bool may_block(const std::string &path)
+{
+    struct stat status {
+    };
+    return stat(path.c_str(), &status) == 0 && !S_ISREG(status.st_mode) && !S_ISDIR(status.st_mode);
+}
+
+} // namespace
+
+struct Writer::State {
+    // set before the thread is started, and its own then
+    std::string name;
+    int flags = 0;
+    int mode = 0;
+    Descriptor file{-1}; // where it is not the caller's
+    int descriptor = -1;
+
+    std::mutex mutex;
+    std::condition_variable changed;
+    bool opened = false;
+    std::string queue;
+    std::size_t in_work = 0; // bytes that the thread is writing
+    bool closed = false;
+    std::string failure;
+
+    void open()
+    {
+        file = Descriptor(::open(name.c_str(), flags, mode));
+        descriptor = file.get();
+        if (!file.is_open()) {
+            const int error = errno;
+            const std::lock_guard lock(mutex);
+            failure = failure_of(name, error);
+        }
+    }
+
+    void run()
+    {
+        if (descriptor < 0) {
+            open();
+        }
+        std::unique_lock lock(mutex);
+        opened = true;
+        changed.notify_all();
+        for (;;) {
+            changed.wait(lock, [this] { return closed || !queue.empty(); });
+            if (queue.empty() || !failure.empty()) {
+                return;
+            }
+            const std::string text = std::exchange(queue, {});
+            in_work = text.size();
+            lock.unlock();
+            const bool written = write_text(descriptor, text) == text.size();
+            const int error = errno;
+            lock.lock();
+            in_work = 0;
+            if (!written && failure.empty()) {
+                failure = failure_of(name, error);
+            }
+            changed.notify_all();
+        }
+    }
+};
+
+Writer::Writer(std::string name, int descriptor) : state_(std::make_shared<State>())
+{
+    state_->name = std::move(name);
+    state_->descriptor = descriptor;
+    if (!is_regular(descriptor)) {
+        start();
+    }
+}
+
+Writer::Writer(const std::string &path, int flags, int mode)
+    : state_(std::make_shared<State>()), is_own_((flags & O_CREAT) != 0)
+{
+    state_->name = path;
+    state_->flags = flags | O_NOCTTY | O_CLOEXEC;
+    state_->mode = mode;
+    if (may_block(path)) {
+        start();
+        return;
+    }
+    state_->open();
+}
+
+Writer::~Writer()
+{
+    const std::lock_guard lock(state_->mutex);
+    state_->closed = true;
+    state_->changed.notify_all();
+}
+
+// Signals are for the thread that waits for them. This one is not waited for, as it
+// may be stuck for good.
+void Writer::start()
+{
+    has_thread_ = true;
+    sigset_t all;
+    sigset_t before;
+    sigfillset(&all);
+    pthread_sigmask(SIG_SETMASK, &all, &before);
+    std::thread([state = state_] { state->run(); }).detach();
+    pthread_sigmask(SIG_SETMASK, &before, nullptr);
+    std::unique_lock lock(state_->mutex);
+    is_patient_ = state_->changed.wait_for(lock, kPrompt, [this] { return state_->opened; });
+}
+
+void Writer::write(const std::string &text)
+{
+    if (!has_thread_) {
+        write_now(text);
+        return;
+    }
+    State &state = *state_;
+    std::unique_lock lock(state.mutex);
+    if (!state.failure.empty()) {
+        return;
+    }
+    if (state.queue.size() + state.in_work + text.size() > kMostWaiting) {
+        state.failure = state.name + ": nobody reads it, and more than " +
+                        std::to_string(kMostWaiting >> 20) + " MiB wait";
+        state.queue.clear();
+        return;
+    }
+    state.queue += text;
+    state.changed.notify_all();
+    if (is_patient_) {
+        is_patient_ = state.changed.wait_for(lock, kPrompt, [&state] {
+            return !state.failure.empty() || (state.queue.empty() && state.in_work == 0);
+        });
+    }
+}
+
+void Writer::write_now(const std::string &text)
+{
+    if (!state_->failure.empty()) {
+        return;
+    }
+    const std::size_t written = write_text(state_->descriptor, text);
+    if (written == text.size()) {
+        return;
+    }
+    state_->failure = failure_of(state_->name, errno);
+    struct stat status {
+    };
+    if (is_own_ && fstat(state_->descriptor, &status) == 0) {
+        // where even that fails the last line is left broken, and the failure is told
+        [[maybe_unused]] const int result =
+            ftruncate(state_->descriptor, status.st_size - static_cast<off_t>(written));
+    }
+}
+
+bool Writer::is_pending() const
+{
+    const std::lock_guard lock(state_->mutex);
+    return state_->failure.empty() && (!state_->queue.empty() || state_->in_work > 0);
+}
+
+std::string Writer::failure() const
+{
+    const std::lock_guard lock(state_->mutex);
+    return state_->failure;
+}
+
+} // namespace fptest

@@ -1,0 +1,259 @@
+// SPDX-FileCopyrightText: 2026 The Quillmark authors
+// SPDX-License-Identifier: Apache-2.0
+
+#include "run/planner.h"
+
+#include "util/failure.h"
+#include "util/text.h"
+
+#include <algorithm>
+#include <cstdio>
+#include <optional>
+#include <utility>
+
+namespace fptest
+{
+namespace
+{
+
+// --- paths --------------------------------------------------------------------
+
+std::string quoted(const std::string &text)
+{
+    return "'" + one_line(text) + "'";
+}
+
+std::vector<std::string> group_names(const Plan &plan)
+{
+    std::vector<std::string> names;
+    for (const Plan::Group &group : plan.groups()) {
+        if (std::ranges::find(names, group.name) == names.end()) {
+            names.push_back(group.name);
+        }
+    }
+    return names;
+}
+
+std::vector<std::string> item_names(const Plan &plan, const std::string &name)
+{
+    std::vector<std::string> names;
+    const auto groups = plan.groups();
+    const auto group = std::ranges::find(groups, name, &Plan::Group::name);
+    if (group != groups.end()) {
+        for (const Plan::Element &item : group->items) {
+            names.push_back(item.name.value_or(""));
+        }
+    }
+    return names;
+}
+
+// "; did you mean 'x'? The groups are a, b and c", for a name that is not there.
+std::string instead(const std::string &name, const std::vector<std::string> &names,
+                    const std::string &what)
+{
+    if (names.empty()) {
+        return "; there are no " + what;
+    }
+    const std::string near = nearest(name, names);
+    std::vector<std::string> shown;
+    for (const std::string &one : names) {
+        shown.push_back(one_line(one));
+    }
+    return (near.empty() ? "; the " : "; did you mean " + quoted(near) + "? The ") + what +
+           " are " + listing(shown);
+}
+
+Path parts_of(const std::string &text, const Plan &plan)
+{
+    std::vector<std::string> parts;
+    for (std::size_t at = 0; at < text.size();) {
+        const std::size_t end = std::min(text.find('/', at), text.size());
+        if (end > at) {
+            parts.push_back(text.substr(at, end - at));
+        }
+        at = end + 1;
+    }
+    const std::string shape = ": a path is root/group or root/group/item";
+    if (parts.size() < 2) {
+        throw Failure(Exit::usage, quoted(text) + " names no group" + shape +
+                                       instead("", group_names(plan), "groups"));
+    }
+    if (parts.size() > 3) {
+        throw Failure(Exit::usage, quoted(text) + " has too many parts" + shape);
+    }
+    if (text.find_first_of(":\t\n") != std::string::npos) {
+        throw Failure(Exit::usage, quoted(text) + " has a ':', a tab or a line feed, at which the "
+                                                  "module would cut it: name it without");
+    }
+    if (text.size() > kPathLimit) {
+        throw Failure(Exit::usage, "a path of " + std::to_string(text.size()) +
+                                       " bytes is cut at " + std::to_string(kPathLimit) +
+                                       ": name the root with less");
+    }
+    if (parts.size() == 3) {
+        return {text, parts[0], parts[1], parts[2]};
+    }
+    return {text, parts[0], parts[1], ""};
+}
+
+void require_known(const Path &path, const Plan &plan, const std::string &plan_name, bool force)
+{
+    const auto groups = group_names(plan);
+    if (std::ranges::find(groups, path.group) == groups.end()) {
+        throw Failure(Exit::usage, "no group " + quoted(path.group) + " in " + one_line(plan_name) +
+                                       instead(path.group, groups, "groups"));
+    }
+    const auto items = item_names(plan, path.group);
+    if (path.item.empty() || force || std::ranges::find(items, path.item) != items.end()) {
+        return;
+    }
+    throw Failure(Exit::usage, "no item " + quoted(path.item) + " in group " + quoted(path.group) +
+                                   " of " + one_line(plan_name) +
+                                   instead(path.item, items, "items of the group"));
+}
+
+// --- jobs ---------------------------------------------------------------------
+
+bool runs_something(const std::optional<Plan::Element> &element)
+{
+    return element && element->name && !element->name->empty();
+}
+
+// Whether every item of the group is what a path with its name runs.
+bool is_addressable(const Plan &plan, const std::string &group,
+                    const std::vector<std::optional<Plan::Element>> &items)
+{
+    return std::ranges::all_of(items, [&](const auto &item) {
+        if (!item || !item->name || item->name->find_first_of("/:\t\n") != std::string::npos) {
+            return false;
+        }
+        const auto found = plan.run_by(group, *item->name);
+        return found && found->number == item->number;
+    });
+}
+
+class WorkPlanner
+{
+  public:
+    WorkPlanner(const Plan &plan, bool as_group) : plan_(plan), as_group_(as_group)
+    {
+    }
+
+    void add(const Path &path)
+    {
+        if (!path.item.empty()) {
+            add_job(path.text, path.group, {plan_.run_by(path.group, path.item)});
+            return;
+        }
+        const auto items = plan_.run_by(path.group);
+        if (as_group_ || !is_addressable(plan_, path.group, items)) {
+            add_job(path.text, path.group, items);
+            return;
+        }
+        for (const auto &item : items) {
+            add_job(path.root + "/" + path.group + "/" + item->name.value(), path.group, {item});
+        }
+    }
+
+    Work take()
+    {
+        return std::move(work_);
+    }
+
+  private:
+    void add_job(const std::string &path, const std::string &group,
+                 const std::vector<std::optional<Plan::Element>> &items)
+    {
+        if (std::ranges::none_of(items, runs_something)) {
+            return;
+        }
+        if (work_.suites.empty() || work_.suites.back().group != group) {
+            work_.suites.push_back({group, {}});
+        }
+        Suite &suite = work_.suites.back();
+        Job job;
+        job.path = path;
+        job.suite = work_.suites.size() - 1;
+        for (const auto &item : items) {
+            if (!runs_something(item)) {
+                job.targets.emplace_back(std::nullopt);
+                continue;
+            }
+            job.targets.emplace_back(Job::Target{suite.items.size(), item->number, {}});
+            ItemRun run;
+            run.group = group;
+            run.name = *item->name;
+            suite.items.push_back(run);
+        }
+        work_.jobs.push_back(std::move(job));
+    }
+
+    const Plan &plan_;
+    bool as_group_;
+    Work work_;
+};
+
+} // namespace
+
+Path parse_path(const std::string &text, const Plan &plan, const std::string &plan_name, bool force)
+{
+    Path path = parts_of(text, plan);
+    require_known(path, plan, plan_name, force);
+    return path;
+}
+
+std::string known_groups(const Plan &plan)
+{
+    return instead("", group_names(plan), "groups");
+}
+
+std::vector<Path> all_paths(const Plan &plan)
+{
+    std::string root = "plan";
+    for (mxml_node_t *node : plan.elements()) {
+        const std::string tag = mxmlGetElement(node);
+        if (!tag.starts_with("?") && !tag.starts_with("!")) {
+            const char *name = mxmlElementGetAttr(node, "name");
+            root = name != nullptr ? name : tag;
+            break;
+        }
+    }
+    std::vector<Path> paths;
+    for (const std::string &group : group_names(plan)) {
+        paths.push_back({root + "/" + group, root, group, ""});
+    }
+    return paths;
+}
+
+Work work_of(const std::vector<Path> &paths, const Plan &plan, bool as_group)
+{
+    WorkPlanner planner(plan, as_group);
+    for (const Path &path : paths) {
+        planner.add(path);
+    }
+    return planner.take();
+}
+
+void list_items(const std::vector<Path> &paths, const Plan &plan, const std::string &suffix)
+{
+    std::vector<std::pair<std::string, std::string>> lines;
+    std::size_t width = 0;
+    for (const Path &path : paths) {
+        const auto items = path.item.empty() ? plan.run_by(path.group)
+                                             : std::vector{plan.run_by(path.group, path.item)};
+        for (const auto &item : items) {
+            if (!runs_something(item)) {
+                continue;
+            }
+            lines.emplace_back(
+                one_line(path.root + "/" + path.group + "/" + *item->name),
+                one_line(command_line(*item->name, item->args, suffix).substr(0, kCommandLimit)));
+            width = std::max(width, columns(lines.back().first));
+        }
+    }
+    for (const auto &[path, command] : lines) {
+        std::printf("%s  %s\n", fit(path, width).c_str(), command.c_str());
+    }
+}
+
+} // namespace fptest

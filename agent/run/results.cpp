@@ -1,0 +1,111 @@
+// SPDX-FileCopyrightText: 2026 The Quillmark authors
+// SPDX-License-Identifier: Apache-2.0
+
+#include "run/results.h"
+
+namespace fptest
+{
+
+const ItemRun &item_at(const Run &run, Place place)
+{
+    return run.suites[place.suite].items[place.item];
+}
+
+Counts count(const std::vector<ItemRun> &items)
+{
+    Counts counts;
+    for (const ItemRun &item : items) {
+        switch (item.outcome) {
+        case Outcome::not_run:
+            ++counts.to_go;
+            break;
+        case Outcome::passed:
+            ++counts.passed;
+            break;
+        case Outcome::failed:
+        case Outcome::silent:
+        case Outcome::timed_out:
+        case Outcome::stopped:
+            ++counts.failed;
+            break;
+        }
+    }
+    return counts;
+}
+
+Counts count(const Run &run)
+{
+    Counts sum = run.before;
+    std::size_t items = 0;
+    for (const Suite &suite : run.suites) {
+        sum += count(suite.items);
+        items += suite.items.size();
+    }
+    sum.to_go += rounds_to_come(run) * items;
+    return sum;
+}
+
+bool has_rounds(const Run &run)
+{
+    return run.rounds != 1;
+}
+
+bool has_fixed_rounds(const Run &run)
+{
+    return run.rounds && !run.time_limit && !run.until_fail;
+}
+
+std::size_t rounds_to_come(const Run &run)
+{
+    const bool is_known = run.rounds && !run.time_limit && !run.finished;
+    return is_known ? static_cast<std::size_t>(*run.rounds - run.round) : 0;
+}
+
+void summarize(Run &run)
+{
+    const bool is_first = run.summary.empty();
+    std::size_t at = 0;
+    for (const Suite &suite : run.suites) {
+        for (const ItemRun &item : suite.items) {
+            if (is_first) {
+                run.summary.push_back({item.group, item.name, 0, {}});
+            }
+            Summary &summary = run.summary[at++];
+            summary.passed += item.outcome == Outcome::passed ? 1 : 0;
+            if (item.outcome != Outcome::not_run) {
+                summary.times.add(item.seconds.value_or(0));
+            }
+        }
+    }
+}
+
+const char *word(Outcome outcome)
+{
+    switch (outcome) {
+    case Outcome::not_run:
+        return "not run";
+    case Outcome::passed:
+        return "passed";
+    case Outcome::failed:
+        return "failed";
+    case Outcome::silent:
+        return "no result";
+    case Outcome::timed_out:
+        return "timed out";
+    case Outcome::stopped:
+        return "stopped";
+    }
+    return "";
+}
+
+std::string of_round(const Run &run)
+{
+    return has_rounds(run) ? " (round " + std::to_string(run.round) + ")" : "";
+}
+
+std::string title(const Run &run, const Suite &suite)
+{
+    return suite.group + of_round(run);
+}
+
+} // namespace fptest

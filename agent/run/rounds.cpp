@@ -1,0 +1,278 @@
+// SPDX-FileCopyrightText: 2026 The Quillmark authors
+// SPDX-License-Identifier: Apache-2.0
+
+#include "run/rounds.h"
+
+#include "cli/outputs.h"
+#include "module/preflight.h"
+#include "module/stored_plan.h"
+#include "plan/plan.h"
+#include "util/files.h"
+
+#include <algorithm>
+#include <chrono>
+#include <poll.h>
+#include <sstream>
+#include <thread>
+#include <utility>
+
+namespace fptest
+{
+namespace
+{
+
+using Clock = std::chrono::steady_clock;
+
+// --- the stored plan ----------------------------------------------------------
+
+// Reads the stored plan until it is whole: somebody may just be writing it.
+template <typename Edit> auto edited_plan(const Edit &edit, std::string &text)
+{
+    for (int tries = 0;; ++tries) {
+        text = read_stored_plan().value_or("");
+        auto edited = edit(text);
+        if (edited || tries == 50) {
+            return edited;
+        }
+        std::this_thread::sleep_for(std::chrono::milliseconds(10));
+    }
+}
+
+std::string new_mark()
+{
+    static unsigned count = 0;
+    std::ostringstream mark;
+    mark << std::hex << std::chrono::system_clock::now().time_since_epoch().count() << '-'
+         << ++count;
+    return mark.str();
+}
+
+// What is shown is to be of this run: what these items have reported before goes,
+// and they are marked, so that it is known for what it is if it comes back.
+void clear_reports(Job &job)
+{
+    std::vector<std::size_t> numbers;
+    for (const auto &target : job.targets) {
+        if (target) {
+            numbers.push_back(target->element);
+        }
+    }
+    const std::string mark = new_mark();
+    const Descriptor lock = lock_stored_plan();
+    std::string text;
+    const auto cleared = edited_plan(
+        [&](const std::string &plan) { return without_reports(plan, numbers, mark); }, text);
+    if (!cleared && Plan::load(text)) {
+        return; // a forced one that is not well-formed: nobody has reported in it
+    }
+    if (!cleared) {
+        throw Failure(Exit::environment,
+                      std::string(kStoredPlan) + " is gone, or not whole any more: store it again");
+    }
+    if (cleared->marked.empty()) {
+        return;
+    }
+    require_room(cleared->text.size());
+    replace_stored_plan(cleared->text);
+    for (auto &target : job.targets) {
+        if (target &&
+            std::ranges::find(cleared->marked, target->element) != cleared->marked.end()) {
+            target->mark = mark;
+        }
+    }
+}
+
+void clear_marks()
+{
+    const Descriptor lock = lock_stored_plan();
+    std::string text;
+    const auto cleared =
+        edited_plan([](const std::string &plan) { return without_marks(plan); }, text);
+    if (cleared && *cleared != text) {
+        replace_stored_plan(*cleared);
+    }
+}
+
+// --- rounds -------------------------------------------------------------------
+
+class Rounds
+{
+  public:
+    Rounds(Runner &runner, Run &run, const std::vector<Listener *> &listeners, const Work &work)
+        : runner_(runner), run_(run), listeners_(listeners), work_(work)
+    {
+    }
+
+    // Until the run has finished, or has come to an early end.
+    void run_all()
+    {
+        while (run_one()) {
+            if (run_.round == run_.rounds ||
+                (run_.time_limit && run_.seconds >= *run_.time_limit)) {
+                run_.finished = true;
+                return;
+            }
+            begin_next();
+        }
+    }
+
+  private:
+    // Whether there may be another one.
+    bool run_one()
+    {
+        for (Job job : work_.jobs) {
+            runner_.make_way_for(job);
+            clear_reports(job);
+            if (!runner_.run(job)) {
+                return false;
+            }
+            if (run_.until_fail && has_failed(job)) {
+                run_.finished = true;
+                return false;
+            }
+        }
+        return true;
+    }
+
+    bool has_failed(const Job &job)
+    {
+        const auto failed = std::ranges::find_if(job.targets, [&](const auto &target) {
+            return target && item_at(run_, {job.suite, target->item}).outcome != Outcome::passed;
+        });
+        if (failed == job.targets.end()) {
+            return false;
+        }
+        const ItemRun &item = item_at(run_, {job.suite, (*failed)->item});
+        run_.why_ended =
+            item.group + "/" + item.name + of_round(run_) + " did not pass (--until-fail)";
+        return true;
+    }
+
+    void begin_next()
+    {
+        runner_.end_round();
+        summarize(run_);
+        for (Listener *listener : listeners_) {
+            listener->round_over(run_);
+        }
+        for (const Suite &suite : run_.suites) {
+            run_.before += count(suite.items);
+        }
+        run_.suites = work_.suites;
+        ++run_.round;
+    }
+
+    Runner &runner_;
+    Run &run_;
+    const std::vector<Listener *> &listeners_;
+    const Work &work_;
+};
+
+// --- listeners ----------------------------------------------------------------
+
+std::string first_failure(const std::vector<Listener *> &listeners)
+{
+    for (const Listener *listener : listeners) {
+        if (std::string failure = listener->failure(); !failure.empty()) {
+            return failure;
+        }
+    }
+    return {};
+}
+
+// Now that nothing runs any more, readers are waited for: not for long where the run
+// was interrupted. False where a signal has come first, or the time is over.
+bool flush(const std::vector<Listener *> &listeners, Signals &signals, bool is_interrupted)
+{
+    const auto begin = Clock::now();
+    const auto is_done = [](Listener *listener) { return listener->flush(); };
+    while (!std::ranges::all_of(listeners, is_done)) {
+        if (is_interrupted && Clock::now() - begin > std::chrono::seconds(2)) {
+            return false;
+        }
+        pollfd signal{signals.descriptor(), POLLIN, 0};
+        poll(&signal, 1, 10);
+        const int taken = signals.take();
+        if (taken == SIGTSTP) {
+            Signals::suspend();
+        } else if (taken != 0) {
+            return false;
+        }
+    }
+    return true;
+}
+
+void finish(Run &run, const std::vector<Listener *> &listeners)
+{
+    summarize(run);
+    for (Suite &suite : run.suites) {
+        for (ItemRun &item : suite.items) {
+            if (item.outcome == Outcome::not_run) {
+                item.reason = run.finished ? run.why_ended : run.why_unfinished;
+            }
+        }
+    }
+    for (Listener *listener : listeners) {
+        listener->finish(run);
+    }
+}
+
+Runner::Limits limits_of(const RunOptions &options)
+{
+    Runner::Limits limits;
+    if (options.timeout) {
+        limits.item = std::chrono::duration<double>(*options.timeout);
+    }
+    limits.grace = std::chrono::duration<double>(options.grace);
+    limits.exit_status = options.exit_status;
+    return limits;
+}
+
+} // namespace
+
+Exit run_rounds(const RunOptions &options, Host &host, Signals &signals, Run &run, const Work &work)
+{
+    const auto owned = make_listeners(options);
+    std::vector<Listener *> listeners;
+    for (const auto &listener : owned) {
+        listeners.push_back(listener.get());
+    }
+    run.suites = work.suites;
+    run.start = std::chrono::system_clock::now();
+    for (Listener *listener : listeners) {
+        listener->begin(run);
+    }
+    if (const std::string failure = first_failure(listeners); !failure.empty()) {
+        throw Failure(Exit::environment, failure + "; nothing was run");
+    }
+    Runner runner(host, signals, run, listeners, limits_of(options));
+    bool broken = false;
+    try {
+        Rounds(runner, run, listeners, work).run_all();
+        if (!runner.broken()) {
+            runner.end_round();
+            run.finished = run.finished && !runner.broken();
+            clear_marks();
+        }
+    } catch (const Failure &failure) {
+        runner.give_up(failure.what());
+        broken = true;
+    }
+    finish(run, listeners);
+    if (!flush(listeners, signals, runner.signal() != 0)) {
+        return Exit::interrupted; // nobody reads why
+    }
+    if (runner.signal() != 0 && !run.finished) {
+        return Exit::interrupted;
+    }
+    if (const std::string failure = first_failure(listeners); !failure.empty()) {
+        throw Failure(Exit::environment, failure + "; the run went on without it");
+    }
+    if (broken || runner.broken()) {
+        throw Failure(Exit::environment, run.why_unfinished + runner.advice());
+    }
+    const Counts counts = count(run);
+    return counts.passed == counts.all() ? Exit::success : Exit::items_failed;
+}
+
+} // namespace fptest

@@ -1,0 +1,176 @@
+// SPDX-FileCopyrightText: 2026 The Quillmark authors
+// SPDX-License-Identifier: Apache-2.0
+
+// Runs what is to be run, watches it, stops it.
+#pragma once
+
+#include "module/module_process.h"
+#include "plan/plan.h"
+#include "run/results.h"
+#include "run/signals.h"
+
+#include <chrono>
+#include <cstddef>
+#include <deque>
+#include <optional>
+#include <string>
+#include <sys/stat.h>
+#include <vector>
+
+namespace fptest
+{
+
+// One command and the items that the module comes to in it.
+struct Job {
+    struct Target {
+        std::size_t item = 0;    // in the suite
+        std::size_t element = 0; // in the plan
+        std::string mark;        // that its element bears; empty for none
+    };
+
+    std::string path;
+    std::size_t suite = 0;
+    // nothing where the module comes to what it cannot run
+    std::vector<std::optional<Target>> targets;
+};
+
+class Runner
+{
+  public:
+    struct Limits {
+        std::optional<std::chrono::duration<double>> item; // then it is stopped
+        std::chrono::duration<double> grace{2};            // and after that it is killed
+        bool exit_status = false; // an item whose exit status is not 0 has failed
+    };
+
+    // All of them outlive the runner.
+    Runner(Host &host, Signals &signals, Run &run, const std::vector<Listener *> &listeners,
+           const Limits &limits);
+
+    // Runs one job after another and fills in the run. False where the run has
+    // come to its end: the run then says why.
+    bool run(const Job &job);
+
+    // Before the reports of its items are cleared from the plan: what an earlier
+    // run of them left running would report into this one, and is ended.
+    void make_way_for(const Job &job);
+
+    // Ends all that items have left running.
+    void end_round();
+
+    // The signal that interrupted the run; 0 where none has.
+    int signal() const
+    {
+        return signal_;
+    }
+    // Whether the run ended because the device is not as it should be.
+    bool broken() const
+    {
+        return broken_;
+    }
+    // What to do about it, to be said behind why the run is unfinished.
+    const std::string &advice() const
+    {
+        return advice_;
+    }
+    // Ends the run early: what was not run stays so, for this reason.
+    void give_up(const std::string &why);
+
+  private:
+    using SteadyClock = std::chrono::steady_clock;
+    // The time of the run: it stands still while the run is suspended.
+    using TimePoint = SteadyClock::time_point;
+
+    // An item from its start until its end has been told.
+    struct Active {
+        Place place;
+        Job::Target target;
+        TimePoint start;
+        bool moved_on = false; // the module has: only a gatherer is still at work then
+        TimePoint moved_on_at;
+        bool done = false;
+        std::optional<Outcome> stop; // timed_out or stopped, once that is wanted
+        bool was_stopped = false;    // a stop has met it
+        bool killed = false;
+        bool overwritten = false; // its element bears another mark
+        bool report_lost = false; // with the stored plan
+        TimePoint stop_wanted_at;
+        TimePoint stop_tried_at;
+        TimePoint gatherer_looked_for;
+        int gatherer_missed = 0; // how many times in a row
+        std::string gatherer_end;
+    };
+
+    static constexpr std::size_t kNoElement = static_cast<std::size_t>(-1);
+
+    // An item that has been judged while something that may report it goes on.
+    struct Judged {
+        Place place;
+        Job::Target target;
+        ItemReport report;
+    };
+
+    TimePoint now() const;
+    TimePoint on_run_clock(TimePoint time) const; // of a moment on the steady clock
+
+    void watch(bool command_runs);
+    void handle(const Host::Event &event, const Job &job, std::size_t &next, bool &runs);
+    void start_next(const Job &job, std::size_t &next, const Host::Event &event);
+    void end_item(const Host::Event &event);
+    void move_on(const Host::Event &event);
+    void lose_module(const Host::Event &event);
+    void require_all_started(const Job &job, std::size_t next);
+    void require_plan();
+    void look();
+    void read_reports(const std::string &text);
+    void read_report(Active &active, const Plan &plan);
+    void read_late_report(Judged &judged, const Plan &plan);
+    void look_for_gatherer(Active &active);
+    void read_signals();
+    void suspend();
+    void stop_what_is_due(bool command_runs);
+    void press_stop(Active &active, bool command_runs);
+    void stop_gatherer(Active &active, bool command_runs, SteadyClock::duration waited);
+    void note_stop(const Host::Event &event);
+    void cannot_stop(Active &active);
+    std::vector<Leftover> item_processes() const;
+    std::vector<Leftover> note_left_running(std::size_t element);
+    void end_left_running();
+    void end_gatherer();
+    template <typename Find> void end_all(const Find &find);
+    void finish(Active &active, TimePoint end);
+    void judge(const Active &active);
+    std::string why_silent(const Active &active);
+    std::string why_stopped(const Active &active);
+    void tell_ended();
+    void tick();
+
+    ItemRun &item(const Place &place);
+    const ItemRun &item(const Place &place) const;
+    bool gathers(const Active &active) const;
+
+    Host &host_;
+    Signals &signals_;
+    Run &run_;
+    const std::vector<Listener *> &listeners_;
+    Limits limits_;
+    std::deque<Active> active_;
+    std::vector<Judged> judged_;             // of this round
+    std::vector<Leftover> left_;             // by items of this round
+    std::vector<std::size_t> left_elements_; // the items' elements
+    struct stat plan_status_ {
+    };
+    SteadyClock::duration suspended_{};
+    TimePoint last_suspension_;
+    SteadyClock::duration last_suspended_{};
+    TimePoint began_ = now();
+    int signal_ = 0;
+    TimePoint signal_taken_at_;
+    bool stop_asked_ = false;         // and not yet answered
+    bool gatherer_is_behind_ = false; // it may still report what it was told in vain
+    std::string module_gone_;         // why, in the job in which its process ended
+    bool broken_ = false;
+    std::string advice_;
+};
+
+} // namespace fptest

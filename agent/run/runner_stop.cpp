@@ -1,0 +1,294 @@
+// SPDX-FileCopyrightText: 2026 The Quillmark authors
+// SPDX-License-Identifier: Apache-2.0
+
+// What the runner stops: an item that takes too long, all where the run is
+// interrupted, what items have left running.
+#include "run/runner.h"
+
+#include "run/trigger.h"
+#include "util/text.h"
+
+#include <algorithm>
+#include <csignal>
+#include <cstdio>
+#include <poll.h>
+#include <thread>
+#include <unistd.h>
+
+namespace fptest
+{
+namespace
+{
+
+using namespace std::chrono_literals;
+
+constexpr auto kTurn = 25ms;
+constexpr auto kBetweenStops = 250ms;
+constexpr auto kBeforeRelease = 300ms;
+constexpr auto kBeforeGivingUp = 10s; // on what was killed
+// What only takes a moment longer to end has not been left running.
+constexpr auto kEnding = 100ms;
+
+// "sh (pid 812, state D)"
+std::string described(const std::vector<Leftover> &processes)
+{
+    std::vector<std::string> all;
+    for (const Leftover &one : processes) {
+        all.push_back(one_line(one.name) + " (pid " + std::to_string(one.process) + ", state " +
+                      state_of(one.process) + ")");
+    }
+    return listing(all);
+}
+
+} // namespace
+
+// --- signals ------------------------------------------------------------------
+
+void Runner::read_signals()
+{
+    for (int signal = signals_.take(); signal != 0; signal = signals_.take()) {
+        if (signal == SIGTSTP) {
+            suspend();
+            continue;
+        }
+        if (signal_ != 0 && signal == SIGHUP) {
+            continue; // a terminal that closes sends it once more, or after its Ctrl-C
+        }
+        if (signal_ != 0) {
+            // the reports are as far as they were written; the host's process
+            // sees that this one is gone and stops what runs
+            pollfd errors{STDERR_FILENO, POLLOUT, 0};
+            if (poll(&errors, 1, 0) > 0) { // a terminal may be stopped
+                std::fputs("\nfptest: left at once; what runs is asked to stop\n", stderr);
+            }
+            _exit(static_cast<int>(128 + SIGINT));
+        }
+        signal_ = signal;
+        signal_taken_at_ = now();
+        give_up("interrupted by " + signal_name(signal));
+        for (Active &active : active_) {
+            if (!active.stop) {
+                active.stop = Outcome::stopped;
+                active.stop_wanted_at = now();
+            }
+        }
+    }
+}
+
+// Nobody would watch them meanwhile, so the items stop as well, and no time passes
+// for them.
+void Runner::suspend()
+{
+    for (Listener *listener : listeners_) {
+        listener->paused(run_);
+    }
+    const auto begin = SteadyClock::now();
+    host_.suspend();
+    Signals::suspend();
+    host_.resume();
+    last_suspension_ = begin;
+    last_suspended_ = SteadyClock::now() - begin;
+    suspended_ += last_suspended_;
+    for (Listener *listener : listeners_) {
+        listener->resumed(run_);
+    }
+}
+
+// --- items --------------------------------------------------------------------
+
+void Runner::stop_what_is_due(bool command_runs)
+{
+    for (Active &active : active_) {
+        if (!active.done && !active.stop && limits_.item && now() - active.start > *limits_.item) {
+            active.stop = Outcome::timed_out;
+            active.stop_wanted_at = now();
+        }
+    }
+    if (!active_.empty() && !active_.back().done && active_.back().stop) {
+        press_stop(active_.back(), command_runs);
+    }
+    if (active_.empty() && command_runs && signal_ != 0 &&
+        now() - signal_taken_at_ > limits_.grace + kBeforeGivingUp) {
+        host_.kill_module(); // it comes to no item, and does not return
+    }
+    // the module stops only what it started last: an earlier gatherer gets a signal
+    for (Active &active : active_) {
+        if (&active != &active_.back() && !active.done && active.stop) {
+            active.was_stopped = true;
+            finish(active, now());
+        }
+    }
+}
+
+// Through the module, again and again, as the item may only just be starting; and
+// by a signal that nothing can ignore where that does not help in time.
+void Runner::press_stop(Active &active, bool command_runs)
+{
+    const auto waited = now() - active.stop_wanted_at;
+    const bool gatherer = gathers(active);
+    if (!gatherer && waited > limits_.grace + kBeforeGivingUp) {
+        if (item_processes().empty()) {
+            host_.kill_module(); // it is that which does not go on
+        } else {
+            cannot_stop(active);
+        }
+        return;
+    }
+    if (active.stop_tried_at != TimePoint{} && now() - active.stop_tried_at < kBetweenStops) {
+        return;
+    }
+    active.stop_tried_at = now();
+    if (!stop_asked_) {
+        host_.stop(item(active.place).name);
+        stop_asked_ = true;
+    }
+    if (gatherer) {
+        stop_gatherer(active, command_runs, waited);
+    } else if (waited > limits_.grace && signal_each(item_processes(), SIGKILL)) {
+        active.was_stopped = true;
+        active.killed = true;
+    }
+}
+
+void Runner::stop_gatherer(Active &active, bool command_runs, SteadyClock::duration waited)
+{
+    if (command_runs && waited > kBeforeRelease) {
+        active.was_stopped = true;
+        release_trigger();
+    }
+    const std::vector<Leftover> left = host_.processes().of_gatherer();
+    if (waited > limits_.grace && signal_each(left, SIGKILL)) {
+        active.was_stopped = true;
+        active.killed = true;
+    }
+    if (active.moved_on && left.empty()) {
+        active.was_stopped = true;
+        finish(active, now());
+    }
+}
+
+// A stop that found nothing has met an item whose process has another name, as a
+// script's is its shell's.
+void Runner::note_stop(const Host::Event &event)
+{
+    stop_asked_ = false;
+    if (active_.empty() || active_.back().done) {
+        return;
+    }
+    Active &active = active_.back();
+    if (event.value == 0) {
+        active.was_stopped = true;
+    } else {
+        const std::vector<Leftover> processes =
+            gathers(active) ? host_.processes().of_gatherer() : item_processes();
+        if (signal_each(processes, SIGTERM)) {
+            signal_each(processes, SIGCONT); // one that is suspended would not see it
+            active.was_stopped = true;
+        }
+    }
+}
+
+void Runner::cannot_stop(Active &active)
+{
+    const std::vector<Leftover> left = item_processes();
+    broken_ = true;
+    give_up(item(active.place).group + "/" + item(active.place).name +
+            " cannot be killed: " + described(left) + " goes on running");
+    active.was_stopped = true;
+    active.killed = true;
+    finish(active, now());
+    item(active.place).reason += ", and goes on running";
+}
+
+// --- what they leave running ---------------------------------------------------
+
+// Those of the item that runs, and of no other that has left some.
+std::vector<Leftover> Runner::item_processes() const
+{
+    return host_.processes().of_items(left_);
+}
+
+std::vector<Leftover> Runner::note_left_running(std::size_t element)
+{
+    std::vector<Leftover> found = item_processes();
+    for (const auto begin = SteadyClock::now();
+         !found.empty() && SteadyClock::now() - begin < kEnding;) {
+        std::this_thread::sleep_for(kTurn);
+        found = item_processes();
+    }
+    if (!found.empty()) {
+        left_.insert(left_.end(), found.begin(), found.end());
+        left_elements_.push_back(element);
+    }
+    return found;
+}
+
+// Ends the processes that are found, until none is.
+template <typename Find> void Runner::end_all(const Find &find)
+{
+    const auto begin = now();
+    TimePoint asked;
+    for (auto left = find(); !left.empty(); left = find()) {
+        const auto waited = now() - begin;
+        if (waited > limits_.grace + kBeforeGivingUp) {
+            give_up(described(left) + " cannot be killed, and would report into the next round");
+            broken_ = true;
+            return;
+        }
+        if (now() - asked > kBetweenStops) {
+            asked = now();
+            signal_each(left, waited > limits_.grace ? SIGKILL : SIGTERM);
+            signal_each(left, SIGCONT);
+        }
+        std::this_thread::sleep_for(kTurn);
+        read_signals();
+        look();
+        tick();
+    }
+}
+
+void Runner::make_way_for(const Job &job)
+{
+    const auto is_of_job = [&](std::size_t element) {
+        return std::ranges::any_of(
+            job.targets, [&](const auto &target) { return target && target->element == element; });
+    };
+    if (std::ranges::any_of(left_elements_, is_of_job)) {
+        end_left_running();
+    }
+    const auto is_gatherers = [&](const auto &target) {
+        return target && is_gatherer(run_.suites[job.suite].items[target->item].name, run_.vendor);
+    };
+    if (gatherer_is_behind_ && std::ranges::any_of(job.targets, is_gatherers)) {
+        end_gatherer();
+    }
+    look();
+    std::erase_if(judged_, [&](const Judged &judged) { return is_of_job(judged.target.element); });
+}
+
+void Runner::end_round()
+{
+    if (!left_.empty()) {
+        end_left_running();
+    }
+    if (gatherer_is_behind_) {
+        end_gatherer();
+    }
+    look();
+    judged_.clear();
+}
+
+void Runner::end_left_running()
+{
+    end_all([this] { return host_.processes().of_items(); });
+    left_.clear();
+    left_elements_.clear();
+}
+
+void Runner::end_gatherer()
+{
+    end_all([this] { return host_.processes().of_gatherer(); });
+    gatherer_is_behind_ = false;
+}
+
+} // namespace fptest

@@ -1,0 +1,83 @@
+// SPDX-FileCopyrightText: 2026 The Quillmark authors
+// SPDX-License-Identifier: Apache-2.0
+
+#include "run/signals.h"
+
+#include <cerrno>
+#include <sys/signalfd.h>
+#include <system_error>
+#include <unistd.h>
+
+namespace fptest
+{
+
+Signals::Signals()
+{
+    sigprocmask(SIG_BLOCK, nullptr, &before_);
+    sigemptyset(&set_);
+    for (const int signal : {SIGINT, SIGTERM, SIGHUP}) {
+        sigaddset(&set_, signal);
+    }
+    receive();
+}
+
+Signals::~Signals()
+{
+    while (take() != 0) {
+    }
+    sigprocmask(SIG_SETMASK, &before_, nullptr);
+}
+
+void Signals::receive()
+{
+    sigprocmask(SIG_BLOCK, &set_, nullptr);
+    const int fd = signalfd(descriptor_.get(), &set_, SFD_NONBLOCK | SFD_CLOEXEC);
+    if (fd < 0) {
+        throw std::system_error(errno, std::generic_category(), "signals cannot be received");
+    }
+    if (!descriptor_.is_open()) {
+        descriptor_ = Descriptor(fd);
+    }
+}
+
+int Signals::descriptor() const
+{
+    return descriptor_.get();
+}
+
+int Signals::take()
+{
+    signalfd_siginfo info{};
+    const ssize_t got = read(descriptor_.get(), &info, sizeof info);
+    return got == static_cast<ssize_t>(sizeof info) ? static_cast<int>(info.ssi_signo) : 0;
+}
+
+void Signals::take_suspensions()
+{
+    sigaddset(&set_, SIGTSTP);
+    receive();
+}
+
+void Signals::suspend()
+{
+    sigset_t suspension;
+    sigemptyset(&suspension);
+    sigaddset(&suspension, SIGTSTP);
+    kill(getpid(), SIGTSTP);
+    sigprocmask(SIG_UNBLOCK, &suspension, nullptr); // here it takes effect
+    sigprocmask(SIG_BLOCK, &suspension, nullptr);
+}
+
+std::string signal_name(int signal)
+{
+    switch (signal) {
+    case SIGINT:
+        return "Ctrl-C";
+    case SIGTERM:
+        return "SIGTERM";
+    default:
+        return "SIGHUP";
+    }
+}
+
+} // namespace fptest

@@ -1,0 +1,75 @@
+// SPDX-FileCopyrightText: 2026 The Quillmark authors
+// SPDX-License-Identifier: Apache-2.0
+
+#include "util/files.h"
+
+#include "common/descriptor.h"
+
+#include <array>
+#include <cerrno>
+#include <cstring>
+#include <fcntl.h>
+#include <unistd.h>
+
+namespace fptest
+{
+namespace
+{
+
+bool standard_output_was_open = true;
+
+} // namespace
+
+void fill_standard_descriptors()
+{
+    standard_output_was_open = fcntl(STDOUT_FILENO, F_GETFD) >= 0;
+    int descriptor = 0;
+    do {
+        descriptor = open("/dev/null", O_RDWR | O_CLOEXEC);
+    } while (descriptor >= 0 && descriptor <= STDERR_FILENO);
+    if (descriptor >= 0) {
+        close(descriptor);
+    }
+}
+
+bool has_standard_output()
+{
+    return standard_output_was_open;
+}
+
+std::optional<std::string> read_file(const std::string &path, int flags)
+{
+    const Descriptor file(path == "-" ? dup(STDIN_FILENO)
+                                      : open(path.c_str(), O_RDONLY | O_CLOEXEC | flags));
+    if (!file.is_open()) {
+        return std::nullopt;
+    }
+    std::string text;
+    std::array<char, 16384> buffer;
+    for (;;) {
+        const ssize_t got = read(file.get(), buffer.data(), buffer.size());
+        if (got < 0 && errno == EINTR) {
+            continue;
+        }
+        if (got < 0) {
+            return std::nullopt;
+        }
+        if (got == 0) {
+            return text;
+        }
+        text.append(buffer.data(), static_cast<std::size_t>(got));
+        if (text.size() > kFileLimit) {
+            errno = EFBIG;
+            return std::nullopt;
+        }
+    }
+}
+
+std::string why_unread()
+{
+    return errno != EFBIG ? std::strerror(errno)
+                          : "longer than the " + std::to_string(kFileLimit >> 20U) +
+                                " MiB that are read of a test plan";
+}
+
+} // namespace fptest
