@@ -30,6 +30,7 @@ namespace
 {
 
 constexpr off_t kOutputKept = off_t{64} * 1024;
+constexpr off_t kRoomLeft = off_t{1024} * 1024;
 
 [[noreturn]] void fail(const char *what)
 {
@@ -92,8 +93,7 @@ void Host::start()
 
 Host::~Host()
 {
-    // a gatherer stays behind with this for its output: it must not fill the memory
-    fcntl(output_.get(), F_ADD_SEALS, F_SEAL_GROW);
+    leave_output();
     shutdown(control_.get(), SHUT_RDWR);
     if (pid_ > 0) {
         kill(pid_, SIGCONT); // an item may have suspended it
@@ -255,6 +255,32 @@ off_t Host::output_size() const
     return fstat(output_.get(), &status) == 0 ? status.st_size : 0;
 }
 
+// A gatherer that stays keeps it for what it prints: that must neither fail from the
+// first byte on nor fill the memory.
+void Host::leave_output()
+{
+    const off_t size = output_size();
+    fcntl(output_.get(), F_SETFL, 0);
+    lseek(output_.get(), size, SEEK_SET);
+    static_cast<void>(ftruncate(output_.get(), size + kRoomLeft));
+    fcntl(output_.get(), F_ADD_SEALS, F_SEAL_GROW);
+}
+
+// An item that opens /dev/stderr anew ("> /dev/stderr") truncates it: what has been
+// taken, and is zeros since, is something else then.
+void Host::note_truncation(off_t end)
+{
+    std::array<char, 4096> bytes{};
+    const off_t data = taken_ > 0 ? lseek(output_.get(), 0, SEEK_DATA) : -1;
+    if (data >= 0 && data < taken_) {
+        const auto size = std::min(bytes.size(), static_cast<std::size_t>(taken_ - data));
+        static_cast<void>(pread(output_.get(), bytes.data(), size, data));
+    }
+    if (end < taken_ || std::ranges::any_of(bytes, [](char byte) { return byte != 0; })) {
+        taken_ = 0;
+    }
+}
+
 std::string Host::take_output()
 {
     const off_t size = output_size();
@@ -278,6 +304,7 @@ void Host::pass_output(std::FILE *stream)
 
 void Host::pass_output(std::FILE *stream, off_t end)
 {
+    note_truncation(end);
     while (taken_ < end) {
         const std::string piece = take_output(std::min(end, taken_ + kOutputKept));
         std::fwrite(piece.data(), 1, piece.size(), stream);
@@ -286,6 +313,7 @@ void Host::pass_output(std::FILE *stream, off_t end)
 
 std::string Host::take_output(off_t end)
 {
+    note_truncation(end);
     if (end <= taken_) {
         return {};
     }

@@ -104,6 +104,8 @@ class Host
     void read_control();
     void lose();
     off_t output_size() const;
+    void leave_output();
+    void note_truncation(off_t end);
 
     pid_t pid_ = -1;    // none when it has ended
     pid_t leader_ = -1; // of the process group that it had

@@ -524,12 +524,17 @@ class Cutter
     explicit Cutter(const std::string &text) : text_(text)
     {
     }
-    void cut(const Attribute &place, const std::string &replacement)
+    void cut(const Attribute &place)
     {
         const std::size_t end = text_.find_last_not_of(kBlanks, place.begin - 1) + 1;
         left_.append(text_, done_, end - done_);
-        left_ += replacement;
         done_ = place.end;
+    }
+    void insert(std::size_t place, const std::string &text)
+    {
+        left_.append(text_, done_, place - done_);
+        left_ += text;
+        done_ = place;
     }
     std::string rest()
     {
@@ -551,7 +556,7 @@ std::optional<std::vector<Tag>> whole_tags(const std::string &text)
 
 } // namespace
 
-std::optional<ClearedPlan> without_reports(const std::string &text,
+std::optional<std::string> without_reports(const std::string &text,
                                            const std::vector<std::size_t> &numbers,
                                            const std::string &mark)
 {
@@ -559,26 +564,22 @@ std::optional<ClearedPlan> without_reports(const std::string &text,
     if (!tags) {
         return std::nullopt;
     }
-    ClearedPlan cleared;
     Cutter cutter(text);
     for (std::size_t number = 0; number < tags->size(); ++number) {
-        if (std::find(numbers.begin(), numbers.end(), number) == numbers.end()) {
+        const Tag &tag = (*tags)[number];
+        if (tag.kind > Tag::Kind::empty || std::ranges::find(numbers, number) == numbers.end()) {
             continue;
         }
-        bool marked = false;
-        for (const Attribute &place : (*tags)[number].attributes) {
+        cutter.insert(tag.begin + 1 + tag.name.size(),
+                      std::string(" ") + kMark + "=\"" + mark + "\"");
+        for (const Attribute &place : tag.attributes) {
             if (place.name == "progress" || place.name == "result" || place.name == "description" ||
                 place.name == kMark) {
-                cutter.cut(place, marked ? "" : std::string(" ") + kMark + "=\"" + mark + "\"");
-                marked = true;
+                cutter.cut(place);
             }
         }
-        if (marked) {
-            cleared.marked.push_back(number);
-        }
     }
-    cleared.text = cutter.rest();
-    return cleared;
+    return cutter.rest();
 }
 
 std::optional<std::string> mended(const std::string &text)
@@ -600,7 +601,7 @@ std::optional<std::string> without_marks(const std::string &text)
     for (const Tag &tag : *tags) {
         for (const Attribute &place : tag.attributes) {
             if (place.name == kMark) {
-                cutter.cut(place, "");
+                cutter.cut(place);
             }
         }
     }

@@ -136,15 +136,10 @@ std::vector<Tag> element_tags(const Plan &plan, std::string_view text);
 // process that saves an old copy of the plan brings back one without.
 inline constexpr char kMark[] = "fptest-run";
 
-struct ClearedPlan {
-    std::string text;
-    std::vector<std::size_t> marked; // the elements that got the mark
-};
-
 // The text without the progress, result and description of these elements, which
-// get the mark in their place; otherwise byte for byte as it was. Nothing where
-// the text is not whole.
-std::optional<ClearedPlan> without_reports(const std::string &text,
+// get the mark; otherwise byte for byte as it was. Nothing where the text is not
+// whole.
+std::optional<std::string> without_reports(const std::string &text,
                                            const std::vector<std::size_t> &numbers,
                                            const std::string &mark);
 

@@ -8,12 +8,15 @@
 #include "module/stored_plan.h"
 #include "plan/plan.h"
 #include "util/files.h"
+#include "util/text.h"
 
 #include <algorithm>
 #include <chrono>
+#include <cstdio>
 #include <poll.h>
 #include <sstream>
 #include <thread>
+#include <unistd.h>
 #include <utility>
 
 namespace fptest
@@ -69,14 +72,17 @@ void clear_reports(Job &job)
         throw Failure(Exit::environment,
                       std::string(kStoredPlan) + " is gone, or not whole any more: store it again");
     }
-    if (cleared->marked.empty()) {
-        return;
+    try {
+        require_room(cleared->size());
+        replace_stored_plan(*cleared);
+    } catch (const Failure &) {
+        if (without_marks(*cleared) == without_marks(text)) {
+            return; // nothing has to go, and the disk has no room for the mark
+        }
+        throw;
     }
-    require_room(cleared->text.size());
-    replace_stored_plan(cleared->text);
     for (auto &target : job.targets) {
-        if (target &&
-            std::ranges::find(cleared->marked, target->element) != cleared->marked.end()) {
+        if (target) {
             target->mark = mark;
         }
     }
@@ -170,14 +176,24 @@ class Rounds
 
 // --- listeners ----------------------------------------------------------------
 
-std::string first_failure(const std::vector<Listener *> &listeners)
+std::string failures(const std::vector<Listener *> &listeners)
 {
+    std::vector<std::string> all;
     for (const Listener *listener : listeners) {
         if (std::string failure = listener->failure(); !failure.empty()) {
-            return failure;
+            all.push_back(std::move(failure));
         }
     }
-    return {};
+    return listing(all);
+}
+
+// For who has interrupted the run, unless that is nobody any more.
+void say_at_end(const std::string &text)
+{
+    pollfd errors{STDERR_FILENO, POLLOUT, 0};
+    if (!text.empty() && poll(&errors, 1, 0) > 0) {
+        std::fprintf(stderr, "fptest: %s\n", text.c_str());
+    }
 }
 
 // Now that nothing runs any more, readers are waited for: not for long where the run
@@ -242,7 +258,7 @@ Exit run_rounds(const RunOptions &options, Host &host, Signals &signals, Run &ru
     for (Listener *listener : listeners) {
         listener->begin(run);
     }
-    if (const std::string failure = first_failure(listeners); !failure.empty()) {
+    if (const std::string failure = failures(listeners); !failure.empty()) {
         throw Failure(Exit::environment, failure + "; nothing was run");
     }
     Runner runner(host, signals, run, listeners, limits_of(options));
@@ -260,12 +276,17 @@ Exit run_rounds(const RunOptions &options, Host &host, Signals &signals, Run &ru
     }
     finish(run, listeners);
     if (!flush(listeners, signals, runner.signal() != 0)) {
-        return Exit::interrupted; // nobody reads why
-    }
-    if (runner.signal() != 0 && !run.finished) {
+        say_at_end("a report is not whole: it was not read to its end");
         return Exit::interrupted;
     }
-    if (const std::string failure = first_failure(listeners); !failure.empty()) {
+    const std::string failure = failures(listeners);
+    if (runner.signal() != 0 && !run.finished) {
+        say_at_end(failure);
+        return Exit::interrupted;
+    }
+    if (!failure.empty() && (broken || runner.broken())) {
+        say_at_end(failure);
+    } else if (!failure.empty()) {
         throw Failure(Exit::environment, failure + "; the run went on without it");
     }
     if (broken || runner.broken()) {

@@ -396,6 +396,9 @@ void Runner::judge(const Active &active)
 
 std::string Runner::why_stopped(const Active &active)
 {
+    if (!active.was_stopped && !module_gone_.empty()) {
+        return "past the limit of " + fine_duration(limits_.item->count()) + ": " + module_gone_;
+    }
     if (!active.was_stopped) {
         return "ended by itself after " + fine_duration(*item(active.place).seconds) +
                ", past the limit of " + duration(limits_.item->count());
@@ -423,6 +426,9 @@ std::string Runner::why_silent(const Active &active)
     if (active.overwritten) {
         return "a process with an old copy of the plan has written it over; what the plan says "
                "now is of an earlier run";
+    }
+    if (active.undone) {
+        return "a process with an old copy of the plan has written over what it had reported";
     }
     if (active.report_lost) {
         return "what it reported is lost: the stored plan is gone, or not whole any more";
@@ -535,6 +541,7 @@ void Runner::read_report(Active &active, const Plan &plan)
     if (report == result.report) {
         return;
     }
+    active.undone = result.report.result && !report.result;
     result.report = std::move(report);
     for (Listener *listener : listeners_) {
         listener->progressed(run_, active.place);

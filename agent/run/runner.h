@@ -94,6 +94,7 @@ class Runner
         bool killed = false;
         bool overwritten = false; // its element bears another mark
         bool report_lost = false; // with the stored plan
+        bool undone = false;      // its result was there, and is not any more
         TimePoint stop_wanted_at;
         TimePoint stop_tried_at;
         TimePoint gatherer_looked_for;

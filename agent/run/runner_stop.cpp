@@ -5,6 +5,7 @@
 // interrupted, what items have left running.
 #include "run/runner.h"
 
+#include "module/preflight.h"
 #include "run/trigger.h"
 #include "util/text.h"
 
@@ -126,8 +127,8 @@ void Runner::press_stop(Active &active, bool command_runs)
 {
     const auto waited = now() - active.stop_wanted_at;
     const bool gatherer = gathers(active);
-    if (!gatherer && waited > limits_.grace + kBeforeGivingUp) {
-        if (item_processes().empty()) {
+    if ((!gatherer || !active.moved_on) && waited > limits_.grace + kBeforeGivingUp) {
+        if (gatherer || item_processes().empty()) {
             host_.kill_module(); // it is that which does not go on
         } else {
             cannot_stop(active);
@@ -259,8 +260,11 @@ void Runner::make_way_for(const Job &job)
     const auto is_gatherers = [&](const auto &target) {
         return target && is_gatherer(run_.suites[job.suite].items[target->item].name, run_.vendor);
     };
-    if (gatherer_is_behind_ && std::ranges::any_of(job.targets, is_gatherers)) {
-        end_gatherer();
+    if (std::ranges::any_of(job.targets, is_gatherers)) {
+        if (gatherer_is_behind_) {
+            end_gatherer();
+        }
+        require_trigger_port(); // an item may have taken it
     }
     look();
     std::erase_if(judged_, [&](const Judged &judged) { return is_of_job(judged.target.element); });

@@ -8,6 +8,9 @@
 
 #include <algorithm>
 #include <csignal>
+#include <fcntl.h>
+#include <nlohmann/json.hpp>
+#include <sys/stat.h>
 #include <unistd.h>
 
 using device::kPlanFile;
@@ -18,7 +21,10 @@ using fptest_runner::expect_refusal;
 using fptest_runner::FptestProcess;
 using fptest_runner::lines_of;
 using fptest_runner::run_fptest;
+using ::testing::ElementsAre;
+using ::testing::HasSubstr;
 using ::testing::Not;
+using ::testing::StartsWith;
 
 namespace
 {
@@ -29,6 +35,20 @@ class Trust : public FptestTest
     static device::Lines outcomes()
     {
         return report_files::outcomes(read_file(work("json")));
+    }
+    // Runs the group G of these items.
+    static Ended run(const std::vector<device::PlanItem> &items, const device::Lines &options = {})
+    {
+        device::Lines arguments = {"run", "--json", work("json"), "--plan",
+                                   plan(device::plan_of({{"G", items}}))};
+        arguments.insert(arguments.end(), options.begin(), options.end());
+        arguments.emplace_back("P/G");
+        return run_fptest(arguments);
+    }
+    // A value of an item's end.
+    static std::string of_end(std::size_t item, const char *name)
+    {
+        return report_files::events_of(read_file(work("json")), "end").at(item).at(name);
     }
 };
 
@@ -77,6 +97,105 @@ TEST_F(Trust, TakesNoResultThatAProcessWithAnOldCopyOfThePlanWritesBack)
     EXPECT_EQ(ended.status, 1);
     EXPECT_THAT(outcomes(), ElementsAre("Item: no result"));
     EXPECT_THAT(ended.out, HasSubstr("a process with an old copy of the plan has written it over"));
+}
+
+TEST_F(Trust, TakesNoResultOfAnEarlierRunThoughThePlanIsGivenAnew)
+{
+    const std::string old = device::plan_of({{"G", {{"Script", ""}}}});
+    const std::size_t end = old.find("/>");
+    file("old", std::string(old).insert(end, " progress=\"100\" result=\"0\" description=\"old\""));
+    const Ended ended =
+        run({{"Script", "'cat /tmp/scene/old >/data/vorlane/src1.xml; sleep 0.2'"}});
+    EXPECT_EQ(ended.status, 1);
+    EXPECT_THAT(outcomes(), ElementsAre("Script: no result"));
+    EXPECT_THAT(of_end(0, "reason"),
+                StartsWith("a process with an old copy of the plan has written it over"));
+}
+
+TEST_F(Trust, TellsAReportThatIsWrittenOverFromNone)
+{
+    run({{"Script", "'cp /data/vorlane/src1.xml /tmp/scene/old; fptest report G Script --progress "
+                    "100 --result 0; sleep 0.3; cat /tmp/scene/old >/data/vorlane/src1.xml; sleep "
+                    "0.3'"}});
+    EXPECT_THAT(outcomes(), ElementsAre("Script: no result"));
+    EXPECT_EQ(of_end(0, "reason"),
+              "a process with an old copy of the plan has written over what it had reported");
+}
+
+// As "> /dev/stderr" does: the file is no pipe.
+TEST_F(Trust, KeepsWhatIsPrintedAfterAnItemHasTruncatedItsOutput)
+{
+    run({{"Item", "flood 30000"},
+         {"Script", "'echo before; sleep 0.2; echo checking >/dev/stderr; sleep 0.2; echo after'"},
+         {"Other", "say other sleep 0.2 complain again"},
+         {"Third", "flood 60000"}});
+    EXPECT_EQ(of_end(1, "output"), "before\nchecking\nafter\n");
+    EXPECT_EQ(of_end(2, "output"), "other\nagain\n");
+    EXPECT_THAT(of_end(3, "output"), StartsWith("line 1\nline 2\n"));
+}
+
+TEST_F(Trust, RunsNoGathererWhosePortAnItemHasTaken)
+{
+    const std::vector<device::PlanItem> items = {
+        {"Script", "'fptest report G Script --progress 100 --result 0; nc -l -p 34952 "
+                   "&lt;/dev/null >/dev/null 2>/dev/null &amp; sleep 0.3'"},
+        {"SensorProbe", "--group G --seconds 0"}};
+    Ended ended = run(items);
+    EXPECT_EQ(ended.status, 3);
+    EXPECT_EQ(lines_of(ended.err).back(),
+              "fptest: port 34952 cannot be had: Address already in use; the gatherer's run would "
+              "never end: stop what listens there (netstat -ltnp names it)");
+    EXPECT_THAT(outcomes(), ElementsAre("Script: passed", "SensorProbe: not run"));
+
+    // where the module comes to it without being asked first
+    ended = run(items, {"--as-group", "--timeout", "0.5", "--grace", "0.2"});
+    EXPECT_EQ(ended.status, 1);
+    EXPECT_THAT(outcomes(), ElementsAre("Script: passed", "SensorProbe: timed out"));
+    EXPECT_LT(ended.seconds, 20);
+}
+
+TEST_F(Trust, LeavesTheGathererThatStaysRoomForWhatItPrints)
+{
+    run({{"SensorProbe", "--group G --seconds 0"}});
+    const auto gatherers = device::processes_named("/system/bin/SensorProbe");
+    ASSERT_EQ(gatherers.size(), 1U);
+    const std::string output = "/proc/" + std::to_string(gatherers[0].pid) + "/fd/1";
+    const std::string text(100 * 1024, 'x');
+    const Descriptor again(open(output.c_str(), O_WRONLY | O_CLOEXEC));
+    struct stat status {
+    };
+    ASSERT_EQ(fstat(again.get(), &status), 0);
+    const auto room = status.st_size;
+    EXPECT_GE(room, 1024 * 1024);
+    EXPECT_EQ(pwrite(again.get(), text.data(), text.size(), room - 100 * 1024), 100 * 1024);
+    EXPECT_LT(pwrite(again.get(), text.data(), text.size(), room), 0); // and no more than that
+}
+
+TEST_F(Trust, NamesEveryReportThatFailsThoughTheRunIsInterrupted)
+{
+    for (const int signal : {0, SIGINT}) {
+        fptest_runner::Start start;
+        std::vector<Descriptor> readers;
+        for (const std::string name : {"json", "tap"}) {
+            unlink(work(name).c_str());
+            ASSERT_EQ(mkfifo(work(name).c_str(), 0600), 0);
+            readers.emplace_back(open(work(name).c_str(), O_RDONLY | O_NONBLOCK | O_CLOEXEC));
+        }
+        const std::string text = device::plan_of(
+            {{"G", {{"Item", "note /tmp/scene/begun await /tmp/scene/go report G 100 0 x"}}}});
+        start.arguments = {"run", "--json", work("json"), "--tap", "--plan", plan(text), "P/G"};
+        start.output = work("tap");
+        FptestProcess fptest(start);
+        ASSERT_TRUE(wait_for_file("begun"));
+        readers.clear();
+        signal == 0 ? static_cast<void>(file("go", "")) : fptest.signal(signal);
+        const Ended ended = fptest.wait();
+        EXPECT_EQ(ended.status, signal == 0 ? 3 : 130);
+        EXPECT_THAT(ended.err, HasSubstr(work("json") + ": Broken pipe"));
+        EXPECT_THAT(ended.err, HasSubstr("the TAP output: Broken pipe"));
+        unlink(work("go").c_str());
+        unlink(work("begun").c_str());
+    }
 }
 
 TEST_F(Trust, LeavesNoMarksOfItsOwnInThePlan)
