@@ -247,10 +247,13 @@ TEST_F(Output, ShowsWhatTheGathererSaysBeforeItReports)
     TerminalSession session(
         {FPTEST_PROGRAM, "run", "--plan",
          plan("<P><CmdGroup name=\"G\"><Cmd name=\"SensorProbe\" args=\"--help >/dev/null; exec "
-              "/system/bin/Item say warming-up gather await /tmp/scene/go\"/></CmdGroup></P>"),
+              "/system/bin/Item say warming-up await /tmp/scene/warm gather say gathering await "
+              "/tmp/scene/go\"/></CmdGroup></P>"),
          "P/G"},
         80, 24);
     EXPECT_TRUE(session.wait_for_text("running    -  warming-up")) << session.text();
+    file("warm", "");
+    EXPECT_TRUE(session.wait_for_text("running    -  gathering")) << session.text();
     file("go", "");
     EXPECT_EQ(session.wait_for_end(), 1);
 }
