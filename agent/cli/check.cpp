@@ -50,6 +50,7 @@ bool check_file(const std::string &file, const std::string &text, PlanUse use)
 
 Exit check_files(const CheckOptions &options)
 {
+    require_standard_output("fptest check");
     bool sound = true;
     bool readable = true;
     for (const std::string &file : options.files) {

@@ -398,7 +398,9 @@ int main(int argc, char **argv)
     } catch (const std::exception &error) {
         status = complain(Exit::environment, error.what());
     }
-    if (std::fflush(stdout) != 0 && status == Exit::success) {
+    // items that did not pass are told by run's own views; errors in a plan are told here
+    const bool is_untold = std::fflush(stdout) != 0 || std::ferror(stdout) != 0;
+    if (is_untold && (status == Exit::success || status == Exit::items_failed)) {
         status = complain(Exit::environment, "standard output cannot be written");
     }
     return static_cast<int>(status);

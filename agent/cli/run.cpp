@@ -174,7 +174,9 @@ Exit run(const RunOptions &options)
     if (options.as_sent && options.plan.empty()) {
         throw Failure(Exit::usage, "--as-sent is of no use without --plan FILE, which is sent");
     }
-    if (!options.list) {
+    if (options.list) {
+        require_standard_output("--list");
+    } else {
         look_after_reports(
             {{"--json", options.json}, {"--junit", options.junit}, {"--log", options.log}});
     }

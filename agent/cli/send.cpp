@@ -121,6 +121,7 @@ class Sender
 
 Exit send(const SendOptions &options)
 {
+    require_standard_output("fptest send");
     if (options.commands.empty() != options.from_input) {
         throw Failure(Exit::usage, "give COMMANDs as arguments, or with -0 on standard input");
     }

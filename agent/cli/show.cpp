@@ -68,6 +68,7 @@ std::string read_shown(const std::string &file)
 
 Exit show(const std::string &file)
 {
+    require_standard_output("fptest show");
     const std::string name = file.empty() ? kStoredPlan : file == "-" ? "<stdin>" : one_line(file);
     const auto plan = Plan::read(read_shown(file));
     if (!plan) {

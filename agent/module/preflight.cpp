@@ -35,7 +35,8 @@ void choose_log(const std::string &file)
     }
     const Descriptor log(
         open(file.c_str(), O_WRONLY | O_CREAT | O_APPEND | O_NONBLOCK | O_CLOEXEC, 0644));
-    if (!log.is_open()) {
+    // the module says nothing of what it cannot write
+    if (!log.is_open() || write(log.get(), "", 0) < 0) {
         throw Failure(Exit::environment, "--log " + one_line(file) + " cannot be written: " +
                                              std::strerror(errno) + "; name another file");
     }

@@ -98,7 +98,7 @@ class Spool
     }
 
   private:
-    static constexpr off_t kPiece = 1 << 20;
+    static constexpr off_t kPiece = 64 << 10;
 
     Descriptor file_{-1};
     off_t size_ = 0;

@@ -4,6 +4,7 @@
 #include "util/files.h"
 
 #include "common/descriptor.h"
+#include "util/failure.h"
 
 #include <array>
 #include <cerrno>
@@ -32,9 +33,11 @@ void fill_standard_descriptors()
     }
 }
 
-bool has_standard_output()
+void require_standard_output(const std::string &who)
 {
-    return standard_output_was_open;
+    if (!standard_output_was_open) {
+        throw Failure(Exit::environment, who + " wants standard output, which is closed: open it");
+    }
 }
 
 std::optional<std::string> read_file(const std::string &path, int flags)

@@ -13,8 +13,8 @@ namespace fptest
 // What is opened later would get the number of a standard stream that is closed, and
 // what is meant for that: they are all opened.
 void fill_standard_descriptors();
-// Whether it was open before.
-bool has_standard_output();
+// Throws a Failure where standard output was closed before; who wants it is named.
+void require_standard_output(const std::string &who);
 
 // The whole file, "-" for standard input; nothing where it cannot be read, or is
 // longer than kFileLimit, errno then says why. Flags are those of open().

@@ -4,6 +4,7 @@
 // A test item that does what its arguments say, one after another:
 //   report GROUP PROGRESS RESULT DESCRIPTION   through the module
 //   report-file GROUP PROGRESS RESULT FILE     the description is that file
+//   report-null GROUP PROGRESS RESULT          without a description, by no text at all
 //   report-here GROUP ITEM PROGRESS RESULT DESCRIPTION  by this process, which
 //                   keeps its copy of the plan
 //   say TEXT        on standard output
@@ -65,12 +66,12 @@ void tell_signal(int signal)
 
 // In a process of its own: one that has reported keeps its copy of the plan.
 void report(const std::string &group, const std::string &item, const std::string &progress,
-            const std::string &result, const std::string &description)
+            const std::string &result, const char *description)
 {
     const pid_t reporter = fork();
     if (reporter == 0) {
         FPTEST_SetTransation(group.c_str(), item.c_str(), std::atoi(progress.c_str()),
-                             std::atoi(result.c_str()), description.c_str());
+                             std::atoi(result.c_str()), description);
         _exit(0);
     }
     waitpid(reporter, nullptr, 0);
@@ -129,11 +130,14 @@ int main(int argc, char **argv)
         const std::string &word = words[at];
         const auto next = [&](std::size_t by) { return words.at(at + by); };
         if (word == "report") {
-            report(next(1), name, next(2), next(3), next(4));
+            report(next(1), name, next(2), next(3), next(4).c_str());
             at += 5;
         } else if (word == "report-file") {
-            report(next(1), name, next(2), next(3), file_text(next(4)));
+            report(next(1), name, next(2), next(3), file_text(next(4)).c_str());
             at += 5;
+        } else if (word == "report-null") {
+            report(next(1), name, next(2), next(3), nullptr);
+            at += 4;
         } else if (word == "report-here") {
             FPTEST_SetTransation(next(1).c_str(), next(2).c_str(), std::atoi(next(3).c_str()),
                                  std::atoi(next(4).c_str()), next(5).c_str());

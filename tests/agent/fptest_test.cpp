@@ -16,6 +16,7 @@ using namespace fptest_runner;
 using device::kPlanFile;
 using device::Lines;
 using device::plan_of;
+using device::read_file;
 using device::write_file;
 using ::testing::Contains;
 using ::testing::IsSupersetOf;
@@ -354,8 +355,9 @@ TEST_F(Fptest, SaysWhichFilesItCannotCheck)
 TEST_F(Fptest, SaysThatStandardOutputCannotBeWritten)
 {
     write_file(kPlanFile, plan_of({{"G", {{"Item", ""}}}}));
-    for (const Lines &arguments :
-         {Lines{"show"}, Lines{"check", kPlanFile}, Lines{"--help"}, Lines{"run", "--list"}}) {
+    const std::string broken = file("broken.xml", "<P><CmdGroup></P>");
+    for (const Lines &arguments : {Lines{"show"}, Lines{"check", kPlanFile}, Lines{"check", broken},
+                                   Lines{"--help"}, Lines{"run", "--list"}}) {
         Start start;
         start.arguments = arguments;
         start.output = "/dev/full";
@@ -363,6 +365,24 @@ TEST_F(Fptest, SaysThatStandardOutputCannotBeWritten)
         EXPECT_EQ(ended.status, 3) << arguments[0];
         EXPECT_EQ(ended.err, "fptest: standard output cannot be written\n") << arguments[0];
     }
+}
+
+TEST_F(Fptest, SaysThatStandardOutputIsClosed)
+{
+    write_file(kPlanFile, plan_of({{"G", {{"Item", ""}}}}));
+    const std::vector<std::pair<std::string, std::string>> commands = {
+        {"show", "fptest show"},
+        {std::string("check ") + kPlanFile, "fptest check"},
+        {"send 'XMLFile::<P/>'", "fptest send"},
+        {"run --list", "--list"}};
+    const std::string before = read_file(kPlanFile);
+    for (const auto &[command, who] : commands) {
+        const Ended ended = run_program({"/system/bin/sh", "-c", "fptest " + command + " >&-"});
+        EXPECT_EQ(ended.status, 3) << command;
+        EXPECT_EQ(ended.out,
+                  "fptest: " + who + " wants standard output, which is closed: open it\n");
+    }
+    EXPECT_EQ(read_file(kPlanFile), before);
 }
 
 // --- manual pages -----------------------------------------------------------------------

@@ -376,6 +376,15 @@ TEST_F(ItemEnd, DescriptionThatNoPlanCanHoldCostsNoOtherItem)
     EXPECT_THAT(read_file(kPlanFile), HasSubstr("a\u2401b"));
 }
 
+TEST_F(ItemEnd, NullDescriptionCostsNoOtherItem)
+{
+    const Ended ended = run({{"Item", "report-null G 100 0"}, {"Other", kPasses}});
+    EXPECT_EQ(ended.status, 0) << ended.err;
+    EXPECT_THAT(outcomes(json()), ElementsAre("Item: passed", "Other: passed"));
+    EXPECT_TRUE(ends().at(0).at("description").is_null());
+    EXPECT_THAT(read_file(kPlanFile), HasSubstr("description=\"\""));
+}
+
 TEST_F(ItemEnd, ItemThatDestroysThePlanHasNoResultWhateverItReported)
 {
     for (const std::string way : {"rm", "truncate -s 3"}) {

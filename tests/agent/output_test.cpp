@@ -13,6 +13,7 @@
 #include <array>
 #include <csignal>
 #include <fcntl.h>
+#include <regex>
 #include <string>
 #include <sys/stat.h>
 #include <unistd.h>
@@ -223,6 +224,38 @@ TEST_F(Output, ShowsWhatAnItemSaysWhileItRuns)
     file("go", "");
     EXPECT_EQ(session.wait_for_end(), 0);
     EXPECT_THAT(session.text(), HasSubstr("passed     0  fine"));
+}
+
+TEST_F(Output, ShowsThatAnItemPastItsLimitIsStopping)
+{
+    TerminalSession session({FPTEST_PROGRAM, "run", "--timeout", "0.5", "--grace", "20", "--plan",
+                             plan("<P><CmdGroup name=\"G\"><Cmd name=\"Item\" args=\"ignore-stop "
+                                  "say going-on await /tmp/scene/go\"/></CmdGroup></P>"),
+                             "P/G"},
+                            80, 24);
+    const std::regex line("  Item .* 1\\.[0-9] s  stopping   -  going-on\n");
+    EXPECT_TRUE(session.wait_for([&] { return std::regex_search(session.text(), line); }))
+        << session.text();
+    file("go", "");
+    EXPECT_EQ(session.wait_for_end(), 1);
+    EXPECT_THAT(session.text(), HasSubstr("timed out  -  stopped after "));
+    EXPECT_THAT(session.text(), ::testing::Not(HasSubstr("stopping")));
+}
+
+TEST_F(Output, ShowsWhatTheGathererSaysBeforeItReports)
+{
+    TerminalSession session(
+        {FPTEST_PROGRAM, "run", "--plan",
+         plan("<P><CmdGroup name=\"G\"><Cmd name=\"SensorProbe\" args=\"--help >/dev/null; exec "
+              "/system/bin/Item say warming-up await /tmp/scene/warm gather say gathering await "
+              "/tmp/scene/go\"/></CmdGroup></P>"),
+         "P/G"},
+        80, 24);
+    EXPECT_TRUE(session.wait_for_text("running    -  warming-up")) << session.text();
+    file("warm", "");
+    EXPECT_TRUE(session.wait_for_text("running    -  gathering")) << session.text();
+    file("go", "");
+    EXPECT_EQ(session.wait_for_end(), 1);
 }
 
 TEST_F(Output, SaysEveryTenSecondsWhatAnItemHasSaid)

@@ -174,6 +174,30 @@ TEST_F(Rounds, TakeNothingWhileTheyHaveNotBegun)
     EXPECT_THAT(ended.out, ::testing::EndsWith("\nBail out!  interrupted by SIGTERM\n"));
 }
 
+TEST_F(Rounds, TakeNoMoreMemoryHoweverManyHaveBeenRun)
+{
+    FptestProcess fptest({"run", "--repeat", "500", "--json", work("json"), "--tap", "--plan",
+                          plan("<P><CmdGroup name=\"G\"><Cmd name=\"Item\" args=\"await "
+                               "/tmp/scene/plan.xml\"/></CmdGroup></P>"),
+                          "P/G"});
+    const pid_t module = fptest.module();
+    const auto held_in = [&](int round) {
+        EXPECT_TRUE(wait_for(
+            [&] {
+                return fptest.out().find(" - G (round " + std::to_string(round) + ")\n") !=
+                       std::string::npos;
+            },
+            60));
+        return std::pair(std::stol(device::status_field(fptest.pid(), "VmHWM")),
+                         std::stol(device::status_field(module, "VmRSS")));
+    };
+    const auto [early, early_module] = held_in(50);
+    const auto [late, late_module] = held_in(490);
+    EXPECT_LT(late, early + 512) << "KiB";
+    EXPECT_LT(late_module, early_module + 512) << "KiB";
+    EXPECT_EQ(fptest.wait().status, 1);
+}
+
 // The signal has come before anything was run.
 TEST_F(Rounds, LookAtSignalsFromTheFirstMomentOn)
 {

@@ -1766,6 +1766,9 @@ TEST_F(Refusal, WhereAReportCannotBeWritten)
            "fptest: --log /tmp/nowhere/log cannot be written: No such file or directory; name "
            "another file",
            {"--log", "/tmp/nowhere/log", "--plan", path, "P/Bringup"});
+    expect(3,
+           "fptest: --log /dev/full cannot be written: No space left on device; name another file",
+           {"--log", "/dev/full", "--plan", path, "P/Bringup"});
 }
 
 TEST_F(Run, SaysThatAReportCouldNotBeWrittenToItsEnd)

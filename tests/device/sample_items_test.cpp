@@ -64,35 +64,37 @@ class SampleItems : public Device
     const TemporaryDirectory kept;
 };
 
-TEST_F(SampleItems, SpiCheckReportsTenStepsAndPasses)
+struct Sample {
+    std::string item;
+    int status = 0;
+    Words reports;
+    std::string last;
+};
+
+TEST_F(SampleItems, ReportTheirStepsAndEndAsTheyReport)
 {
-    const Outcome outcome = on_plan("SpiCheck --group sensor --seconds 0.05");
+    const std::vector<Sample> samples = {
+        {"SpiCheck",
+         0,
+         {"10:-2", "20:-2", "30:-2", "40:-2", "50:-2", "60:-2", "70:-2", "80:-2", "90:-2", "100:0"},
+         " progress=\"100\" result=\"0\" description=\"chip 0x1a2b answers at 8 MHz\""},
+        {"DeadPixel",
+         1,
+         {"0:-2", "100:1"},
+         " progress=\"100\" result=\"1\" description=\"3 dead pixels, limit 2\""},
+        {"FingerWait",
+         1,
+         {"0:-2", "100:-2"},
+         " progress=\"100\" result=\"-2\" description=\"no finger within 0.05 s\""},
+    };
+    for (const Sample &sample : samples) {
+        SCOPED_TRACE(sample.item);
+        const Outcome outcome = on_plan(sample.item + " --group sensor --seconds 0.05");
 
-    EXPECT_EQ(outcome.status, 0);
-    EXPECT_EQ(reports(outcome), (Words{"10:-2", "20:-2", "30:-2", "40:-2", "50:-2", "60:-2",
-                                       "70:-2", "80:-2", "90:-2", "100:0"}));
-    EXPECT_EQ(report("SpiCheck"),
-              " progress=\"100\" result=\"0\" description=\"chip 0x1a2b answers at 8 MHz\"");
-}
-
-TEST_F(SampleItems, DeadPixelFailsWithADescription)
-{
-    const Outcome outcome = on_plan("DeadPixel --group sensor --seconds 0.05");
-
-    EXPECT_EQ(outcome.status, 1);
-    EXPECT_EQ(reports(outcome), (Words{"0:-2", "100:1"}));
-    EXPECT_EQ(report("DeadPixel"),
-              " progress=\"100\" result=\"1\" description=\"3 dead pixels, limit 2\"");
-}
-
-TEST_F(SampleItems, FingerWaitEndsUnfinished)
-{
-    const Outcome outcome = on_plan("FingerWait --group sensor --seconds 0.05");
-
-    EXPECT_EQ(outcome.status, 1);
-    EXPECT_EQ(reports(outcome), (Words{"0:-2", "100:-2"}));
-    EXPECT_EQ(report("FingerWait"),
-              " progress=\"100\" result=\"-2\" description=\"no finger within 0.05 s\"");
+        EXPECT_EQ(outcome.status, sample.status);
+        EXPECT_EQ(reports(outcome), sample.reports);
+        EXPECT_EQ(report(sample.item), sample.last);
+    }
 }
 
 TEST_F(SampleItems, BurnInReportsNowAndThenAndPassesInTheEnd)
