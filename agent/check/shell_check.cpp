@@ -167,10 +167,11 @@ void ShellChecker::report_effect(const Item &item, const Effect &effect, std::si
         report_command(item, effect, place);
         break;
     case Effect::Kind::expansion:
-        findings_.error(place, refusal + in_quotes(effect.text) +
-                                   " is a bad substitution; put a "
-                                   "'\\' before its '$' if it is meant "
-                                   "for the item");
+        if (std::string why; shell_.ask_to_expand(effect.text, why) == Shell::Answer::refused) {
+            findings_.error(place, refusal + one_line(why) +
+                                       "; put a '\\' before the '$' here if it is "
+                                       "meant for the item");
+        }
         break;
     case Effect::Kind::substitution:
         if (std::string why; effect.mark == "`" && is_refused(effect.text, why)) {

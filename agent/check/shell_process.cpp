@@ -4,7 +4,9 @@
 #include "check/shell_reader.h"
 #include "common/descriptor.h"
 
+#include <algorithm>
 #include <array>
+#include <cctype>
 #include <cerrno>
 #include <chrono>
 #include <csignal>
@@ -53,12 +55,33 @@ std::optional<std::string> read_all(int descriptor, double seconds)
 Shell::Answer Shell::ask(const std::string &line, std::string &why)
 {
     const auto begin = Clock::now();
-    const Answer answer = ask_once(line, why);
+    const Answer answer = ask_once("-n", line, why);
     left_ -= std::chrono::duration<double>(Clock::now() - begin).count();
     return answer;
 }
 
-Shell::Answer Shell::ask_once(const std::string &line, std::string &why) const
+Shell::Answer Shell::ask_to_expand(const std::string &expansion, std::string &why)
+{
+    const bool has_names =
+        std::ranges::any_of(expansion, [](unsigned char byte) { return std::isalpha(byte); });
+    for (const std::string_view runs : {"`", "$(", "${ ", "${|", "${\t", "${\n", "<(", ">(", "?"}) {
+        const std::size_t at = expansion.find(runs);
+        if (at != expansion.npos && expansion.compare(at, 3, "$((") != 0) {
+            return Answer::unknown;
+        }
+    }
+    // it may divide by a variable, or a variable decides on what is inside
+    if ((has_names && expansion.find_first_of("/%") != expansion.npos) ||
+        (expansion.starts_with("${") && expansion.find("${", 1) != expansion.npos)) {
+        return Answer::unknown;
+    }
+    const auto begin = Clock::now();
+    const Answer answer = ask_once("-f", ": \"" + expansion + "\"", why);
+    left_ -= std::chrono::duration<double>(Clock::now() - begin).count();
+    return answer;
+}
+
+Shell::Answer Shell::ask_once(std::string option, const std::string &line, std::string &why) const
 {
     std::array<int, 2> ends{};
     if (left_ <= 0 || access("/system/bin/sh", X_OK) != 0 || pipe2(ends.data(), O_CLOEXEC) != 0) {
@@ -72,10 +95,9 @@ Shell::Answer Shell::ask_once(const std::string &line, std::string &why) const
     posix_spawn_file_actions_addopen(&actions, STDOUT_FILENO, "/dev/null", O_WRONLY, 0);
     posix_spawn_file_actions_adddup2(&actions, errors.get(), STDERR_FILENO);
     std::string name = "sh";
-    std::string reads_only = "-n";
     std::string takes_text = "-c";
     std::string text = line;
-    const std::array<char *, 5> arguments = {name.data(), reads_only.data(), takes_text.data(),
+    const std::array<char *, 5> arguments = {name.data(), option.data(), takes_text.data(),
                                              text.data(), nullptr};
     const std::array<char *, 1> environment = {nullptr};
     pid_t process = -1;

@@ -16,8 +16,6 @@ using Fault = ShellReading::Fault;
 using Effect = ShellReading::Effect;
 
 constexpr std::string_view kEndsWord = " \t\n;&|<>()";
-constexpr std::string_view kNameCharacters =
-    "abcdefghijklmnopqrstuvwxyzABCDEFGHIJKLMNOPQRSTUVWXYZ0123456789_";
 
 std::string trimmed(std::string_view text)
 {
@@ -480,31 +478,18 @@ class Scanner
         const std::size_t begin = at_;
         at_ += 2;
         const bool is_command = looking_at_any(" \t\n|");
-        // a word inside is expanded only where its turn comes
-        const bool is_bad = braces_ == 0 && !is_command && !may_be_expanded(line_.substr(at_));
-        ++braces_;
+        ++braces_; // a word inside is expanded only where its turn comes
         while (!at_end() && !looking_at("}")) {
             read_character(in_quotes && !is_command);
         }
         --braces_;
         end_at("}", begin, "${");
-        if (is_bad) {
+        if (braces_ == 0 && !is_command) {
             note(Effect::Kind::expansion, begin, "${", begin, at_);
         }
         if (is_command) {
             note(Effect::Kind::substitution, begin, "${", begin + 3, std::max(at_ - 1, begin + 3));
         }
-    }
-
-    // Of what "${" begins; the shell accepts any of it with -n. In doubt, true.
-    static bool may_be_expanded(std::string_view text)
-    {
-        if (text.find_first_of("}&(),.;<>^]{~") == 0) {
-            return false;
-        }
-        const std::size_t name = text.find_first_not_of(kNameCharacters);
-        return name == 0 || name == text.npos ||
-               std::string_view(" \t\n&(),.;<>^]{~|*!").find(text[name]) == text.npos;
     }
 
     void read_pattern()
@@ -533,6 +518,9 @@ class Scanner
                 ++open;
             } else if (looking_at(")")) {
                 if (open == 2 && pass("))")) {
+                    if (mark == "$((" && braces_ == 0) {
+                        note(Effect::Kind::expansion, begin, mark, begin, at_);
+                    }
                     return true;
                 }
                 if (open == 2) {

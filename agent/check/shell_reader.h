@@ -29,7 +29,7 @@ struct ShellReading {
         std::size_t at = 0;
         std::string mark;
         std::string text; // what is run, and may be nothing; else all of it
-        // An expansion is noted only where the shell would give up at it.
+        // "${...}" and "$((...))" are expansions, at which it may give up.
     };
 
     std::optional<Fault> fault;  // the first
@@ -56,13 +56,17 @@ class Shell
     // then is as it was, else what the shell says against the line.
     Answer ask(const std::string &line, std::string &why);
 
+    // The same of an expansion, which has to be tried: with no variables set, and
+    // unknown where that could make a difference, or something would be run.
+    Answer ask_to_expand(const std::string &expansion, std::string &why);
+
     [[nodiscard]] bool is_out_of_time() const
     {
         return left_ <= 0;
     }
 
   private:
-    Answer ask_once(const std::string &line, std::string &why) const;
+    Answer ask_once(std::string option, const std::string &line, std::string &why) const;
 
     double left_; // seconds
 };

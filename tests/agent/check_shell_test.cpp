@@ -237,20 +237,22 @@ TEST(CheckedGrammar, IsTheShellsBetweenBackticksToo)
 TEST(CheckedExpansion, IsAnErrorWhereTheShellGivesUpAtIt)
 {
     EXPECT_EQ(messages(plan_with("a ${b c} d")),
-              "p.xml:3:23: error: the shell would refuse the command line of item 'X': '${b c}' is "
-              "a bad substitution; put a '\\' before its '$' if it is meant for the item\n"
+              "p.xml:3:23: error: the shell would refuse the command line of item 'X': ${b c}: bad "
+              "substitution; put a '\\' before the '$' here if it is meant for the item\n"
               "<Cmd name=\"X\" args=\"a ${b c} d\"/>\n"
               "                      ^\n");
     for (const std::string args : {"${}", "${x;y}", "&quot;${a b}&quot;", "${a^}", "${.}", "${a,}",
-                                   "${a.b}", "$((1 + ${a b}))"}) {
+                                   "${a.b}", "$((1 + ${a b}))", "$((1+))", "$((1/0))", "${x!y}",
+                                   "${1:=x}", "$((a b))", "${x[a b]}", "&quot;$((2 **))&quot;"}) {
         EXPECT_TRUE(has_error(args)) << args;
         EXPECT_FALSE(runs(args)) << args;
     }
     for (const std::string args :
-         {"${a}",     "${a:-b c}", "${a-${b c}}x",  "${#a}", "${a#b}",  "${a%%b}", "${a/b/c}",
-          "${a@Q}",   "${a:0:1}",  "${1}",          "${10}", "${*}",    "${@}",    "${#}",
-          "${?}",     "${$}",      "${!}",          "${-}",  "${a[1]}", "${a[*]}", "$'${'",
-          "\\${a b}", "'${a b}'",  "x || : ${a b}", "${!a}", "${%a}"}) {
+         {"${a}",     "${a:-b c}", "${a-${b c}}x", "${#a}",      "${a#b}",   "${a%%b}",
+          "${a/b/c}", "${a@Q}",    "${a:0:1}",     "${1}",       "${10}",    "${*}",
+          "${@}",     "${#}",      "${?}",         "${$}",       "${!}",     "${-}",
+          "${a[1]}",  "${a[*]}",   "$'${'",        "\\${a b}",   "'${a b}'", "x || : ${a b}",
+          "${!a}",    "${%a}",     "${HOME?}",     "$((1 + 2))", "${a:=b}",  "$((a = 3, 4))"}) {
         EXPECT_FALSE(has_error(args)) << args;
         EXPECT_TRUE(runs("; a=b; : " + args)) << args;
     }
@@ -415,7 +417,8 @@ TEST(CheckedArgs, OfAnyKindAreErrorsWhereTheShellRefusesThem)
         const bool is_error =
             std::ranges::any_of(reading.effects, [&](const ShellReading::Effect &effect) {
                 return effect.kind == ShellReading::Effect::Kind::function ||
-                       effect.kind == ShellReading::Effect::Kind::expansion ||
+                       (effect.kind == ShellReading::Effect::Kind::expansion &&
+                        shell.ask_to_expand(effect.text, why) == Shell::Answer::refused) ||
                        (effect.mark == "`" &&
                         shell.ask(effect.text, why) == Shell::Answer::refused);
             });
