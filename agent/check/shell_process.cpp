@@ -62,17 +62,21 @@ Shell::Answer Shell::ask(const std::string &line, std::string &why)
 
 Shell::Answer Shell::ask_to_expand(const std::string &expansion, std::string &why)
 {
+    const bool is_arithmetic = expansion.starts_with("$((");
     const bool has_names =
         std::ranges::any_of(expansion, [](unsigned char byte) { return std::isalpha(byte); });
-    for (const std::string_view runs : {"`", "$(", "${ ", "${|", "${\t", "${\n", "<(", ">(", "?"}) {
-        const std::size_t at = expansion.find(runs);
-        if (at != expansion.npos && expansion.compare(at, 3, "$((") != 0) {
-            return Answer::unknown;
-        }
+    const std::string_view inside = std::string_view(expansion).substr(is_arithmetic ? 3 : 1);
+    constexpr std::string_view kRuns[] = {"`", "$(", "{ ", "{|", "{\t", "{\n"};
+    constexpr std::string_view kMayEndArithmetic = "'\"\\;#\n";
+    if (std::ranges::any_of(
+            kRuns, [&](std::string_view runs) { return inside.find(runs) != inside.npos; }) ||
+        (is_arithmetic && inside.find_first_of(kMayEndArithmetic) != inside.npos)) {
+        return Answer::unknown;
     }
-    // it may divide by a variable, or a variable decides on what is inside
-    if ((has_names && expansion.find_first_of("/%") != expansion.npos) ||
-        (expansion.starts_with("${") && expansion.find("${", 1) != expansion.npos)) {
+    // it may divide by a variable, or a variable decides what is looked at
+    if (inside.find('?') != inside.npos ||
+        (has_names && inside.find_first_of("/%") != inside.npos) ||
+        (!is_arithmetic && inside.find("${") != inside.npos)) {
         return Answer::unknown;
     }
     const auto begin = Clock::now();

@@ -269,6 +269,15 @@ TEST(CheckedGrammar, IsJudgedWithoutRunningAnything)
                   Shell::Answer::accepted);
         EXPECT_NE(access(file.c_str(), F_OK), 0) << args;
     }
+    for (const std::string &run : {"$(touch " + file + ")", "`touch " + file + "`"}) {
+        for (const std::string &expansion :
+             {"$((1 + " + run + "))", "${a:-" + run + "}", "${a[" + run + "]}", "$((" + run + "))",
+              "${ touch " + file + ";}", "${|touch " + file + ";}",
+              "$((1)); touch " + file + "; ((1))"}) {
+            EXPECT_EQ(Shell().ask_to_expand(expansion, why), Shell::Answer::unknown);
+            EXPECT_NE(access(file.c_str(), F_OK), 0) << expansion;
+        }
+    }
 }
 
 TEST(CheckedGrammar, IsAskedOfTheShellForFiveSecondsInAll)
