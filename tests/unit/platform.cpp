@@ -748,8 +748,10 @@ int qm_sigprocmask(int how, const sigset_t *set, sigset_t *old)
     if (old != nullptr && step.kind != Step::Kind::Return) {
         *old = state().mask;
     }
-    record("sigprocmask(" + std::string(how == SIG_BLOCK ? "SIG_BLOCK" : "SIG_SETMASK") + ", " +
-           set_names(*set) + (old != nullptr ? ", old mask)" : ", null)"));
+    const std::map<int, std::string> names = {
+        {SIG_BLOCK, "SIG_BLOCK"}, {SIG_UNBLOCK, "SIG_UNBLOCK"}, {SIG_SETMASK, "SIG_SETMASK"}};
+    record("sigprocmask(" + names.at(how) + ", " + set_names(*set) +
+           (old != nullptr ? ", old mask)" : ", null)"));
     return static_cast<int>(scripted(step));
 }
 
