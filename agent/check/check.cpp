@@ -385,7 +385,7 @@ class FormChecker
             return "; leave it out";
         case XML_ERROR_UNKNOWN_ENCODING:
         case XML_ERROR_INCORRECT_ENCODING:
-            return "; save it as UTF-8";
+            return "; declare UTF-8, or leave the declaration out";
         default:
             return "; mend it here";
         }

@@ -46,7 +46,11 @@ std::string quoted(std::string_view text)
         {"\xEF\xBF\xBE", "\\uFFFE"},
         {"\xEF\xBF\xBF", "\\uFFFF"},
     };
-    return '"' + replaced(clean(text), kEscapes) + '"';
+    // Perl's reader of YAML takes a longer one for broken
+    constexpr std::size_t kLongest = 60000;
+    constexpr std::size_t kKept = 10000;
+    const std::string whole = '"' + replaced(clean(text), kEscapes) + '"';
+    return whole.size() <= kLongest ? whole : quoted(cut(clean(text), kKept));
 }
 
 std::string plan_line(std::size_t points)

@@ -439,13 +439,14 @@ TEST(CheckedForm, OfBytesThatAreNoUtf8)
     EXPECT_EQ(
         stored("<?xml version=\"1.0\" encoding=\"klingon\"?>\n<P/>"),
         "p.xml:1:31: error: not well-formed, unknown encoding: the module would load it all the "
-        "same, and run what it took from it; save it as UTF-8\n"
+        "same, and run what it took from it; declare UTF-8, or leave the declaration out\n"
         "<?xml version=\"1.0\" encoding=\"klingon\"?>\n"
         "                              ^\n");
     EXPECT_EQ(
         stored("<?xml version=\"1.0\" encoding=\"UTF-16\"?>\n<P/>"),
         "p.xml:1:31: error: not well-formed, encoding specified in XML declaration is incorrect: "
-        "the module would load it all the same, and run what it took from it; save it as UTF-8\n"
+        "the module would load it all the same, and run what it took from it; declare UTF-8, or "
+        "leave the declaration out\n"
         "<?xml version=\"1.0\" encoding=\"UTF-16\"?>\n"
         "                              ^\n");
 }

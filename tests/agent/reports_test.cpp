@@ -1208,6 +1208,20 @@ TEST_F(Prove, IsNotDeceivedByWhatItemsReport)
     }
 }
 
+TEST_F(Prove, ReadsALongDescriptionsBeginning)
+{
+    for (const std::string piece : {"d", "\u2028"}) {
+        ItemRun one = passed("a");
+        one.report.description = "";
+        while (one.report.description->size() < 200000) {
+            *one.report.description += piece;
+        }
+        const Finished finished = proved(run_of({suite("G", {one})}));
+        EXPECT_EQ(finished.status, 0);
+        EXPECT_THAT(finished.output, Not(HasSubstr("Parse errors")));
+    }
+}
+
 TEST_F(TapReport, SaysThatTheDiskIsFullAndStaysQuiet)
 {
     const Stream stream(std::fopen("/dev/full", "w"), &std::fclose);
