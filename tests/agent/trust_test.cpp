@@ -120,7 +120,7 @@ TEST_F(Trust, RefusesAPathThatTheModuleWouldCut)
 TEST_F(Trust, TakesNoEmptyNameForAFile)
 {
     for (const std::string option : {"--plan", "--json", "--junit", "--log"}) {
-        expect_refusal(2, "fptest: " + option + ": an empty name is none; see fptest run --help",
+        expect_refusal(2, "fptest: " + option + ": its value is empty; see fptest run --help",
                        {"run", option, "", "P/G"});
     }
 }
