@@ -50,6 +50,12 @@ std::string real_path(const std::string &path)
     return real ? real.get() : path;
 }
 
+// What is written before it takes the place of the target.
+std::string aside_of(const std::string &target)
+{
+    return target + "." + std::to_string(getpid()) + ".tmp";
+}
+
 // A file without a name, gone with this process.
 Descriptor unnamed_file(const std::string &directory)
 {
@@ -260,7 +266,7 @@ class JunitReport : public Listener
 
     bool replace_file(const Run &run) const
     {
-        const std::string aside = target_ + "." + std::to_string(getpid()) + ".tmp";
+        const std::string aside = aside_of(target_);
         const int flags = O_WRONLY | O_CREAT | O_TRUNC | O_NOFOLLOW | O_CLOEXEC;
         const Descriptor file(open(aside.c_str(), flags, 0666));
         const bool is_written = file.is_open() && write(run, [&file](std::string_view text) {
@@ -311,6 +317,13 @@ class JunitReport : public Listener
 };
 
 } // namespace
+
+std::string junit_obstacle(const std::string &path)
+{
+    const std::string opened = is_replaceable(path) ? aside_of(real_path(path)) : path;
+    const int error = path == "-" ? 0 : Writer::obstacle(opened);
+    return error == 0 ? "" : failure_of(path, error);
+}
 
 std::unique_ptr<Listener> junit_report(const std::string &path)
 {

@@ -10,6 +10,7 @@
 #include <condition_variable>
 #include <csignal>
 #include <fcntl.h>
+#include <filesystem>
 #include <mutex>
 #include <sys/stat.h>
 #include <thread>
@@ -122,6 +123,24 @@ Writer::~Writer()
     const std::lock_guard lock(state_->mutex);
     state_->closed = true;
     state_->changed.notify_all();
+}
+
+int Writer::obstacle(const std::string &path)
+{
+    if (may_block(path)) {
+        return 0;
+    }
+    const bool is_there = access(path.c_str(), F_OK) == 0;
+    const int flags = O_WRONLY | O_NOCTTY | O_CLOEXEC | (is_there ? 0 : O_CREAT);
+    const Descriptor file(::open(path.c_str(), flags, 0666));
+    if (!file.is_open()) {
+        return errno;
+    }
+    if (!is_there) { // a link that leads to it stays
+        std::error_code none;
+        std::filesystem::remove(std::filesystem::canonical(path, none), none);
+    }
+    return 0;
 }
 
 // Signals are for the thread that waits for them. This one is not waited for, as it

@@ -80,6 +80,28 @@ TEST_F(Started, SignalToItsGroupEndsTheRunAndNotTheModulesProcess)
     }
 }
 
+// A long plan waits for the lock of the stored one, between its start and its view.
+TEST_F(Started, TerminalThatClosesIsAnInterruption)
+{
+    device::write_file(kPlanFile, "<P/>");
+    const Descriptor lock(open(kPlanFile, O_RDONLY | O_CLOEXEC));
+    ASSERT_EQ(flock(lock.get(), LOCK_EX), 0);
+    int master = -1;
+    int terminal = -1;
+    std::array<char, 64> name{};
+    ASSERT_EQ(openpty(&master, &terminal, name.data(), nullptr, nullptr), 0);
+    Start start = start_of_run(plan(kOneSleeps + std::string(3000, '\n')));
+    start.output = name.data();
+    FptestProcess fptest(start);
+    ASSERT_NE(fptest.module(), 0);
+    close(terminal);
+    close(master);
+    flock(lock.get(), LOCK_UN);
+    const Ended ended = fptest.wait();
+    EXPECT_EQ(ended.status, 130) << ended.err;
+    expect_whole_reports("interrupted by SIGHUP");
+}
+
 TEST_F(Started, SignalsThatAreIgnoredStayIgnored)
 {
     const std::string path =
