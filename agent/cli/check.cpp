@@ -51,6 +51,9 @@ bool check_file(const std::string &file, const std::string &text, PlanUse use)
 Exit check_files(const CheckOptions &options)
 {
     require_standard_output("fptest check");
+    if (std::ranges::count(options.files, "-") > 1) {
+        throw Failure(Exit::usage, "'-' is given twice: standard input can be read only once");
+    }
     bool sound = true;
     bool readable = true;
     for (const std::string &file : options.files) {

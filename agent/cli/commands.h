@@ -56,7 +56,7 @@ struct SendOptions {
     std::string log;
 };
 
-Exit run(const RunOptions &options);
+Exit run(RunOptions options);
 Exit check_files(const CheckOptions &options);
 Exit show(const std::string &file); // empty: the stored plan
 Exit report(const ReportOptions &options);

@@ -73,6 +73,12 @@ constexpr char kSendExamples[] =
     "  printf 'XMLFile::%s\\0XMLNodePath::demo/Bringup' \"$(cat plan.xml)\" |\n"
     "      adb shell -T fptest send -0";
 
+// What is wrong with a value, which a shell's variable may have left empty.
+std::string refused(const std::string &value, const std::string &why)
+{
+    return value.empty() ? "its value is empty" : "'" + fptest::one_line(value) + "' " + why;
+}
+
 // A whole number or fraction in that range. CLI11's own takes an empty text for 0.
 template <typename Number> CLI::Validator range(Number least, Number most)
 {
@@ -87,9 +93,8 @@ template <typename Number> CLI::Validator range(Number least, Number most)
                 }
                 std::ostringstream complaint;
                 complaint.precision(10);
-                complaint << "'" << fptest::one_line(text) << "' is no number from " << least
-                          << " to " << most;
-                return complaint.str();
+                complaint << "is no number from " << least << " to " << most;
+                return refused(text, complaint.str());
             },
             ""};
 }
@@ -98,6 +103,7 @@ template <typename Number> CLI::Validator range(Number least, Number most)
 CLI::Validator time_span()
 {
     return {[](std::string &text) {
+                constexpr double kMostDays = 1000;
                 static constexpr std::pair<char, double> kUnits[] = {
                     {'s', 1}, {'m', 60}, {'h', 3600}, {'d', 86400}};
                 double number = 0;
@@ -109,8 +115,11 @@ CLI::Validator time_span()
                         seconds = number * size;
                     }
                 }
-                if (!(seconds >= 0.001 && seconds <= 1e8)) {
-                    return "'" + fptest::one_line(text) + "' is no time as 90, 90s, 10m, 2h or 1d";
+                if (seconds > kMostDays * 86400) {
+                    return refused(text, "is longer than 1000 days");
+                }
+                if (!(seconds >= 0.001)) {
+                    return refused(text, "is no time as 90, 90s, 10m, 2h or 1d");
                 }
                 std::ostringstream put_down;
                 put_down.precision(17);
@@ -127,7 +136,7 @@ CLI::Validator result_code()
     return {[](std::string &text) {
                 return text == "0" || text == "1" || text == "-2"
                            ? std::string()
-                           : "'" + fptest::one_line(text) + "' is none of 0, 1 and -2";
+                           : refused(text, "is none of 0, 1 and -2");
             },
             ""};
 }
@@ -138,18 +147,14 @@ CLI::Validator plan_use()
     return {[](std::string &text) {
                 return text == "command" || text == "file"
                            ? std::string()
-                           : "'" + fptest::one_line(text) + "' is neither command nor file";
+                           : refused(text, "is neither command nor file");
             },
             ""};
 }
 
-// A shell's variable that was meant to be set.
 CLI::Validator not_empty()
 {
-    return {[](std::string &text) {
-                return text.empty() ? std::string("an empty name is none") : std::string();
-            },
-            ""};
+    return {[](std::string &text) { return text.empty() ? refused(text, "") : ""; }, ""};
 }
 
 // A plan that device/run has taken the working directory away from.
@@ -184,8 +189,13 @@ class CommandLine
     Exit run(int argc, char **argv)
     {
         require_known_command(argc, argv);
+        std::vector<std::string> words(argv + std::min(argc, 1), argv + argc);
+        if (const CLI::App *command = words.empty() ? nullptr : find(words.front())) {
+            words = fptest::readable(*command, std::move(words));
+        }
+        std::ranges::reverse(words); // as the parser wants them
         try {
-            app_.parse(argc, argv);
+            app_.parse(std::move(words));
         } catch (const CLI::ParseError &error) {
             return app_.exit(error) == 0 ? Exit::success : Exit::usage;
         }
@@ -193,6 +203,13 @@ class CommandLine
     }
 
   private:
+    const CLI::App *find(const std::string &name) const
+    {
+        const auto commands = app_.get_subcommands(nullptr);
+        const auto found = std::ranges::find(commands, name, &CLI::App::get_name);
+        return found == commands.end() ? nullptr : *found;
+    }
+
     // CLI11 would only say that there is none.
     void require_known_command(int argc, char **argv) const
     {
@@ -201,8 +218,8 @@ class CommandLine
         for (const CLI::App *command : app_.get_subcommands(nullptr)) {
             names.push_back(command->get_name());
         }
-        if (word.empty() || std::ranges::find(names, word) != names.end() || word == "--help" ||
-            word == "-h" || word == "--version") {
+        if (word.empty() || find(word) != nullptr || word == "--help" || word == "-h" ||
+            word == "--version") {
             return;
         }
         if (word.starts_with('-')) {

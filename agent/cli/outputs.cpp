@@ -3,6 +3,7 @@
 
 #include "cli/outputs.h"
 
+#include "module/preflight.h"
 #include "plan/plan.h"
 #include "reporters/reporters.h"
 #include "reporters/views.h"
@@ -11,12 +12,15 @@
 
 #include <filesystem>
 #include <sys/stat.h>
+#include <unistd.h>
 #include <utility>
 
 namespace fptest
 {
 namespace
 {
+
+const NamedFile kModulesFile{"the module", kStoredPlan};
 
 // Whether both are one file, by whatever name, of which one would overwrite the
 // other: into a pipe or a terminal both may write.
@@ -35,30 +39,35 @@ bool are_same_file(const std::string &one, const std::string &other)
     return !path.empty() && path == std::filesystem::weakly_canonical(other, none);
 }
 
+// Not of a device that swallows everything: that may be named as often as one likes.
+bool is_standard_output(const std::string &file)
+{
+    struct stat named {
+    };
+    struct stat output {
+    };
+    return file == "-" || (stat(file.c_str(), &named) == 0 && fstat(STDOUT_FILENO, &output) == 0 &&
+                           named.st_dev == output.st_dev && named.st_ino == output.st_ino &&
+                           (!S_ISCHR(output.st_mode) || isatty(STDOUT_FILENO) != 0));
+}
+
 std::vector<std::string> reports_on_standard_output(const RunOptions &options)
 {
     std::vector<std::string> reports;
     if (options.tap) {
         reports.emplace_back("--tap");
     }
-    if (options.json == "-") {
-        reports.emplace_back("--json -");
-    }
-    if (options.junit == "-") {
-        reports.emplace_back("--junit -");
+    for (const NamedFile &report :
+         {NamedFile{"--json", options.json}, {"--junit", options.junit}}) {
+        if (is_standard_output(report.second)) {
+            reports.push_back(label(report));
+        }
     }
     return reports;
 }
 
-} // namespace
-
-void require_different_outputs(const RunOptions &options)
+void require_different(const std::vector<NamedFile> &files)
 {
-    const std::vector<std::pair<std::string, std::string>> files = {{"--plan", options.plan},
-                                                                    {"--json", options.json},
-                                                                    {"--junit", options.junit},
-                                                                    {"--log", options.log},
-                                                                    {"the module", kStoredPlan}};
     for (std::size_t one = 0; one < files.size(); ++one) {
         for (std::size_t other = one + 1; other < files.size(); ++other) {
             const auto &[option, file] = files[one];
@@ -72,6 +81,17 @@ void require_different_outputs(const RunOptions &options)
             }
         }
     }
+}
+
+} // namespace
+
+void settle_outputs(RunOptions &options)
+{
+    require_different({{"--plan", options.plan},
+                       {"--json", options.json},
+                       {"--junit", options.junit},
+                       log_file(options.log),
+                       kModulesFile});
     const auto reports = reports_on_standard_output(options);
     if (reports.size() > 1) {
         throw Failure(Exit::usage,
@@ -79,6 +99,38 @@ void require_different_outputs(const RunOptions &options)
     }
     if (!reports.empty()) {
         require_standard_output(reports.front());
+    }
+    require_log_of_its_own(options.log, reports.empty() ? Beside::view : Beside::results);
+    for (std::string *report : {&options.json, &options.junit}) {
+        if (is_standard_output(*report)) {
+            *report = "-";
+        }
+    }
+}
+
+void require_writable_reports(const RunOptions &options)
+{
+    for (const std::string &obstacle :
+         {options.json.empty() ? "" : json_obstacle(options.json),
+          options.junit.empty() ? "" : junit_obstacle(options.junit)}) {
+        if (!obstacle.empty()) {
+            throw Failure(Exit::environment, obstacle + "; nothing was run");
+        }
+    }
+}
+
+void require_log_of_its_own(const std::string &log, Beside beside)
+{
+    const NamedFile file = log_file(log);
+    require_different({file, kModulesFile});
+    struct stat output {
+    };
+    const bool is_regular = fstat(STDOUT_FILENO, &output) == 0 && S_ISREG(output.st_mode);
+    const bool is_apart = beside == Beside::nothing ||
+                          (!is_regular && (beside == Beside::view || isatty(STDOUT_FILENO) != 0));
+    if (file.second == "-" || (!is_apart && is_standard_output(file.second))) {
+        throw Failure(Exit::usage, label(file) + " is standard output, which is not for the "
+                                                 "module's log: name a file for that");
     }
 }
 

@@ -2,6 +2,7 @@
 // SPDX-License-Identifier: Apache-2.0
 
 #include "cli/commands.h"
+#include "cli/outputs.h"
 #include "module/preflight.h"
 #include "module/stored_plan.h"
 #include "plan/plan.h"
@@ -88,6 +89,7 @@ std::size_t find_item(const Plan &plan, const ReportOptions &options)
 
 Exit report(const ReportOptions &options)
 {
+    require_log_of_its_own(options.log, Beside::nothing);
     choose_log(options.log);
     const Descriptor lock = lock_stored_plan();
     const std::string text = read_stored();

@@ -159,6 +159,18 @@ void place(const Source &source, bool quiet)
     }
 }
 
+void require_nothing_to_report_of_a_list(const RunOptions &options)
+{
+    const std::string report = options.tap              ? "--tap"
+                               : !options.json.empty()  ? "--json"
+                               : !options.junit.empty() ? "--junit"
+                                                        : "";
+    if (options.list && !report.empty()) {
+        throw Failure(Exit::usage, "--list runs nothing that " + report +
+                                       " could tell of: leave one of them out");
+    }
+}
+
 // Kept locked, so that what is looked at now is still so when it is run.
 Descriptor ready_device()
 {
@@ -168,9 +180,10 @@ Descriptor ready_device()
 
 } // namespace
 
-Exit run(const RunOptions &options)
+Exit run(RunOptions options)
 {
-    require_different_outputs(options);
+    require_nothing_to_report_of_a_list(options);
+    settle_outputs(options);
     if (options.as_sent && options.plan.empty()) {
         throw Failure(Exit::usage, "--as-sent is of no use without --plan FILE, which is sent");
     }
@@ -191,6 +204,7 @@ Exit run(const RunOptions &options)
                                    "root/group/item" +
                                        known_groups(source.plan));
     }
+    require_writable_reports(options);
     choose_log(options.log);
     Signals signals;
     std::optional<Host> host(std::in_place);

@@ -2,6 +2,7 @@
 // SPDX-License-Identifier: Apache-2.0
 
 #include "cli/commands.h"
+#include "cli/outputs.h"
 #include "module/module_process.h"
 #include "module/preflight.h"
 #include "module/stored_plan.h"
@@ -125,6 +126,7 @@ Exit send(const SendOptions &options)
     if (options.commands.empty() != options.from_input) {
         throw Failure(Exit::usage, "give COMMANDs as arguments, or with -0 on standard input");
     }
+    require_log_of_its_own(options.log, Beside::results);
     require_device();
     choose_log(options.log);
     const std::vector<std::string> commands =

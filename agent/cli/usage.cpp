@@ -3,6 +3,7 @@
 
 #include "cli/usage.h"
 
+#include "util/failure.h"
 #include "util/text.h"
 
 #include <algorithm>
@@ -45,13 +46,18 @@ std::string mismatch(const CLI::App &command, const std::string &text)
 
 std::string without_option(const CLI::App &command, const std::string &word)
 {
+    const std::string name = word.substr(0, word.find('='));
     std::vector<std::string> names;
+    std::vector<std::string> longer; // of which it is the beginning
     for (const CLI::Option *option : command.get_options()) {
         if (option->get_name().starts_with('-')) {
             names.push_back(option->get_name());
         }
+        if (name.size() > 2 && option->get_name().starts_with(name)) {
+            longer.push_back(option->get_name());
+        }
     }
-    const std::string near = nearest(word, names);
+    const std::string near = longer.size() == 1 ? longer.front() : nearest(word, names);
     return "there is no option '" + one_line(word) + "'" +
            (near.empty() ? "" : "; did you mean '" + near + "'?");
 }
@@ -62,9 +68,13 @@ std::string surplus(const CLI::App &app, const CLI::App &command, const std::str
     if (words.empty()) {
         return text;
     }
-    return words.front().starts_with('-') && words.front() != "-"
-               ? without_option(command, words.front())
-               : "'" + one_line(words.front()) + "' is one argument too many";
+    const std::string &word = words.front();
+    if (!word.starts_with('-') || word == "-") {
+        return "'" + one_line(word) + "' is one argument too many";
+    }
+    return command.get_option_no_throw(word) != nullptr
+               ? word + " is no option where it comes after --: put it before that"
+               : without_option(command, word);
 }
 
 std::string with_help(const std::string &text, const std::string &command)
@@ -74,6 +84,27 @@ std::string with_help(const std::string &text, const std::string &command)
 }
 
 } // namespace
+
+std::vector<std::string> readable(const CLI::App &command, std::vector<std::string> words)
+{
+    for (std::size_t at = 0; at < words.size() && words[at] != "--"; ++at) {
+        const std::string &word = words[at];
+        const CLI::Option *option =
+            word.starts_with("--") && word.find('=') == word.size() - 1
+                ? command.get_option_no_throw(word.substr(0, word.size() - 1))
+                : nullptr;
+        if (option == nullptr) {
+            continue;
+        }
+        if (option->get_expected_max() == 0) {
+            throw Failure(Exit::usage,
+                          with_help(option->get_name() + " takes no value", command.get_name()));
+        }
+        words[at].pop_back();
+        words.insert(words.begin() + static_cast<std::ptrdiff_t>(++at), "");
+    }
+    return words;
+}
 
 std::string unknown_option(const std::string &word, const CLI::App &app)
 {

@@ -7,6 +7,7 @@
 #include <CLI/CLI.hpp>
 
 #include <string>
+#include <vector>
 
 namespace fptest
 {
@@ -14,6 +15,10 @@ namespace fptest
 // "fptest: --plan is given 2 times: give it once; see fptest run --help", with a
 // line feed.
 std::string usage_line(const CLI::App *app, const CLI::Error &error);
+
+// A command's words as the parser is to read them: of "--name=" it would take the next
+// word for the value, which is empty.
+std::vector<std::string> readable(const CLI::App &command, std::vector<std::string> words);
 
 // That the program has no such option, without "fptest: " and a line feed.
 std::string unknown_option(const std::string &word, const CLI::App &app);

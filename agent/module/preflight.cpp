@@ -13,6 +13,7 @@
 #include <cstring>
 #include <fcntl.h>
 #include <netinet/in.h>
+#include <string_view>
 #include <sys/file.h>
 #include <sys/socket.h>
 #include <sys/stat.h>
@@ -24,23 +25,54 @@ namespace
 {
 
 constexpr char kDataDirectory[] = "/data/vorlane";
+constexpr char kLogVariable[] = "VR_LOG_FILE";
+
+// The module's process has other descriptors than this one.
+std::string for_all_processes(const std::string &file)
+{
+    static constexpr std::pair<std::string_view, std::string_view> kOwn[] = {
+        {"/dev/stdout", "1"}, {"/dev/stderr", "2"}, {"/dev/fd/", ""}, {"/proc/self/fd/", ""}};
+    for (const auto &[name, number] : kOwn) {
+        if (number.empty() ? file.starts_with(name) : file == name) {
+            return "/proc/" + std::to_string(getpid()) + "/fd/" + std::string(number) +
+                   file.substr(name.size());
+        }
+    }
+    return file;
+}
 
 } // namespace
 
-void choose_log(const std::string &file)
+std::string label(const NamedFile &file)
 {
-    if (file.empty()) {
-        setenv("VR_LOG_FILE", "/dev/null", 0);
+    return file.first + (file.first.starts_with('-') ? " " : "=") + one_line(file.second);
+}
+
+NamedFile log_file(const std::string &option)
+{
+    const char *inherited = std::getenv(kLogVariable);
+    if (!option.empty() || inherited == nullptr) {
+        return {"--log", option};
+    }
+    return {kLogVariable, inherited};
+}
+
+void choose_log(const std::string &option)
+{
+    const NamedFile file = log_file(option);
+    if (file.second.empty()) {
+        setenv(kLogVariable, "/dev/null", 0);
         return;
     }
+    const std::string path = for_all_processes(file.second);
     const Descriptor log(
-        open(file.c_str(), O_WRONLY | O_CREAT | O_APPEND | O_NONBLOCK | O_CLOEXEC, 0644));
+        open(path.c_str(), O_WRONLY | O_CREAT | O_APPEND | O_NONBLOCK | O_CLOEXEC, 0644));
     // the module says nothing of what it cannot write
     if (!log.is_open() || write(log.get(), "", 0) < 0) {
-        throw Failure(Exit::environment, "--log " + one_line(file) + " cannot be written: " +
+        throw Failure(Exit::environment, label(file) + " cannot be written: " +
                                              std::strerror(errno) + "; name another file");
     }
-    setenv("VR_LOG_FILE", file.c_str(), 1);
+    setenv(kLogVariable, path.c_str(), 1);
 }
 
 void require_device()

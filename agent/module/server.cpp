@@ -272,6 +272,7 @@ void move_descriptor(int from, int to)
 void reset_signals()
 {
     for (const int signal : {SIGINT, SIGQUIT, SIGTERM, SIGHUP, SIGTSTP, SIGWINCH}) {
+        std::signal(signal, SIG_IGN); // one that came before, for the agent, is forgotten
         std::signal(signal, SIG_DFL);
     }
     // not ignored, because items would inherit that
@@ -295,12 +296,12 @@ void raise_descriptor_limit()
 
 void serve_module(int socket, int output)
 {
+    setsid(); // first: what a terminal sends to the agent is still blocked
     reset_signals();
     raise_descriptor_limit();
     prctl(PR_SET_CHILD_SUBREAPER, 1); // what an item leaves behind stays below
     // a suspended agent suspends this process; one that is killed then cannot resume it
     prctl(PR_SET_PDEATHSIG, SIGCONT);
-    setsid();
     const int null = open("/dev/null", O_RDONLY | O_CLOEXEC);
     move_descriptor(null, STDIN_FILENO);
     move_descriptor(output, STDERR_FILENO);

@@ -6,6 +6,7 @@
 #include "reporters/wording.h"
 #include "reporters/writer.h"
 #include "util/text.h"
+#include "util/write.h"
 
 #include <cmath>
 #include <fcntl.h>
@@ -247,6 +248,12 @@ class JsonReport : public Listener
 };
 
 } // namespace
+
+std::string json_obstacle(const std::string &path)
+{
+    const int error = path == "-" ? 0 : Writer::obstacle(path);
+    return error == 0 ? "" : failure_of(path, error);
+}
 
 std::unique_ptr<Listener> json_report(const std::string &path)
 {

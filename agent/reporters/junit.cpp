@@ -15,6 +15,7 @@
 #include <cstdio>
 #include <cstdlib>
 #include <fcntl.h>
+#include <filesystem>
 #include <functional>
 #include <optional>
 #include <string_view>
@@ -42,12 +43,20 @@ bool is_replaceable(const std::string &path)
     return stat(path.c_str(), &status) != 0 || S_ISREG(status.st_mode);
 }
 
-// Behind a symbolic link, which is to stay.
-std::string real_path(const std::string &path)
+// Where a symbolic link leads, which is to stay, also to a file that is not there yet.
+std::string real_path(std::filesystem::path path)
 {
-    const std::unique_ptr<char, decltype(&std::free)> real(realpath(path.c_str(), nullptr),
-                                                           &std::free);
-    return real ? real.get() : path;
+    std::error_code none;
+    for (int links = 0; links < 40 && std::filesystem::is_symlink(path, none); ++links) {
+        path = path.parent_path() / std::filesystem::read_symlink(path, none);
+    }
+    return path;
+}
+
+// What is written before it takes the place of the target.
+std::string aside_of(const std::string &target)
+{
+    return target + "." + std::to_string(getpid()) + ".tmp";
 }
 
 // A file without a name, gone with this process.
@@ -260,9 +269,14 @@ class JunitReport : public Listener
 
     bool replace_file(const Run &run) const
     {
-        const std::string aside = target_ + "." + std::to_string(getpid()) + ".tmp";
+        const std::string aside = aside_of(target_);
         const int flags = O_WRONLY | O_CREAT | O_TRUNC | O_NOFOLLOW | O_CLOEXEC;
         const Descriptor file(open(aside.c_str(), flags, 0666));
+        struct stat old {
+        };
+        if (stat(target_.c_str(), &old) == 0) {
+            static_cast<void>(fchmod(file.get(), old.st_mode & 07777));
+        }
         const bool is_written = file.is_open() && write(run, [&file](std::string_view text) {
                                     return write_text(file.get(), text) == text.size();
                                 });
@@ -311,6 +325,13 @@ class JunitReport : public Listener
 };
 
 } // namespace
+
+std::string junit_obstacle(const std::string &path)
+{
+    const std::string opened = is_replaceable(path) ? aside_of(real_path(path)) : path;
+    const int error = path == "-" ? 0 : Writer::obstacle(opened);
+    return error == 0 ? "" : failure_of(path, error);
+}
 
 std::unique_ptr<Listener> junit_report(const std::string &path)
 {

@@ -29,6 +29,11 @@ std::unique_ptr<Listener> json_report(const std::string &path);
 // killed is no success.
 std::unique_ptr<Listener> junit_report(const std::string &path);
 
+// Why a report could not be begun there, as Listener::failure() would say; empty where
+// it could. Changes nothing.
+std::string json_obstacle(const std::string &path);
+std::string junit_obstacle(const std::string &path);
+
 // TAP 14, a subtest per suite and round, into a stream that stays the caller's. A
 // point is written when its item and those before it have ended. The plan comes first
 // where the number of rounds is known, and else last. A run that ended early bails

@@ -10,6 +10,7 @@
 #include <condition_variable>
 #include <csignal>
 #include <fcntl.h>
+#include <filesystem>
 #include <mutex>
 #include <sys/stat.h>
 #include <thread>
@@ -124,6 +125,24 @@ Writer::~Writer()
     state_->changed.notify_all();
 }
 
+int Writer::obstacle(const std::string &path)
+{
+    if (may_block(path)) {
+        return 0;
+    }
+    const bool is_there = access(path.c_str(), F_OK) == 0;
+    const int flags = O_WRONLY | O_NOCTTY | O_CLOEXEC | (is_there ? 0 : O_CREAT);
+    const Descriptor file(::open(path.c_str(), flags, 0666));
+    if (!file.is_open()) {
+        return errno;
+    }
+    if (!is_there) { // a link that leads to it stays
+        std::error_code none;
+        std::filesystem::remove(std::filesystem::canonical(path, none), none);
+    }
+    return 0;
+}
+
 // Signals are for the thread that waits for them. This one is not waited for, as it
 // may be stuck for good.
 void Writer::start()
@@ -171,13 +190,19 @@ void Writer::write_now(const std::string &text)
         return;
     }
     const std::size_t written = write_text(state_->descriptor, text);
+    const int error = errno;
+    struct stat status {
+    };
+    const bool is_known = is_own_ && fstat(state_->descriptor, &status) == 0;
+    if (is_known && status.st_nlink == 0) {
+        state_->failure = state_->name + ": somebody has removed it";
+        return;
+    }
     if (written == text.size()) {
         return;
     }
-    state_->failure = failure_of(state_->name, errno);
-    struct stat status {
-    };
-    if (is_own_ && fstat(state_->descriptor, &status) == 0) {
+    state_->failure = failure_of(state_->name, error);
+    if (is_known) {
         // where even that fails the last line is left broken, and the failure is told
         [[maybe_unused]] const int result =
             ftruncate(state_->descriptor, status.st_size - static_cast<off_t>(written));

@@ -32,6 +32,11 @@ class Writer
     void write(const std::string &text);
     static constexpr std::size_t kMostWaiting = std::size_t{16} << 20;
 
+    // The error that opening that file for writing meets; 0 where it meets none, or may
+    // take until somebody reads it. The file is left as it is, and one that is not
+    // there is not there afterwards.
+    static int obstacle(const std::string &path);
+
     // Whether some of it is still to be written.
     bool is_pending() const;
     // "out.json: No space left on device"; empty while all is well.

@@ -14,6 +14,7 @@
 #include <chrono>
 #include <cstdio>
 #include <poll.h>
+#include <ranges>
 #include <sstream>
 #include <thread>
 #include <unistd.h>
@@ -233,6 +234,31 @@ void finish(Run &run, const std::vector<Listener *> &listeners)
     }
 }
 
+// A terminal that closes is met as an error as well: its signal is what counts.
+bool is_interrupted(const Signals &signals)
+{
+    pollfd signal{signals.descriptor(), POLLIN, 0};
+    return poll(&signal, 1, 100) > 0;
+}
+
+// The view first: it writes nothing over. Where one of them fails, those that have begun
+// say so.
+void begin(Run &run, const std::vector<Listener *> &listeners, Signals &signals)
+{
+    std::vector<Listener *> begun;
+    for (Listener *listener : std::views::reverse(listeners)) {
+        listener->begin(run);
+        begun.push_back(listener);
+        const std::string failure = listener->failure();
+        if (!failure.empty() && !is_interrupted(signals)) {
+            run.why_unfinished = failure + "; nothing was run";
+            finish(run, begun);
+            flush(begun, signals, true);
+            throw Failure(Exit::environment, run.why_unfinished);
+        }
+    }
+}
+
 Runner::Limits limits_of(const RunOptions &options)
 {
     Runner::Limits limits;
@@ -255,12 +281,7 @@ Exit run_rounds(const RunOptions &options, Host &host, Signals &signals, Run &ru
     }
     run.suites = work.suites;
     run.start = std::chrono::system_clock::now();
-    for (Listener *listener : listeners) {
-        listener->begin(run);
-    }
-    if (const std::string failure = failures(listeners); !failure.empty()) {
-        throw Failure(Exit::environment, failure + "; nothing was run");
-    }
+    begin(run, listeners, signals);
     Runner runner(host, signals, run, listeners, limits_of(options));
     bool broken = false;
     try {

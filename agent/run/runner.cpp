@@ -401,12 +401,14 @@ std::string Runner::why_stopped(const Active &active)
     }
     if (!active.was_stopped) {
         return "ended by itself after " + fine_duration(*item(active.place).seconds) +
-               ", past the limit of " + duration(limits_.item->count());
+               ", past the limit of " + fine_duration(limits_.item->count());
     }
-    const std::string by = active.stop == Outcome::stopped
-                               ? " by " + signal_name(signal_)
-                               : " after " + duration(*item(active.place).seconds);
-    return (active.killed ? "killed" : "stopped") + by +
+    const std::string interruption =
+        (active.killed ? " after the run was interrupted by " : " by ") + signal_name(signal_);
+    const std::string how = active.stop == Outcome::stopped
+                                ? interruption
+                                : " after " + duration(*item(active.place).seconds);
+    return (active.killed ? "killed" : "stopped") + how +
            (active.killed ? ", as it did not end when it was asked to" : "");
 }
 
@@ -445,7 +447,7 @@ std::string Runner::why_silent(const Active &active)
         return "no report could be written: the stored plan is not whole any more";
     }
     return gathers(active) ? "no result was reported within " +
-                                 duration(limits_.item.value_or(kGathering).count())
+                                 fine_duration(limits_.item.value_or(kGathering).count())
                            : "ended without reporting a result";
 }
 

@@ -16,7 +16,7 @@ Signals::Signals()
     sigprocmask(SIG_BLOCK, nullptr, &before_);
     sigemptyset(&set_);
     for (const int signal : {SIGINT, SIGTERM, SIGHUP}) {
-        sigaddset(&set_, signal);
+        add(signal);
     }
     receive();
 }
@@ -26,6 +26,16 @@ Signals::~Signals()
     while (take() != 0) {
     }
     sigprocmask(SIG_SETMASK, &before_, nullptr);
+}
+
+// A signal that is blocked comes though it is ignored.
+void Signals::add(int signal)
+{
+    struct sigaction now {
+    };
+    if (sigaction(signal, nullptr, &now) != 0 || now.sa_handler != SIG_IGN) {
+        sigaddset(&set_, signal);
+    }
 }
 
 void Signals::receive()
@@ -54,7 +64,7 @@ int Signals::take()
 
 void Signals::take_suspensions()
 {
-    sigaddset(&set_, SIGTSTP);
+    add(SIGTSTP);
     receive();
 }
 

@@ -12,7 +12,8 @@
 namespace fptest
 {
 
-// SIGINT, SIGTERM and SIGHUP of this process; on request Ctrl-Z's SIGTSTP, too.
+// SIGINT, SIGTERM and SIGHUP of this process; on request Ctrl-Z's SIGTSTP, too. One
+// that this process was started to ignore, as by nohup, stays ignored.
 class Signals
 {
   public:
@@ -35,6 +36,7 @@ class Signals
     static void suspend();
 
   private:
+    void add(int signal);
     void receive();
 
     sigset_t set_{};

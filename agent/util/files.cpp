@@ -70,9 +70,9 @@ std::optional<std::string> read_file(const std::string &path, int flags)
 
 std::string why_unread()
 {
-    return errno != EFBIG ? std::strerror(errno)
-                          : "longer than the " + std::to_string(kFileLimit >> 20U) +
-                                " MiB that are read of a test plan";
+    return errno != EFBIG
+               ? std::strerror(errno)
+               : "longer than the " + std::to_string(kFileLimit >> 20U) + " MiB that fptest reads";
 }
 
 } // namespace fptest

@@ -138,7 +138,8 @@ void FptestProcess::become(const Start &start) const
     dup2(output_.get(), STDOUT_FILENO);
     dup2(errors_.get(), STDERR_FILENO);
     if (!start.output.empty()) {
-        const int file = open(start.output.c_str(), O_WRONLY | O_CREAT | O_TRUNC, 0644);
+        // a terminal becomes that of the session only where it can be read
+        const int file = open(start.output.c_str(), O_RDWR | O_CREAT | O_TRUNC, 0644);
         dup2(file, STDOUT_FILENO);
         close(file);
     }
@@ -146,6 +147,9 @@ void FptestProcess::become(const Start &start) const
     close_range(STDERR_FILENO + 1, ~0U, CLOSE_RANGE_CLOEXEC);
     for (const int number : {SIGINT, SIGTERM, SIGHUP, SIGQUIT, SIGPIPE}) {
         std::signal(number, SIG_DFL);
+    }
+    for (const int number : start.ignored) {
+        std::signal(number, SIG_IGN);
     }
     unsetenv("QUILLMARK_DEVICE"); // it would say at each start what goes with the device
     for (const auto &[name, value] : start.environment) {

@@ -29,6 +29,7 @@ struct Start {
     bool is_interrupted = false; // SIGINT has come before it does anything
     bool has_own_group = false;  // of processes, as a shell with job control starts it
     bool has_own_session = false;
+    std::vector<int> ignored; // signals, as by nohup
 };
 
 struct Ended {

@@ -185,7 +185,7 @@ TEST_F(LongPlan, LeavesTheOldOneOnAFullDisk)
 
 TEST_F(LongPlan, IsReadUpToSixteenMebibytes)
 {
-    const std::string why = "longer than the 16 MiB that are read of a test plan";
+    const std::string why = "longer than the 16 MiB that fptest reads";
     expect_refusal(2, "fptest: /dev/zero: " + why, {"check", "/dev/zero"});
     expect_refusal(2, "fptest: /dev/zero: " + why, {"show", "/dev/zero"});
     expect_refusal(2, "fptest: /dev/zero: " + why, {"run", "--plan", "/dev/zero", "P/G"});

@@ -5,6 +5,7 @@
 #include "fptest_runner.h"
 #include "report_files.h"
 #include "terminal_session.h"
+#include "util/text.h"
 
 #include <gmock/gmock.h>
 #include <nlohmann/json.hpp>
@@ -61,6 +62,29 @@ class Output : public FptestTest
     {
         EXPECT_EQ(mkfifo(work("fifo").c_str(), 0600), 0);
         return Descriptor(open(work("fifo").c_str(), O_RDONLY | O_NONBLOCK | O_CLOEXEC));
+    }
+
+    // Of the log that --log names, and of one that VR_LOG_FILE does. The text has "{}" for
+    // what names it, "{=}" where the file follows. Standard output is a file.
+    static void expect_log_refusal(int status, const device::Lines &arguments,
+                                   const std::string &log, const std::string &text)
+    {
+        for (const std::string name : {"--log", "VR_LOG_FILE"}) {
+            Start start;
+            start.arguments = arguments;
+            start.output = work("out");
+            if (name == "--log") {
+                start.arguments.insert(start.arguments.begin() + 1, {name, log});
+            } else {
+                start.environment[name] = log;
+            }
+            const fptest::Replacement names[] = {
+                {"{}", name}, {"{=}", name == "--log" ? "--log " : "VR_LOG_FILE="}};
+            const Ended ended = run_fptest(start);
+            EXPECT_EQ(ended.status, status) << ::testing::PrintToString(arguments);
+            EXPECT_EQ(ended.err, "fptest: " + fptest::replaced(text, names) + "\n");
+            EXPECT_EQ(read_file(work("out")), "");
+        }
     }
 
     static std::string read_to_end(const Descriptor &reader)
@@ -187,16 +211,48 @@ TEST_F(Output, OneReportAtMostGoesToStandardOutput)
                    {"run", "--tap", "--json", "-", "--junit", "-", "--plan", path, "P/G"});
 }
 
-TEST_F(Output, JunitMayNameStandardOutputThatIsAFile)
+TEST_F(Output, StandardOutputMayHaveAnotherName)
+{
+    for (const std::string name :
+         {"/dev/stdout", "/proc/self/fd/1", "/dev/fd/1", "/tmp/scene/out"}) {
+        SCOPED_TRACE(name);
+        Start start;
+        start.arguments = {"run", "--junit", name, "--plan", plan(kLoud), "P/G/Third"};
+        start.output = work("out");
+        Ended ended = run_fptest(start);
+        EXPECT_EQ(ended.status, 0);
+        EXPECT_EQ(ended.err, "");
+        EXPECT_EQ(parse_xml(read_file(work("out"))).attributes.at("tests"), "1");
+        start.arguments.at(1) = "--json";
+        EXPECT_EQ(run_fptest(start).status, 0);
+        EXPECT_THAT(outcomes(read_file(work("out"))), ElementsAre("Third: passed"));
+        EXPECT_THAT(read_file(work("out")), ::testing::StartsWith("{\"event\":\"run\""));
+    }
+}
+
+TEST_F(Output, OneReportAtMostGoesToStandardOutputByWhateverName)
+{
+    for (const std::string name : {"/dev/stdout", "/proc/self/fd/1", "/tmp/scene/out"}) {
+        Start start;
+        start.arguments = {"run", "--tap", "--json", name, "--plan", plan(kLoud), "P/G/Third"};
+        start.output = work("out");
+        const Ended ended = run_fptest(start);
+        EXPECT_EQ(ended.status, 2);
+        EXPECT_EQ(ended.err, "fptest: --tap and --json " + name +
+                                 " each want standard output: give all but one a file\n");
+        EXPECT_EQ(read_file(work("out")), "");
+    }
+}
+
+TEST_F(Output, WhatSwallowsEverythingMayBeNamedForAll)
 {
     Start start;
-    start.arguments = {"run",    "--quiet",   "--junit",  "/dev/stdout",
-                       "--plan", plan(kLoud), "P/G/Third"};
-    start.output = work("out");
+    start.arguments = {"run",         "--tap",  "--json",    "/dev/null", "--junit",
+                       "/dev/stdout", "--plan", plan(kLoud), "P/G/Third"};
+    start.output = "/dev/null";
     const Ended ended = run_fptest(start);
     EXPECT_EQ(ended.status, 0);
     EXPECT_EQ(ended.err, "");
-    EXPECT_EQ(parse_xml(read_file(work("out"))).attributes.at("tests"), "1");
 }
 
 TEST_F(Output, FileThatHasTwoNamesIsWantedByOne)
@@ -208,6 +264,138 @@ TEST_F(Output, FileThatHasTwoNamesIsWantedByOne)
                    "fptest: --json and --junit both want the file /tmp/scene/one: give them files "
                    "of their own",
                    {"run", "--json", work("one"), "--junit", work("two"), "--plan", path, "P/G"});
+}
+
+TEST_F(Output, ListHasNoReports)
+{
+    for (const device::Lines &report :
+         {device::Lines{"--junit", work("out")}, {"--json", "-"}, {"--tap"}}) {
+        device::Lines arguments = {"run", "--list", "--plan", plan("<P/>")};
+        arguments.insert(arguments.end(), report.begin(), report.end());
+        expect_refusal(2,
+                       "fptest: --list runs nothing that " + report.front() +
+                           " could tell of: leave one of them out",
+                       arguments);
+    }
+    EXPECT_FALSE(is_there("out"));
+}
+
+// --- the module's log -----------------------------------------------------------------
+
+TEST_F(Output, LogIsAFileOfItsOwnWhoeverNamesIt)
+{
+    const std::string path = plan(kLoud);
+    const std::vector<std::pair<device::Lines, std::string>> commands = {
+        {{"run", "--json", work("file"), "--plan", path, "P/G"}, "--json"},
+        {{"run", "--junit", work("file"), "--plan", path, "P/G"}, "--junit"},
+        {{"run", "--plan", work("file"), "P/G"}, "--plan"}};
+    file("file", kLoud);
+    for (const auto &[arguments, option] : commands) {
+        expect_log_refusal(2, arguments, work("file"),
+                           option + " and {} both want the file /tmp/scene/file: give them files "
+                                    "of their own");
+    }
+    EXPECT_EQ(read_file(work("file")), kLoud);
+}
+
+TEST_F(Output, LogIsNeverTheStoredPlan)
+{
+    device::write_file(device::kPlanFile, kLoud);
+    for (const device::Lines &arguments :
+         {device::Lines{"run", "P/G"},
+          {"send", "pingtest"},
+          {"report", "G", "Item", "--progress", "1", "--result", "0"}}) {
+        expect_log_refusal(2, arguments, device::kPlanFile,
+                           "{} and the module both want the file /data/vorlane/src1.xml: give "
+                           "them files of their own");
+    }
+    EXPECT_EQ(read_file(device::kPlanFile), kLoud);
+}
+
+TEST_F(Output, LogThatCannotBeWrittenIsRefusedWhoeverNamesIt)
+{
+    device::write_file(device::kPlanFile, kLoud);
+    for (const device::Lines &arguments :
+         {device::Lines{"run", "P/G"},
+          {"send", "pingtest"},
+          {"report", "G", "Item", "--progress", "1", "--result", "0"}}) {
+        expect_log_refusal(3, arguments, "/nowhere/log",
+                           "{=}/nowhere/log cannot be written: No such file or directory; name "
+                           "another file");
+    }
+}
+
+TEST_F(Output, LogIsNotStandardOutput)
+{
+    device::write_file(device::kPlanFile, kLoud);
+    const std::string why = " is standard output, which is not for the module's log: name a file "
+                            "for that";
+    for (const device::Lines &arguments :
+         {device::Lines{"run", "P/G"},
+          {"send", "pingtest"},
+          {"report", "G", "Item", "--progress", "1", "--result", "0"}}) {
+        expect_log_refusal(2, arguments, "-", "{=}-" + why);
+    }
+    for (const device::Lines &arguments :
+         {device::Lines{"run", "P/G"}, {"run", "--tap", "P/G"}, {"send", "pingtest"}}) {
+        expect_log_refusal(2, arguments, "/dev/stdout", "{=}/dev/stdout" + why);
+        expect_log_refusal(2, arguments, work("out"), "{=}/tmp/scene/out" + why);
+    }
+    EXPECT_FALSE(is_there("-"));
+}
+
+// In the module's process it would be where items print.
+TEST_F(Output, LogMayBeStandardError)
+{
+    const Ended ended = run_fptest({"run", "--log", "/dev/stderr", "--json", work("json"), "--plan",
+                                    plan(kLoud), "P/G/Third"});
+    EXPECT_EQ(ended.status, 0);
+    EXPECT_THAT(ended.err, HasSubstr("=> Input cmdline : P/G/Third"));
+    EXPECT_EQ(events_of(read_file(work("json")), "end").at(0).at("output"), "");
+}
+
+// --- a report that cannot be begun ------------------------------------------------------
+
+TEST_F(Output, ReportThatCannotBeBegunCostsNoOther)
+{
+    device::write_file(device::kPlanFile, kLoud);
+    const std::string earlier = "what an earlier run has left";
+    file("json", earlier);
+    file("junit", earlier);
+    expect_refusal(3, "fptest: /nowhere/x: No such file or directory; nothing was run",
+                   {"run", "--json", work("json"), "--junit", "/nowhere/x", "P/G"});
+    expect_refusal(3, "fptest: /nowhere/x: No such file or directory; nothing was run",
+                   {"run", "--junit", work("junit"), "--json", "/nowhere/x", "P/G"});
+    Start start;
+    start.arguments = {"run", "--json", work("json"), "--junit", work("junit"), "P/G"};
+    start.output = "/dev/full";
+    const Ended ended = run_fptest(start);
+    EXPECT_EQ(ended.status, 3);
+    EXPECT_EQ(ended.err, "fptest: standard output: No space left on device; nothing was run\n");
+    EXPECT_EQ(read_file(work("json")), earlier);
+    EXPECT_EQ(read_file(work("junit")), earlier);
+    EXPECT_EQ(read_file(device::kPlanFile), kLoud);
+    expect_refusal(3, "fptest: /nowhere/x: No such file or directory; nothing was run",
+                   {"run", "--json", work("new"), "--junit", "/nowhere/x", "P/G"});
+    EXPECT_FALSE(is_there("new"));
+}
+
+TEST_F(Output, ReportThatHasBegunSaysThatNothingWasRun)
+{
+    if (is_in_place()) {
+        GTEST_SKIP() << "in place, the disk is the container's own and is not to be filled";
+    }
+    device::write_file(device::kPlanFile, kLoud);
+    fill_disk();
+    const Ended ended =
+        run_fptest({"run", "--json", "/data/vorlane/json", "--junit", work("junit"), "P/G/Third"});
+    const std::string why = "/data/vorlane/json: No space left on device; nothing was run";
+    EXPECT_EQ(ended.status, 3);
+    EXPECT_EQ(ended.err, "fptest: " + why + "\n");
+    EXPECT_THAT(ended.out, HasSubstr("\nnot finished: " + why + "\n"));
+    auto suite = parse_xml(read_file(work("junit"))).children.at(0);
+    EXPECT_EQ(suite.properties()["finished"], "false");
+    EXPECT_EQ(suite.properties()["reason"], why);
 }
 
 // --- while an item runs ---------------------------------------------------------------

@@ -817,6 +817,26 @@ TEST_F(JunitReport, KeepsALinkToItsFile)
     EXPECT_THAT(directory_.names(), ElementsAre("target", "xml"));
 }
 
+TEST_F(JunitReport, GoesWhereALinkLeadsThoughThatIsNotThereYet)
+{
+    ASSERT_EQ(symlink("next", path("xml").c_str()), 0);
+    ASSERT_EQ(symlink("target", path("next").c_str()), 0);
+    EXPECT_THAT(junit_of(mixed_run()), StartsWith("<?xml"));
+    EXPECT_THAT(read_file(path("target")), StartsWith("<?xml"));
+    EXPECT_THAT(directory_.names(), ElementsAre("next", "target", "xml"));
+}
+
+TEST_F(JunitReport, KeepsThePermissionsOfItsFile)
+{
+    write_file(path("xml"), "old");
+    ASSERT_EQ(chmod(path("xml").c_str(), 0604), 0);
+    junit_of(mixed_run());
+    struct stat status {
+    };
+    ASSERT_EQ(stat(path("xml").c_str(), &status), 0);
+    EXPECT_EQ(status.st_mode & 07777, 0604U);
+}
+
 TEST_F(JunitReport, HasThePermissionsOfAnyNewFile)
 {
     const mode_t mask = umask(0027);

@@ -131,11 +131,16 @@ TEST_F(Rounds, EndAfterTheirNumberWhereThatComesBeforeTheTime)
 
 TEST_F(Rounds, TakeNoTimeThatIsNone)
 {
-    for (const std::string wrong : {"0", "-1", "x", "", "1w", "1 h", "h", "1e300d"}) {
+    for (const std::string wrong : {"0", "-1", "x", "1w", "1 h", "h", "nan", "0.0001"}) {
         expect_refusal(2,
                        "fptest: --for: '" + wrong +
                            "' is no time as 90, 90s, 10m, 2h or 1d; see fptest run --help",
                        {"run", "--for", wrong, "P/G"});
+    }
+    for (const std::string wrong : {"1001d", "99999999999d", "1e300d"}) {
+        expect_refusal(
+            2, "fptest: --for: '" + wrong + "' is longer than 1000 days; see fptest run --help",
+            {"run", "--for", wrong, "P/G"});
     }
 }
 

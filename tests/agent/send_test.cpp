@@ -89,6 +89,10 @@ TEST_F(Send, ReadsAndWritesZeroBytesWhereThatIsWanted)
     ended = run_fptest({"send", "-0"}, "");
     EXPECT_EQ(ended.status, 2);
     EXPECT_EQ(ended.err, "fptest: no command can be read from standard input\n");
+    ended = run_fptest({"send", "-0"}, std::string((16U << 20U) + 1, 'x'));
+    EXPECT_EQ(ended.status, 2);
+    EXPECT_EQ(ended.err, "fptest: no command can be read from standard input: longer than the 16 "
+                         "MiB that fptest reads\n");
 }
 
 TEST_F(Send, StoresAndRunsAPlan)

@@ -97,6 +97,7 @@ TerminalSession::TerminalSession(const std::vector<std::string> &arguments, int 
         setenv("TERM", "xterm-256color", 1);
         unsetenv("NO_COLOR");
         unsetenv("QUILLMARK_DEVICE"); // it would say at each start what goes with the device
+        std::signal(SIGHUP, SIG_DFL); // the tests may have been started by nohup
         become(arguments, environment);
     }
 }

@@ -174,25 +174,23 @@ TEST_F(Trust, LeavesTheGathererThatStaysRoomForWhatItPrints)
 TEST_F(Trust, NamesEveryReportThatFailsThoughTheRunIsInterrupted)
 {
     for (const int signal : {0, SIGINT}) {
-        fptest_runner::Start start;
         std::vector<Descriptor> readers;
-        for (const std::string name : {"json", "tap"}) {
+        for (const std::string name : {"json", "junit"}) {
             unlink(work(name).c_str());
             ASSERT_EQ(mkfifo(work(name).c_str(), 0600), 0);
             readers.emplace_back(open(work(name).c_str(), O_RDONLY | O_NONBLOCK | O_CLOEXEC));
         }
         const std::string text = device::plan_of(
             {{"G", {{"Item", "note /tmp/scene/begun await /tmp/scene/go report G 100 0 x"}}}});
-        start.arguments = {"run", "--json", work("json"), "--tap", "--plan", plan(text), "P/G"};
-        start.output = work("tap");
-        FptestProcess fptest(start);
+        FptestProcess fptest(
+            {"run", "--json", work("json"), "--junit", work("junit"), "--plan", plan(text), "P/G"});
         ASSERT_TRUE(wait_for_file("begun"));
         readers.clear();
         signal == 0 ? static_cast<void>(file("go", "")) : fptest.signal(signal);
         const Ended ended = fptest.wait();
         EXPECT_EQ(ended.status, signal == 0 ? 3 : 130);
         EXPECT_THAT(ended.err, HasSubstr(work("json") + ": Broken pipe"));
-        EXPECT_THAT(ended.err, HasSubstr("the TAP output: Broken pipe"));
+        EXPECT_THAT(ended.err, HasSubstr(work("junit") + ": Broken pipe"));
         unlink(work("go").c_str());
         unlink(work("begun").c_str());
     }
@@ -239,7 +237,7 @@ TEST_F(Trust, RefusesAPathThatTheModuleWouldCut)
 TEST_F(Trust, TakesNoEmptyNameForAFile)
 {
     for (const std::string option : {"--plan", "--json", "--junit", "--log"}) {
-        expect_refusal(2, "fptest: " + option + ": an empty name is none; see fptest run --help",
+        expect_refusal(2, "fptest: " + option + ": its value is empty; see fptest run --help",
                        {"run", option, "", "P/G"});
     }
 }

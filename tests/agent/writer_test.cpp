@@ -191,4 +191,16 @@ TEST_F(WriterTest, TellsAtOnceWhatCannotBeOpened)
               path + ": No such file or directory");
 }
 
+TEST(WrittenFile, MustBeThereStill)
+{
+    const Directory directory;
+    const std::string path = directory.path("file");
+    Writer writer(path, O_WRONLY | O_CREAT | O_APPEND, 0600);
+    writer.write("a");
+    EXPECT_EQ(writer.failure(), "");
+    ASSERT_EQ(unlink(path.c_str()), 0);
+    writer.write("b");
+    EXPECT_EQ(writer.failure(), path + ": somebody has removed it");
+}
+
 } // namespace

@@ -1,0 +1,125 @@
+// SPDX-FileCopyrightText: 2026 The Quillmark authors
+// SPDX-License-Identifier: Apache-2.0
+
+// Signals in the first moments of fptest run, and those that it was started to ignore.
+#include "fptest_runner.h"
+#include "report_files.h"
+
+#include <array>
+#include <chrono>
+#include <csignal>
+#include <fcntl.h>
+#include <pty.h>
+#include <string>
+#include <sys/file.h>
+#include <unistd.h>
+
+using namespace fptest_runner;
+using device::kPlanFile;
+using device::read_file;
+using device::wait_for;
+using report_files::events_of;
+using report_files::outcomes;
+using report_files::parse_xml;
+using ::testing::ElementsAre;
+
+namespace
+{
+
+constexpr char kOneSleeps[] = "<P><CmdGroup name=\"G\">"
+                              "<Cmd name=\"Item\" args=\"note /tmp/scene/begun sleep 60\"/>"
+                              "</CmdGroup></P>";
+
+class Started : public FptestTest
+{
+  protected:
+    static Start start_of_run(const std::string &path)
+    {
+        Start start;
+        start.arguments = {"run",         "--json", work("json"), "--junit",
+                           work("junit"), "--plan", path,         "P/G"};
+        start.has_own_session = true;
+        return start;
+    }
+
+    static void expect_whole_reports(const std::string &reason)
+    {
+        EXPECT_EQ(events_of(read_file(work("json")), "finish").at(0).at("reason"), reason);
+        auto suite = parse_xml(read_file(work("junit"))).children.at(0);
+        EXPECT_EQ(suite.properties()["reason"], reason);
+    }
+
+    // Without the pauses of wait_for(), so that its process is met when it is new.
+    static bool has_child(pid_t pid)
+    {
+        const std::string children =
+            "/proc/" + std::to_string(pid) + "/task/" + std::to_string(pid) + "/children";
+        const auto end = std::chrono::steady_clock::now() + std::chrono::seconds(10);
+        while (std::chrono::steady_clock::now() < end) {
+            if (!read_file(children).empty()) {
+                return true;
+            }
+        }
+        return false;
+    }
+};
+
+TEST_F(Started, SignalToItsGroupEndsTheRunAndNotTheModulesProcess)
+{
+    for (int turn = 0; turn < 60; ++turn) {
+        const int signal = std::array{SIGINT, SIGTERM, SIGHUP}.at(turn % 3);
+        FptestProcess fptest(start_of_run(plan(kOneSleeps)));
+        ASSERT_TRUE(has_child(fptest.pid()));
+        usleep(static_cast<useconds_t>(turn) * 5);
+        ASSERT_EQ(kill(-fptest.pid(), signal), 0);
+        const Ended ended = fptest.wait();
+        ASSERT_EQ(ended.status, 130) << "turn " << turn << ": " << ended.err;
+        expect_whole_reports(std::string("interrupted by ") + (signal == SIGINT    ? "Ctrl-C"
+                                                               : signal == SIGTERM ? "SIGTERM"
+                                                                                   : "SIGHUP"));
+    }
+}
+
+// A long plan waits for the lock of the stored one, between its start and its view.
+TEST_F(Started, TerminalThatClosesIsAnInterruption)
+{
+    device::write_file(kPlanFile, "<P/>");
+    const Descriptor lock(open(kPlanFile, O_RDONLY | O_CLOEXEC));
+    ASSERT_EQ(flock(lock.get(), LOCK_EX), 0);
+    int master = -1;
+    int terminal = -1;
+    std::array<char, 64> name{};
+    ASSERT_EQ(openpty(&master, &terminal, name.data(), nullptr, nullptr), 0);
+    Start start = start_of_run(plan(kOneSleeps + std::string(3000, '\n')));
+    start.output = name.data();
+    FptestProcess fptest(start);
+    ASSERT_NE(fptest.module(), 0);
+    close(terminal);
+    close(master);
+    flock(lock.get(), LOCK_UN);
+    const Ended ended = fptest.wait();
+    EXPECT_EQ(ended.status, 130) << ended.err;
+    expect_whole_reports("interrupted by SIGHUP");
+}
+
+TEST_F(Started, SignalsThatAreIgnoredStayIgnored)
+{
+    const std::string path =
+        plan("<P><CmdGroup name=\"G\"><Cmd name=\"Item\" args=\"note /tmp/scene/begun "
+             "await /tmp/scene/go report G 100 0 fine\"/></CmdGroup></P>");
+    for (const int signal : {SIGHUP, SIGINT}) {
+        Start start = start_of_run(path);
+        start.ignored = {signal};
+        FptestProcess fptest(start);
+        ASSERT_TRUE(wait_for_file("begun"));
+        fptest.signal(signal);
+        usleep(200'000);
+        file("go", "");
+        EXPECT_EQ(fptest.wait().status, 0);
+        EXPECT_THAT(outcomes(read_file(work("json"))), ElementsAre("Item: passed"));
+        unlink(work("begun").c_str());
+        unlink(work("go").c_str());
+    }
+}
+
+} // namespace
