@@ -173,6 +173,6 @@ be_the_device()
 	[[ -z $out ]] || cd -- "$out" || exit 125
 	PATH=/system/bin TMPDIR=/tmp QUILLMARK_DEVICE=in-place QUILLMARK_DEVICE_RUN=$run_mark \
 		"$supervise" here "$signals" "$mksh" "$device/start" "$supervise" "$signals" "$vendor" \
-		"$@" <&0 {lock}<&- &
+		"$scripts" "$@" <&0 {lock}<&- &
 	wait_for_command $!
 }

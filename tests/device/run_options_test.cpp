@@ -190,16 +190,20 @@ TEST_F(Reports, ThatStayAreSaidNothingOf)
 
 // ---- --bin ----------------------------------------------------------------------
 
-TEST(UsersPrograms, ThatAreLinksToNowhereAreRefused)
+TEST(UsersPrograms, ThatCannotBeOnTheDeviceAreRefusedByOneLineEach)
 {
     const TemporaryDirectory own;
     fs::create_symlink("gone/MyItem", own.path() / "MyItem");
+    fs::create_symlink("gone/Other", own.path() / "Other");
+    own.program("ps", "");
 
     const Outcome outcome = refused({"--bin", own.path(), "--", "true"});
 
     EXPECT_EQ(outcome.status, 125);
-    EXPECT_EQ(outcome.err, "device/run: --bin " + own.path().string() +
-                               ": MyItem is a link that leads nowhere: to gone/MyItem\n");
+    const std::string start = "device/run: --bin " + own.path().string() + ": ";
+    EXPECT_EQ(outcome.err, start + "MyItem is a link that leads nowhere: to gone/MyItem\n" + start +
+                               "Other is a link that leads nowhere: to gone/Other\n" + start +
+                               "ps is the device's own and cannot be replaced\n");
 }
 
 class UsersProgram : public Device
@@ -233,6 +237,30 @@ TEST_F(UsersProgram, MayBeALinkToOneOutsideOfTheDirectory)
     for (const std::string name : {"MyItem", "MyItem_ca"}) {
         EXPECT_EQ(on_device({name}, {"--bin", own.path()}).out, name + "\n");
     }
+}
+
+TEST_F(UsersProgram, WhoseInterpreterIsMissingIsNamed)
+{
+    const TemporaryDirectory own;
+    own.program("A", "#!/nowhere/python3\n");
+    own.program("B", "#! /usr/bin/env nowhere -x\n");
+    own.program("C", "#!/system/bin/sh\r\n");
+    own.program("D", "#!/system/bin/sh -e\necho mine\n");
+    own.program("E", "#!/usr/bin/env -S sh\n");
+    own.program("F", "no script\n");
+
+    const Outcome outcome = on_device({"D"}, {"--bin", own.path()});
+
+    EXPECT_EQ(outcome.out, "mine\n");
+    EXPECT_EQ(outcome.status, 0);
+    Words said = lines(outcome.err);
+    std::erase_if(said, [](auto &line) { return line.starts_with("device/run: in place: "); });
+    const auto missing = [](const std::string &name, const std::string &interpreter) {
+        return "device/run: --bin: " + name + " cannot be started: there is no " + interpreter +
+               " on the device";
+    };
+    EXPECT_EQ(said, (Words{missing("A", "/nowhere/python3"), missing("B", "nowhere"),
+                           missing("C", "/system/bin/sh\\r")}));
 }
 
 TEST_F(UsersProgram, NeedNotBeThere)
