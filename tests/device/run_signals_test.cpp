@@ -13,6 +13,7 @@
 #include <cstdio>
 #include <fcntl.h>
 #include <pty.h>
+#include <stdexcept>
 #include <sys/wait.h>
 #include <thread>
 #include <unistd.h>
@@ -236,18 +237,18 @@ TEST_F(Device, CtrlCComesToCommandOnce)
 // ---- signals ----------------------------------------------------------------
 
 // A device in a process group of its own, started by a process that starts nothing
-// else. What it says goes to a file.
+// else. What it says goes to a file, its errors elsewhere where that is wanted.
 class SignalledDevice
 {
   public:
-    explicit SignalledDevice(const Words &command, const Words &options = {})
+    explicit SignalledDevice(const Words &command, const Words &options = {}, int errors = -1)
     {
         pid_ = fork();
         if (pid_ == 0) {
             setpgid(0, 0);
             const int file = open(said().c_str(), O_WRONLY | O_CREAT | O_APPEND, 0600);
             dup2(file, STDOUT_FILENO);
-            dup2(file, STDERR_FILENO);
+            dup2(errors < 0 ? file : errors, STDERR_FILENO);
             close(file);
             become(Words{device_run} + options + Words{"--"} + command,
                    {.directory = directory_.path()});
@@ -391,18 +392,79 @@ TEST_F(Device, ACommandThatGoesOnIsEndedWithItTenSecondsLater)
     }
 }
 
-TEST_F(Device, ASignalBeforeCommandHasBegunEndsItAtOnce)
+TEST_F(Device, ASignalAtItsStartEndsItAtOnceAndLeavesNothingRunning)
 {
-    for (const auto delay : {20ms, 60ms, 100ms}) {
-        SignalledDevice device({"sleep", "30"});
-        std::this_thread::sleep_for(delay);
-        const auto begin = std::chrono::steady_clock::now();
+    for (const int number : {SIGTERM, SIGHUP}) {
+        for (auto delay = 0ms; delay <= 200ms; delay += 20ms) {
+            SCOPED_TRACE(sigabbrev_np(number) + std::to_string(delay.count()));
+            const std::string length = unique_length();
+            SignalledDevice device({"timeout", "20", "sleep", length});
+            std::this_thread::sleep_for(delay);
+            const auto begin = std::chrono::steady_clock::now();
 
-        device.signal(SIGTERM);
+            device.signal(number);
 
-        EXPECT_EQ(device.wait(), 143);
-        EXPECT_LT(std::chrono::steady_clock::now() - begin, 9s);
+            EXPECT_EQ(device.wait(), 128 + number) << device.out();
+            EXPECT_LT(std::chrono::steady_clock::now() - begin, 9s);
+            EXPECT_TRUE(eventually([&] { return processes_with(length).empty(); }));
+        }
     }
+}
+
+// Nobody reads it.
+class FullPipe
+{
+  public:
+    FullPipe()
+    {
+        if (pipe2(ends_.data(), O_CLOEXEC | O_NONBLOCK) != 0) {
+            throw std::runtime_error("pipe2");
+        }
+        const std::array<char, 4096> page{};
+        while (write(ends_[1], page.data(), page.size()) > 0) {
+        }
+        fcntl(ends_[1], F_SETFL, 0);
+    }
+    FullPipe(const FullPipe &) = delete;
+    FullPipe &operator=(const FullPipe &) = delete;
+    ~FullPipe()
+    {
+        close(ends_[0]);
+        close(ends_[1]);
+    }
+    int writing() const
+    {
+        return ends_[1];
+    }
+
+  private:
+    std::array<int, 2> ends_{};
+};
+
+TEST_F(NamespaceDevice, SignalsAreHandedOnWhileNobodyReadsItsErrors)
+{
+    const FullPipe errors;
+    SignalledDevice device(signal_sayer, {}, errors.writing());
+    ASSERT_TRUE(device.says("ready"));
+
+    device.signal(SIGTERM);
+
+    EXPECT_EQ(device.wait(), 7);
+    EXPECT_EQ(device.out(), "ready\nTERM\n");
+}
+
+TEST_F(NamespaceDevice, ACommandThatGoesOnIsEndedWhileNobodyReadsItsErrors)
+{
+    const FullPipe errors;
+    const std::string mark = unique_length();
+    SignalledDevice device({"sh", "-c", "trap '' TERM; echo ready; echo errors >&2", mark}, {},
+                           errors.writing());
+    ASSERT_TRUE(device.says("ready"));
+
+    device.signal(SIGTERM);
+
+    EXPECT_EQ(device.wait(), 143);
+    EXPECT_TRUE(eventually([&] { return processes_with(mark).empty(); }));
 }
 
 TEST_F(Device, ATimeLimitLeavesWholeReports)
