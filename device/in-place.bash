@@ -172,7 +172,7 @@ be_the_device()
 	done
 	[[ -z $out ]] || cd -- "$out" || exit 125
 	PATH=/system/bin TMPDIR=/tmp QUILLMARK_DEVICE=in-place QUILLMARK_DEVICE_RUN=$run_mark \
-		"$supervise" here "$signals" "$mksh" "$device/start" "$supervise" "$signals" "$vendor" \
-		"$scripts" "$@" <&0 {lock}<&- &
+		"$supervise" here $$ "$signals" "$supervise" become 0 "$signals" \
+		"$mksh" "$device/start" "$vendor" "$scripts" "$@" <&0 {lock}<&- &
 	wait_for_command $!
 }

@@ -4,16 +4,21 @@
 // What device/run leaves in its place: it runs the device, hands on to COMMAND the
 // signals that are sent to device/run alone, and ends what does not end itself.
 //
-//   supervise box SIGNALS BWRAP ARG...      COMMAND is what bwrap's init runs
-//   supervise here SIGNALS PROGRAM ARG...   PROGRAM becomes COMMAND itself
-//   supervise become SIGNALS COMMAND ARG... the last step on the device
+//   supervise box CALLER SIGNALS BWRAP ARG...      COMMAND is what bwrap's init runs
+//   supervise here CALLER SIGNALS PROGRAM ARG...   PROGRAM becomes COMMAND itself
+//   supervise become 0 SIGNALS MKSH START VENDOR SCRIPTS COMMAND ARG...
+//                                                  runs START on the device, then becomes COMMAND
 //
+// CALLER is the process to which this one belongs, and 0 where it need not be there.
 // SIGNALS are the numbers, comma-separated, of those that the caller does not ignore.
-// They are ignored by all that stands in between, until COMMAND is begun.
+// They are blocked in all that stands in between, so that one that comes before COMMAND
+// is begun meets what was to become COMMAND.
 //
-// A terminal, and timeout(1), signal the whole process group, COMMAND with it, and it
-// is not to get that twice: a second SIGTERM may mean "at once". So a witness is kept
-// in the group, which blocks every signal: what is pending there was sent to all.
+// These are two processes. The front one has device/run's id: it hands on the signals
+// that come there, and can be killed. The other, the supervisor, then still ends the
+// device. It is of the same process group, which a terminal and timeout(1) signal whole,
+// COMMAND with it; and COMMAND is not to get that twice, as a second SIGTERM may mean "at
+// once". What comes to the supervisor itself was sent to all.
 
 #include "common/descriptor.h"
 
@@ -28,16 +33,14 @@
 #include <fcntl.h>
 #include <fstream>
 #include <iterator>
-#include <linux/close_range.h>
 #include <map>
-#include <memory>
 #include <optional>
 #include <poll.h>
+#include <set>
 #include <sstream>
 #include <string>
 #include <string_view>
 #include <sys/prctl.h>
-#include <sys/syscall.h>
 #include <sys/wait.h>
 #include <unistd.h>
 #include <vector>
@@ -71,17 +74,44 @@ std::vector<int> parse_signals(const char *text)
     std::exit(kFailed);
 }
 
-[[noreturn]] void become(const std::vector<int> &signals, char **command)
+sigset_t set_of(const std::vector<int> &signals)
+{
+    sigset_t set;
+    sigemptyset(&set);
+    for (const int number : signals) {
+        sigaddset(&set, number);
+    }
+    return set;
+}
+
+int shell_status(int status)
+{
+    return WIFEXITED(status) ? WEXITSTATUS(status) : 128 + WTERMSIG(status);
+}
+
+// How many words START is begun with, before COMMAND.
+constexpr int kStartWords = 4;
+
+[[noreturn]] void become(const std::vector<int> &signals, char **words)
 {
     if (const char *descriptor = std::getenv(kBeginVariable)) {
         fcntl(std::atoi(descriptor), F_SETFD, FD_CLOEXEC);
         unsetenv(kBeginVariable);
     }
-    for (const int number : signals) {
-        std::signal(number, SIG_DFL);
+    const pid_t start = fork();
+    if (start == 0) {
+        execv(words[0], words);
+        fail(words[0]);
     }
-    execvp(command[0], command);
-    fail(command[0]);
+    int status = -1;
+    waitpid(start, &status, 0);
+    const sigset_t unblocked = set_of(signals);
+    sigprocmask(SIG_UNBLOCK, &unblocked, nullptr);
+    if (status != 0) {
+        std::exit(status < 0 ? kFailed : shell_status(status));
+    }
+    execvp(words[kStartWords], words + kStartWords);
+    fail(words[kStartWords]);
 }
 
 // ---- other processes ---------------------------------------------------------
@@ -99,67 +129,65 @@ pid_t first_child(pid_t pid)
     return child;
 }
 
-// A process of this group that does nothing; signals stay pending on it.
-class Witness
+// What bwrap has left to this process when it died: its child, which ends with it only
+// once it has said so, and may wait for it.
+void end_children()
 {
-  public:
-    Witness() : pid_(fork())
-    {
-        if (pid_ == 0) {
-            sigset_t all;
-            sigfillset(&all);
-            sigprocmask(SIG_BLOCK, &all, nullptr);
-            prctl(PR_SET_PDEATHSIG, SIGKILL);
-            syscall(SYS_close_range, 0U, ~0U, 0);
-            for (;;) {
-                pause();
-            }
+    for (pid_t child = 0; (child = first_child(getpid())) > 0;) {
+        if (kill(child, SIGKILL) != 0) {
+            return;
         }
+        waitpid(child, nullptr, 0);
     }
-    Witness(const Witness &) = delete;
-    Witness &operator=(const Witness &) = delete;
-    ~Witness()
-    {
-        if (pid_ > 0) {
-            kill(pid_, SIGKILL);
-            waitpid(pid_, nullptr, 0);
-        }
-    }
-    bool has_got(int number) const
-    {
-        std::ifstream status(proc(pid_, "status"));
-        for (std::string line; std::getline(status, line);) {
-            if (line.starts_with("ShdPnd:")) {
-                return (std::stoull(line.substr(7), nullptr, 16) >> (number - 1) & 1U) != 0;
-            }
-        }
-        return false;
-    }
+}
 
-  private:
-    pid_t pid_;
-};
+// Ends with that process, or is told so; it may have ended before.
+void follow(pid_t parent, int by)
+{
+    prctl(PR_SET_PDEATHSIG, by);
+    if (getppid() != parent) {
+        std::exit(kFailed);
+    }
+}
+
+// ---- the front process ---------------------------------------------------------
+
+// What it sends to the supervisor: the number of a signal that it got, SIGRTMIN when its
+// caller has ended.
+const int kHandedOn = SIGRTMIN;
+// What the supervisor gets when the front process has ended.
+const int kLeftAlone = SIGRTMIN + 1;
+
+int stand_in_front(pid_t caller, pid_t supervisor, const sigset_t &awaited)
+{
+    for (;;) {
+        int status = 0;
+        const int number = sigwaitinfo(&awaited, nullptr);
+        if (number == SIGCHLD && waitpid(supervisor, &status, WNOHANG) == supervisor) {
+            return shell_status(status);
+        }
+        if (number == SIGRTMIN && getppid() == caller) {
+            continue; // it was a thread of the caller's that has ended
+        }
+        if (number > 0 && number != SIGCHLD) {
+            sigqueue(supervisor, kHandedOn, {.sival_int = number});
+        }
+    }
+}
 
 // ---- the supervision ---------------------------------------------------------
 
 class Supervisor
 {
   public:
-    Supervisor(bool is_box, std::vector<int> signals, char **program)
-        : is_box_(is_box), signals_(std::move(signals))
+    // The signals are blocked; mask is the caller's.
+    Supervisor(bool is_box, std::vector<int> signals, char **program, const sigset_t &mask)
+        : is_box_(is_box), signals_(std::move(signals)), awaited_(set_of(signals_))
     {
-        sigset_t before;
-        sigemptyset(&awaited_);
-        sigaddset(&awaited_, SIGCHLD);
-        sigaddset(&awaited_, SIGRTMIN);
-        for (const int number : signals_) {
+        for (const int number : {SIGCHLD, kHandedOn, kLeftAlone}) {
             sigaddset(&awaited_, number);
-            std::signal(number, SIG_DFL); // a shell ignores some for what it has in the background
         }
-        sigprocmask(SIG_BLOCK, &awaited_, &before);
-        end_with_the_caller();
-        start(program, before);
-        witness_ = std::make_unique<Witness>();
+        start(program, mask);
     }
 
     // COMMAND's status, as a shell has it.
@@ -172,28 +200,27 @@ class Supervisor
                 if (const auto status = ended()) {
                     return *status;
                 }
-            } else if (number > 0 && !has_begun()) {
-                end_by(number == SIGRTMIN ? SIGHUP : number);
-            } else if (number == SIGRTMIN) {
-                if (given_up_ == 0 && requests_.empty()) {
-                    hand_on(SIGHUP);
-                }
+            } else if (number == kLeftAlone) {
+                end_by(SIGKILL);
+            } else if (number == kHandedOn) {
+                take(info.si_value.sival_int);
             } else if (number > 0) {
-                requests_.try_emplace(number, Clock::now() + kOneRequest);
+                sent_to_all_.insert(number);
             }
             look_at_the_clock();
         }
     }
 
   private:
-    // With its caller's end a device in namespaces is left by its terminal, unless that
-    // is nothing to it. In place the caller is the script that puts the container back.
-    void end_with_the_caller() const
+    // A signal that has come to the front process.
+    void take(int number)
     {
-        if (!is_box_) {
-            prctl(PR_SET_PDEATHSIG, SIGKILL);
-        } else if (std::ranges::find(signals_, SIGHUP) != signals_.end()) {
-            prctl(PR_SET_PDEATHSIG, SIGRTMIN);
+        if (!has_begun()) {
+            end_by(number == SIGRTMIN ? SIGHUP : number);
+        } else if (number != SIGRTMIN) {
+            requests_.try_emplace(number, Clock::now() + kOneRequest);
+        } else if (given_up_ == 0 && requests_.empty()) {
+            hand_on(SIGHUP);
         }
     }
 
@@ -207,16 +234,16 @@ class Supervisor
         const Descriptor writing(ends[1]);
         fcntl(begin_.get(), F_SETFD, FD_CLOEXEC);
         setenv(kBeginVariable, std::to_string(writing.get()).c_str(), 1);
+        const pid_t supervisor = getpid();
         pid_ = fork();
         if (pid_ < 0) {
             fail("fork");
         }
         if (pid_ == 0) {
-            prctl(PR_SET_PDEATHSIG, SIGKILL);
-            for (const int number : signals_) {
-                std::signal(number, SIG_IGN);
-            }
+            follow(supervisor, SIGKILL);
+            const sigset_t blocked = set_of(signals_);
             sigprocmask(SIG_SETMASK, &mask, nullptr);
+            sigprocmask(SIG_BLOCK, &blocked, nullptr);
             execvp(program[0], program);
             fail(program[0]);
         }
@@ -244,10 +271,10 @@ class Supervisor
         if (waitpid(pid_, &status, WNOHANG) != pid_) {
             return std::nullopt;
         }
-        if (ended_by_ != 0) {
-            return 128 + ended_by_;
+        if (is_box_) {
+            end_children();
         }
-        return WIFEXITED(status) ? WEXITSTATUS(status) : 128 + WTERMSIG(status);
+        return ended_by_ != 0 ? 128 + ended_by_ : shell_status(status);
     }
 
     bool has_begun() const
@@ -290,9 +317,7 @@ class Supervisor
     // Ctrl-C and Ctrl-\ are COMMAND's to handle, for as long as it likes.
     void judge(int number)
     {
-        auto next = std::make_unique<Witness>();
-        const bool has_it = witness_->has_got(number) && getpgid(command()) == getpgrp();
-        witness_ = std::move(next);
+        const bool has_it = sent_to_all_.erase(number) > 0 && getpgid(command()) == getpgrp();
         if (!has_it) {
             hand_on(number);
         } else if (number != SIGINT && number != SIGQUIT) {
@@ -316,17 +341,9 @@ class Supervisor
         }
     }
 
-    // bwrap's child ends with it only once it has said so: early on it would go on.
     void end_by(int number)
     {
         ended_by_ = number;
-        siginfo_t stopped{};
-        if (is_box_ && kill(pid_, SIGSTOP) == 0 &&
-            waitid(P_PID, static_cast<id_t>(pid_), &stopped, WSTOPPED | WEXITED | WNOWAIT) == 0) {
-            if (const pid_t init = first_child(pid_); init > 0) {
-                kill(init, SIGKILL);
-            }
-        }
         kill(pid_, SIGKILL);
     }
 
@@ -335,25 +352,66 @@ class Supervisor
     sigset_t awaited_{};
     pid_t pid_ = -1;
     Descriptor begin_{-1};
-    std::unique_ptr<Witness> witness_;
+    std::set<int> sent_to_all_;
     std::map<int, Clock::time_point> requests_; // and when they are judged
     std::optional<Clock::time_point> deadline_;
     int given_up_ = 0; // the signal whose deadline runs
     int ended_by_ = 0;
 };
 
+// With its caller's end a device in namespaces is left by its terminal, unless that is
+// nothing to it. In place the caller is the script that puts the container back.
+void end_with_the_caller(bool is_box, pid_t caller, const std::vector<int> &signals)
+{
+    if (!is_box) {
+        follow(caller, SIGKILL);
+    } else if (std::ranges::find(signals, SIGHUP) != signals.end()) {
+        prctl(PR_SET_PDEATHSIG, SIGRTMIN);
+    }
+}
+
+int supervise(bool is_box, pid_t caller, const std::vector<int> &signals, char **program)
+{
+    for (const int number : signals) {
+        std::signal(number, SIG_DFL); // a shell ignores some for what it has in the background
+    }
+    sigset_t awaited = set_of(signals);
+    sigaddset(&awaited, SIGCHLD);
+    sigaddset(&awaited, SIGRTMIN);
+    sigset_t before;
+    sigprocmask(SIG_BLOCK, &awaited, &before);
+    const pid_t parent = getppid();
+    end_with_the_caller(is_box, caller, signals);
+    const pid_t front = getpid();
+    const pid_t supervisor = fork();
+    if (supervisor < 0) {
+        fail("fork");
+    }
+    if (supervisor > 0) {
+        return stand_in_front(parent, supervisor, awaited);
+    }
+    sigset_t all;
+    sigfillset(&all);
+    sigprocmask(SIG_BLOCK, &all, nullptr);
+    follow(front, kLeftAlone);
+    if (is_box) {
+        prctl(PR_SET_CHILD_SUBREAPER, 1);
+    }
+    return Supervisor(is_box, signals, program, before).run();
+}
+
 } // namespace
 
 int main(int argc, char **argv)
 {
-    const std::string_view way = argc > 3 ? argv[1] : "";
+    const std::string_view way = argc > 4 ? argv[1] : "";
     if (way != "box" && way != "here" && way != "become") {
         std::fputs("device/run: supervise: it is for device/run and device/start\n", stderr);
         return kFailed;
     }
-    std::vector<int> signals = parse_signals(argv[2]);
+    const std::vector<int> signals = parse_signals(argv[3]);
     if (way == "become") {
-        become(signals, argv + 3);
+        become(signals, argv + 4);
     }
-    return Supervisor(way == "box", std::move(signals), argv + 3).run();
+    return supervise(way == "box", std::atoi(argv[2]), signals, argv + 4);
 }

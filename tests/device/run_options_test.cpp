@@ -118,6 +118,19 @@ TEST_F(Out, LetsFptestCheckAndShowPlansOfTheCallersDirectory)
     }
 }
 
+TEST(WritableDirectory, IsNoneOfADirectoryThatIsGone)
+{
+    const Outcome outcome =
+        run({"sh", "-c", "mkdir gone && cd gone && rmdir ../gone && exec \"$0\" --out x -- true",
+             device_run},
+            {.directory = TemporaryDirectory().path()});
+
+    EXPECT_EQ(outcome.status, 125);
+    Words said = lines(outcome.err);
+    std::erase_if(said, [](auto &line) { return line.starts_with("shell-init: "); }); // bash's
+    EXPECT_EQ(said, Words{"device/run: the current directory is gone"});
+}
+
 TEST_F(Out, TakesAFileOfItsOwnBeforeOneOfTheCallers)
 {
     fs::create_directories(caller.path() / "results/plans");
@@ -263,6 +276,27 @@ TEST_F(UsersProgram, WhoseInterpreterIsMissingIsNamed)
                            missing("C", "/system/bin/sh\\r")}));
 }
 
+TEST_F(UsersProgram, WhoseInterpreterIsMissingIsNoCommand)
+{
+    const TemporaryDirectory own;
+    own.program("unix", "#!/nowhere/bash\n");
+    own.program("dos", "#!/system/bin/sh\r\n");
+    const std::map<std::string, std::string> missing = {{"unix", "/nowhere/bash"},
+                                                        {"dos", "/system/bin/sh\\r"}};
+    for (const auto &[name, interpreter] : missing) {
+        for (const bool is_given_as_a_path : {true, false}) {
+            const Outcome outcome = is_given_as_a_path
+                                        ? on_device({"./" + name}, {}, {.directory = own.path()})
+                                        : on_device({name}, {"--bin", own.path()});
+
+            EXPECT_EQ(outcome.status, 127);
+            EXPECT_EQ(lines(outcome.err).back(),
+                      "device/run: " + (is_given_as_a_path ? "./" + name : name) +
+                          " cannot be started: there is no " + interpreter + " on the device");
+        }
+    }
+}
+
 TEST_F(UsersProgram, NeedNotBeThere)
 {
     const TemporaryDirectory own;
@@ -270,6 +304,43 @@ TEST_F(UsersProgram, NeedNotBeThere)
 
     EXPECT_EQ(outcome.status, 0);
     EXPECT_EQ(outcome.err.find("--bin"), std::string::npos) << outcome.err;
+}
+
+// ---- what the device does not show ------------------------------------------------
+
+class HostsTmp : public NamespaceDevice
+{
+};
+
+TEST_F(HostsTmp, IsNotTheDevicesAsIsSaidToWhoWorksThere)
+{
+    EXPECT_EQ(on_device({"true"}, {}, {.directory = "/tmp"}).err,
+              "device/run: the device's /tmp is its own: the files here are not on it; run this "
+              "from a directory below /tmp, or from elsewhere\n");
+}
+
+TEST_F(HostsTmp, HidesFilesAsIsSaidToWhoNamesThem)
+{
+    const TemporaryDirectory own("/tmp");
+    const TemporaryDirectory other("/tmp");
+    std::ofstream(own.path() / "plan.xml");
+    std::ofstream(other.path() / "plan.xml");
+    const auto err = [&](const std::string &word, const fs::path &directory) {
+        return on_device({"true", word}, {}, {.directory = directory}).err;
+    };
+    const auto hidden = [](const std::string &word) {
+        return "device/run: the device's /tmp is its own: " + word +
+               " is not on it; run this from its directory, or keep it elsewhere\n";
+    };
+    const std::string plan = own.path() / "plan.xml";
+
+    EXPECT_EQ(err(plan.substr(1), "/"), hidden(plan.substr(1)));
+    EXPECT_EQ(err("--plan=" + plan, tree), hidden(plan));
+    EXPECT_EQ(err("../" + other.path().filename().string() + "/plan.xml", own.path()),
+              hidden("../" + other.path().filename().string() + "/plan.xml"));
+    EXPECT_EQ(err(plan, own.path()), "");
+    EXPECT_EQ(err("./plan.xml", own.path()), "");
+    EXPECT_EQ(err("/tmp/no-such-file", tree), "");
 }
 
 // ---- values ---------------------------------------------------------------------

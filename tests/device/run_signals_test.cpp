@@ -12,6 +12,7 @@
 #include <csignal>
 #include <cstdio>
 #include <fcntl.h>
+#include <optional>
 #include <pty.h>
 #include <stdexcept>
 #include <sys/wait.h>
@@ -411,6 +412,80 @@ TEST_F(Device, ASignalAtItsStartEndsItAtOnceAndLeavesNothingRunning)
     }
 }
 
+// What device/run finds for bwrap: a script that is told which start it is, and leaves a
+// process that does not end with it, as bwrap does early on.
+class SlowBwrap
+{
+  public:
+    explicit SlowBwrap(const std::string &on_probe, const std::string &on_device = "")
+    {
+        directory_.program("bwrap", "#!/bin/bash\nleave() { setsid timeout 20 sleep " + left_ +
+                                        " & }\ncase $* in *' -- /usr/bin/true') " + on_probe +
+                                        "\n;; *) " + on_device + "\nesac\nexec " + real_ +
+                                        " \"$@\"\n");
+        setenv("PATH", (directory_.path().string() + ":" + path_).c_str(), 1);
+    }
+    SlowBwrap(const SlowBwrap &) = delete;
+    SlowBwrap &operator=(const SlowBwrap &) = delete;
+    ~SlowBwrap()
+    {
+        setenv("PATH", path_.c_str(), 1);
+    }
+    bool has_started() const
+    {
+        return eventually([this] { return fs::exists(directory_.path() / "bwrap-started"); });
+    }
+    bool has_left_nothing() const
+    {
+        return eventually([this] { return processes_with(left_).empty(); });
+    }
+
+  private:
+    TemporaryDirectory directory_;
+    std::string left_ = unique_length();
+    std::string path_ = std::getenv("PATH");
+    std::string real_ = lines(run({"sh", "-c", "command -v bwrap"}).out).at(0);
+};
+
+TEST_F(NamespaceDevice, SignalsToItsGroupDoNotMeetWhatTriesTheBox)
+{
+    for (const auto &[name, number] : ending_signals) {
+        SCOPED_TRACE(name);
+        const SlowBwrap slow("leave; touch $0-started; sleep 0.4; kill $!");
+        SignalledDevice device({"sh", "-c", "echo begun; sleep 9"});
+        ASSERT_TRUE(slow.has_started());
+
+        device.signal_group(number);
+
+        EXPECT_EQ(device.wait(), 128 + number);
+        EXPECT_TRUE(slow.has_left_nothing());
+        EXPECT_EQ(device.out(), "");
+    }
+}
+
+TEST_F(NamespaceDevice, SigkillOfItAsTheBoxIsLaidOutEndsWhatBwrapLeaves)
+{
+    const SlowBwrap slow(":", "leave; touch $0-started; wait");
+    SignalledDevice device({"echo", "begun"});
+    ASSERT_TRUE(slow.has_started());
+
+    device.signal(SIGKILL);
+
+    EXPECT_EQ(device.wait(), 137);
+    EXPECT_TRUE(slow.has_left_nothing());
+    EXPECT_EQ(device.out(), "");
+}
+
+TEST_F(NamespaceDevice, ABwrapThatIsKilledHasRefusedNothing)
+{
+    const SlowBwrap killed("kill -KILL $$");
+
+    const Outcome outcome = on_device({"true"});
+
+    EXPECT_EQ(outcome.status, 125);
+    EXPECT_EQ(outcome.err, "device/run: bwrap was ended by signal 9 as it tried the device\n");
+}
+
 // Nobody reads it.
 class FullPipe
 {
@@ -499,6 +574,21 @@ TEST_F(NamespaceDevice, ItsCallersEndIsAHangUp)
     waitpid(caller, nullptr, 0);
 
     EXPECT_TRUE(eventually([&] { return content(said) == "ready\nHUP\n"; })) << content(said);
+}
+
+TEST_F(NamespaceDevice, TheEndOfItsCallersThreadIsNoHangUp)
+{
+    std::optional<SignalledDevice> device;
+    std::thread([&] {
+        device.emplace(signal_sayer);
+        EXPECT_TRUE(device->says("ready"));
+    }).join();
+    std::this_thread::sleep_for(300ms);
+
+    device->signal(SIGTERM);
+
+    EXPECT_EQ(device->wait(), 7);
+    EXPECT_EQ(device->out(), "ready\nTERM\n");
 }
 
 TEST_F(Device, AClosedTerminalComesToCommandOnce)
