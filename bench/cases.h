@@ -31,7 +31,7 @@ std::unique_ptr<Contest> first_load_to_parser(int items);
 
 std::unique_ptr<Contest> trigger();
 
-// For the growth: the module's two lookups, and the search by Mini-XML that they
+// For the growth: the library's two lookups, and the search by Mini-XML that they
 // are made of. No floors.
 std::unique_ptr<Contest> lookup_by_name(int items);
 std::unique_ptr<Contest> lookup_by_position(int items);

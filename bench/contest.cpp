@@ -23,7 +23,7 @@ using Lines = std::vector<std::string>;
 
 Lines *heard;
 
-// Behind the prefix: the function and the line differ between the two sides.
+// After the prefix: the function and the line differ between the two sides.
 void hear(const char *format, va_list arguments)
 {
     std::array<char, 8192> line{};
@@ -53,7 +53,7 @@ void expect_same_log(const std::string &name, const Lines &module, const Lines &
     throw std::runtime_error(name + ": log line " + std::to_string(here - module.begin() + 1) +
                              " is '" + (here != module.end() ? *here : "(none)") +
                              "', its floor's is '" + (there != floor.end() ? *there : "(none)") +
-                             "'; make the floor log what the module logs");
+                             "'; make the floor log what the library logs");
 }
 
 void expect_same_work(Contest &contest)
@@ -71,7 +71,7 @@ void expect_same_work(Contest &contest)
     expect_same_log(contest.name(), module_log, floor_log);
     if (module != floor) {
         throw std::runtime_error(contest.name() + ": the floor leaves something else behind; make "
-                                                  "it do what the module does");
+                                                  "it do what the library does");
     }
 }
 

@@ -1,7 +1,7 @@
 // SPDX-FileCopyrightText: 2026 The Quillmark authors
 // SPDX-License-Identifier: Apache-2.0
 
-// The module against its floor: the same job done by the bare calls that it
+// The library against its floor: the same job done by the bare calls that it
 // needs. Both do it turn by turn in one process.
 #pragma once
 
@@ -57,7 +57,7 @@ class Contest
     }
     virtual void module(int calls) = 0;
     virtual void floor(int calls) = 0;
-    // Behind each turn, not timed.
+    // After each turn, not timed.
     virtual void clear()
     {
     }
@@ -104,7 +104,7 @@ class Match
     Side first_ = Side::module;
 };
 
-// Seconds for one call of the module alone: the median turn of so many seconds.
+// Seconds for one call of the library alone: the median turn of so many seconds.
 double alone(Contest &contest, double seconds);
 
 } // namespace bench

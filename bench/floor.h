@@ -1,7 +1,7 @@
 // SPDX-FileCopyrightText: 2026 The Quillmark authors
 // SPDX-License-Identifier: Apache-2.0
 
-// How a floor logs: as the module does, its own function and line in the prefix.
+// How a floor logs: as the library does, its own function and line in the prefix.
 #pragma once
 
 #include "vr_log.h"

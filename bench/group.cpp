@@ -39,7 +39,7 @@ void query_presence()
     pclose(query);
 }
 
-// The module's job besides, which is not in here: the parameter file is read and
+// The library's job besides, which is not in here: the parameter file is read and
 // the "vendor" line printed for each item, the command line is made of the plan.
 void run_item()
 {

@@ -95,7 +95,7 @@ void send_twenty(const Module &module)
     module.read_back(plan.data(), static_cast<int>(plan.size()));
 }
 
-// What the module prints is not to be mixed with what this does.
+// What the library prints is not to be mixed with what this does.
 int set_output_aside()
 {
     const int output = dup(STDOUT_FILENO);

@@ -56,7 +56,7 @@ class FirstLoad : public Contest
         tree_ = bare_ = nullptr;
         lseek(file_.get(), 0, SEEK_SET);
     }
-    // The elements alone: the white space between them is the module's to remove.
+    // The elements alone: the white space between them is the library's to remove.
     std::string outcome() override
     {
         std::string names;
@@ -76,7 +76,7 @@ class FirstLoad : public Contest
     mxml_node_t *bare_ = nullptr;
 };
 
-// Lookups in a plan that the module has loaded, of each item in turn.
+// Lookups in a plan that the library has loaded, of each item in turn.
 class Lookup : public Contest
 {
   public:
@@ -94,7 +94,7 @@ class Lookup : public Contest
         write_plan(fresh_plan(items_));
         tree_ = unit::load_configs_file(kPlanPath);
         if (tree_ == nullptr) {
-            throw std::runtime_error(std::string(kPlanPath) + ": the module has not loaded it");
+            throw std::runtime_error(std::string(kPlanPath) + ": the library has not loaded it");
         }
         for (int index = 0; index < items_; ++index) {
             names_.push_back(item_name(index));

@@ -1,7 +1,7 @@
 // SPDX-FileCopyrightText: 2026 The Quillmark authors
 // SPDX-License-Identifier: Apache-2.0
 
-// What the module costs beside the bare calls that its job needs: see README.md.
+// What the library costs beside the bare calls that its job needs: see README.md.
 #include "cases.h"
 #include "figures.h"
 #include "filter.h"
@@ -56,7 +56,7 @@ constexpr Pace kQuick{7, 0.2, 100, true};
 
 // --- output ---------------------------------------------------------------
 
-// The module prints a line for each item. So that it is not among the figures,
+// The library prints a line for each item. So that it is not among the figures,
 // standard output goes nowhere, and the figures go where that went before.
 class Output
 {
@@ -355,7 +355,7 @@ std::vector<Curve> curves_of(const std::map<std::string, double> &points, const 
 Options parse(int argc, char **argv)
 {
     Options options;
-    CLI::App app("Measures the module against the bare calls that its job needs. Runs on the "
+    CLI::App app("Measures the library against the bare calls that its job needs. Runs on the "
                  "virtual device: scripts/bench starts it.");
     app.add_flag("--quick", options.quick, "shorter rounds, seven of each; small group runs only");
     app.add_flag("--unjudged", options.unjudged, "judge no time, only sizes");

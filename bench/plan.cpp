@@ -19,7 +19,7 @@ namespace bench
 namespace
 {
 
-// As the module writes one.
+// As the library writes one.
 template <typename Attributes> std::string plan_of(int items, Attributes attributes)
 {
     std::string plan = "<?xml version=\"1.0\" encoding=\"utf-8\"?>\n<Plan>\n\t<CmdGroup name=\"";
@@ -108,7 +108,7 @@ void load_into_module(const std::string &text)
     // a group that is not there: the plan is loaded, and nothing is run
     FPTEST_RunTestCmd("XMLNodePath::plan/Missing", nullptr, 0);
     if (g_TestCmdTree == nullptr) {
-        throw std::runtime_error(std::string(kPlanPath) + ": the module has not loaded it");
+        throw std::runtime_error(std::string(kPlanPath) + ": the library has not loaded it");
     }
 }
 

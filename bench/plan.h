@@ -1,7 +1,7 @@
 // SPDX-FileCopyrightText: 2026 The Quillmark authors
 // SPDX-License-Identifier: Apache-2.0
 
-// Test plans of any size, and how the module gets them.
+// Test plans of any size, and how the library gets them.
 #pragma once
 
 #include <set>
@@ -38,11 +38,11 @@ class Places
 void write_plan(const std::string &text);
 std::string read_plan();
 
-// Has the module load that plan. It takes 2,048 bytes at most in a command: it
+// Has the library load that plan. It takes 2,048 bytes at most in a command: it
 // is sent a short plan, which drops its cached one, and that is overwritten.
 void load_into_module(const std::string &text);
 
-// Closes what the module, and a floor after it, leave open.
+// Closes what the library, and a floor after it, leave open.
 class LeftOpen
 {
   public:

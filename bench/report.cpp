@@ -19,7 +19,7 @@ namespace
 
 constexpr const char *kDescription = "contact 97 %";
 
-// The module's layout, for plans of this bench.
+// The library's layout, for plans of this bench.
 const char *layout(mxml_node_t *node, int where)
 {
     const char *name = mxmlGetElement(node);
@@ -75,8 +75,8 @@ void update(const char *item, int progress)
     FLOOR_LOG("update Src Xml File success . leave...\n");
 }
 
-// The module looks an item up twice, and so does this. That it also counts the
-// item's position, for a line of its log, is left to the module.
+// The library looks an item up twice, and so does this. That it also counts the
+// item's position, for a line of its log, is left to the library.
 void report_bare(const char *item, int index, int progress)
 {
     FLOOR_LOG("enter...\n");

@@ -1,7 +1,7 @@
 // SPDX-FileCopyrightText: 2026 The Quillmark authors
 // SPDX-License-Identifier: Apache-2.0
 
-// The module's unit once more. The names that it exports are taken: the shipped
+// The library's unit once more. The names that it exports are taken: the shipped
 // library is in this program too.
 #define g_TestCmdTree unit_TestCmdTree
 #define FPTEST_RunTestCmd unit_RunTestCmd

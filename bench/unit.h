@@ -1,7 +1,7 @@
 // SPDX-FileCopyrightText: 2026 The Quillmark authors
 // SPDX-License-Identifier: Apache-2.0
 
-// What the module keeps to itself and no exported function reaches alone.
+// What the library keeps to itself and no exported function reaches alone.
 #pragma once
 
 #include <mxml.h>

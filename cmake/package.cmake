@@ -81,7 +81,7 @@ set(CPACK_DEBIAN_RUNTIME_PACKAGE_NAME libquillmark1)
 set(CPACK_DEBIAN_RUNTIME_PACKAGE_SECTION libs)
 set(CPACK_DEBIAN_RUNTIME_PACKAGE_CONTROL_EXTRA
   ${control}/shlibs ${control}/symbols ${control}/triggers)
-set(CPACK_DEBIAN_RUNTIME_DESCRIPTION "test module of fingerprint-sensor stacks - library
+set(CPACK_DEBIAN_RUNTIME_DESCRIPTION "test library for fingerprint-sensor stacks - library
 ${about}
 .
 This package holds the shared library, and the Linux implementation of the
@@ -90,7 +90,7 @@ interfaces that a device's maker provides.")
 set(CPACK_DEBIAN_DEVELOPMENT_PACKAGE_NAME libquillmark-dev)
 set(CPACK_DEBIAN_DEVELOPMENT_PACKAGE_SECTION libdevel)
 set(CPACK_DEBIAN_DEVELOPMENT_PACKAGE_DEPENDS "libquillmark1 (= ${debian_version}), libmxml-dev")
-set(CPACK_DEBIAN_DEVELOPMENT_DESCRIPTION "test module of fingerprint-sensor stacks - development
+set(CPACK_DEBIAN_DEVELOPMENT_DESCRIPTION "test library for fingerprint-sensor stacks - development
 ${about}
 .
 This package holds what agents and test items are built with: the header,

@@ -53,9 +53,7 @@ struct Process {
     }
 };
 
-// A process may end between the opening and the reading; its file then fails to
-// be read, which the stream makes nothing of.
-// Nothing where the process has gone, be it before the file was opened or after.
+// Nothing where the process has gone, before its file was opened or after.
 std::optional<std::string> read_file(const std::filesystem::path &path)
 {
     const Descriptor file(open(path.c_str(), O_RDONLY | O_CLOEXEC));
@@ -80,8 +78,8 @@ bool parse_stat(const std::string &text, Process &process)
     }
     process.kernel_name = text.substr(open + 1, close - open - 1);
 
-    std::istringstream behind(text.substr(close + 1));
-    const std::vector<std::string> fields(std::istream_iterator<std::string>{behind}, {});
+    std::istringstream after(text.substr(close + 1));
+    const std::vector<std::string> fields(std::istream_iterator<std::string>{after}, {});
     const auto number = [&fields](std::size_t manual_field, auto &value) {
         const std::string &field = fields.at(manual_field - 3); // proc(5) counts from 1
         std::from_chars(field.data(), field.data() + field.size(), value);

@@ -100,7 +100,7 @@ mxml_node_t *watched_load(mxml_node_t *top, int descriptor, mxml_load_cb_t type)
     return tree;
 }
 
-// The buffer is the module's: all of what it says it holds must be there.
+// The buffer is the library's: all of what it says it holds must be there.
 void require_room(const void *buffer, std::size_t size)
 {
     require(__asan_region_is_poisoned(const_cast<void *>(buffer), size) == nullptr,
@@ -400,8 +400,8 @@ void mxmlSetLoneWhitespaceOff(int /*off*/)
 }
 
 // Mini-XML 3.3 forgets nodes of some documents: of some that it refuses, and text
-// behind the root element. A first load shows which; those, and only those, are
-// freed here, for the rest of a plan is the module's to free.
+// after the root element. A first load shows which; those, and only those, are
+// freed here, for the rest of a plan is the library's to free.
 mxml_node_t *qm_mxmlLoadFd(mxml_node_t *top, int descriptor, mxml_load_cb_t type)
 {
     mxml_node_t *tree = watched_load(top, descriptor, type);

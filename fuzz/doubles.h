@@ -1,7 +1,7 @@
 // SPDX-FileCopyrightText: 2026 The Quillmark authors
 // SPDX-License-Identifier: Apache-2.0
 
-// What the module calls outside itself, for the fuzz targets: the same calls as
+// What the library calls outside itself, for the fuzz targets: the same calls as
 // the unit tests' doubles take over, but nothing is scripted and little is
 // recorded, so that a run costs microseconds. The test plan file is in memory;
 // nothing is started, signalled or listened on.
@@ -16,8 +16,8 @@
 namespace doubles
 {
 
-// One run: the module as at load time, on a platform without a test plan. Its end
-// frees the plan and closes what the module leaves open on purpose.
+// One run: the library as at load time, on a platform without a test plan. Its end
+// frees the plan and closes what the library leaves open on purpose.
 class Run
 {
   public:
@@ -40,7 +40,7 @@ void set_listing(std::string_view text);
 // standard output.
 std::vector<std::string> started();
 
-// How many descriptors and streams the module has open.
+// How many descriptors and streams the library has open.
 std::size_t left_open();
 
 // Runs the body with vfork returning as in the child, up to the child's end.

@@ -13,7 +13,7 @@
 #include <string>
 #include <string_view>
 
-// The first N - 1 texts, and all that is behind them.
+// The first N - 1 texts, and all that is after them.
 template <std::size_t N>
 std::array<std::string, N> texts(const std::uint8_t *data, std::size_t size)
 {
@@ -29,7 +29,7 @@ std::array<std::string, N> texts(const std::uint8_t *data, std::size_t size)
 }
 
 // A block of its own, exactly as long as it has to be: AddressSanitizer stops
-// whoever touches the byte before or behind it.
+// whoever touches the byte before or after it.
 class Block
 {
   public:

@@ -2,7 +2,7 @@
 // SPDX-License-Identifier: Apache-2.0
 
 // A test plan as the fuzz targets see it: read from Mini-XML's nodes, but looked
-// up by code that shares nothing with the module's.
+// up by code that shares nothing with the library's.
 #pragma once
 
 #include <mxml.h>

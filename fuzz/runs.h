@@ -1,7 +1,7 @@
 // SPDX-FileCopyrightText: 2026 The Quillmark authors
 // SPDX-License-Identifier: Apache-2.0
 
-// What a node path starts, worked out apart from the module.
+// What a node path starts, worked out apart from the library.
 #pragma once
 
 #include <mxml.h>

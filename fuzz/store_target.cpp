@@ -154,7 +154,7 @@ bool is_loaded_as(const std::vector<Content> &contents)
 // then writes as they stand, where they mean something else (white space in a
 // word, markup in a name) or are refused (control characters, surrogates, a byte
 // order mark), as they are in a description that holds them. So a tree that comes
-// back changed is a finding only if Mini-XML gives it back without the module's
+// back changed is a finding only if Mini-XML gives it back without the library's
 // layout.
 void check_file(const std::vector<Content> &contents)
 {

@@ -49,7 +49,7 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t *data, std::size_t size
 {
     const doubles::Run run;
     const auto [name, listing] = texts<2>(data, size);
-    // the module's own array, which only the run of an item fills
+    // the library's own array, which only the run of an item fills
     const std::string item = name.substr(0, module::command_name_size - 1);
     item.copy(const_cast<char *>(module::command_name()), item.size());
     doubles::set_listing(listing);

@@ -4,7 +4,7 @@
  */
 
 /*
- * The whole module, in the order in which it builds on itself: each function
+ * The whole library, in the order in which it builds on itself: each function
  * stands above its callers. To follow a command, start at the last section and
  * read upward.
  */
@@ -69,7 +69,7 @@ __attribute__((noinline)) static void log_line(const char *format, const char *f
                   arguments...);
 }
 
-/* The size is of no use: asking for it has the compiler check the arguments against
+/* sizeof evaluates nothing; it only makes the compiler check the arguments against
    the format. */
 #define LOG(format, ...)                                                                           \
     ((void)sizeof(vr_log_printf(VR_LOG_DEBUG, "", format __VA_OPT__(, ) __VA_ARGS__)),             \
@@ -79,14 +79,14 @@ __attribute__((noinline)) static void log_line(const char *format, const char *f
 /* A failure that names its place once more. */
 #define LOG_PLACE(format) LOG("%s[%d]" format, __func__, __LINE__)
 
-/* Formatters differ in what they make of a null text, and compilers turn some
-   calls into ones that crash on it. */
+/* printf("%s", NULL) is undefined, and compilers may turn it into puts(NULL),
+   which crashes. */
 static const char *null_text(const char *text)
 {
     return text != nullptr ? text : "(null)";
 }
 
-/* Fills the array to its capacity: replies are zero behind their text. */
+/* Fills the array to its capacity: replies are zero after their text. */
 static void copy_text(char *array, size_t capacity, const char *text)
 {
     const size_t length = strnlen(text, capacity - 1);
@@ -188,7 +188,7 @@ static mxml_node_t *find_group(mxml_node_t *tree, const char *groupname)
 }
 
 /* Bounded by the tree, not by the group: an item that the group lacks is taken
-   from a group behind it. Agents address items so; do not confine it. */
+   from a group after it. Agents address items so; do not confine it. */
 static mxml_node_t *find_item(mxml_node_t *tree, mxml_node_t *group, const char *itemname)
 {
     return mxmlFindElement(group, tree, "Cmd", "name", itemname, MXML_DESCEND);
@@ -373,7 +373,7 @@ static void updateSrcXmlFile(const char *groupname, const char *inodename, int i
 
     LOG("start save xml!\n");
     save_XmlFile(tree);
-    /* said whatever became of the save: it ends the report, not judges it */
+    /* logged even if the save failed: it marks the end, not success */
     LOG("update Src Xml File success . leave...\n");
 }
 
@@ -393,9 +393,9 @@ int FPTEST_SetTransation(const char *iGroupname, const char *iNodename, int iPro
 
 /* --- read-back ----------------------------------------------------------- */
 
-/* A negative room, once it is a size, is one that kernels refuse; the caller
-   must instead learn that there was something to read, so one byte is read
-   aside. */
+/* A negative size would make read() fail; the caller must instead learn that
+   there was something to read. So one byte is read aside, and the assertion
+   fires if there is data. */
 static int read_piece(int fd, char *place, int room)
 {
     char aside;

@@ -74,14 +74,14 @@ extern QUILLMARK_API mxml_node_t *g_TestCmdTree;
  *                reply.
  *   XMLNodePath  NAME is root/group (run every item of the group, in order) or
  *                root/group/item (run that one); anything shorter runs nothing,
- *                and what stands behind the item or a tab or line feed is
+ *                and what stands after the item or a tab or line feed is
  *                ignored. Names hold at most 63 characters; the root is not
  *                compared. An item that the group lacks is looked for in the
- *                groups behind it, and its position there is run here. Replies
+ *                groups after it, and its position there is run here. Replies
  *                an empty text: all olen bytes become zero.
  * Any other head does nothing.
  *
- * An item runs as "/system/bin/NAME ARGS" with the vendor's suffix behind its
+ * An item runs as "/system/bin/NAME ARGS" with the vendor's suffix after its
  * name, cut to 1024 characters; its name is cut at its first tab or line feed
  * and to 1023 characters, suffix included 1024. Attributes name and args come
  * from the plan; a missing args reads "(null)".
@@ -104,7 +104,7 @@ QUILLMARK_API int FPTEST_RunTestCmd(const char *ibuff, char *obuff, int olen);
  *
  * iGroupname  name of the item's CmdGroup; not null
  * iNodename   name of the item; not null. An item that the group lacks is
- *             looked for in the groups behind it.
+ *             looked for in the groups after it.
  * iProgress   written in decimal, cut to its first 9 characters
  * iResult     0, 1 or -2; any other value leaves the attribute without a value
  * iDesc       text of any length, copied; null leaves the attribute without a
@@ -124,7 +124,7 @@ QUILLMARK_API int FPTEST_SetTransation(const char *iGroupname, const char *iNode
  * Copies the stored test plan, as it is in the file, into the caller's buffer.
  *
  * o_rst  the caller's buffer; no terminating zero is written, and the bytes
- *        behind the text are left as they were, so clear it before the call
+ *        after the text are left as they were, so clear it before the call
  * olen   its capacity in bytes; a longer file is cut there. A negative value
  *        ends the process with an assertion if there is anything to read.
  *

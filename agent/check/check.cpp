@@ -75,7 +75,7 @@ struct Flaw {
     XML_Error error = XML_ERROR_NONE;
 };
 
-// Entities in entities can go deeper than a stack, and the module knows none: the
+// Entities in entities can go deeper than a stack, and the library knows none: the
 // declaration of one ends the parse.
 void XMLCALL stop_at_entity(void *parser, const XML_Char *, int, const XML_Char *, int,
                             const XML_Char *, const XML_Char *, const XML_Char *, const XML_Char *)
@@ -143,7 +143,7 @@ class SizeChecker
   private:
     [[nodiscard]] std::string fate(const std::string &what) const
     {
-        return std::string(", and the module would ") +
+        return std::string(", and the library would ") +
                (Plan::load(stored_) ? "load " + what + " without the rest" : "not load " + what);
     }
 
@@ -171,11 +171,11 @@ class SizeChecker
                     amount(command_.size(), "byte") + " would be stored" + fate("them");
         } else {
             text +=
-                "which is behind the " + std::to_string(kPlanLimit) + " bytes that it takes anyway";
+                "which is after the " + std::to_string(kPlanLimit) + " bytes that it takes anyway";
         }
         text += takes_references(colon_) ? "; write &#58; in its place" : "; leave it out";
         if (more > 0) {
-            text += ", and look to the " + std::to_string(more) + " behind it";
+            text += ", and the " + std::to_string(more) + " after it";
         }
         findings_.error(colon_, text);
     }
@@ -230,7 +230,7 @@ std::string open_at(const std::vector<Tag> &tags, std::size_t offset)
 class FormChecker
 {
   public:
-    // stored: what of the text the module would get.
+    // stored: what of the text the library would get.
     FormChecker(const std::string &text, const std::string &stored, Findings &findings)
         : text_(text), stored_(stored), tags_(scan(text)), findings_(findings)
     {
@@ -292,7 +292,7 @@ class FormChecker
             if (attribute->begin < up_to) {
                 findings_.error(attribute->begin,
                                 "attribute " + in_quotes(attribute->name) +
-                                    " has no value: the module would not load the plan; write " +
+                                    " has no value: the library would not load the plan; write " +
                                     cut(one_line(attribute->name), kShownName) +
                                     "=\"\" or leave it out");
             }
@@ -304,13 +304,13 @@ class FormChecker
         const std::size_t offset = place_of(flaw);
         if (flaw.error == XML_ERROR_ABORTED) {
             findings_.error(offset,
-                            std::string("an entity is declared here: the module would not ") +
+                            std::string("an entity is declared here: the library would not ") +
                                 (Plan::load(stored_) ? "know it" : "load the plan") +
                                 "; write its text where it is used");
             return;
         }
         findings_.error(offset, "not well-formed, " + reason(flaw.error, offset) +
-                                    ": the module would " +
+                                    ": the library would " +
                                     (Plan::load(stored_) ? "load it all the same, and run what it "
                                                            "took from it"
                                                          : "not load it") +
@@ -387,7 +387,7 @@ class FormChecker
         case XML_ERROR_INCORRECT_ENCODING:
             return "; declare UTF-8, or leave the declaration out";
         default:
-            return "; mend it here";
+            return "; fix it here";
         }
     }
 
@@ -406,21 +406,21 @@ class FormChecker
         if (std::iscntrl(byte) != 0 && std::isspace(byte) == 0) {
             return "; leave the control character out";
         }
-        return "; mend it here";
+        return "; fix it here";
     }
 
-    // The library looks at no declaration: it takes every text for UTF-8.
+    // Mini-XML ignores the declaration: it takes every text for UTF-8.
     void report_encoding()
     {
         const std::size_t offset = first_not_utf8(text_);
         // zero bytes are another finding
         if (offset != kNone && text_.find('\0') == kNone) {
-            findings_.error(offset, "not UTF-8: the module looks at no encoding declaration, and "
+            findings_.error(offset, "not UTF-8: the library looks at no encoding declaration, and "
                                     "would read something else here; save it as UTF-8");
         }
     }
 
-    // The library sees the end of a comment only behind something in it.
+    // Mini-XML sees the end of a comment only after something in it.
     bool report_endless_comments()
     {
         constexpr std::string_view kEmpty = "<!---->";
@@ -429,7 +429,7 @@ class FormChecker
             if (tag.kind == Tag::Kind::comment &&
                 text_.compare(tag.begin, kEmpty.size(), kEmpty) == 0) {
                 findings_.error(tag.begin,
-                                "an empty comment has no end for the module, which would take "
+                                "an empty comment has no end for the library, which would take "
                                 "what follows for a comment as well; write something into it");
                 found = true;
             }
@@ -443,23 +443,22 @@ class FormChecker
             why.pop_back();
         }
         if (text_.find_first_of(" \t\r\n") == 0) {
-            findings_.error(0, "the module would not load a text that begins with white space; "
+            findings_.error(0, "the library would not load a text that begins with white space; "
                                "begin it with a '<'");
             return;
         }
         if (const std::size_t beside = beside_root(); beside != kNone) {
-            findings_.error(beside, std::string("the module would not load a plan without a "
+            findings_.error(beside, std::string("the library would not load a plan without a "
                                                 "declaration that has something beside its root "
                                                 "element; begin it with ") +
                                         kDeclaration);
             return;
         }
-        findings_.error(undefined_entity(0), "well-formed, but the module would not load it: " +
-                                                 cut(one_line(why), 2 * kShownPath) +
-                                                 "; mend that");
+        findings_.error(undefined_entity(0), "well-formed, but the library would not load it: " +
+                                                 cut(one_line(why), 2 * kShownPath) + "; fix that");
     }
 
-    // What stands beside the root element, where the library takes that for a
+    // What stands beside the root element, where Mini-XML takes that for a
     // second root.
     [[nodiscard]] std::size_t beside_root() const
     {
@@ -596,7 +595,7 @@ class Places
         return place != nullptr && place->has_value ? place->value_begin : of(element);
     }
 
-    // Of a byte of the value, as the module reads it.
+    // Of a byte of the value, as the library reads it.
     [[nodiscard]] std::size_t inside(std::size_t element, std::string_view name,
                                      std::size_t byte) const
     {
@@ -677,15 +676,15 @@ struct Group {
     std::vector<mxml_node_t *> others;
 };
 
-// An item that its group lacks is looked for in the groups behind it, and its
+// An item that its group lacks is looked for in the groups after it, and its
 // position there is run here. That is so with every item of every later group:
 // said is where the wrong path comes easily, because another group has an item of
 // that name, or the earlier group one like it.
-class BehindChecker
+class LaterGroupsCheck
 {
   public:
-    BehindChecker(const Plan &plan, const Places &places, const std::vector<Group> &groups,
-                  Findings &findings)
+    LaterGroupsCheck(const Plan &plan, const Places &places, const std::vector<Group> &groups,
+                     Findings &findings)
         : plan_(plan), places_(places), findings_(findings)
     {
         for (const Group &group : groups) {
@@ -705,7 +704,7 @@ class BehindChecker
         for (at_ = 0; at_ < groups_.size(); ++at_) {
             check_group(groups_[at_]);
             for (const Item *item : groups_[at_].items) {
-                behind_last_[*item->name] = at_ + 1;
+                after_last_[*item->name] = at_ + 1;
                 alike_[likeness(*item->name)] = at_;
             }
         }
@@ -748,8 +747,8 @@ class BehindChecker
             }
             first = item;
             text = "group " + in_quotes(*earlier->name) + " has no item " + in_quotes(*item->name) +
-                   ", and finds this one behind it: " + path_of(*earlier->name, *item->name) +
-                   " would run " + names_of({run}) + "; mind the group in paths to it";
+                   ", and finds this one after it: " + path_of(*earlier->name, *item->name) +
+                   " would run " + names_of({run}) + "; check the group in paths to it";
         }
         if (first != nullptr) {
             findings_.warning(places_.of(first->number, "name"),
@@ -761,8 +760,8 @@ class BehindChecker
     // One before this group whose path with that name leads here.
     [[nodiscard]] const Group *earlier_group(const std::string &name) const
     {
-        const auto last = behind_last_.find(name);
-        const std::size_t begin = last != behind_last_.end() ? last->second : 0;
+        const auto last = after_last_.find(name);
+        const std::size_t begin = last != after_last_.end() ? last->second : 0;
         if (uses_.at(name) > 1 && begin < at_) {
             return groups_[at_ - 1].group;
         }
@@ -777,8 +776,8 @@ class BehindChecker
     std::vector<Entry> groups_;
     std::size_t at_ = 0;
     std::unordered_map<std::string, std::size_t> uses_;
-    std::unordered_map<std::string, std::size_t> behind_last_; // group that has the name
-    std::unordered_map<std::string, std::size_t> alike_;       // the last group with such a name
+    std::unordered_map<std::string, std::size_t> after_last_; // group that has the name
+    std::unordered_map<std::string, std::size_t> alike_;      // the last group with such a name
 };
 
 class PlanChecker
@@ -795,7 +794,7 @@ class PlanChecker
         check_tags();
         if (groups_.empty()) {
             findings_.error(places_.of(root()),
-                            "no CmdGroup in it: the module would find nothing "
+                            "no CmdGroup in it: the library would find nothing "
                             "to run; put the items into <CmdGroup name=\"...\">");
             return;
         }
@@ -814,7 +813,7 @@ class PlanChecker
                 check_positions(group);
             }
         }
-        BehindChecker(plan_, places_, groups_, findings_).check();
+        LaterGroupsCheck(plan_, places_, groups_, findings_).check();
     }
 
   private:
@@ -892,8 +891,7 @@ class PlanChecker
                 if (strcasecmp(tag, meant) == 0 && std::strcmp(tag, meant) != 0) {
                     findings_.warning(places_.of(plan_.number(node)),
                                       kind_of(node) +
-                                          " is nothing to the module, which tells small "
-                                          "letters from capitals; write <" +
+                                          " is ignored: element names are case-sensitive; write <" +
                                           meant + ">");
                 }
             }
@@ -906,7 +904,7 @@ class PlanChecker
         const std::size_t place = places_.of(group.number, "name");
         if (group.node == plan_.top()) {
             findings_.error(places_.of(group.number),
-                            "the module looks for groups below the top of the document, and would "
+                            "the library looks for groups below the top of the document, and would "
                             "not find this one; begin it with " +
                                 std::string(kDeclaration));
         } else if (name.empty()) {
@@ -964,9 +962,9 @@ class PlanChecker
     {
         if (!places_.is_valueless(item.number, "name")) {
             findings_.error(places_.of(item.number, "name"),
-                            item.name ? "the name of an item is empty: the module would not run "
+                            item.name ? "the name of an item is empty: the library would not run "
                                         "it; write the name of its program"
-                                      : "an item has no name: the module would not run it; add "
+                                      : "an item has no name: the library would not run it; add "
                                         "name=\"...\" with the name of its program");
         }
     }
@@ -1032,7 +1030,7 @@ class PlanChecker
         if (name == gatherer + "_qsee" || (vendor && vendor->name == gatherer)) {
             findings_.warning(place, "item " + in_quotes(name) + " is not the gatherer: that is " +
                                          in_quotes(gatherer) +
-                                         ", to which the module adds the vendor's suffix; leave "
+                                         ", to which the library adds the vendor's suffix; leave "
                                          "it out");
         } else if (vendor) {
             const std::string under = " under vendor " + std::to_string(vendor->vendor);
@@ -1042,7 +1040,7 @@ class PlanChecker
                                                ", and item " + in_quotes(vendor->name) + " as " +
                                                in_quotes(name) + "; rename one"
                                          : "item " + in_quotes(name) + " would be run as " + twice +
-                                               ": the module adds the suffix; leave it out");
+                                               ": the library adds the suffix; leave it out");
         }
     }
 
@@ -1098,7 +1096,7 @@ class PlanChecker
             findings_.warning(places_.of(group.number),
                               "group " + in_quotes(*group.name) + " is empty: " +
                                   path_of(*group.name) + " would run nothing, and an item of it " +
-                                  "is looked for in the groups behind; put items into it");
+                                  "is looked for in the groups after it; put items into it");
         }
         if (group.others.empty()) {
             return;

@@ -1,7 +1,7 @@
 // SPDX-FileCopyrightText: 2026 The Quillmark authors
 // SPDX-License-Identifier: Apache-2.0
 
-// Finds in a test plan what the module would make something else of than its
+// Finds in a test plan what the library would make something else of than its
 // author meant.
 #pragma once
 

@@ -86,16 +86,16 @@ Messages::Messages(const std::string &file, std::string_view text)
 std::string Messages::of(const Finding &finding)
 {
     constexpr std::size_t kWidth = 80;
-    constexpr std::size_t kBehind = 40; // columns kept behind a place far to the right
+    constexpr std::size_t kAfter = 40; // columns kept after a place far to the right
     const Position place = positions_.of(finding.offset);
-    auto [before, behind] = source_line(text_, place.begin);
-    if (columns(before) + columns(behind) > kWidth && columns(before) > kWidth - kBehind) {
-        behind = cut(behind, kBehind);
-        before = "..." + std::string(end_of(before, kWidth - 3 - columns(behind)));
+    auto [before, after] = source_line(text_, place.begin);
+    if (columns(before) + columns(after) > kWidth && columns(before) > kWidth - kAfter) {
+        after = cut(after, kAfter);
+        before = "..." + std::string(end_of(before, kWidth - 3 - columns(after)));
     }
     return file_ + ":" + std::to_string(place.line) + ":" + std::to_string(place.column) +
            (finding.severity == Finding::Severity::error ? ": error: " : ": warning: ") +
-           finding.text + "\n" + cut(before + behind, kWidth) + "\n" +
+           finding.text + "\n" + cut(before + after, kWidth) + "\n" +
            std::string(columns(before), ' ') + "^\n";
 }
 

@@ -45,7 +45,7 @@ std::string reason(const Fault &fault)
         return "it finds no end of the " + mark + " here; end it, or put a '\\' before it";
     case Fault::Kind::unexpected:
         return "it takes no " + mark + " here; put it in quotes, or leave it out";
-    case Fault::Kind::nothing_behind:
+    case Fault::Kind::nothing_after:
         return "nothing follows the " + mark + " here; put it in quotes, or leave it out";
     }
     return {};
@@ -152,7 +152,7 @@ void ShellChecker::report_refusal(const Item &item, const Verdict &verdict, std:
     if (const auto &fault = verdict.reading.fault) {
         findings_.error(item.args_place(fault->at - args_begin), text + reason(*fault));
     } else {
-        findings_.error(item.args_place(0), text + one_line(verdict.why) + "; mend its args");
+        findings_.error(item.args_place(0), text + one_line(verdict.why) + "; fix its args");
     }
 }
 
@@ -213,7 +213,7 @@ void ShellChecker::report_command(const Item &item, const Effect &effect, std::s
     } else if (effect.mark == "&" || effect.mark == "|&") {
         findings_.warning(place,
                           "the shell would run item " + name + " in the background" +
-                              (effect.text.empty() ? ", so that it ends at once for the module"
+                              (effect.text.empty() ? ", so that it ends at once for the library"
                                                    : ", and " + second) +
                               unless);
     } else if (effect.text.empty()) {

@@ -85,7 +85,8 @@ Shell::Answer Shell::ask_to_expand(const std::string &expansion, std::string &wh
     return answer;
 }
 
-Shell::Answer Shell::ask_once(std::string option, const std::string &line, std::string &why) const
+Shell::Answer Shell::ask_once(const std::string &option, const std::string &line,
+                              std::string &why) const
 {
     std::array<int, 2> ends{};
     if (left_ <= 0 || access("/system/bin/sh", X_OK) != 0 || pipe2(ends.data(), O_CLOEXEC) != 0) {
@@ -99,9 +100,10 @@ Shell::Answer Shell::ask_once(std::string option, const std::string &line, std::
     posix_spawn_file_actions_addopen(&actions, STDOUT_FILENO, "/dev/null", O_WRONLY, 0);
     posix_spawn_file_actions_adddup2(&actions, errors.get(), STDERR_FILENO);
     std::string name = "sh";
+    std::string how = option;
     std::string takes_text = "-c";
     std::string text = line;
-    const std::array<char *, 5> arguments = {name.data(), option.data(), takes_text.data(),
+    const std::array<char *, 5> arguments = {name.data(), how.data(), takes_text.data(),
                                              text.data(), nullptr};
     const std::array<char *, 1> environment = {nullptr};
     pid_t process = -1;

@@ -65,7 +65,7 @@ class Scanner
         bool is_empty = true;  // it has no redirection either
         std::size_t cases = 0; // "case" without its "esac"
         std::size_t operator_at = 0;
-        std::string operator_; // what has a command behind it
+        std::string operator_; // what has a command after it
     };
 
     // --- places ---
@@ -110,7 +110,7 @@ class Scanner
 
     [[nodiscard]] bool is_first() const
     {
-        return depth_ == 0 && !behind_first_;
+        return depth_ == 0 && !after_first_;
     }
 
     void note(Effect::Kind kind, std::size_t at, std::string_view mark, std::size_t begin,
@@ -122,13 +122,13 @@ class Scanner
         }
     }
 
-    // What is behind it is the text, up to the end of the line.
+    // What is after it is the text, up to the end of the line.
     void begin_effect(std::size_t at, std::string_view mark)
     {
         if (is_first()) {
             note(Effect::Kind::command, at, mark, at, at);
             open_ = at_;
-            behind_first_ = true;
+            after_first_ = true;
         }
     }
 
@@ -176,7 +176,7 @@ class Scanner
             }
         }
         if (!state.operator_.empty() && state.is_empty) {
-            fail(Fault::Kind::nothing_behind, state.operator_at, state.operator_);
+            fail(Fault::Kind::nothing_after, state.operator_at, state.operator_);
         }
     }
 
@@ -205,7 +205,7 @@ class Scanner
         if (depth_ == 0 && !has_line_end_ && next_command() < line_.size()) {
             has_line_end_ = true;
             end_effect();
-            behind_first_ = false;
+            after_first_ = false;
             begin_effect(place, "\n");
             open_ = next_command();
         }
@@ -249,7 +249,7 @@ class Scanner
         }
     }
 
-    // "()" behind a name.
+    // "()" after a name.
     bool pass_function()
     {
         const std::size_t begin = at_;
@@ -313,7 +313,7 @@ class Scanner
             const std::size_t target = at_;
             pass_word();
             if (at_ == target) {
-                fail(Fault::Kind::nothing_behind, place, mark);
+                fail(Fault::Kind::nothing_after, place, mark);
                 return;
             }
             note(Effect::Kind::redirection, begin, mark, begin, at_);
@@ -383,7 +383,7 @@ class Scanner
         if (word.ends_with('=') && looking_at("(")) {
             read_pattern(); // the values of an array
         }
-        // behind these a command begins
+        // after these a command begins
         if (!is_any(word, {"if", "then", "elif", "else", "while", "until", "do", "{", "!"})) {
             ++state.words;
         }
@@ -544,7 +544,7 @@ class Scanner
     ShellReading reading_;
     std::size_t depth_ = 0; // of what is run on its own
     std::size_t braces_ = 0;
-    bool behind_first_ = false;
+    bool after_first_ = false;
     bool has_line_end_ = false;
     std::optional<std::size_t> open_; // where the last effect's text begins
     std::vector<HereDocument> here_documents_;

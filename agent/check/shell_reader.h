@@ -17,7 +17,7 @@ namespace fptest
 struct ShellReading {
     // What keeps the shell from running anything.
     struct Fault {
-        enum class Kind { no_end, unexpected, nothing_behind };
+        enum class Kind { no_end, unexpected, nothing_after };
         Kind kind = Kind::no_end;
         std::size_t at = 0;
         std::string mark; // the characters that stand there
@@ -66,7 +66,7 @@ class Shell
     }
 
   private:
-    Answer ask_once(std::string option, const std::string &line, std::string &why) const;
+    Answer ask_once(const std::string &option, const std::string &line, std::string &why) const;
 
     double left_; // seconds
 };

@@ -56,7 +56,7 @@ constexpr char kShowExamples[] = "Examples:\n"
                                  "  fptest show results/annotated.xml";
 
 constexpr char kReportExamples[] =
-    "Lets a shell script be an item. RESULT is 0, 1 or -2: the module has a text for\n"
+    "Lets a shell script be an item. RESULT is 0, 1 or -2: the library has a text for\n"
     "no other code.\n"
     "\n"
     "Examples:\n"
@@ -65,7 +65,7 @@ constexpr char kReportExamples[] =
     "      --description 'chip answers at 8 MHz'";
 
 constexpr char kSendExamples[] =
-    "Prints one line a command: the reply, empty where there is none. What the module\n"
+    "Prints one line a command: the reply, empty where there is none. What the library\n"
     "and the items print goes to standard error.\n"
     "\n"
     "Examples:\n"
@@ -130,7 +130,7 @@ CLI::Validator time_span()
             ""};
 }
 
-// The codes that the module has a text for, spelled as it does.
+// The codes that the library has a text for, spelled as it does.
 CLI::Validator result_code()
 {
     return {[](std::string &text) {
@@ -246,7 +246,7 @@ class CommandLine
     {
         command
             ->add_option("--log", log,
-                         "append the module's log to FILE; without, it\n"
+                         "append the library's log to FILE; without, it\n"
                          "goes where VR_LOG_FILE says, or nowhere")
             ->type_name("FILE")
             ->check(not_empty());
@@ -323,8 +323,8 @@ class CommandLine
 
     void add_check()
     {
-        CLI::App *command = add("check", "Say what the module would make of a plan", kCheckExamples,
-                                [this] { return fptest::check_files(check_); });
+        CLI::App *command = add("check", "Say what the library would make of a plan",
+                                kCheckExamples, [this] { return fptest::check_files(check_); });
         command->add_option("FILE", check_.files, "test plans ('-': standard input)")
             ->type_name("")
             ->transform(desk_file())
@@ -373,16 +373,16 @@ class CommandLine
 
     void add_send()
     {
-        CLI::App *command = add("send", "Hand raw command strings to the module", kSendExamples,
+        CLI::App *command = add("send", "Hand raw command strings to the library", kSendExamples,
                                 [this] { return fptest::send(send_); });
         command->add_option("COMMAND", send_.commands, "HEAD::NAME::ARGUMENTS")->type_name("");
         command->add_flag("-0", send_.from_input,
                           "read them from standard input instead, a\n"
-                          "zero byte behind each, as behind the replies");
+                          "zero byte after each, as after the replies");
         add_log(command, send_.log);
     }
 
-    CLI::App app_{"Runs test plans of a fingerprint-sensor stack through the Quillmark module.",
+    CLI::App app_{"Runs test plans of a fingerprint-sensor stack through the Quillmark library.",
                   "fptest"};
     std::function<Exit()> action_;
     fptest::RunOptions run_;

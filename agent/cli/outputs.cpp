@@ -20,7 +20,7 @@ namespace fptest
 namespace
 {
 
-const NamedFile kModulesFile{"the module", kStoredPlan};
+const NamedFile kModulesFile{"the library", kStoredPlan};
 
 // Whether both are one file, by whatever name, of which one would overwrite the
 // other: into a pipe or a terminal both may write.
@@ -74,7 +74,7 @@ void require_different(const std::vector<NamedFile> &files)
             const auto &[other_option, other_file] = files[other];
             if (!file.empty() && !other_file.empty() && file != "-" && other_file != "-" &&
                 are_same_file(file, other_file) &&
-                !(option == "--plan" && other_option == "the module")) {
+                !(option == "--plan" && other_option == "the library")) {
                 throw Failure(Exit::usage, option + " and " + other_option +
                                                " both want the file " + one_line(file) +
                                                ": give them files of their own");
@@ -130,7 +130,7 @@ void require_log_of_its_own(const std::string &log, Beside beside)
                           (!is_regular && (beside == Beside::view || isatty(STDOUT_FILENO) != 0));
     if (file.second == "-" || (!is_apart && is_standard_output(file.second))) {
         throw Failure(Exit::usage, label(file) + " is standard output, which is not for the "
-                                                 "module's log: name a file for that");
+                                                 "library's log: name a file for that");
     }
 }
 

@@ -20,7 +20,7 @@ void settle_outputs(RunOptions &options);
 // That the reports can be begun, all of them: none is written over where one cannot.
 void require_writable_reports(const RunOptions &options);
 
-// That the module's log, which --log names or else VR_LOG_FILE, goes neither into the
+// That the library's log, which --log names or else VR_LOG_FILE, goes neither into the
 // stored plan nor into what this program itself writes to standard output: a view may
 // have it in its terminal or pipe, but a file both would write over, and who reads
 // results expects no log among them.

@@ -61,8 +61,8 @@ Plan load_stored(const std::string &text)
                       (shown.empty() ? " has none at all" : " has " + listing(shown)));
 }
 
-// The item's number in the plan. Only its own group is looked at: the module
-// would go on into the groups behind it, and annotate another item.
+// The item's number in the plan. Only its own group is looked at: the library
+// would go on into the groups after it, and annotate another item.
 std::size_t find_item(const Plan &plan, const ReportOptions &options)
 {
     const auto groups = plan.groups();
@@ -95,7 +95,7 @@ Exit report(const ReportOptions &options)
     const std::string text = read_stored();
     const Plan plan = load_stored(text);
     const std::size_t number = find_item(plan, options);
-    // the library would not load such a plan again
+    // Mini-XML would not load such a plan again
     const std::string description = clean(options.description);
     if (description != options.description) {
         std::fputs("fptest: bytes of the description that no plan can hold are replaced\n", stderr);
@@ -111,7 +111,7 @@ Exit report(const ReportOptions &options)
     wanted.description = as_loaded(description);
     if (!written || !(written->report(number) == wanted)) {
         throw Failure(Exit::environment, std::string("the report is not in ") + kStoredPlan +
-                                             ": is it writable? --log FILE tells what the module "
+                                             ": is it writable? --log FILE tells what the library "
                                              "met");
     }
     return Exit::success;

@@ -27,7 +27,7 @@ namespace fptest
 namespace
 {
 
-// What is to be run: the plan's text and what the module makes of it.
+// What is to be run: the plan's text and what the library makes of it.
 struct Source {
     std::string name; // of the file, for people
     std::string text;
@@ -86,7 +86,7 @@ Source open_plan(const RunOptions &options)
     }
     if (has_errors(findings) && !options.force) {
         print(stderr, name, text, findings);
-        throw Failure(Exit::usage, "nothing was run, because the plan has errors; mend them, or "
+        throw Failure(Exit::usage, "nothing was run, because the plan has errors; fix them, or "
                                    "run it as it is with --force");
     }
     if (!findings.empty() && !options.quiet) {
@@ -98,7 +98,7 @@ Source open_plan(const RunOptions &options)
     auto plan = Plan::load(use == PlanUse::to_send ? stored_part(text) : text, &why);
     if (!plan) {
         throw Failure(Exit::usage,
-                      one_line(name) + ": the module cannot load this plan: " + one_line(why));
+                      one_line(name) + ": the library cannot load this plan: " + one_line(why));
     }
     return {name, text, std::move(*plan), use};
 }

@@ -24,7 +24,7 @@ namespace
 
 using namespace std::chrono_literals;
 
-// Commands separated by zero bytes; one behind the last may be there or not.
+// Commands separated by zero bytes; one after the last may be there or not.
 std::vector<std::string> read_commands()
 {
     std::vector<std::string> commands;
@@ -42,7 +42,7 @@ std::vector<std::string> read_commands()
     return commands;
 }
 
-// What the module takes for the command's head: colons in front of it are passed
+// What the library takes for the command's head: colons in front of it are passed
 // over.
 std::string_view head_of(std::string_view command)
 {
@@ -84,7 +84,7 @@ class Sender
     // The reply, or nothing where the command was interrupted.
     std::optional<std::string> send(const std::string &command)
     {
-        // the module waits for nobody who is just writing the plan that it loads
+        // the library waits for nobody who is just writing the plan that it loads
         Descriptor plan =
             head_of(command).starts_with("XMLNodePath") ? lock_stored_plan() : Descriptor(-1);
         const auto items = items_of(command);

@@ -1,8 +1,8 @@
 // SPDX-FileCopyrightText: 2026 The Quillmark authors
 // SPDX-License-Identifier: Apache-2.0
 
-// The module runs its items by system() and looks at no status. This program has a
-// system() of its own, which the module finds ahead of the C library's: it does the
+// The library runs its items by system() and looks at no status. This program has a
+// system() of its own, which the library finds ahead of the C library's: it does the
 // same, and tells the status.
 #pragma once
 
@@ -13,7 +13,7 @@ namespace fptest
 
 // What is told each status, as waitpid() gives it, before system() returns. Each
 // command then runs in a process group of its own, so that an item which signals
-// its group does not meet the module.
+// its group does not meet the library.
 void tell_item_status(std::function<void(int)> told);
 
 } // namespace fptest

@@ -1,7 +1,7 @@
 // SPDX-FileCopyrightText: 2026 The Quillmark authors
 // SPDX-License-Identifier: Apache-2.0
 
-// What the agent and the module's process say to each other over their socket.
+// What the agent and the library's process say to each other over their socket.
 #pragma once
 
 #include <string>
@@ -10,11 +10,11 @@ namespace fptest
 {
 
 enum class MessageKind : char {
-    // to the module's process
+    // to the library's process
     command = 'c',   // the command and the names of its items, a zero byte between each
     stop = 's',      // the item's name
     read_back = 'b', // nothing
-    hold = 'h',      // nothing: from here on the module is held at each item's end
+    hold = 'h',      // nothing: from here on the library is held at each item's end
     go_on = 'g',     // nothing: it may go on after the item that has ended
     // from it
     item = 'i',     // "MOMENT VENDOR": the command has come to an item

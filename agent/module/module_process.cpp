@@ -66,7 +66,7 @@ Host::Event with_moment(Host::Event::Kind kind, const std::string &text)
 
 Host::Host() : output_(make_output())
 {
-    // what outlives the module's process comes to this one, and can be found
+    // what outlives the library's process comes to this one, and can be found
     prctl(PR_SET_CHILD_SUBREAPER, 1);
     start();
 }
@@ -75,14 +75,14 @@ void Host::start()
 {
     std::array<int, 2> control{};
     if (socketpair(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0, control.data()) != 0) {
-        fail("no socket to the module's process");
+        fail("no socket to the library's process");
     }
     control_ = Descriptor(control[0]);
     const Descriptor their_control(control[1]);
     std::fflush(nullptr);
     pid_ = fork();
     if (pid_ < 0) {
-        fail("no process for the module");
+        fail("no process for the library");
     }
     leader_ = pid_;
     if (pid_ == 0) {
@@ -149,7 +149,7 @@ void Host::kill_module() const
     }
 }
 
-// The module first, or it would start another item meanwhile.
+// The library first, or it would start another item meanwhile.
 void Host::suspend()
 {
     if (pid_ > 0) {
@@ -287,7 +287,7 @@ std::string Host::take_output()
     return has_events() ? "" : take_output(size);
 }
 
-// What has been printed behind an event that is still to come is not what was
+// What has been printed after an event that is still to come is not what was
 // printed before it.
 bool Host::has_events() const
 {

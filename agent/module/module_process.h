@@ -1,8 +1,8 @@
 // SPDX-FileCopyrightText: 2026 The Quillmark authors
 // SPDX-License-Identifier: Apache-2.0
 
-// The module in a process of its own, which the agent asks by messages. A
-// terminal's Ctrl-C reaches the agent and not the items, a module that dies
+// The library in a process of its own, which the agent asks by messages. A
+// terminal's Ctrl-C reaches the agent and not the items, a library that dies
 // takes no results along, and while a command runs this process calls nothing:
 // the suspension goes through the other one.
 #pragma once
@@ -43,7 +43,7 @@ class Host
     };
 
     // Throws std::system_error where the process cannot be made.
-    // What the module and its items print is kept for take_output(); input they get
+    // What the library and its items print is kept for take_output(); input they get
     // none.
     Host();
     // Ends the process. An item that it still runs is stopped.
@@ -56,25 +56,25 @@ class Host
     void command(const std::string &text, const std::vector<std::string> &items = {});
 
     // Asks for FPTEST_SuspendItemExecute, which is called where a process of the
-    // item is there to be stopped: before any has been started, the module would
+    // item is there to be stopped: before any has been started, the library would
     // stop the first process of the system.
     void stop(const std::string &item);
 
-    // Holds the module at the end of each item, from here on, until go_on() is called:
+    // Holds the library at the end of each item, from here on, until go_on() is called:
     // what it left can be looked at before anything else starts.
     void hold_at_ends();
     void go_on();
 
-    // What runs for the module; also what a module's process that has ended left.
+    // What runs for the library; also what a library's process that has ended left.
     ModuleProcesses processes() const;
 
-    // Takes another process for the module in place of one that has ended.
+    // Takes another process for the library in place of one that has ended.
     void restart();
 
-    // Ends the module's process, where that does not answer.
+    // Ends the library's process, where that does not answer.
     void kill_module() const;
 
-    // Suspends the module and its items, and lets them go on.
+    // Suspends the library and its items, and lets them go on.
     void suspend();
     void resume();
 

@@ -27,7 +27,7 @@ namespace
 constexpr char kDataDirectory[] = "/data/vorlane";
 constexpr char kLogVariable[] = "VR_LOG_FILE";
 
-// The module's process has other descriptors than this one.
+// The library's process has other descriptors than this one.
 std::string for_all_processes(const std::string &file)
 {
     static constexpr std::pair<std::string_view, std::string_view> kOwn[] = {
@@ -67,7 +67,7 @@ void choose_log(const std::string &option)
     const std::string path = for_all_processes(file.second);
     const Descriptor log(
         open(path.c_str(), O_WRONLY | O_CREAT | O_APPEND | O_NONBLOCK | O_CLOEXEC, 0644));
-    // the module says nothing of what it cannot write
+    // the library says nothing of what it cannot write
     if (!log.is_open() || write(log.get(), "", 0) < 0) {
         throw Failure(Exit::environment, label(file) + " cannot be written: " +
                                              std::strerror(errno) + "; name another file");
@@ -140,7 +140,7 @@ void require_trigger_port()
         bind(probe.get(), reinterpret_cast<const sockaddr *>(&address), sizeof address) != 0) {
         throw Failure(Exit::environment,
                       "port " + std::to_string(kTriggerPort) +
-                          " cannot be had: " + std::strerror(errno) +
+                          " is not available: " + std::strerror(errno) +
                           "; the gatherer's run would never end: stop what listens there "
                           "(netstat -ltnp names it)");
     }
@@ -148,7 +148,7 @@ void require_trigger_port()
 
 std::string gone_text(const Host::Event &event)
 {
-    return "the module's process ended " + event.text + "; --log FILE keeps what it says";
+    return "the library's process ended " + event.text + "; --log FILE keeps what it says";
 }
 
 int send_and_wait(Host &host, const std::string &command)
@@ -187,7 +187,7 @@ int ask_vendor(Host &host)
         throw Failure(
             Exit::environment,
             "the vendor selector is " + std::to_string(vendor) +
-                ", and the module runs nothing then: set device/SysParam/Quillmark/vendor "
+                ", and the library runs nothing then: set device/SysParam/Quillmark/vendor "
                 "to 0, 1 or 2 in /etc/vorlane/sysparms/vr_common_cfg.xml");
     }
     return vendor;

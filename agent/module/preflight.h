@@ -21,11 +21,11 @@ using NamedFile = std::pair<std::string, std::string>;
 // "--log agent.log", "VR_LOG_FILE=agent.log"
 std::string label(const NamedFile &file);
 
-// Where the module's log goes: to the file that --log names, else where VR_LOG_FILE
+// Where the library's log goes: to the file that --log names, else where VR_LOG_FILE
 // says. Its name is empty where it goes nowhere.
 NamedFile log_file(const std::string &option);
 
-// Sees to that. To be called before the module is.
+// Sees to that. To be called before the library is.
 void choose_log(const std::string &option);
 
 // That this is a device at all.
@@ -40,17 +40,17 @@ void require_stored(const std::string &found, const std::string &wanted);
 // That nobody else runs a plan here, for as long as the descriptor is open.
 Descriptor lock_device();
 
-// That the module will be able to listen for the gatherer.
+// That the library will be able to listen for the gatherer.
 void require_trigger_port();
 
-// The vendor that the module reads; nothing is run to learn it.
+// The vendor that the library reads; nothing is run to learn it.
 int ask_vendor(Host &host);
 
 // Sends a command that runs nothing, and waits for its end. Gives the vendor that
-// the module read for it; 0 where it read none.
+// the library read for it; 0 where it read none.
 int send_and_wait(Host &host, const std::string &command);
 
-// Says that the module's process has ended, and what to do.
+// Says that the library's process has ended, and what to do.
 std::string gone_text(const Host::Event &event);
 
 // That no program of an item is still running from an earlier run: it would report

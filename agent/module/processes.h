@@ -1,7 +1,7 @@
 // SPDX-FileCopyrightText: 2026 The Quillmark authors
 // SPDX-License-Identifier: Apache-2.0
 
-// The processes below the one that holds the module: an item's own, and those of
+// The processes below the one that holds the library: an item's own, and those of
 // the gatherer, which stays when its item has ended.
 #pragma once
 
@@ -30,17 +30,17 @@ bool runs_below(pid_t ancestor, const std::vector<std::string> &items);
 std::optional<std::pair<std::string, pid_t>>
 process_of_any(const std::vector<std::string> &programs);
 
-// What a module's process has started and what came of that.
+// What a library's process has started and what came of that.
 class ModuleProcesses
 {
   public:
-    // The module's process, which leads its own process group, and the one that
+    // The library's process, which leads its own process group, and the one that
     // inherits what it leaves behind when it dies; they may be the same.
     ModuleProcesses(pid_t module, pid_t ancestor) : module_(module), ancestor_(ancestor)
     {
     }
 
-    // Those of items: everything but the gatherer, which the module starts in its
+    // Those of items: everything but the gatherer, which the library starts in its
     // own process group, and what the gatherer has started. Some are left out, with
     // all of their process groups and what they have started.
     std::vector<Leftover> of_items(const std::vector<Leftover> &left_out = {}) const;

@@ -89,14 +89,14 @@ class Server
         send_message(socket_, message);
     }
 
-    // An item that has been stopped ends at once, but its end is told behind this.
+    // An item that has been stopped ends at once, but its end is told after this.
     void answer_stop(const std::string &item)
     {
         const std::lock_guard lock(mutex_);
         send_message(socket_, {MessageKind::stopped, std::to_string(stop({item}))});
     }
 
-    // What the module itself prints, "vendor = N" for each item that it comes to,
+    // What the library itself prints, "vendor = N" for each item that it comes to,
     // goes to the agent, which learns by it when the item began and what of the
     // output was before. The items are started with descriptor 1.
     static void print_to(Server &server)
@@ -133,7 +133,7 @@ class Server
                 moment() + (number == std::string::npos ? "0" : line.substr(number))});
     }
 
-    // Where that is wanted, the module is held until the agent has read what the item
+    // Where that is wanted, the library is held until the agent has read what the item
     // reported, and looked for what it has left running.
     void tell_ended(int status)
     {
@@ -174,8 +174,8 @@ class Server
                std::to_string(output.st_size) + " ";
     }
 
-    // The shell that runs the stop complains of process 9, which its command names
-    // and which is nobody: that is no output of the item's.
+    // The stop's shell complains that there is no process 9: that is kept out of the
+    // item's output.
     static int stop(const std::vector<std::string> &items)
     {
         if (!runs_below(getpid(), items)) {
@@ -282,7 +282,7 @@ void reset_signals()
     sigprocmask(SIG_SETMASK, &none, nullptr);
 }
 
-// The module leaves descriptors open with each trigger and each stop.
+// The library leaves descriptors open with each trigger and each stop.
 void raise_descriptor_limit()
 {
     rlimit limit{};

@@ -1,14 +1,14 @@
 // SPDX-FileCopyrightText: 2026 The Quillmark authors
 // SPDX-License-Identifier: Apache-2.0
 
-// The module's process, from the inside.
+// The library's process, from the inside.
 #pragma once
 
 namespace fptest
 {
 
-// Turns this process, which was just made, into the module's: it calls the module
-// as the messages on the socket say, until their sender is gone. What the module
+// Turns this process, which was just made, into the library's: it calls the library
+// as the messages on the socket say, until their sender is gone. What the library
 // starts prints into the output and gets no input.
 [[noreturn]] void serve_module(int socket, int output);
 

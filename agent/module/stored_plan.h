@@ -19,7 +19,7 @@ std::optional<std::string> read_stored_plan();
 std::string whole_stored_plan();
 
 // Makes one load again that a report has spoiled, so that the next items can
-// report: a result that the module has no text for, or a null description, is left
+// report: a result that the library has no text for, or a null description, is left
 // without a value, and control characters and bytes that are no UTF-8 are kept as
 // they came. Throws a Failure where it cannot be written.
 void mend_stored_plan();

@@ -74,8 +74,8 @@ class Scanner
         return std::string(text_.substr(begin, at_ - begin));
     }
 
-    // Ends the tag behind the next such text.
-    void end_behind(std::string_view mark, std::size_t from)
+    // Ends the tag after the next such text.
+    void end_after(std::string_view mark, std::size_t from)
     {
         const std::size_t place = text_.find(mark, from);
         tag_.complete = place != text_.npos;
@@ -99,17 +99,17 @@ class Scanner
             read_comment();
         } else if (looking_at("<![CDATA[")) {
             tag_.kind = Tag::Kind::cdata;
-            end_behind("]]>", at_ + 9);
+            end_after("]]>", at_ + 9);
         } else if (looking_at("<!")) {
             tag_.kind = Tag::Kind::declaration;
-            end_behind(">", at_ + 2);
+            end_after(">", at_ + 2);
         } else if (looking_at("<?")) {
             read_instruction();
         } else if (looking_at("</")) {
             tag_.kind = Tag::Kind::close;
             at_ += 2;
             tag_.name = read_until_any(" \t\r\n/><");
-            end_behind(">", at_);
+            end_after(">", at_);
         } else {
             read_element();
         }
@@ -131,7 +131,7 @@ class Scanner
         const std::size_t begin = at_;
         at_ += 2;
         tag_.name = read_until_any(" \t\r\n?>");
-        end_behind("?>", begin + 1);
+        end_after("?>", begin + 1);
     }
 
     void read_element()

@@ -16,7 +16,7 @@ namespace fptest
 struct Attribute {
     std::string name;
     std::size_t begin = 0; // offset of the name's first byte
-    std::size_t end = 0;   // behind the closing quote, or behind the name
+    std::size_t end = 0;   // after the closing quote, or after the name
     bool has_value = false;
     std::size_t value_begin = 0; // inside the quotes
     std::size_t value_end = 0;
@@ -28,7 +28,7 @@ struct Tag {
     Kind kind = Kind::text;
     std::string name;      // of an element or an instruction
     std::size_t begin = 0; // offset of its '<', or of a text's first word
-    std::size_t end = 0;   // behind its '>', or behind a text's last word
+    std::size_t end = 0;   // after its '>', or after a text's last word
     bool complete = true;  // whether the text goes on to its end
     std::vector<Attribute> attributes;
 };
@@ -36,8 +36,8 @@ struct Tag {
 // The tags of a text in order; white space alone is no text.
 std::vector<Tag> scan(std::string_view text);
 
-// Where the byte of an attribute's value stands that is that many behind its first
-// one as Mini-XML reads it; for its end, behind its last.
+// Where the byte of an attribute's value stands that is that many after its first
+// one as Mini-XML reads it; for its end, after its last.
 std::size_t place_in_value(std::string_view text, const Attribute &attribute, std::size_t byte);
 
 inline constexpr std::string_view kByteOrderMark = "\xEF\xBB\xBF";

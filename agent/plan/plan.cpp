@@ -23,7 +23,7 @@ namespace fptest
 namespace
 {
 
-// --- text as the module cuts it ---------------------------------------------
+// --- text as the library cuts it ---------------------------------------------
 
 constexpr std::size_t kPathLimit = 2047;
 constexpr std::size_t kProgramLimit = 1023; // characters of a name that are run
@@ -40,7 +40,7 @@ std::string program_name(std::string_view name)
     return up_to_any(name.substr(0, kProgramLimit), std::string_view("\t\n\0", 3));
 }
 
-// The components that the module sees in the path of this group, or of this
+// The components that the library sees in the path of this group, or of this
 // item. A name that holds a '/' is two, an empty one is none.
 std::vector<std::string> components(const std::string &names)
 {
@@ -58,7 +58,7 @@ std::vector<std::string> components(const std::string &names)
 
 // --- Mini-XML ---------------------------------------------------------------
 
-// What the library says while this exists, which it would print otherwise.
+// What Mini-XML says while this exists, which it would print otherwise.
 class LibraryErrors
 {
   public:
@@ -85,7 +85,7 @@ class LibraryErrors
     }
 };
 
-// The library counts a line end that it has read ahead: its line is not always the
+// Mini-XML counts a line end that it has read ahead: its line is not always the
 // one that is meant.
 std::string without_line(std::string message)
 {
@@ -102,8 +102,8 @@ std::string without_line(std::string message)
     throw std::system_error(errno, std::generic_category(), what);
 }
 
-// A descriptor that reads this text: the library takes a text in memory for
-// ended where a file is not, and reads behind the end of one in UTF-16.
+// A descriptor that reads this text: Mini-XML takes a text in memory for
+// ended where a file is not, and reads after the end of one in UTF-16.
 Descriptor descriptor_of(std::string_view text)
 {
     Descriptor file(static_cast<int>(syscall(SYS_memfd_create, "fptest-plan", MFD_CLOEXEC)));
@@ -222,7 +222,7 @@ bool belongs(const Tag &tag, mxml_node_t *node)
 
 } // namespace
 
-// --- what the module makes of texts -------------------------------------------
+// --- what the library makes of texts -------------------------------------------
 
 std::string stored_part(std::string_view text)
 {
@@ -303,7 +303,7 @@ Plan::Plan(Tree tree) : tree_(std::move(tree))
     note_positions();
 }
 
-// The library finds an element by going through the whole tree, and a position by
+// Mini-XML finds an element by going through the whole tree, and a position by
 // going from node to node: too slow for asking after every item of a long plan.
 void Plan::note_names()
 {
@@ -363,7 +363,7 @@ std::optional<Plan> Plan::read(std::string_view text)
     if (!plan) {
         return std::nullopt;
     }
-    // as the module has them in its tree: these two it leaves without a value
+    // as the library has them in its tree: these two it leaves without a value
     const std::vector<Tag> places = element_tags(*plan, cleaned);
     for (std::size_t number = 0; number < places.size(); ++number) {
         for (const Attribute &place : places[number].attributes) {
@@ -444,7 +444,7 @@ mxml_node_t *Plan::find_group(const std::string &group) const
     return found != groups_.end() ? found->second : nullptr;
 }
 
-mxml_node_t *Plan::behind(mxml_node_t *group, const Numbers &items) const
+mxml_node_t *Plan::after(mxml_node_t *group, const Numbers &items) const
 {
     const auto found = std::upper_bound(items.begin(), items.end(), number(group));
     return found != items.end() ? elements_[*found] : nullptr;
@@ -472,7 +472,7 @@ std::vector<std::optional<Plan::Element>> Plan::run_group(const std::string &nam
     if (group == nullptr) {
         return run;
     }
-    mxml_node_t *item = behind(group, items_); // the first item, of whatever group
+    mxml_node_t *item = after(group, items_); // the first item, of whatever group
     for (mxml_node_t *child = mxmlGetFirstChild(group); child != nullptr;
          child = mxmlGetNextSibling(child)) {
         run.push_back(item != nullptr && has_name(item) ? std::optional(element(item))
@@ -489,12 +489,12 @@ std::optional<Plan::Element> Plan::run_item(const std::string &group, const std:
     if (start == nullptr || places == items_named_.end()) {
         return std::nullopt;
     }
-    mxml_node_t *const named = behind(start, places->second);
+    mxml_node_t *const named = after(start, places->second);
     if (named == nullptr) {
         return std::nullopt;
     }
-    // as many steps from the first item as the named one is behind its siblings
-    mxml_node_t *const first = behind(start, items_);
+    // as many steps from the first item as the named one is after its siblings
+    mxml_node_t *const first = after(start, items_);
     const auto &siblings = children_[number(mxmlGetParent(first))];
     const std::size_t position = positions_[number(first)] + positions_[number(named)];
     return position < siblings.size() && has_name(siblings[position])

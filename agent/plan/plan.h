@@ -1,7 +1,7 @@
 // SPDX-FileCopyrightText: 2026 The Quillmark authors
 // SPDX-License-Identifier: Apache-2.0
 
-// Test plans as the module sees them: the same library loads them, and the same
+// Test plans as the library sees them: the same library loads them, and the same
 // lookups tell which item a command really runs.
 #pragma once
 
@@ -39,13 +39,13 @@ std::optional<std::string> vendor_suffix(int vendor);
 // Whether the item of that name is started in the background and triggered.
 bool is_gatherer(std::string_view name, int vendor);
 
-// The program of an item: the module cuts its name at a tab or line feed.
+// The program of an item: the library cuts its name at a tab or line feed.
 std::string program_of(std::string_view name, std::string_view suffix);
 
 // Whether the shell takes the name as it stands; else the program is another one.
 bool is_plain_name(std::string_view name);
 
-// The command line that the module runs for an item, whole; it runs the first
+// The command line that the library runs for an item, whole; it runs the first
 // 1024 characters.
 std::string command_line(std::string_view name, const std::optional<std::string> &args,
                          std::string_view suffix);
@@ -53,7 +53,7 @@ std::string command_line(std::string_view name, const std::optional<std::string>
 class Plan
 {
   public:
-    // One element, as the module reads it.
+    // One element, as the library reads it.
     struct Element {
         std::string tag;                 // "Cmd" for an item
         std::optional<std::string> name; // nothing where it has no such attribute
@@ -62,8 +62,8 @@ class Plan
         std::size_t number = 0; // among all elements of the document, comments included
     };
 
-    // Nothing where the library does not load it; why then says what it has
-    // against it, in the library's words.
+    // Nothing where Mini-XML does not load it; why then says what it has
+    // against it, in Mini-XML's words.
     static std::optional<Plan> load(const std::string &text, std::string *why = nullptr);
 
     // As load(), but for reading results: control characters and bytes that are
@@ -82,12 +82,12 @@ class Plan
     // The first group of that name; null where there is none.
     mxml_node_t *find_group(const std::string &group) const;
 
-    // What the module runs for root/group: an entry for each of its calls,
+    // What the library runs for root/group: an entry for each of its calls,
     // nothing where a call would find nothing to run. The path is taken as the
-    // module takes it: a '/' in the name makes one of an item.
+    // library takes it: a '/' in the name makes one of an item.
     std::vector<std::optional<Element>> run_by(const std::string &group) const;
 
-    // What the module runs for root/group/item, nothing where that is nothing.
+    // What the library runs for root/group/item, nothing where that is nothing.
     std::optional<Element> run_by(const std::string &group, const std::string &item) const;
 
     // Every element of the document in order, comments and the like included.
@@ -110,8 +110,8 @@ class Plan
     void note_names();
     void note_positions();
     Element element(mxml_node_t *node) const;
-    // The first of these behind the start of that group.
-    mxml_node_t *behind(mxml_node_t *group, const Numbers &items) const;
+    // The first of these after the start of that group.
+    mxml_node_t *after(mxml_node_t *group, const Numbers &items) const;
     std::vector<std::optional<Element>> run_group(const std::string &name) const;
     std::optional<Element> run_item(const std::string &group, const std::string &name) const;
 
@@ -124,12 +124,12 @@ class Plan
     std::unordered_map<std::string, Numbers> items_named_;
 };
 
-// An attribute's value as the library gives it back once it is saved: it drops
+// An attribute's value as Mini-XML gives it back once it is saved: it drops
 // characters that it writes.
 std::string as_loaded(const std::string &value);
 
 // The tags that a plan's elements were read from, in the same order; none where
-// the text has others than the library has seen.
+// the text has others than Mini-XML has seen.
 std::vector<Tag> element_tags(const Plan &plan, std::string_view text);
 
 // An attribute by which an item's element is known to be as fptest has left it: a

@@ -36,7 +36,7 @@ Json words_or_null(const std::string &words)
     return words.empty() ? Json() : Json(clean(words));
 }
 
-// In milliseconds: the digits behind them are noise.
+// In milliseconds: the digits after them are noise.
 Json seconds_or_null(const std::optional<double> &seconds)
 {
     return seconds ? Json(std::round(*seconds * 1000) / 1000) : Json();

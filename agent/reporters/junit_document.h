@@ -40,7 +40,7 @@ std::string junit_round(const Run &run, const std::vector<Late> &late);
 constexpr char kHowItStands = '\0';
 std::string junit_how_it_stands(const Run &run);
 
-// From behind the last suite of the round: an error for the rounds that are to come.
+// From after the last suite of the round: an error for the rounds that are to come.
 std::string junit_tail(const Run &run);
 
 } // namespace fptest

@@ -259,7 +259,7 @@ class LiveView : public Listener
         line.add(std::to_string(counts.failed) + " failed",
                  counts.failed > 0 ? Colour::red : Colour::none);
         const std::string all = total(run);
-        // the rest of it, from the comma behind the failed ones
+        // the rest of it, from the comma after the failed ones
         line.add(all.substr(all.find(',', all.find(',') + 1)));
         if (!running_.empty() && !run.why_unfinished.empty()) {
             line.add("; Ctrl-C again leaves at once");

@@ -83,7 +83,7 @@ Path parts_of(const std::string &text, const Plan &plan)
     }
     if (text.find_first_of(":\t\n") != std::string::npos) {
         throw Failure(Exit::usage, quoted(text) + " has a ':', a tab or a line feed, at which the "
-                                                  "module would cut it: name it without");
+                                                  "library would cut it: name it without");
     }
     if (text.size() > kPathLimit) {
         throw Failure(Exit::usage, "a path of " + std::to_string(text.size()) +

@@ -51,8 +51,8 @@ std::string new_mark()
     return mark.str();
 }
 
-// What is shown is to be of this run: what these items have reported before goes,
-// and they are marked, so that it is known for what it is if it comes back.
+// Shows only this run's results: removes old ones, and marks the items, to recognise
+// a stale report that is written back.
 void clear_reports(Job &job)
 {
     std::vector<std::size_t> numbers;

@@ -118,7 +118,7 @@ bool Runner::run(const Job &job)
         }
     }
     // a process that reports, such as a gatherer, truncates the plan before it writes it:
-    // the module may load it until it has come to the first item
+    // the library may load it until it has come to the first item
     Descriptor plan = lock_stored_plan();
     host_.command("XMLNodePath::" + job.path, names);
 
@@ -155,8 +155,9 @@ void Runner::require_all_started(const Job &job, std::size_t next)
         }
         result.seconds = 0;
         result.outcome = Outcome::silent;
-        result.reason = module_gone_.empty() ? "the module did not come to it: --log FILE tells why"
-                                             : "the module did not come to it: " + module_gone_;
+        result.reason = module_gone_.empty()
+                            ? "the library never reached it; run with --log FILE to see why"
+                            : "the library never reached it: " + module_gone_;
         for (Listener *listener : listeners_) {
             listener->ended(run_, place);
         }
@@ -202,7 +203,7 @@ void Runner::handle(const Host::Event &event, const Job &job, std::size_t &next,
 // It costs the items that it was running; the next ones get another.
 void Runner::lose_module(const Host::Event &event)
 {
-    module_gone_ = "the module's process ended " + event.text + "; --log FILE keeps what it says";
+    module_gone_ = "the library's process ended " + event.text + "; --log FILE keeps what it says";
     stop_asked_ = false;
     if (!active_.empty()) {
         append_output(item(active_.back().place).output, host_.take_output(event.output));
@@ -284,7 +285,7 @@ void Runner::start_next(const Job &job, std::size_t &next, const Host::Event &ev
     }
 }
 
-// The item's process has ended, and the module waits: what stands in the plan now is
+// The item's process has ended, and the library waits: what stands in the plan now is
 // what the item has reported.
 void Runner::end_item(const Host::Event &event)
 {
@@ -307,7 +308,7 @@ void Runner::end_item(const Host::Event &event)
         active.moved_on_at = on_run_clock(event.time);
         if (!WIFSIGNALED(event.value)) {
             result.exit_status = WEXITSTATUS(event.value);
-        } else if (!active.was_stopped) { // else it is fptest's own, or the module's
+        } else if (!active.was_stopped) { // else it is fptest's own, or the library's
             result.signal = WTERMSIG(event.value);
         }
         result.left_running = left;
@@ -317,7 +318,7 @@ void Runner::end_item(const Host::Event &event)
     host_.go_on();
 }
 
-// The module has gone on to its next item, or has returned: it was with the
+// The library has gone on to its next item, or has returned: it was with the
 // gatherer, or with an item that it could not start.
 void Runner::move_on(const Host::Event &event)
 {
@@ -354,7 +355,7 @@ void Runner::finish(Active &active, TimePoint end)
     }
     judge(active);
     if (gathers(active) && !(result.report.progress == "100" && result.report.result)) {
-        gatherer_is_behind_ = true;
+        gatherer_may_report_late_ = true;
         signal_each(host_.processes().of_gatherer(), SIGTERM);
     }
     if (!result.left_running.empty() || gathers(active)) {
@@ -494,7 +495,7 @@ void Runner::look()
     }
 }
 
-// Without it the module would wait at its port without end, and what has died
+// Without it the library would wait at its port without end, and what has died
 // reports no more.
 void Runner::look_for_gatherer(Active &active)
 {

@@ -20,7 +20,7 @@
 namespace fptest
 {
 
-// One command and the items that the module comes to in it.
+// One command and the items that the library comes to in it.
 struct Job {
     struct Target {
         std::size_t item = 0;    // in the suite
@@ -30,7 +30,7 @@ struct Job {
 
     std::string path;
     std::size_t suite = 0;
-    // nothing where the module comes to what it cannot run
+    // nothing where the library comes to what it cannot run
     std::vector<std::optional<Target>> targets;
 };
 
@@ -68,7 +68,7 @@ class Runner
     {
         return broken_;
     }
-    // What to do about it, to be said behind why the run is unfinished.
+    // What to do about it, to be said after why the run is unfinished.
     const std::string &advice() const
     {
         return advice_;
@@ -86,7 +86,7 @@ class Runner
         Place place;
         Job::Target target;
         TimePoint start;
-        bool moved_on = false; // the module has: only a gatherer is still at work then
+        bool moved_on = false; // the library has: only a gatherer is still at work then
         TimePoint moved_on_at;
         bool done = false;
         std::optional<Outcome> stop; // timed_out or stopped, once that is wanted
@@ -167,9 +167,9 @@ class Runner
     TimePoint began_ = now();
     int signal_ = 0;
     TimePoint signal_taken_at_;
-    bool stop_asked_ = false;         // and not yet answered
-    bool gatherer_is_behind_ = false; // it may still report what it was told in vain
-    std::string module_gone_;         // why, in the job in which its process ended
+    bool stop_asked_ = false;               // and not yet answered
+    bool gatherer_may_report_late_ = false; // it may still report what it was told in vain
+    std::string module_gone_;               // why, in the job in which its process ended
     bool broken_ = false;
     std::string advice_;
 };

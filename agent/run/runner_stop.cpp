@@ -60,7 +60,8 @@ void Runner::read_signals()
             // sees that this one is gone and stops what runs
             pollfd errors{STDERR_FILENO, POLLOUT, 0};
             if (poll(&errors, 1, 0) > 0) { // a terminal may be stopped
-                std::fputs("\nfptest: left at once; what runs is asked to stop\n", stderr);
+                std::fputs("\nfptest: interrupted again: exiting now, stopping the running item\n",
+                           stderr);
             }
             _exit(static_cast<int>(128 + SIGINT));
         }
@@ -112,7 +113,7 @@ void Runner::stop_what_is_due(bool command_runs)
         now() - signal_taken_at_ > limits_.grace + kBeforeGivingUp) {
         host_.kill_module(); // it comes to no item, and does not return
     }
-    // the module stops only what it started last: an earlier gatherer gets a signal
+    // the library stops only what it started last: an earlier gatherer gets a signal
     for (Active &active : active_) {
         if (&active != &active_.back() && !active.done && active.stop) {
             active.was_stopped = true;
@@ -121,7 +122,7 @@ void Runner::stop_what_is_due(bool command_runs)
     }
 }
 
-// Through the module, again and again, as the item may only just be starting; and
+// Through the library, again and again, as the item may only just be starting; and
 // by a signal that nothing can ignore where that does not help in time.
 void Runner::press_stop(Active &active, bool command_runs)
 {
@@ -261,7 +262,7 @@ void Runner::make_way_for(const Job &job)
         return target && is_gatherer(run_.suites[job.suite].items[target->item].name, run_.vendor);
     };
     if (std::ranges::any_of(job.targets, is_gatherers)) {
-        if (gatherer_is_behind_) {
+        if (gatherer_may_report_late_) {
             end_gatherer();
         }
         require_trigger_port(); // an item may have taken it
@@ -275,7 +276,7 @@ void Runner::end_round()
     if (!left_.empty()) {
         end_left_running();
     }
-    if (gatherer_is_behind_) {
+    if (gatherer_may_report_late_) {
         end_gatherer();
     }
     look();
@@ -292,7 +293,7 @@ void Runner::end_left_running()
 void Runner::end_gatherer()
 {
     end_all([this] { return host_.processes().of_gatherer(); });
-    gatherer_is_behind_ = false;
+    gatherer_may_report_late_ = false;
 }
 
 } // namespace fptest

@@ -153,7 +153,7 @@ class Utf8Locale
 };
 
 // Tells widths while it lives; the thread's own locale is back afterwards. Where
-// the library has no such locale the thread's own is asked.
+// the C library has no such locale the thread's own is asked.
 class Widths
 {
   public:
@@ -169,7 +169,7 @@ class Widths
         uselocale(before_);
     }
 
-    // A character that the library has no width for is one box on most screens.
+    // A character that the C library has no width for is one box on most screens.
     [[nodiscard]] std::size_t of(char32_t code) const
     {
         const int width = wcwidth(static_cast<wchar_t>(code));

@@ -2,7 +2,7 @@
 // SPDX-License-Identifier: Apache-2.0
 
 // The sensor-data gatherer. It stays in the background and gathers whenever the
-// module tells it to: it connects to the module's port, waits there for the
+// library tells it to: it connects to the library's port, waits there for the
 // word, leaves, gathers, and connects again.
 //
 // Vendor 2's variant is started like any other item and never told anything, so
@@ -55,7 +55,7 @@ class Complaints
 };
 
 // While nobody listens, a connection from the port's own number would find
-// itself, and hold the port against the module. Such a one is taken down at once.
+// itself, and hold the port against the library. Such a one is taken down at once.
 bool is_connected_to_itself(const Descriptor &connection)
 {
     sockaddr_in local{};
@@ -80,8 +80,8 @@ bool connect_to_module(const Descriptor &connection)
            !is_connected_to_itself(connection);
 }
 
-// Reads until the text is there. The module never closes its end, so nothing
-// behind the text is waited for.
+// Reads until the text is there. The library never closes its end, so nothing
+// after the text is waited for.
 bool read_trigger(const Descriptor &connection, Complaints &complaints)
 {
     std::array<char, trigger_text.size()> buffer{};
@@ -94,7 +94,7 @@ bool read_trigger(const Descriptor &connection, Complaints &complaints)
         }
         if (got < 0) {
             // A listening socket that is closed resets those still waiting in its
-            // queue: the module has just told this gatherer, and is done.
+            // queue: the library has just told this gatherer, and is done.
             if (errno != ECONNRESET || length > 0) {
                 complaints.say(std::string("the trigger cannot be read: ") + std::strerror(errno));
             }

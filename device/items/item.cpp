@@ -47,7 +47,7 @@ std::string one_line(const CLI::App *app, const CLI::Error &error)
     return app->get_name() + ": " + error.what() + "; see " + app->get_name() + " --help\n";
 }
 
-// The module does not coordinate those that write the plan. The samples do, by a
+// The library does not coordinate those that write the plan. The samples do, by a
 // lock on the file. Without a plan there is nothing to lock, and the report fails.
 Descriptor lock_plan()
 {
@@ -86,7 +86,7 @@ void Item::report(int progress, Result result, const std::string &description) c
 {
     const Descriptor lock = lock_plan();
 
-    // The module loads the plan once in a process and from then on saves that
+    // The library loads the plan once in a process and from then on saves that
     // copy whole: a second report would undo what other items have reported
     // since. And a stop in the middle of saving would leave half a plan. So each
     // report is made by a process of its own, which nobody stops.

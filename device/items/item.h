@@ -2,13 +2,13 @@
 // SPDX-License-Identifier: Apache-2.0
 
 // What the sample items have in common: their options, their reports, their
-// pace. An item is a program of its own that reports through the module.
+// pace. An item is a program of its own that reports through the library.
 #pragma once
 
 #include <chrono>
 #include <string>
 
-// The samples' use of the three result codes that the module knows.
+// The samples' use of the three result codes that the library knows.
 enum class Result { passed = 0, failed = 1, unfinished = -2 };
 
 class Item

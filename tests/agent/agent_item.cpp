@@ -2,7 +2,7 @@
 // SPDX-License-Identifier: Apache-2.0
 
 // A test item that does what its arguments say, one after another:
-//   report GROUP PROGRESS RESULT DESCRIPTION   through the module
+//   report GROUP PROGRESS RESULT DESCRIPTION   through the library
 //   report-file GROUP PROGRESS RESULT FILE     the description is that file
 //   report-null GROUP PROGRESS RESULT          without a description, by no text at all
 //   report-here GROUP ITEM PROGRESS RESULT DESCRIPTION  by this process, which
@@ -20,7 +20,7 @@
 //   flood BYTES     on standard output, in numbered lines
 //   count-input     says how many bytes it gets on standard input
 //   crash           by a signal
-//   gather          waits for the module's word, as the gatherer does
+//   gather          waits for the library's word, as the gatherer does
 #include "quillmark.h"
 
 #include <chrono>

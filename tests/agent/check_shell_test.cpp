@@ -128,7 +128,7 @@ TEST(CheckedLineFeed, IsOfNoMatterWhereNoCommandFollows)
     }
 }
 
-TEST(CheckedLineFeed, IsSaidBehindAnotherCommandAsWell)
+TEST(CheckedLineFeed, IsSaidAfterAnotherCommandAsWell)
 {
     const auto findings = check(plan_with("a; b\nc"), PlanUse::stored);
     ASSERT_EQ(findings.size(), 2U);
@@ -188,7 +188,7 @@ TEST(CheckedParentheses, AreTakenInQuotesOnly)
               "nothing; put the '(' in quotes if it is meant for the item");
 }
 
-TEST(CheckedOperator, HasNothingBehindIt)
+TEST(CheckedOperator, HasNothingAfterIt)
 {
     for (const auto &[args, mark] : std::vector<std::pair<std::string, std::string>>{
              {"a |", "|"}, {"a &amp;&amp; ", "&&"}, {"a ||", "||"}, {"a &gt;", ">"}}) {
@@ -206,7 +206,7 @@ TEST(CheckedGrammar, IsTheShellsToJudge)
     ASSERT_EQ(Shell().ask("/system/bin/X a; if", why), Shell::Answer::refused);
     EXPECT_EQ(why, "syntax error: unmatched 'if'");
     EXPECT_EQ(finding_of("a; if"), "p.xml:3:21: error: the shell would refuse the command line of "
-                                   "item 'X': syntax error: unmatched 'if'; mend its args");
+                                   "item 'X': syntax error: unmatched 'if'; fix its args");
     // which is not what one would think, and accepted all the same
     ASSERT_TRUE(read_shell_line("/system/bin/X \\<<\\\n<<E").fault);
     ASSERT_EQ(Shell().ask("/system/bin/X \\<<\\\n<<E", why), Shell::Answer::accepted);
@@ -325,7 +325,7 @@ TEST(CheckedCommand, MayBeOver)
 {
     EXPECT_EQ(finding_of("a &amp;"),
               "p.xml:3:23: warning: the shell would run item 'X' in the background, so that it "
-              "ends at once for the module; put the '&' in quotes if it is meant for the item");
+              "ends at once for the library; put the '&' in quotes if it is meant for the item");
     EXPECT_EQ(finding_of("a ;"),
               "p.xml:3:23: warning: the shell would end the command of item 'X' here, and not hand "
               "it the ';'; put the ';' in quotes if it is meant for the item");
@@ -359,7 +359,7 @@ TEST(CheckedCommand, IsRedirected)
     }
 }
 
-TEST(CheckedCommand, HasACommentBehindIt)
+TEST(CheckedCommand, HasACommentAfterIt)
 {
     EXPECT_EQ(
         finding_of("--color #fff it's"),

@@ -33,7 +33,7 @@ namespace
 
 // --- plans ------------------------------------------------------------------------
 
-// What the module would look for, in a plan that has a root element around it.
+// What the library would look for, in a plan that has a root element around it.
 std::string plan_of(const std::string &content)
 {
     return "<P>" + content + "</P>";
@@ -140,7 +140,7 @@ TEST(CheckedColon, EndsWhatIsStored)
         to_send("<?xml version=\"1.0\"?>\n<P>\n<CmdGroup name=\"A\">\n"
                 "<Cmd name=\"x\" args=\"--at 12:30\"/>\n</CmdGroup>\n</P>\n"),
         "p.xml:4:28: error: a command takes a plan up to its first ':', so 73 of 97 bytes would be "
-        "stored, and the module would not load them; write &#58; in its place\n"
+        "stored, and the library would not load them; write &#58; in its place\n"
         "<Cmd name=\"x\" args=\"--at 12:30\"/>\n"
         "                           ^\n");
 }
@@ -155,19 +155,18 @@ TEST(CheckedColon, MayLeaveAPlanThatLoads)
     EXPECT_EQ(to_send("<P>" + group("A", cmd("x")) + "<a:b/></P>"),
               "p.xml:1:59: error: a command takes a plan up to its first ':', so 58 of 66 bytes "
               "would be stored, "
-              "and the module would load them without the rest; leave it out\n"
+              "and the library would load them without the rest; leave it out\n"
               "<P><CmdGroup name=\"A\"><Cmd name=\"x\" args=\"\"/></CmdGroup><a:b/></P>\n"
               "                                                          ^\n");
 }
 
-TEST(CheckedColon, IsCountedWithTheOnesBehindIt)
+TEST(CheckedColon, IsCountedWithTheOnesAfterIt)
 {
     EXPECT_EQ(
         to_send("<P a=\"b:c\" d=\":\">" + group("A", cmd("x")) + "e:f</P>"),
         "p.xml:1:8: error: a command takes a plan up to its first ':', so 7 of 77 bytes would be "
         "stored, "
-        "and the module would not load them; write &#58; in its place, and look to the 2 "
-        "behind it\n"
+        "and the library would not load them; write &#58; in its place, and the 2 after it\n"
         "<P a=\"b:c\" d=\":\"><CmdGroup name=\"A\"><Cmd name=\"x\" args=\"\"/></CmdGroup>e:f</P>\n"
         "       ^\n");
 }
@@ -198,7 +197,7 @@ TEST(CheckedLength, SaysWhereAPlanIsCut)
         begin + std::string(2000 - begin.size(), ' ') + "\n" + group("B", cmd("x")) + "</P>\n";
     EXPECT_EQ(to_send(text),
               "p.xml:4:48: error: 2059 bytes are 11 more than the 2048 that a command stores: the "
-              "plan would be cut here, and the module would not load it; shorten it, or have "
+              "plan would be cut here, and the library would not load it; shorten it, or have "
               "fptest run --plan place it as a file\n"
               "<CmdGroup name=\"B\"><Cmd name=\"x\" args=\"\"/></CmdGroup></P>\n"
               "                                               ^\n");
@@ -213,7 +212,7 @@ TEST(CheckedLength, SaysThatTheRestMayBeMissedOnly)
         begin + std::string(2047 - begin.size(), ' ') + "\n" + group("B", cmd("x")) + "</P>\n";
     EXPECT_EQ(to_send(text),
               "p.xml:3:1: error: 2106 bytes are 58 more than the 2048 that a command stores: the "
-              "plan would be cut here, and the module would load it without the rest; shorten it, "
+              "plan would be cut here, and the library would load it without the rest; shorten it, "
               "or have fptest run --plan place it as a file\n"
               "<CmdGroup name=\"B\"><Cmd name=\"x\" args=\"\"/></CmdGroup></P>\n"
               "^\n");
@@ -225,7 +224,7 @@ TEST(CheckedLength, StandsAtTheCharacterThatIsCut)
     const std::string text = begin + std::string(2046 - begin.size(), ' ') + "\xE2\x82\xAC</P>";
     EXPECT_EQ(to_send(text),
               "p.xml:2:1990: error: 2053 bytes are 5 more than the 2048 that a command stores: the "
-              "plan would be cut here, and the module would load it without the rest; shorten it, "
+              "plan would be cut here, and the library would load it without the rest; shorten it, "
               "or have fptest run --plan place it as a file\n"
               "..." +
                   std::string(72, ' ') + "\xE2\x82\xAC</P>\n" + std::string(75, ' ') + "^\n");
@@ -239,7 +238,7 @@ TEST(CheckedLength, YieldsToAColonInFrontOfIt)
         to_send(text),
         "p.xml:1:7: error: a command takes a plan up to its first ':', so 6 of 2056 bytes would be "
         "stored, "
-        "and the module would not load them; write &#58; in its place\n"
+        "and the library would not load them; write &#58; in its place\n"
         "<P a=\":\"><CmdGroup name=\"A\"><Cmd name=\"x\" args=\"\"/></CmdGroup>\n"
         "      ^\n"
         "p.xml:3:1: error: 2056 bytes are 8 more than the 2048 that a command stores: the plan "
@@ -249,17 +248,17 @@ TEST(CheckedLength, YieldsToAColonInFrontOfIt)
         "^\n");
 }
 
-TEST(CheckedLength, ComesInFrontOfAColonBehindIt)
+TEST(CheckedLength, ComesInFrontOfAColonAfterIt)
 {
     const std::string begin = "<P>" + group("A", cmd("x")) + "\n";
     const std::string text = begin + std::string(2046 - begin.size(), ' ') + "\n<S a=\":\"/></P>";
     EXPECT_EQ(to_send(text),
               "p.xml:3:2: error: 2061 bytes are 13 more than the 2048 that a command stores: the "
-              "plan would be cut here, and the module would load it without the rest; shorten it, "
+              "plan would be cut here, and the library would load it without the rest; shorten it, "
               "or have fptest run --plan place it as a file\n"
               "<S a=\":\"/></P>\n"
               " ^\n"
-              "p.xml:3:7: error: a command takes a plan up to its first ':', which is behind the "
+              "p.xml:3:7: error: a command takes a plan up to its first ':', which is after the "
               "2048 bytes that it takes anyway; write &#58; in its place\n"
               "<S a=\":\"/></P>\n"
               "      ^\n");
@@ -271,8 +270,8 @@ TEST(CheckedLength, MeetsAColonAtTheLimit)
     const std::string filled = begin + std::string(2047 - begin.size(), ' ');
     EXPECT_THAT(to_send(filled + ":</P>"), HasSubstr("':', so 2047 of 2052 bytes would be stored"));
     EXPECT_THAT(to_send(filled + ":</P>"), HasSubstr("cut here, were it not cut at a ':' before"));
-    EXPECT_THAT(to_send(filled + " :</P>"), HasSubstr("':', which is behind the 2048 bytes"));
-    EXPECT_THAT(to_send(filled + " :</P>"), HasSubstr("cut here, and the module would load it"));
+    EXPECT_THAT(to_send(filled + " :</P>"), HasSubstr("':', which is after the 2048 bytes"));
+    EXPECT_THAT(to_send(filled + " :</P>"), HasSubstr("cut here, and the library would load it"));
 }
 
 TEST(CheckedLength, EndsAtAZeroByte)
@@ -284,7 +283,7 @@ TEST(CheckedLength, EndsAtAZeroByte)
     }
     EXPECT_THAT(to_send(text),
                 HasSubstr("error: a command takes a plan up to its first zero byte, so 1 byte "
-                          "would be stored, and the module would load them without the rest; "
+                          "would be stored, and the library would load them without the rest; "
                           "save it as UTF-8\n"));
     // one that is no XML for its zero byte has that said of it once
     EXPECT_EQ(check("<P>\0</P>"s, PlanUse::to_send).size(), 1U);
@@ -313,12 +312,12 @@ TEST(CheckedEncoding, OfUtf16IsAnErrorHoweverItIsStored)
 TEST(CheckedForm, OfNothing)
 {
     EXPECT_EQ(stored(""),
-              "p.xml:1:1: error: not well-formed, no element found: the module would not "
+              "p.xml:1:1: error: not well-formed, no element found: the library would not "
               "load it; write a plan\n"
               "\n"
               "^\n");
     EXPECT_EQ(stored("<!-- a -->\n\n"),
-              "p.xml:1:11: error: not well-formed, no element found: the module would load it all "
+              "p.xml:1:11: error: not well-formed, no element found: the library would load it all "
               "the same, and run what it took from it; write a plan\n"
               "<!-- a -->\n"
               "          ^\n");
@@ -327,7 +326,7 @@ TEST(CheckedForm, OfNothing)
 TEST(CheckedForm, OfWhiteSpace)
 {
     EXPECT_EQ(stored(" \n "),
-              "p.xml:1:1: error: not well-formed, no element found: the module would "
+              "p.xml:1:1: error: not well-formed, no element found: the library would "
               "not load it; write a plan\n"
               " \n"
               "^\n");
@@ -337,13 +336,13 @@ TEST(CheckedForm, OfATextThatEndsTooEarly)
 {
     EXPECT_EQ(
         stored("<P>\n" + group("A", cmd("x")) + "\n\n"),
-        "p.xml:2:54: error: not well-formed, the text ends too early: the module would load it "
+        "p.xml:2:54: error: not well-formed, the text ends too early: the library would load it "
         "all the same, and run what it took from it; close <P>\n"
         "<CmdGroup name=\"A\"><Cmd name=\"x\" args=\"\"/></CmdGroup>\n"
         "                                                     ^\n");
     EXPECT_EQ(
         stored("<?xml version=\"1.0\"?>\n<P><CmdGroup name=\"A\">"),
-        "p.xml:2:23: error: not well-formed, the text ends too early: the module would not load "
+        "p.xml:2:23: error: not well-formed, the text ends too early: the library would not load "
         "it; close <CmdGroup>\n"
         "<P><CmdGroup name=\"A\">\n"
         "                      ^\n");
@@ -353,7 +352,7 @@ TEST(CheckedForm, OfTagsThatDoNotMatch)
 {
     EXPECT_EQ(
         stored("<P>\n<CmdGroup name=\"A\">\n<Cmd name=\"x\" args=\"\">\n</CmdGroup>\n</P>"),
-        "p.xml:4:3: error: not well-formed, mismatched tag: the module would not load it; close "
+        "p.xml:4:3: error: not well-formed, mismatched tag: the library would not load it; close "
         "<Cmd> before\n"
         "</CmdGroup>\n"
         "  ^\n");
@@ -361,40 +360,43 @@ TEST(CheckedForm, OfTagsThatDoNotMatch)
 
 TEST(CheckedForm, OfATagThatDoesNotEnd)
 {
-    EXPECT_EQ(stored("<P>\n" + group("A", cmd("x")) + "\n</P"),
-              "p.xml:3:1: error: not well-formed, unclosed token: the module would load it all the "
-              "same, and run what it took from it; end what begins here\n"
-              "</P\n"
-              "^\n");
+    EXPECT_EQ(
+        stored("<P>\n" + group("A", cmd("x")) + "\n</P"),
+        "p.xml:3:1: error: not well-formed, unclosed token: the library would load it all the "
+        "same, and run what it took from it; end what begins here\n"
+        "</P\n"
+        "^\n");
 }
 
 TEST(CheckedForm, OfCharactersThatMeanSomething)
 {
     EXPECT_EQ(
         stored(plan_of(group("A", "<Cmd name=\"x\" args=\"a && b\"/>"))),
-        "p.xml:1:46: error: not well-formed, invalid token: the module would not load it; write "
+        "p.xml:1:46: error: not well-formed, invalid token: the library would not load it; write "
         "&amp; for a '&'\n"
         "<P><CmdGroup name=\"A\"><Cmd name=\"x\" args=\"a && b\"/></CmdGroup></P>\n"
         "                                             ^\n");
-    EXPECT_EQ(stored(plan_of(group("A", "<Cmd name=\"x\" args=\"a<b\"/>"))),
-              "p.xml:1:44: error: not well-formed, invalid token: the module would load it all the "
-              "same, and run what it took from it; write &lt; for a '<'\n"
-              "<P><CmdGroup name=\"A\"><Cmd name=\"x\" args=\"a<b\"/></CmdGroup></P>\n"
-              "                                           ^\n");
-    EXPECT_EQ(stored(plan_of(group("A", "<Cmd name=x args=\"\"/>"))),
-              "p.xml:1:33: error: not well-formed, invalid token: the module would load it all the "
-              "same, and run what it took from it; mend it here\n"
-              "<P><CmdGroup name=\"A\"><Cmd name=x args=\"\"/></CmdGroup></P>\n"
-              "                                ^\n");
+    EXPECT_EQ(
+        stored(plan_of(group("A", "<Cmd name=\"x\" args=\"a<b\"/>"))),
+        "p.xml:1:44: error: not well-formed, invalid token: the library would load it all the "
+        "same, and run what it took from it; write &lt; for a '<'\n"
+        "<P><CmdGroup name=\"A\"><Cmd name=\"x\" args=\"a<b\"/></CmdGroup></P>\n"
+        "                                           ^\n");
+    EXPECT_EQ(
+        stored(plan_of(group("A", "<Cmd name=x args=\"\"/>"))),
+        "p.xml:1:33: error: not well-formed, invalid token: the library would load it all the "
+        "same, and run what it took from it; fix it here\n"
+        "<P><CmdGroup name=\"A\"><Cmd name=x args=\"\"/></CmdGroup></P>\n"
+        "                                ^\n");
     EXPECT_EQ(
         stored(plan_of(group("A", "<Cmd name=\"x\" args=\"&nbsp;\"/>"))),
-        "p.xml:1:43: error: not well-formed, undefined entity: the module would load it all the "
+        "p.xml:1:43: error: not well-formed, undefined entity: the library would load it all the "
         "same, and run what it took from it; write &amp; for a '&'\n"
         "<P><CmdGroup name=\"A\"><Cmd name=\"x\" args=\"&nbsp;\"/></CmdGroup></P>\n"
         "                                          ^\n");
 }
 
-TEST(CheckedForm, OfAnEntityBehindOthers)
+TEST(CheckedForm, OfAnEntityAfterOthers)
 {
     EXPECT_THAT(stored(plan_of(group("A", "<Cmd name=\"x\" args=\"&lt;&gt;&amp;&quot;&apos;&#65;"
                                           "&nbsp;\"/>"))),
@@ -405,17 +407,17 @@ TEST(CheckedForm, OfControlCharacters)
 {
     EXPECT_EQ(
         stored(plan_of(group("A", "<Cmd name=\"x\" args=\"a\x1B[1m\"/>"))),
-        "p.xml:1:44: error: not well-formed, invalid token: the module would not load it; leave "
+        "p.xml:1:44: error: not well-formed, invalid token: the library would not load it; leave "
         "the control character out\n"
         "<P><CmdGroup name=\"A\"><Cmd name=\"x\" args=\"a\u241B[1m\"/></CmdGroup></P>\n"
         "                                           ^\n");
     EXPECT_EQ(
         stored(plan_of(group("A", "<Cmd name=\"x\" args=\"&#27;\"/>"))),
-        "p.xml:1:43: error: not well-formed, reference to invalid character number: the module "
+        "p.xml:1:43: error: not well-formed, reference to invalid character number: the library "
         "would not load it; leave it out\n"
         "<P><CmdGroup name=\"A\"><Cmd name=\"x\" args=\"&#27;\"/></CmdGroup></P>\n"
         "                                          ^\n");
-    EXPECT_EQ(stored("<P>\0</P>"s), "p.xml:1:4: error: not well-formed, invalid token: the module "
+    EXPECT_EQ(stored("<P>\0</P>"s), "p.xml:1:4: error: not well-formed, invalid token: the library "
                                     "would load it all the same, and run what it took from it; "
                                     "leave the control character out\n"
                                     "<P>\u2400</P>\n"
@@ -426,26 +428,26 @@ TEST(CheckedForm, OfBytesThatAreNoUtf8)
 {
     EXPECT_EQ(
         stored(plan_of(group("A", "<Cmd name=\"x\" args=\"caf\xE9 2\"/>"))),
-        "p.xml:1:46: error: not well-formed, invalid token: the module would not load it; save "
+        "p.xml:1:46: error: not well-formed, invalid token: the library would not load it; save "
         "it as UTF-8\n"
         "<P><CmdGroup name=\"A\"><Cmd name=\"x\" args=\"caf\uFFFD 2\"/></CmdGroup></P>\n"
         "                                             ^\n");
     EXPECT_EQ(
         stored("<P>\xC3"),
-        "p.xml:1:4: error: not well-formed, partial character: the module would load it all the "
+        "p.xml:1:4: error: not well-formed, partial character: the library would load it all the "
         "same, and run what it took from it; complete the character\n"
         "<P>\uFFFD\n"
         "   ^\n");
     EXPECT_EQ(
         stored("<?xml version=\"1.0\" encoding=\"klingon\"?>\n<P/>"),
-        "p.xml:1:31: error: not well-formed, unknown encoding: the module would load it all the "
+        "p.xml:1:31: error: not well-formed, unknown encoding: the library would load it all the "
         "same, and run what it took from it; declare UTF-8, or leave the declaration out\n"
         "<?xml version=\"1.0\" encoding=\"klingon\"?>\n"
         "                              ^\n");
     EXPECT_EQ(
         stored("<?xml version=\"1.0\" encoding=\"UTF-16\"?>\n<P/>"),
         "p.xml:1:31: error: not well-formed, encoding specified in XML declaration is incorrect: "
-        "the module would load it all the same, and run what it took from it; declare UTF-8, or "
+        "the library would load it all the same, and run what it took from it; declare UTF-8, or "
         "leave the declaration out\n"
         "<?xml version=\"1.0\" encoding=\"UTF-16\"?>\n"
         "                              ^\n");
@@ -455,13 +457,13 @@ TEST(CheckedForm, OfSecondOnes)
 {
     EXPECT_EQ(
         stored("<?xml version=\"1.0\"?>\n<P>" + group("A", cmd("x")) + "</P>\n<Q/>\n"),
-        "p.xml:3:1: error: not well-formed, junk after document element: the module would load it "
+        "p.xml:3:1: error: not well-formed, junk after document element: the library would load it "
         "all the same, and run what it took from it; put everything into one element\n"
         "<Q/>\n"
         "^\n");
     EXPECT_EQ(
         stored(plan_of(group("A", "<Cmd name=\"x\" name=\"y\" args=\"\"/>"))),
-        "p.xml:1:37: error: not well-formed, duplicate attribute: the module would not load it; "
+        "p.xml:1:37: error: not well-formed, duplicate attribute: the library would not load it; "
         "keep one of the two\n"
         "<P><CmdGroup name=\"A\"><Cmd name=\"x\" name=\"y\" args=\"\"/></CmdGroup></P>\n"
         "                                    ^\n");
@@ -472,7 +474,7 @@ TEST(CheckedForm, OfADeclarationThatIsNotTheBegin)
     EXPECT_EQ(
         stored("\n<?xml version=\"1.0\"?>\n<P/>"),
         "p.xml:2:1: error: not well-formed, XML or text declaration not at start of entity: the "
-        "module would not load it; begin the text with it\n"
+        "library would not load it; begin the text with it\n"
         "<?xml version=\"1.0\"?>\n"
         "^\n");
 }
@@ -481,7 +483,7 @@ TEST(CheckedForm, OfASectionThatDoesNotEnd)
 {
     EXPECT_EQ(
         stored("<P><![CDATA[ </P>"),
-        "p.xml:1:4: error: not well-formed, unclosed CDATA section: the module would not load "
+        "p.xml:1:4: error: not well-formed, unclosed CDATA section: the library would not load "
         "it; end what begins here\n"
         "<P><![CDATA[ </P>\n"
         "   ^\n");
@@ -491,8 +493,8 @@ TEST(CheckedForm, OfAnythingElse)
 {
     EXPECT_EQ(
         stored("<?xml version=\"1.0\"?>\n<!DOCTYPE P FOO><P/>"),
-        "p.xml:2:13: error: not well-formed, syntax error: the module would load it all the same, "
-        "and run what it took from it; mend it here\n"
+        "p.xml:2:13: error: not well-formed, syntax error: the library would load it all the same, "
+        "and run what it took from it; fix it here\n"
         "<!DOCTYPE P FOO><P/>\n"
         "            ^\n");
 }
@@ -501,12 +503,12 @@ TEST(CheckedForm, OfADeclaredEntity)
 {
     EXPECT_EQ(
         stored("<!DOCTYPE P [\n<!ENTITY a \"b\">]>\n<P>&a;" + group("A", cmd("x")) + "</P>"),
-        "p.xml:2:12: error: an entity is declared here: the module would not load the plan; write "
+        "p.xml:2:12: error: an entity is declared here: the library would not load the plan; write "
         "its text where it is used\n"
         "<!ENTITY a \"b\">]>\n"
         "           ^\n");
     EXPECT_THAT(stored("<!DOCTYPE P [<!ENTITY a \"b\">]><P>" + group("A", cmd("x")) + "</P>"),
-                HasSubstr(": error: an entity is declared here: the module would not know it; "
+                HasSubstr(": error: an entity is declared here: the library would not know it; "
                           "write its text where it is used\n"));
 }
 
@@ -524,11 +526,11 @@ TEST(CheckedValue, IsMissing)
     EXPECT_EQ(
         stored(group_of("<Cmd name=\"x\" args=\"\" progress=\"5\" result description=\"a\"/>\n"
                         "<Cmd name=\"y\" args/>\n")),
-        "p.xml:3:36: error: attribute 'result' has no value: the module would not load the plan; "
+        "p.xml:3:36: error: attribute 'result' has no value: the library would not load the plan; "
         "write result=\"\" or leave it out\n"
         "<Cmd name=\"x\" args=\"\" progress=\"5\" result description=\"a\"/>\n"
         "                                   ^\n"
-        "p.xml:4:15: error: attribute 'args' has no value: the module would not load the plan; "
+        "p.xml:4:15: error: attribute 'args' has no value: the library would not load the plan; "
         "write args=\"\" or leave it out\n"
         "<Cmd name=\"y\" args/>\n"
         "              ^\n");
@@ -538,7 +540,7 @@ TEST(CheckedValue, DoesNotHideOtherFindings)
 {
     EXPECT_EQ(
         stored(group_of("<Cmd name=\"x\" args=\"\" result/>\n<Cmd name=\"x\" args=\"\"/>\n")),
-        "p.xml:3:23: error: attribute 'result' has no value: the module would not load the plan; "
+        "p.xml:3:23: error: attribute 'result' has no value: the library would not load the plan; "
         "write result=\"\" or leave it out\n"
         "<Cmd name=\"x\" args=\"\" result/>\n"
         "                      ^\n"
@@ -552,39 +554,39 @@ TEST(CheckedValue, OfANameIsMissedOnce)
 {
     EXPECT_EQ(
         stored(plan_of("<CmdGroup name><Cmd name args=\"\"/></CmdGroup>")),
-        "p.xml:1:14: error: attribute 'name' has no value: the module would not load the plan; "
+        "p.xml:1:14: error: attribute 'name' has no value: the library would not load the plan; "
         "write name=\"\" or leave it out\n"
         "<P><CmdGroup name><Cmd name args=\"\"/></CmdGroup></P>\n"
         "             ^\n"
-        "p.xml:1:24: error: attribute 'name' has no value: the module would not load the plan; "
+        "p.xml:1:24: error: attribute 'name' has no value: the library would not load the plan; "
         "write name=\"\" or leave it out\n"
         "<P><CmdGroup name><Cmd name args=\"\"/></CmdGroup></P>\n"
         "                       ^\n");
 }
 
-TEST(CheckedValue, DoesNotMoveWhatIsFoundBehindIt)
+TEST(CheckedValue, DoesNotMoveWhatIsFoundAfterIt)
 {
     EXPECT_EQ(
         stored("<P a><Q b>\n</P>"),
-        "p.xml:1:4: error: attribute 'a' has no value: the module would not load the plan; write "
+        "p.xml:1:4: error: attribute 'a' has no value: the library would not load the plan; write "
         "a=\"\" or leave it out\n"
         "<P a><Q b>\n"
         "   ^\n"
-        "p.xml:1:9: error: attribute 'b' has no value: the module would not load the plan; write "
+        "p.xml:1:9: error: attribute 'b' has no value: the library would not load the plan; write "
         "b=\"\" or leave it out\n"
         "<P a><Q b>\n"
         "        ^\n"
-        "p.xml:2:3: error: not well-formed, mismatched tag: the module would not load it; close "
+        "p.xml:2:3: error: not well-formed, mismatched tag: the library would not load it; close "
         "<Q> before\n"
         "</P>\n"
         "  ^\n");
 }
 
-TEST(CheckedValue, IsNotMissedBehindAPlaceThatIsNotWellFormed)
+TEST(CheckedValue, IsNotMissedAfterAPlaceThatIsNotWellFormed)
 {
     EXPECT_EQ(
         stored("<P>&</P><Q a/>"),
-        "p.xml:1:5: error: not well-formed, invalid token: the module would not load it; write "
+        "p.xml:1:5: error: not well-formed, invalid token: the library would not load it; write "
         "&amp; for a '&'\n"
         "<P>&</P><Q a/>\n"
         "    ^\n");
@@ -602,25 +604,25 @@ TEST(CheckedValue, IsNotMissedWhereAQuoteIs)
 {
     EXPECT_EQ(
         stored("<P a=\"b c=\"d\">"),
-        "p.xml:1:12: error: not well-formed, invalid token: the module would not load it; mend it "
+        "p.xml:1:12: error: not well-formed, invalid token: the library would not load it; mend it "
         "here\n"
         "<P a=\"b c=\"d\">\n"
         "           ^\n");
     EXPECT_EQ(
         stored(plan_of(group("A", "<Cmd name=\"x\" args=\"\"\"/>"))),
-        "p.xml:1:44: error: not well-formed, invalid token: the module would not load it; mend it "
+        "p.xml:1:44: error: not well-formed, invalid token: the library would not load it; mend it "
         "here\n"
         "<P><CmdGroup name=\"A\"><Cmd name=\"x\" args=\"\"\"/></CmdGroup></P>\n"
         "                                           ^\n");
     EXPECT_EQ(
         stored("<P a\"/>"),
-        "p.xml:1:5: error: not well-formed, invalid token: the module would not load it; mend it "
+        "p.xml:1:5: error: not well-formed, invalid token: the library would not load it; mend it "
         "here\n"
         "<P a\"/>\n"
         "    ^\n");
     EXPECT_EQ(
         stored("<P 1/>"),
-        "p.xml:1:4: error: not well-formed, invalid token: the module would not load it; mend it "
+        "p.xml:1:4: error: not well-formed, invalid token: the library would not load it; mend it "
         "here\n"
         "<P 1/>\n"
         "   ^\n");
@@ -633,7 +635,7 @@ TEST(CheckedRefusal, OfWhiteSpaceInFront)
 {
     EXPECT_EQ(
         stored(" <P>" + group("A", cmd("x")) + "</P>"),
-        "p.xml:1:1: error: the module would not load a text that begins with white space; begin "
+        "p.xml:1:1: error: the library would not load a text that begins with white space; begin "
         "it with a '<'\n"
         " <P><CmdGroup name=\"A\"><Cmd name=\"x\" args=\"\"/></CmdGroup></P>\n"
         "^\n");
@@ -642,17 +644,17 @@ TEST(CheckedRefusal, OfWhiteSpaceInFront)
 TEST(CheckedRefusal, OfSomethingBesideARootWithoutADeclaration)
 {
     EXPECT_EQ(stored("<!-- a -->\n<P>" + group("A", cmd("x")) + "</P>"),
-              "p.xml:1:1: error: the module would not load a plan without a declaration that has "
+              "p.xml:1:1: error: the library would not load a plan without a declaration that has "
               "something beside its root element; begin it with <?xml version=\"1.0\"?>\n"
               "<!-- a -->\n"
               "^\n");
     EXPECT_EQ(stored("<P>" + group("A", cmd("x")) + "</P>\n<!-- a -->\n"),
-              "p.xml:2:1: error: the module would not load a plan without a declaration that has "
+              "p.xml:2:1: error: the library would not load a plan without a declaration that has "
               "something beside its root element; begin it with <?xml version=\"1.0\"?>\n"
               "<!-- a -->\n"
               "^\n");
     EXPECT_EQ(stored("<P/>\n<?a b?>\n"),
-              "p.xml:2:1: error: the module would not load a plan without a declaration that has "
+              "p.xml:2:1: error: the library would not load a plan without a declaration that has "
               "something beside its root element; begin it with <?xml version=\"1.0\"?>\n"
               "<?a b?>\n"
               "^\n");
@@ -660,24 +662,26 @@ TEST(CheckedRefusal, OfSomethingBesideARootWithoutADeclaration)
 
 TEST(CheckedRefusal, OfAnEmptyComment)
 {
-    EXPECT_EQ(stored("<P>\n<!---->" + group("A", cmd("x")) + "</P>"),
-              "p.xml:2:1: error: an empty comment has no end for the module, which would take what "
-              "follows for a comment as well; write something into it\n"
-              "<!----><CmdGroup name=\"A\"><Cmd name=\"x\" args=\"\"/></CmdGroup></P>\n"
-              "^\n");
-    EXPECT_EQ(stored("<P>" + group("A", cmd("x")) + "\n<!---->" + cmd("y") + "<!-- a --></P>"),
-              "p.xml:2:1: error: an empty comment has no end for the module, which would take what "
-              "follows for a comment as well; write something into it\n"
-              "<!----><Cmd name=\"y\" args=\"\"/><!-- a --></P>\n"
-              "^\n");
+    EXPECT_EQ(
+        stored("<P>\n<!---->" + group("A", cmd("x")) + "</P>"),
+        "p.xml:2:1: error: an empty comment has no end for the library, which would take what "
+        "follows for a comment as well; write something into it\n"
+        "<!----><CmdGroup name=\"A\"><Cmd name=\"x\" args=\"\"/></CmdGroup></P>\n"
+        "^\n");
+    EXPECT_EQ(
+        stored("<P>" + group("A", cmd("x")) + "\n<!---->" + cmd("y") + "<!-- a --></P>"),
+        "p.xml:2:1: error: an empty comment has no end for the library, which would take what "
+        "follows for a comment as well; write something into it\n"
+        "<!----><Cmd name=\"y\" args=\"\"/><!-- a --></P>\n"
+        "^\n");
 }
 
 TEST(CheckedRefusal, OfAnythingElseIsInTheLibrarysWords)
 {
     EXPECT_EQ(
         stored("<!DOCTYPE P SYSTEM \"p.dtd\">\n<P>&q;</P>"),
-        "p.xml:2:4: error: well-formed, but the module would not load it: Entity name 'q;' not "
-        "supported under parent <P>; mend that\n"
+        "p.xml:2:4: error: well-formed, but the library would not load it: Entity name 'q;' not "
+        "supported under parent <P>; fix that\n"
         "<P>&q;</P>\n"
         "   ^\n");
 }
@@ -688,17 +692,17 @@ TEST(CheckedRefusal, OfAnythingElseIsInTheLibrarysWords)
 TEST(CheckedGroup, IsMissing)
 {
     EXPECT_EQ(stored("<?xml version=\"1.0\"?>\n<!-- a -->\n<P>" + cmd("x") + "</P>"),
-              "p.xml:3:1: error: no CmdGroup in it: the module would find nothing to run; put the "
+              "p.xml:3:1: error: no CmdGroup in it: the library would find nothing to run; put the "
               "items into <CmdGroup name=\"...\">\n"
               "<P><Cmd name=\"x\" args=\"\"/></P>\n"
               "^\n");
     EXPECT_EQ(stored("<P><cmdgroup name=\"A\"/></P>"),
-              "p.xml:1:1: error: no CmdGroup in it: the module would find nothing to run; put the "
+              "p.xml:1:1: error: no CmdGroup in it: the library would find nothing to run; put the "
               "items into <CmdGroup name=\"...\">\n"
               "<P><cmdgroup name=\"A\"/></P>\n"
               "^\n"
-              "p.xml:1:4: warning: <cmdgroup> is nothing to the module, which tells small letters "
-              "from capitals; write <CmdGroup>\n"
+              "p.xml:1:4: warning: <cmdgroup> is ignored: element names are case-sensitive; write "
+              "<CmdGroup>\n"
               "<P><cmdgroup name=\"A\"/></P>\n"
               "   ^\n");
 }
@@ -707,7 +711,7 @@ TEST(CheckedGroup, IsTheTopOfTheDocument)
 {
     EXPECT_EQ(
         stored(group("A", cmd("x") + "<!-- a -->")),
-        "p.xml:1:1: error: the module looks for groups below the top of the document, and would "
+        "p.xml:1:1: error: the library looks for groups below the top of the document, and would "
         "not find this one; begin it with <?xml version=\"1.0\"?>\n"
         "<CmdGroup name=\"A\"><Cmd name=\"x\" args=\"\"/><!-- a --></CmdGroup>\n"
         "^\n");
@@ -786,7 +790,7 @@ TEST(CheckedGroup, IsEmpty)
     EXPECT_EQ(
         stored("<P>\n<CmdGroup name=\"A\">\n</CmdGroup>" + group("B", cmd("x")) + "</P>"),
         "p.xml:2:1: warning: group 'A' is empty: 'root/A' would run nothing, and an item of it is "
-        "looked for in the groups behind; put items into it\n"
+        "looked for in the groups after it; put items into it\n"
         "<CmdGroup name=\"A\">\n"
         "^\n");
 }
@@ -815,27 +819,27 @@ TEST(CheckedItem, IsInNoGroup)
 
 TEST(CheckedTags, AreTakenLetterByLetter)
 {
-    EXPECT_EQ(stored("<P>\n" + group("A", cmd("x")) + "\n<cmdgroup name=\"B\"/>\n" +
-                     "<CMD name=\"y\"/>\n<Command/></P>"),
-              "p.xml:3:1: warning: <cmdgroup> is nothing to the module, which tells small letters "
-              "from capitals; write <CmdGroup>\n"
-              "<cmdgroup name=\"B\"/>\n"
-              "^\n"
-              "p.xml:4:1: warning: <CMD> is nothing to the module, which tells small letters from "
-              "capitals; write <Cmd>\n"
-              "<CMD name=\"y\"/>\n"
-              "^\n");
+    EXPECT_EQ(
+        stored("<P>\n" + group("A", cmd("x")) + "\n<cmdgroup name=\"B\"/>\n" +
+               "<CMD name=\"y\"/>\n<Command/></P>"),
+        "p.xml:3:1: warning: <cmdgroup> is ignored: element names are case-sensitive; write "
+        "<CmdGroup>\n"
+        "<cmdgroup name=\"B\"/>\n"
+        "^\n"
+        "p.xml:4:1: warning: <CMD> is ignored: element names are case-sensitive; write <Cmd>\n"
+        "<CMD name=\"y\"/>\n"
+        "^\n");
 }
 
 TEST(CheckedItem, HasNoName)
 {
     EXPECT_EQ(
         stored(group_of("<Cmd args=\"\"/>\n<Cmd name=\"\"/>\n")),
-        "p.xml:3:1: error: an item has no name: the module would not run it; add name=\"...\" "
+        "p.xml:3:1: error: an item has no name: the library would not run it; add name=\"...\" "
         "with the name of its program\n"
         "<Cmd args=\"\"/>\n"
         "^\n"
-        "p.xml:4:12: error: the name of an item is empty: the module would not run it; write the "
+        "p.xml:4:12: error: the name of an item is empty: the library would not run it; write the "
         "name of its program\n"
         "<Cmd name=\"\"/>\n"
         "           ^\n");
@@ -977,12 +981,12 @@ TEST(CheckedItem, HasAVendorsSuffixInItsName)
 {
     EXPECT_EQ(
         stored(group_of(cmd("x_ca") + "\n" + cmd("y_ca_qsee") + "\n")),
-        "p.xml:3:12: warning: item 'x_ca' would be run as 'x_ca_ca' under vendor 1: the module "
+        "p.xml:3:12: warning: item 'x_ca' would be run as 'x_ca_ca' under vendor 1: the library "
         "adds the suffix; leave it out\n"
         "<Cmd name=\"x_ca\" args=\"\"/>\n"
         "           ^\n"
         "p.xml:4:12: warning: item 'y_ca_qsee' would be run as 'y_ca_qsee_ca_qsee' under vendor "
-        "2: the module adds the suffix; leave it out\n"
+        "2: the library adds the suffix; leave it out\n"
         "<Cmd name=\"y_ca_qsee\" args=\"\"/>\n"
         "           ^\n");
     EXPECT_EQ(stored(group_of(cmd("_ca") + cmd("_ca_qsee") + cmd("x_qsee") + cmd("ca"))),
@@ -1012,7 +1016,7 @@ TEST(CheckedItem, HasAVendorsNameOfTheGatherer)
     for (const std::string suffix : {"_ca", "_qsee", "_ca_qsee"}) {
         EXPECT_EQ(stored(group_of(cmd("SensorProbe" + suffix) + "\n" + cmd("SensorProbe") + "\n")),
                   "p.xml:3:12: warning: item 'SensorProbe" + suffix +
-                      "' is not the gatherer: that is 'SensorProbe', to which the module adds the "
+                      "' is not the gatherer: that is 'SensorProbe', to which the library adds the "
                       "vendor's suffix; leave it out\n"
                       "<Cmd name=\"SensorProbe" +
                       suffix +
@@ -1199,69 +1203,69 @@ TEST(CheckedPositions, AreNotLookedAtInAGroupThatIsNotFound)
         1U);
 }
 
-// --- groups behind
+// --- groups after it
 // ----------------------------------------------------------------------------------
 
-TEST(CheckedGroupBehind, HasAnItemThatOtherGroupsHave)
+TEST(CheckedGroupAfter, HasAnItemThatOtherGroupsHave)
 {
     EXPECT_EQ(
         stored("<P>\n" + group("A", cmd("x")) + "\n" + group("B", cmd("y")) + "\n" +
                group("C", cmd("x")) + "</P>"),
-        "p.xml:4:31: warning: group 'B' has no item 'x', and finds this one behind it: 'root/B/x' "
-        "would run 'y'; mind the group in paths to it\n"
+        "p.xml:4:31: warning: group 'B' has no item 'x', and finds this one after it: 'root/B/x' "
+        "would run 'y'; check the group in paths to it\n"
         "<CmdGroup name=\"C\"><Cmd name=\"x\" args=\"\"/></CmdGroup></P>\n"
         "                              ^\n");
 }
 
-TEST(CheckedGroupBehind, HasAnItemThatIsCalledMuchTheSame)
+TEST(CheckedGroupAfter, HasAnItemThatIsCalledMuchTheSame)
 {
     EXPECT_EQ(
         stored("<P>\n" + group("A", cmd("Wait_1")) + "\n" + group("B", cmd("wait2")) + "</P>"),
-        "p.xml:3:31: warning: group 'A' has no item 'wait2', and finds this one behind it: "
-        "'root/A/wait2' would run 'Wait_1'; mind the group in paths to it\n"
+        "p.xml:3:31: warning: group 'A' has no item 'wait2', and finds this one after it: "
+        "'root/A/wait2' would run 'Wait_1'; check the group in paths to it\n"
         "<CmdGroup name=\"B\"><Cmd name=\"wait2\" args=\"\"/></CmdGroup></P>\n"
         "                              ^\n");
 }
 
-TEST(CheckedGroupBehind, IsSaidOnceForAGroup)
+TEST(CheckedGroupAfter, IsSaidOnceForAGroup)
 {
     EXPECT_EQ(stored("<P>\n" + group("A", cmd("T1") + cmd("T2") + cmd("T3")) + "\n" +
                      group("B", cmd("T4") + cmd("T5") + cmd("T6") + cmd("T7")) + "</P>"),
-              "p.xml:3:31: warning: group 'A' has no item 'T4', and finds this one behind it: "
+              "p.xml:3:31: warning: group 'A' has no item 'T4', and finds this one after it: "
               "'root/A/T4' "
-              "would run 'T1'; mind the group in paths to it, and to 2 more here\n"
+              "would run 'T1'; check the group in paths to it, and to 2 more here\n"
               "<CmdGroup name=\"B\"><Cmd name=\"T4\" args=\"\"/><Cmd name=\"T5\" args=\"\"/><Cmd "
               "name=...\n"
               "                              ^\n");
 }
 
-TEST(CheckedGroupBehind, MayHaveTwoSuchItems)
+TEST(CheckedGroupAfter, MayHaveTwoSuchItems)
 {
     EXPECT_THAT(
         stored(plan_of(group("A", cmd("T1") + cmd("T2")) + group("B", cmd("T3") + cmd("T4")))),
-        HasSubstr("; mind the group in paths to it, and to 1 more here\n"));
+        HasSubstr("; check the group in paths to it, and to 1 more here\n"));
 }
 
-TEST(CheckedGroupBehind, IsOfNoMatterWhereNothingWouldBeRun)
+TEST(CheckedGroupAfter, IsOfNoMatterWhereNothingWouldBeRun)
 {
-    // the position is behind the last item of the group in front
+    // the position is after the last item of the group in front
     EXPECT_EQ(stored(plan_of(group("A", cmd("x")) + group("B", cmd("y")) +
                              group("C", cmd("z") + cmd("x")))),
               "");
 }
 
-TEST(CheckedGroupBehind, IsOfNoMatterWhereTheItemItselfWouldBeRun)
+TEST(CheckedGroupAfter, IsOfNoMatterWhereTheItemItselfWouldBeRun)
 {
     EXPECT_EQ(
         stored("<P>\n" + group("A", cmd("x")) + "\n" + group("B", "") + "\n" +
                group("C", cmd("x")) + "</P>"),
         "p.xml:3:1: warning: group 'B' is empty: 'root/B' would run nothing, and an item of it is "
-        "looked for in the groups behind; put items into it\n"
+        "looked for in the groups after it; put items into it\n"
         "<CmdGroup name=\"B\"></CmdGroup>\n"
         "^\n");
 }
 
-TEST(CheckedGroupBehind, IsNotReachedPastAGroupThatHasTheItem)
+TEST(CheckedGroupAfter, IsNotReachedPastAGroupThatHasTheItem)
 {
     // 'root/A/T2' finds that of B
     EXPECT_EQ(stored(plan_of(group("A", cmd("T1")) + group("B", cmd("z") + cmd("T2")) +
@@ -1269,7 +1273,7 @@ TEST(CheckedGroupBehind, IsNotReachedPastAGroupThatHasTheItem)
               "");
 }
 
-TEST(CheckedGroupBehind, IsOfNoMatterForNamesOfItsOwn)
+TEST(CheckedGroupAfter, IsOfNoMatterForNamesOfItsOwn)
 {
     EXPECT_EQ(stored(plan_of(group("A", cmd("SpiCheck")) + group("B", cmd("BurnIn")))), "");
     EXPECT_EQ(stored(plan_of(group("A", cmd("a")) + group("B", cmd("b")))), "");
@@ -1311,7 +1315,7 @@ TEST(Findings, StandInTheFirstLineWhereTheirPlaceIsNotKnown)
     const auto findings = check(text, PlanUse::stored);
     ASSERT_EQ(findings.size(), 1U);
     EXPECT_EQ(findings[0].offset, 0U); // and not where the root begins, in the third line
-    EXPECT_EQ(findings[0].text, "no CmdGroup in it: the module would find nothing to run; put the "
+    EXPECT_EQ(findings[0].text, "no CmdGroup in it: the library would find nothing to run; put the "
                                 "items into <CmdGroup name=\"...\">");
 }
 
@@ -1593,7 +1597,7 @@ TEST(Message, DoesNotShowAByteOrderMark)
     EXPECT_EQ(shown("\xEF\xBB\xBF<a>", 0), "f:1:1: warning: t\n<a>\n^\n");
 }
 
-TEST(Message, OfThePlaceBehindTheEnd)
+TEST(Message, OfThePlaceAfterTheEnd)
 {
     EXPECT_EQ(shown("ab\n", 3), "f:2:1: warning: t\n\n^\n");
     EXPECT_EQ(shown("ab", 2), "f:1:3: warning: t\nab\n  ^\n");
@@ -1677,7 +1681,7 @@ TEST(CheckedForm, OfAnotherEncodingThanTheModules)
         "<?xml version=\"1.0\" encoding=\"ISO-8859-1\"?>\n<P>" + group("G\xE4", cmd("x")) + "</P>";
     EXPECT_EQ(
         stored(text),
-        "p.xml:2:21: error: not UTF-8: the module looks at no encoding declaration, and would "
+        "p.xml:2:21: error: not UTF-8: the library looks at no encoding declaration, and would "
         "read something else here; save it as UTF-8\n"
         "<P><CmdGroup name=\"G\uFFFD\"><Cmd name=\"x\" args=\"\"/></CmdGroup></P>\n" +
             std::string(20, ' ') + "^\n");
@@ -1689,8 +1693,8 @@ TEST(CheckedForm, IsSaidOfWhatTheModuleWouldGet)
     const std::string text = "<P>" + group("G", cmd("x")) + "</P:>";
     const auto findings = fptest::check(text, fptest::PlanUse::to_send);
     ASSERT_EQ(findings.size(), 2U);
-    EXPECT_THAT(findings[0].text, testing::HasSubstr("the module would load it all the same"));
-    EXPECT_THAT(findings[1].text, testing::HasSubstr("the module would load them"));
+    EXPECT_THAT(findings[0].text, testing::HasSubstr("the library would load it all the same"));
+    EXPECT_THAT(findings[1].text, testing::HasSubstr("the library would load them"));
 }
 
 TEST(CheckedItem, IsToldToShortenWhatIsLong)

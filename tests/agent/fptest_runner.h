@@ -52,7 +52,7 @@ class FptestProcess
     {
         return pid_;
     }
-    // Its process that runs the module, waited for.
+    // Its process that runs the library, waited for.
     pid_t module() const;
     void signal(int number) const;
 
@@ -92,7 +92,7 @@ device::Lines lines_of(const std::string &text);
 // The text with its times, like "0.3 s", made the same.
 std::string without_times(const std::string &text);
 
-// --- what the module says in its log -------------------------------------------
+// --- what the library says in its log -------------------------------------------
 
 // The paths that it was told to run; what the agent asks it for itself is left out.
 device::Lines paths_run(const std::string &log = device::kLogFile);

@@ -300,16 +300,16 @@ TEST_F(Fptest, CountsNothingInAPlanThatDoesNotLoad)
 TEST_F(Fptest, ChecksArgsWhereThereIsNoShellToAsk)
 {
     const std::string before = "<P><CmdGroup name=\"G\"><Cmd name=\"X\" args=\"";
-    const std::string behind = "\"/></CmdGroup></P>";
+    const std::string after = "\"/></CmdGroup></P>";
     Start start;
     start.is_no_device = true;
     start.arguments = {"check", "-"};
-    start.input = before + "it's" + behind;
+    start.input = before + "it's" + after;
     EXPECT_EQ(lines_of(run_fptest(start).out).front(),
               "<stdin>:1:45: error: the shell would refuse the command line of item 'X': it finds "
               "no end of the ''' here; end it, or put a '\\' before it");
     // a fault that only the shell knows
-    start.input = before + "a; if" + behind;
+    start.input = before + "a; if" + after;
     EXPECT_EQ(lines_of(run_fptest(start).out).front(),
               "<stdin>:1:44: warning: the shell would run 'if' as a command of its own, after item "
               "'X'; put the ';' in quotes if it is meant for the item");

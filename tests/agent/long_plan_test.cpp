@@ -63,7 +63,7 @@ TEST_F(LongPlan, OfThreeHundredItemsIsPlacedAndRun)
 {
     const Plan long_plan = plan_of_groups(100, "at");
     ASSERT_GT(long_plan.text.size(), kLimit);
-    // an earlier one with the same names, which the module has looked at by then
+    // an earlier one with the same names, which the library has looked at by then
     write_file(kPlanFile, plan_of({{"G7", {{"Third", "report G7 100 0 old"}}}}));
     Lines arguments = {"run", "--plan", plan(long_plan.text)};
     arguments.insert(arguments.end(), long_plan.paths.begin(), long_plan.paths.end());
@@ -121,7 +121,7 @@ TEST_F(LongPlan, KeepsToTheCommandWhereThatIsAskedFor)
     EXPECT_EQ(ended.status, 2);
     EXPECT_EQ(ended.out, "");
     EXPECT_THAT(ended.err, HasSubstr(" more than the 2048 that a command stores: the plan would be "
-                                     "cut here, and the module would "));
+                                     "cut here, and the library would "));
     EXPECT_THAT(ended.err, HasSubstr("; shorten it, or leave --as-sent out\n"));
     EXPECT_FALSE(fs::exists(kPlanFile));
 

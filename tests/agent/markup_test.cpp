@@ -45,7 +45,7 @@ const char *kind_name(Tag::Kind kind)
     return "?";
 }
 
-// "KIND NAME|what stands there", with " ..." behind what is not complete.
+// "KIND NAME|what stands there", with " ..." after what is not complete.
 std::vector<std::string> scanned(std::string_view text)
 {
     std::vector<std::string> tags;
@@ -105,7 +105,7 @@ TEST(Scan, TakesTextUpToItsLastWord)
                 ElementsAre("text|a\n b", "open x|<x>", "text|c", "close x|</x>", "text|d"));
 }
 
-TEST(Scan, EndsATagBehindQuotesOnly)
+TEST(Scan, EndsATagAfterQuotesOnly)
 {
     EXPECT_THAT(scanned("<a b='<c>/>'><d e=\"?>'/>\"/>"),
                 ElementsAre("open a|<a b='<c>/>'>", "empty d|<d e=\"?>'/>\"/>"));
@@ -125,7 +125,7 @@ TEST(Scan, SeesNoEndInACommentOfNothing)
     EXPECT_THAT(scanned("<!--a-->b"), ElementsAre("comment|<!--a-->", "text|b"));
 }
 
-TEST(Scan, SeesNoEndOfACommentBehindThreeHyphens)
+TEST(Scan, SeesNoEndOfACommentAfterThreeHyphens)
 {
     EXPECT_THAT(scanned("<!-- a ---> b --> c"), ElementsAre("comment|<!-- a ---> b -->", "text|c"));
 }
@@ -270,7 +270,7 @@ TEST(PositionInText, CountsLinesAndColumnsFromOne)
     EXPECT_EQ(place("a\n", 2), "2:1");
 }
 
-TEST(PositionInText, TakesAPlaceBehindTheEndForTheEnd)
+TEST(PositionInText, TakesAPlaceAfterTheEndForTheEnd)
 {
     EXPECT_EQ(place("a\nbc", 99), "2:3");
 }

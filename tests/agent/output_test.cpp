@@ -280,7 +280,7 @@ TEST_F(Output, ListHasNoReports)
     EXPECT_FALSE(is_there("out"));
 }
 
-// --- the module's log -----------------------------------------------------------------
+// --- the library's log -----------------------------------------------------------------
 
 TEST_F(Output, LogIsAFileOfItsOwnWhoeverNamesIt)
 {
@@ -306,7 +306,7 @@ TEST_F(Output, LogIsNeverTheStoredPlan)
           {"send", "pingtest"},
           {"report", "G", "Item", "--progress", "1", "--result", "0"}}) {
         expect_log_refusal(2, arguments, device::kPlanFile,
-                           "{} and the module both want the file /data/vorlane/src1.xml: give "
+                           "{} and the library both want the file /data/vorlane/src1.xml: give "
                            "them files of their own");
     }
     EXPECT_EQ(read_file(device::kPlanFile), kLoud);
@@ -328,7 +328,7 @@ TEST_F(Output, LogThatCannotBeWrittenIsRefusedWhoeverNamesIt)
 TEST_F(Output, LogIsNotStandardOutput)
 {
     device::write_file(device::kPlanFile, kLoud);
-    const std::string why = " is standard output, which is not for the module's log: name a file "
+    const std::string why = " is standard output, which is not for the library's log: name a file "
                             "for that";
     for (const device::Lines &arguments :
          {device::Lines{"run", "P/G"},
@@ -344,7 +344,7 @@ TEST_F(Output, LogIsNotStandardOutput)
     EXPECT_FALSE(is_there("-"));
 }
 
-// In the module's process it would be where items print.
+// In the library's process it would be where items print.
 TEST_F(Output, LogMayBeStandardError)
 {
     const Ended ended = run_fptest({"run", "--log", "/dev/stderr", "--json", work("json"), "--plan",

@@ -1,8 +1,8 @@
 // SPDX-FileCopyrightText: 2026 The Quillmark authors
 // SPDX-License-Identifier: Apache-2.0
 
-// Test plans as the module sees them. What it runs is compared with its own
-// lookups, done on the same tree by the same calls of the library.
+// Test plans as the library sees them. What it runs is compared with its own
+// lookups, done on the same tree by the same calls of Mini-XML.
 #include "plan/plan.h"
 
 #include <gmock/gmock.h>
@@ -120,7 +120,7 @@ TEST(StoredPart, EndsAtTheFirstColon)
     EXPECT_EQ(fptest::stored_part("<Plan a=\"b:c:d\"/>"), "<Plan a=\"b");
 }
 
-TEST(StoredPart, BeginsBehindTheColonsAtTheStart)
+TEST(StoredPart, BeginsAfterTheColonsAtTheStart)
 {
     EXPECT_EQ(fptest::stored_part(":::<a/>:<b/>"), "<a/>");
     EXPECT_EQ(fptest::stored_part("::"), "");
@@ -167,7 +167,7 @@ TEST(Gatherer, HasNoSuffixInItsName)
     EXPECT_FALSE(fptest::is_gatherer("SensorProb", 0));
 }
 
-TEST(Gatherer, MayHaveMoreBehindATab)
+TEST(Gatherer, MayHaveMoreAfterATab)
 {
     EXPECT_TRUE(fptest::is_gatherer("SensorProbe\t2", 0));
     EXPECT_TRUE(fptest::is_gatherer("SensorProbe\n", 1));
@@ -287,7 +287,7 @@ TEST(LoadedPlan, IsNoneOfATextThatTheLibraryRefuses)
     EXPECT_EQ(reason("<!-- c --><P/>"), "<P> cannot be a second root node after <!-- c -->.");
 }
 
-// A value as the library has it after saving and loading.
+// A value as Mini-XML has it after saving and loading.
 TEST(LoadedPlan, HasValuesAsTheyComeBackFromAFile)
 {
     using namespace std::string_literals;
@@ -616,7 +616,7 @@ TEST(ItemPath, HoldsTwoThousandAndFortySevenBytes)
     EXPECT_EQ(run_by(plan, std::string(2047 - 5 - 1, 'g'), "xy"), "-");
 }
 
-TEST(ItemPath, IgnoresWhatStandsBehindASlash)
+TEST(ItemPath, IgnoresWhatStandsAfterASlash)
 {
     const Plan plan = loaded(plan_of(group("A", cmd("y") + cmd("x"))));
     EXPECT_EQ(run_by(plan, "A", "x/y"), "x");
@@ -633,7 +633,7 @@ TEST(ItemPath, IsCutAtAColonATabAndALineFeed)
     EXPECT_EQ(run_by(plan, "A:", "x"), "-");
 }
 
-// --- the module's own lookups -----------------------------------------------------------
+// --- the library's own lookups -----------------------------------------------------------
 
 mxml_node_t *module_item(mxml_node_t *tree, const std::string &name, int index)
 {

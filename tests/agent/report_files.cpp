@@ -193,7 +193,7 @@ std::vector<std::string> outcomes(const std::string &text)
 namespace
 {
 
-// What stands behind the number of a point.
+// What stands after the number of a point.
 struct PointText {
     std::string name;
     std::optional<std::string> directive;
@@ -239,7 +239,7 @@ class TapParser
                 tap.planned = plan("");
             } else if (const auto reason = take("Bail out!  ")) {
                 tap.bail_out = *reason;
-                EXPECT_EQ(at_, lines_.size()) << "more behind the end";
+                EXPECT_EQ(at_, lines_.size()) << "more after the end";
             } else if (const auto comment = take("# ")) {
                 tap.comments.push_back(*comment);
             } else {

@@ -179,7 +179,7 @@ TEST_F(Report, NamesTheNearestItemAndAllOfTheGroup)
                    "fptest: group 'Bringup' of the stored plan has no item 'SpiChek'; did you mean "
                    "'SpiCheck'? It has SpiCheck and DeadPixel",
                    {"Bringup", "SpiChek", "--progress", "1", "--result", "0"});
-    // the module would annotate the item of the group behind
+    // the library would annotate the item of the next group
     expect_refusal(2,
                    "fptest: group 'Bringup' of the stored plan has no item 'BurnIn'; it has "
                    "SpiCheck and DeadPixel",
@@ -254,7 +254,7 @@ TEST_F(Report, SaysThatThePlanIsNotWritable)
     const Ended ended = run_fptest(start);
     EXPECT_EQ(ended.status, 3);
     EXPECT_EQ(ended.err, "fptest: the report is not in /data/vorlane/src1.xml: is it writable? "
-                         "--log FILE tells what the module met\n");
+                         "--log FILE tells what the library met\n");
     EXPECT_EQ(read_file(kPlanFile), kPlan);
 }
 

@@ -538,7 +538,7 @@ TEST_F(JsonReport, TakesBackALineThatFoundNoRoom)
 
 TEST_F(JsonReport, WritesNoMoreOnceALineHasFoundNoRoom)
 {
-    // the short line behind the long one would fit
+    // the short line after the long one would fit
     EXPECT_EQ(in_a_child([&] {
                   limit_file_size(1500);
                   const auto report = json_report(path("json"));

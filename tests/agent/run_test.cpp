@@ -1,7 +1,7 @@
 // SPDX-FileCopyrightText: 2026 The Quillmark authors
 // SPDX-License-Identifier: Apache-2.0
 
-// Running plans: what is sent to the module, what becomes of the items, and what
+// Running plans: what is sent to the library, what becomes of the items, and what
 // is told of it.
 #include "fptest_runner.h"
 #include "network.h"
@@ -263,7 +263,7 @@ TEST_F(Run, RunsByForceWhatIsStoredOfAPlan)
     EXPECT_THAT(outcomes(json()), ElementsAre("Item: passed"));
 }
 
-// --- what is sent to the module ----------------------------------------------------
+// --- what is sent to the library ----------------------------------------------------
 
 TEST_F(Run, RunsAGroupItemByItem)
 {
@@ -427,7 +427,7 @@ TEST_F(Run, TellsItemsOfOneNameInTwoGroupsApart)
     EXPECT_EQ(events_of(json(), "end").at(1).at("description"), "of-a");
 }
 
-// A comment in the group: the module counts it, and every name leads one behind
+// A comment in the group: the library counts it, and every name leads one after
 // its item.
 const std::string kShifted =
     "<P><CmdGroup name=\"G\"><!-- about it -->"
@@ -486,7 +486,7 @@ TEST_F(Run, CreditsTheItemThatReallyRanAndNotTheOneNamed)
 
 TEST_F(Run, RunsByForceWhatTheModuleTakesForAnUnknownItem)
 {
-    // it is found in the group behind, and its place there taken in this one
+    // it is found in the group after it, and its place there taken in this one
     const std::string text =
         plan_of({{"A", {{"Item", "report A 100 0 x"}}}, {"B", {{"Other", "report B 100 0 x"}}}});
     EXPECT_EQ(run({"--force", "--plan", plan(text), "P/A/Other"}).status, 0);
@@ -1212,10 +1212,10 @@ TEST_F(Run, StartsItemsAsAnyProgramIsStarted)
     ASSERT_TRUE(wait_for_file("begun"));
     const pid_t item = processes_named("/system/bin/Item").at(0).pid;
     EXPECT_EQ(std::stoull(device::status_field(item, "SigBlk"), nullptr, 16), 0U);
-    // the C library's own behind the usual ones are the caller's
+    // the C library's own after the usual ones are the caller's
     EXPECT_EQ(std::stoull(device::status_field(item, "SigIgn"), nullptr, 16) & 0x7fffffffU, 0U);
     EXPECT_NE(getpgid(item), getpgid(fptest.pid())) << "Ctrl-C would reach it";
-    // of those that the module leaves open, and of nothing else
+    // of those that the library leaves open, and of nothing else
     for (const auto &entry : fs::directory_iterator("/proc/" + std::to_string(item) + "/fd")) {
         const std::string name = entry.path().filename();
         const std::string target = fs::read_symlink(entry.path());
@@ -1394,7 +1394,8 @@ TEST_F(Run, LeavesAtOnceWhenInterruptedTwice)
         ASSERT_TRUE(wait_for([] { return !processes_stopped().empty(); }, 30));
         EXPECT_FALSE(fptest.has_ended());
         EXPECT_LT(seconds_to_end(fptest, second), 1);
-        EXPECT_EQ(fptest.err(), "\nfptest: left at once; what runs is asked to stop\n");
+        EXPECT_EQ(fptest.err(),
+                  "\nfptest: interrupted again: exiting now, stopping the running item\n");
         EXPECT_THAT(outcomes(json()), ElementsAre("Item: passed"));
         EXPECT_THAT(events_of(json(), "finish"), IsEmpty());
         const Element junit = parse_xml(read_file(work("junit")));
@@ -1507,7 +1508,7 @@ TEST_F(CutOff, LosesTheItemInWhichTheModulesProcessEndedAndNoOther)
     EXPECT_EQ(ended.status, 1);
     EXPECT_EQ(ended.err, "");
     EXPECT_THAT(outcomes(json()), ElementsAre("Item: passed", "Other: no result", "Third: passed"));
-    EXPECT_EQ(reasons(json()).at(1), "the module's process ended by signal 9; --log FILE keeps "
+    EXPECT_EQ(reasons(json()).at(1), "the library's process ended by signal 9; --log FILE keeps "
                                      "what it says");
     EXPECT_EQ(tally_of_json(json()), (Tally{2, 1, 0}));
     EXPECT_EQ(tally_of_junit(read_file(work("junit"))), (Tally{2, 1, 0}));
@@ -1525,7 +1526,7 @@ TEST_F(CutOff, LosesWhatTheModulesProcessWouldHaveComeToInAGroupsCommand)
     EXPECT_EQ(fptest.wait().status, 1);
     EXPECT_THAT(outcomes(json()), ElementsAre("Item: no result", "Other: no result"));
     EXPECT_EQ(reasons(json()).at(1),
-              "the module did not come to it: the module's process ended by signal 9; --log FILE "
+              "the library never reached it: the library's process ended by signal 9; --log FILE "
               "keeps what it says");
 }
 
@@ -1577,7 +1578,7 @@ TEST_F(Refusal, OfAnUnknownItemNamesTheNearestAndTheItemsThereAre)
            "fptest: no item 'Itm' in group 'Bringup' of /tmp/scene/plan.xml; did you mean 'Item'? "
            "The items of the group are Item and Other",
            {"--plan", path, "P/Bringup/Itm"});
-    // the module would find it in the group behind
+    // the library would find it in the group after it
     expect(2,
            "fptest: no item 'Third' in group 'Bringup' of /tmp/scene/plan.xml; the items of the "
            "group are Item and Other",
@@ -1604,7 +1605,7 @@ TEST_F(Refusal, OfAPathThatIsNone)
            "are Bringup and Endurance",
            std::vector<std::string>{});
     expect(2,
-           "fptest: 'P/Bring:up' has a ':', a tab or a line feed, at which the module would cut "
+           "fptest: 'P/Bring:up' has a ':', a tab or a line feed, at which the library would cut "
            "it: name it without",
            {"P/Bring:up"});
 }
@@ -1644,7 +1645,7 @@ TEST_F(Refusal, OfAPlanThatDoesNotLoadEvenWithForce)
                     plan("<P><CmdGroup name='G'><Cmd name/></CmdGroup></P>"), "P/G"});
     EXPECT_EQ(ended.status, 2);
     EXPECT_THAT(lines_of(ended.err).back(),
-                StartsWith("fptest: /tmp/scene/plan.xml: the module cannot load this plan: "));
+                StartsWith("fptest: /tmp/scene/plan.xml: the library cannot load this plan: "));
     EXPECT_FALSE(fs::exists(kPlanFile));
 }
 
@@ -1702,9 +1703,9 @@ TEST_F(Refusal, WhereTheGatherersPortIsTaken)
     const device::Socket taken = take_trigger_port();
     const std::string path =
         plan(group_of({{"Item", "note /tmp/scene/order"}, {"SensorProbe", "--group G"}}));
-    const std::string line =
-        "fptest: port 34952 cannot be had: Address already in use; the gatherer's run would never "
-        "end: stop what listens there (netstat -ltnp names it)";
+    const std::string line = "fptest: port 34952 is not available: Address already in use; the "
+                             "gatherer's run would never "
+                             "end: stop what listens there (netstat -ltnp names it)";
     expect(3, line, {"--plan", path, "P/G"});
     expect(3, line, {"--plan", path, "P/G/SensorProbe"});
     expect(3, line, {"--force", "--plan", path, "P/G/SensorProbe"});
@@ -1746,7 +1747,7 @@ TEST_F(Refusal, OfAVendorThatRunsNothing)
         set_vendor(vendor);
         expect(3,
                "fptest: the vendor selector is " + vendor +
-                   ", and the module runs nothing then: set device/SysParam/Quillmark/vendor to "
+                   ", and the library runs nothing then: set device/SysParam/Quillmark/vendor to "
                    "0, 1 or 2 in /etc/vorlane/sysparms/vr_common_cfg.xml",
                {"--plan", plan(kTwoGroups), "P/Bringup"});
         EXPECT_FALSE(fs::exists(kPlanFile));

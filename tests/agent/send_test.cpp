@@ -41,7 +41,7 @@ TEST_F(Send, PrintsALineForEachReply)
 
 TEST_F(Send, HandsAllCommandsToOneProcess)
 {
-    // the module answers one ping in the life of a process
+    // the library answers one ping in the life of a process
     EXPECT_EQ(run_fptest({"send", "pingtest", "pingtest"}).out, "Ping Success!\n\n");
     EXPECT_EQ(run_fptest({"send", "pingtest"}).out, "Ping Success!\n");
 }
@@ -223,7 +223,7 @@ TEST_F(Send, SaysThatTheModulesProcessEnded)
     EXPECT_EQ(ended.status, 3);
     EXPECT_EQ(ended.out, "");
     EXPECT_EQ(lines_of(ended.err).back(),
-              "fptest: the module's process ended by signal 9; --log FILE keeps what it says");
+              "fptest: the library's process ended by signal 9; --log FILE keeps what it says");
 }
 
 TEST_F(Send, SaysThatRepliesCannotBeWritten)

@@ -119,7 +119,7 @@ TEST(Clean, ReplacesEveryByteThatIsNoUtf8)
     }
 }
 
-TEST(Clean, ReplacesACharacterThatBreaksOffAndGoesOnBehindIt)
+TEST(Clean, ReplacesACharacterThatBreaksOffAndGoesOnAfterIt)
 {
     EXPECT_EQ(clean("a\xC3"), "a\uFFFD");
     EXPECT_EQ(clean("a\xE6\x97"), "a\uFFFD\uFFFD");

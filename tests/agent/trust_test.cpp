@@ -142,12 +142,13 @@ TEST_F(Trust, RunsNoGathererWhosePortAnItemHasTaken)
         {"SensorProbe", "--group G --seconds 0"}};
     Ended ended = run(items);
     EXPECT_EQ(ended.status, 3);
-    EXPECT_EQ(lines_of(ended.err).back(),
-              "fptest: port 34952 cannot be had: Address already in use; the gatherer's run would "
-              "never end: stop what listens there (netstat -ltnp names it)");
+    EXPECT_EQ(
+        lines_of(ended.err).back(),
+        "fptest: port 34952 is not available: Address already in use; the gatherer's run would "
+        "never end: stop what listens there (netstat -ltnp names it)");
     EXPECT_THAT(outcomes(), ElementsAre("Script: passed", "SensorProbe: not run"));
 
-    // where the module comes to it without being asked first
+    // where the library comes to it without being asked first
     ended = run(items, {"--as-group", "--timeout", "0.5", "--grace", "0.2"});
     EXPECT_EQ(ended.status, 1);
     EXPECT_THAT(outcomes(), ElementsAre("Script: passed", "SensorProbe: timed out"));

@@ -202,7 +202,7 @@ TEST_F(LiveView, IsPlainWhereALineHasNoRoomForAResult)
     }
 }
 
-TEST_F(LiveView, LeavesNothingBehindOnATerminalThatBecomesVeryNarrow)
+TEST_F(LiveView, LeavesNothingAfterOnATerminalThatBecomesVeryNarrow)
 {
     use_plan(kTwoItems);
     TerminalSession session(run({"P/Bringup"}), 80, 24);

@@ -106,7 +106,7 @@ TEST(Match, IsRefusedWhereTheFloorLogsSomethingElse)
     EXPECT_THAT([&] { bench::Match(words, 1); },
                 ThrowsMessage<std::runtime_error>(
                     StrEq("words: log line 1 is 'said it', its floor's is 'said nothing'; make the "
-                          "floor log what the module logs")));
+                          "floor log what the library logs")));
 }
 
 TEST(Match, IsRefusedWhereTheFloorLogsLess)
@@ -116,7 +116,7 @@ TEST(Match, IsRefusedWhereTheFloorLogsLess)
     EXPECT_THAT([&] { bench::Match(words, 1); },
                 ThrowsMessage<std::runtime_error>(
                     StrEq("words: log line 1 is 'said it', its floor's is '(none)'; make the floor "
-                          "log what the module logs")));
+                          "log what the library logs")));
 }
 
 TEST(Match, IsRefusedWhereTheFloorLeavesOutWhatTheModuleHasDone)

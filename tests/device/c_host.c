@@ -3,7 +3,7 @@
  * SPDX-License-Identifier: Apache-2.0
  */
 
-/* A host agent in C: pings the module twice and says what it got. */
+/* A host agent in C: pings the library twice and says what it got. */
 #include "quillmark.h"
 
 #include <stdio.h>

@@ -978,7 +978,7 @@ class FailingGatherer : public Fault
         kill(host.pid(), SIGCONT);
     }
 
-    // The lines since the last call that stand behind the presence check's.
+    // The lines since the last call that stand after the presence check's.
     static Lines trigger_lines()
     {
         const Lines lines = log_lines();

@@ -171,7 +171,7 @@ TEST_F(Gatherer, IsAwaitedOnEveryLocalAddressForAsLongAsItTakes)
     EXPECT_TRUE(returned);
 }
 
-TEST_F(Gatherer, ItemsBehindItInAGroupRunOnceItIsTriggered)
+TEST_F(Gatherer, ItemsAfterItInAGroupRunOnceItIsTriggered)
 {
     store_plan();
     run_path("P/G");

@@ -142,7 +142,7 @@ TEST_F(Sandbox, ATreeMayLieInAnyDirectory)
 
 // ---- the gatherer's own port ------------------------------------------------
 
-// Every connection is made from the module's port, so that it finds itself.
+// Every connection is made from the library's port, so that it finds itself.
 TEST_F(Sandbox, AGathererConnectedToItselfDoesNotHoldTheModulesPort)
 {
     const std::string gatherer = quoted(build / "device/bin/SensorProbe");

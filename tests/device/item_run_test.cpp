@@ -2,7 +2,7 @@
 // SPDX-License-Identifier: Apache-2.0
 
 // Items run through the real shell: what is started, in which order, under
-// which name, and what the module says of it.
+// which name, and what the library says of it.
 #include "device_test.h"
 
 #include <chrono>
@@ -220,7 +220,7 @@ TEST_F(ItemRun, VendorTwoAppendsItsSuffix)
     EXPECT_THAT(log_lines(), ::testing::Contains("SingleItemExecute| tLine:Note_ca_qsee"));
 }
 
-TEST_F(ItemRun, VendorMayHaveABlankBeforeAndLettersBehind)
+TEST_F(ItemRun, VendorMayHaveABlankBeforeAndLettersAfter)
 {
     store(plan_of({{"G", {{"Note", "x"}}}}));
     for (const char *text : {" 1", "1abc"}) {

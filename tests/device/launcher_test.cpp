@@ -52,7 +52,7 @@ INSTANTIATE_TEST_SUITE_P(
     Launcher, BadCommandLine,
     testing::Values(
         BadLine{"NoCommand", {}, "no COMMAND given; see device/run --help"},
-        BadLine{"NothingBehindTheDashes",
+        BadLine{"NothingAfterTheDashes",
                 {"--vendor", "1", "--"},
                 "no COMMAND given; see device/run --help"},
         BadLine{"UnknownOption",
@@ -575,7 +575,7 @@ TEST_F(NamespaceDevice, ProcessNineIsNobody)
     EXPECT_EQ(outcome.out, "");
     EXPECT_EQ(outcome.status, 1);
     EXPECT_NE(outcome.err.find("kill: 9: No such process"), std::string::npos) << outcome.err;
-    // the first process that COMMAND starts is behind it
+    // the first process that COMMAND starts is after it
     EXPECT_GT(std::stoi(shell("sh -c 'echo $$'; :").out), 9);
 }
 

@@ -31,7 +31,7 @@ class SampleItems : public Device
     {
         return shell(script, {"--data", kept.path()});
     }
-    // What the plan says of an item: the attributes behind its name.
+    // What the plan says of an item: the attributes after its name.
     std::string report(const std::string &item) const
     {
         const std::string plan = content(kept.path() / "src1.xml");
@@ -48,7 +48,7 @@ class SampleItems : public Device
         }
         return attributes;
     }
-    // The progress and the result of every report, in order, from the module's log.
+    // The progress and the result of every report, in order, from the library's log.
     static Words reports(const Outcome &outcome)
     {
         static const std::regex line("iResult=(-?[0-9]+) - iProgress=([0-9]+) - iDesc=.+");
@@ -190,7 +190,7 @@ TEST_F(SampleItems, SayInOneLineWhatIsWrongWithTheirOptions)
     }
 }
 
-// Listens once on the module's port and says that.
+// Listens once on the library's port and says that.
 std::string say(const std::string &text)
 {
     return "printf '" + text + "' | timeout 5 netcat -l -p 34952 >/dev/null; ";

@@ -210,7 +210,7 @@ TEST_F(Suspension, EveryCallLeavesItsStreamAndItsChildren)
 
 TEST_F(Suspension, StandardKillTakesTheNineForAProcess)
 {
-    // the same text that the module runs, with a process that is there in the
+    // the same text that the library runs, with a process that is there in the
     // place of the nobody that process 9 is
     EXPECT_NE(kill(9, 0), 0) << "process 9 must be nobody on the device";
     const pid_t victim = start_program({"/system/bin/ab", "--sleep", "60"});

@@ -5,7 +5,7 @@
 //   --sleep SECONDS   stays that long before it ends
 //   --vendor TEXT     writes the vendor selector
 //   --report GROUP ITEM PROGRESS RESULT DESCRIPTION
-//                     reports through the module
+//                     reports through the library
 // Every other argument is only noted.
 #include "quillmark.h"
 

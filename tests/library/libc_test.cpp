@@ -1,7 +1,7 @@
 // SPDX-FileCopyrightText: 2026 The Quillmark authors
 // SPDX-License-Identifier: Apache-2.0
 
-// What the module takes for granted of a C library: what Android's, musl and
+// What the library takes for granted of a C library: what Android's, musl and
 // glibc share.
 #include "outside.h"
 

@@ -22,10 +22,10 @@ namespace
 class CommandEntry : public ModuleTest
 {
   protected:
-    static constexpr std::size_t kBehind = 8; // bytes that nobody may touch
+    static constexpr std::size_t kAfter = 8; // bytes that nobody may touch
 
     // What a command leaves in a reply buffer of that length, which was full of
-    // 'x', and in the bytes behind it.
+    // 'x', and in the bytes after it.
     static std::string reply_to(const std::string &command, int length)
     {
         std::string buffer = untouched(length);
@@ -34,12 +34,12 @@ class CommandEntry : public ModuleTest
     }
     static std::string untouched(int length)
     {
-        return std::string(static_cast<std::size_t>(length) + kBehind, 'x');
+        return std::string(static_cast<std::size_t>(length) + kAfter, 'x');
     }
     static std::string filled(std::string text, int length)
     {
         text.resize(static_cast<std::size_t>(length), '\0');
-        return text + std::string(kBehind, 'x');
+        return text + std::string(kAfter, 'x');
     }
 
     // A whole buffer after ExtractString with that length.
@@ -381,7 +381,7 @@ TEST_F(CommandEntry, PingReplyIsCutToTheBufferAndZeroFilled)
     }
 }
 
-TEST_F(CommandEntry, HeadThatGoesOnBehindPingtestIsAPing)
+TEST_F(CommandEntry, HeadThatGoesOnAfterPingtestIsAPing)
 {
     EXPECT_EQ(reply_to("pingtest2 and more", 16), filled("Ping Success!", 16));
     EXPECT_EQ(events(), joined({parsed("pingtest2 and more"), {kPing}}));
@@ -460,7 +460,7 @@ TEST_F(CommandEntry, StoringWithoutAnOldPlanCreatesTheFile)
     EXPECT_EQ(platform::plan_text(), "<P/>");
 }
 
-TEST_F(CommandEntry, HeadThatGoesOnBehindXMLFileStores)
+TEST_F(CommandEntry, HeadThatGoesOnAfterXMLFileStores)
 {
     reply_to("XMLFiles and more::<P/>", 16);
     EXPECT_EQ(events(), joined({parsed("XMLFiles and more", "<P/>"), stored("<P/>", 1, -1)}));
@@ -520,7 +520,7 @@ TEST_F(CommandEntry, PlanIsCutAtItsFirstColon)
     EXPECT_EQ(platform::plan_text(), "<P>a");
 }
 
-TEST_F(CommandEntry, TextBehindThePlansFirstColonIsTheArgumentField)
+TEST_F(CommandEntry, TextAfterThePlansFirstColonIsTheArgumentField)
 {
     FPTEST_RunTestCmd("XMLFile::<P>a:b::c:d</P>", nullptr, 0);
     EXPECT_EQ(events(), joined({parsed("XMLFile", "<P>a", "b"), stored("<P>a", 1, -1)}));
@@ -698,7 +698,7 @@ TEST_F(CommandEntry, RunNeedsNoReplyBuffer)
     EXPECT_EQ(runs, 1);
 }
 
-TEST_F(CommandEntry, HeadThatGoesOnBehindXMLNodePathRuns)
+TEST_F(CommandEntry, HeadThatGoesOnAfterXMLNodePathRuns)
 {
     EXPECT_EQ(reply_to("XMLNodePaths and more::r", 16), filled("", 16));
     EXPECT_EQ(events(),

@@ -534,7 +534,7 @@ TEST_F(Item, StatusOfTheProgramIsIgnored)
     }
 }
 
-TEST_F(Item, EmptyArgumentsLeaveOneBlankBehindTheProgram)
+TEST_F(Item, EmptyArgumentsLeaveOneBlankAfterTheProgram)
 {
     EXPECT_THAT(run_item("x", ""),
                 ElementsAreArray(joined({begun(), looked_up("x"), read("x", ""), absent(),

@@ -1,7 +1,7 @@
 // SPDX-FileCopyrightText: 2026 The Quillmark authors
 // SPDX-License-Identifier: Apache-2.0
 
-// The module's unit itself, so that what it keeps to itself can be reached.
+// The library's unit itself, so that what it keeps to itself can be reached.
 #include "../../src/quillmark.cpp"
 
 #include "module.h"

@@ -1,7 +1,7 @@
 // SPDX-FileCopyrightText: 2026 The Quillmark authors
 // SPDX-License-Identifier: Apache-2.0
 
-// The module's internal functions and variables, for the tests of what no
+// The library's internal functions and variables, for the tests of what no
 // exported function can show alone.
 #pragma once
 

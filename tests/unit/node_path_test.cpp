@@ -55,7 +55,7 @@ class NodePath : public ModuleTest
     {
         return sequences::failed_load("-1", "(2),No such file or directory");
     }
-    // A lookup's lines; the plan is loaded behind the first of them.
+    // A lookup's lines; the plan is loaded after the first of them.
     static Lines asked_length(const Lines &loading, const std::string &outcome)
     {
         return joined({{"get_node_length| Enter node length calculate!\n",
@@ -248,7 +248,7 @@ TEST_F(NodePath, LastComponentIsLoggedUpToItsFirstTabOrLineFeed)
     }
 }
 
-TEST_F(NodePath, ShorterLastComponentBehindALongerOneIsLoggedAlone)
+TEST_F(NodePath, ShorterLastComponentAfterALongerOneIsLoggedAlone)
 {
     std::string last;
     EXPECT_EQ(level_of("a long root/a longer group/b", last), 3);
@@ -517,7 +517,7 @@ TEST_F(NodePath, ItemOfAPlanThatCannotBeLoadedStillGetsARunThatFails)
                       asked_index(not_loaded(), kCouldNotLoad), run_failed(no_tree())}));
 }
 
-TEST_F(NodePath, PositionOfAnItemBehindACommentIsUsedAsItIs)
+TEST_F(NodePath, PositionOfAnItemAfterACommentIsUsedAsItIs)
 {
     platform::write_plan("<P><CmdGroup name='g'><!-- first --><Cmd name='a' args='1'/>"
                          "<Cmd name='b' args='2'/></CmdGroup></P>");

@@ -311,7 +311,7 @@ TEST_F(PlanStore, WordOfAnyOneVisibleCharacterIsANode)
 }
 
 // A tree in which Mini-XML has left out what it had no memory for. The library
-// makes none on request; a node of a kind that the module does not load is as
+// makes none on request; a node of a kind that the library does not load is as
 // nameless to it.
 TEST_F(PlanStore, PlanThatIsNotWholeIsAsOneThatDoesNotParse)
 {
@@ -603,7 +603,7 @@ TEST_F(PlanStore, GroupInsideAGroupIsOneOfItsNodesAndAGroupItself)
     EXPECT_EQ(length_of("i"), 2);
     EXPECT_EQ(index_of("g", "c"), 1);
     EXPECT_EQ(index_of("g", "d"), 2);
-    EXPECT_EQ(index_of("i", "d"), 2); // behind it, in the outer group
+    EXPECT_EQ(index_of("i", "d"), 2); // after it, in the outer group
     EXPECT_EQ(item_at("g", 1), "i");
     EXPECT_EQ(item_at("g", 2), "d");
     EXPECT_EQ(item_at("i", 1), "c");
@@ -681,7 +681,7 @@ TEST_F(PlanStore, GroupWithoutAnItemYieldsThoseOfTheNext)
     EXPECT_EQ(item_at("empty", 3), "nothing");
 }
 
-TEST_F(PlanStore, GroupWithNoItemBehindItYieldsNothing)
+TEST_F(PlanStore, GroupWithNoItemAfterItYieldsNothing)
 {
     load("<P><CmdGroup name='g'><Cmd name='a'/></CmdGroup>"
          "<CmdGroup name='h'><Other name='o'/></CmdGroup></P>");

@@ -1,7 +1,7 @@
 // SPDX-FileCopyrightText: 2026 The Quillmark authors
 // SPDX-License-Identifier: Apache-2.0
 
-// Recording doubles for everything that the module calls outside itself: the
+// Recording doubles for everything that the library calls outside itself: the
 // platform, whose calls are redirected here at link time, and the maker's
 // interfaces. Files are real ones in a directory of the test's own; nothing is
 // started, signalled, listened on or slept for.
@@ -55,7 +55,7 @@ void set_vendor(const std::string &text);
 
 // Called inside each system() call, with its command.
 void on_system(std::function<void(const std::string &)> hook);
-// Called with each tree that Mini-XML has loaded, before the module sees it.
+// Called with each tree that Mini-XML has loaded, before the library sees it.
 void on_load(std::function<void(mxml_node_t *)> hook);
 // Called inside each log call, with its event.
 void on_log(std::function<void(const std::string &)> hook);
@@ -64,7 +64,7 @@ void on_log(std::function<void(const std::string &)> hook);
 void free_descriptor_zero();
 
 // Calls that return twice or never: runs the body until it returns or until
-// the module calls _exit.
+// the library calls _exit.
 void run_child(const std::function<void()> &body);
 
 // What has happened since the last call of this function, in order. Log lines
@@ -78,7 +78,7 @@ std::vector<std::string> events();
 std::vector<std::string> log_lines();
 std::vector<std::string> calls();
 
-// What the module has opened and not closed, by the names above; popen's
+// What the library has opened and not closed, by the names above; popen's
 // streams are stream#1 and so on.
 std::vector<std::string> left_open();
 

@@ -28,7 +28,7 @@ namespace
 {
 
 constexpr char kGuard = '\x7e';
-constexpr std::size_t kBehind = 64;
+constexpr std::size_t kAfter = 64;
 
 // Standard output's descriptor is free meanwhile.
 class FreedOutput
@@ -65,10 +65,10 @@ class ReadBack : public ModuleTest
         return text;
     }
 
-    // The buffer after a read-back, with what is behind its capacity.
+    // The buffer after a read-back, with what is after its capacity.
     static std::string read_back(int capacity)
     {
-        std::string buffer(static_cast<std::size_t>(capacity) + kBehind, kGuard);
+        std::string buffer(static_cast<std::size_t>(capacity) + kAfter, kGuard);
         FPTEST_ExtractResultMsg(buffer.data(), capacity);
         return buffer;
     }
@@ -76,7 +76,7 @@ class ReadBack : public ModuleTest
     static std::string filled(int capacity, const std::string &text)
     {
         return text +
-               std::string(static_cast<std::size_t>(capacity) + kBehind - text.size(), kGuard);
+               std::string(static_cast<std::size_t>(capacity) + kAfter - text.size(), kGuard);
     }
 
     static Lines line(const std::string &text)
@@ -144,7 +144,7 @@ class ReadBackAssertion : public ReadBack
     }
 };
 
-TEST_F(ReadBack, FileShorterThanTheBufferIsReadWholeWithNothingBehindIt)
+TEST_F(ReadBack, FileShorterThanTheBufferIsReadWholeWithNothingAfterIt)
 {
     write_plan(bytes(300));
     EXPECT_EQ(read_back(1000), filled(1000, bytes(300)));
@@ -169,7 +169,7 @@ TEST_F(ReadBack, NoCapacityReadsNothing)
     EXPECT_THAT(events(), ElementsAreArray(joined({begun(300), ended(0, 0)})));
 }
 
-TEST_F(ReadBack, FileOfTheBuffersSizeFillsItWithNoZeroBehind)
+TEST_F(ReadBack, FileOfTheBuffersSizeFillsItWithNoZeroAfter)
 {
     write_plan(bytes(300));
     EXPECT_EQ(read_back(300), filled(300, bytes(300)));
@@ -203,7 +203,7 @@ TEST_F(ReadBack, LargeFileIsReadWhole)
                               {begun(200000), piece(300000, 200000), ended(100000, 200000)})));
 }
 
-TEST_F(ReadBack, EachPieceLandsBehindTheLastAndIsLogged)
+TEST_F(ReadBack, EachPieceLandsAfterTheLastAndIsLogged)
 {
     write_plan(bytes(300));
     plan_steps("read", {limit(1), limit(150), limit(100)});
@@ -361,10 +361,10 @@ TEST_F(ReadBack, NegativeCapacityReadsAnEmptyFileAsAnyOther)
         SCOPED_TRACE(capacity);
         platform::reset();
         write_plan("");
-        std::string buffer(kBehind, kGuard);
+        std::string buffer(kAfter, kGuard);
         FPTEST_ExtractResultMsg(buffer.data(), capacity);
 
-        EXPECT_EQ(buffer, std::string(kBehind, kGuard));
+        EXPECT_EQ(buffer, std::string(kAfter, kGuard));
         auto lines = joined({begun(0), ended(0, 0)});
         std::erase_if(lines, [](const auto &event) { return event.starts_with("read("); });
         auto seen = events();

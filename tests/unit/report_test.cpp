@@ -27,8 +27,8 @@ const std::string kReason = "(" + std::to_string(EACCES) + "),Permission denied"
 class Report : public ModuleTest
 {
   protected:
-    // A plan as the module saves it: items "a" and "b" in the group "first", "b"
-    // and "c" in the group "second", with what stands behind the names of a, of
+    // A plan as the library saves it: items "a" and "b" in the group "first", "b"
+    // and "c" in the group "second", with what stands after the names of a, of
     // the first b, and of c.
     static std::string plan(const std::string &a = "", const std::string &b = "",
                             const std::string &c = "")
@@ -165,7 +165,7 @@ TEST_F(Report, LaterReportUsesThePlanInMemory)
     EXPECT_EQ(plan_text(), plan("", " progress=\"-1\" result=\"1\" description=\"bad\""));
 }
 
-TEST_F(Report, EachValueIsSetBehindItsOwnLineAndBeforeTheNext)
+TEST_F(Report, EachValueIsSetAfterItsOwnLineAndBeforeTheNext)
 {
     load_plan(plan(" progress=\"1\" result=\"1\" description=\"old\""));
     Lines seen;
@@ -376,12 +376,12 @@ TEST_F(Report, ItemOfTheGroupItselfComesBeforeItsNamesakes)
 TEST_F(Report, FirstOfSameNamedGroupsAndItemsIsUpdated)
 {
     const std::string before = "<?xml version=\"1.0\"?>\n<P>\n\t<CmdGroup name=\"first\">\n";
-    const std::string behind = "\t\t<Cmd name=\"a\" />\n</CmdGroup>\n\t<CmdGroup name=\"first\">\n"
-                               "\t\t<Cmd name=\"a\" />\n</CmdGroup>\n</P>\n";
-    load_plan(before + item("a", "") + behind);
+    const std::string after = "\t\t<Cmd name=\"a\" />\n</CmdGroup>\n\t<CmdGroup name=\"first\">\n"
+                              "\t\t<Cmd name=\"a\" />\n</CmdGroup>\n</P>\n";
+    load_plan(before + item("a", "") + after);
     report(5, 0, "d");
     EXPECT_EQ(plan_text(),
-              before + item("a", " progress=\"5\" result=\"0\" description=\"d\"") + behind);
+              before + item("a", " progress=\"5\" result=\"0\" description=\"d\"") + after);
 }
 
 TEST_F(Report, ItemBelowANestedElementIsFound)

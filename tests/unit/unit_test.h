@@ -39,7 +39,7 @@ inline std::string every_character_but(const std::string &these)
     return text;
 }
 
-// The module as at load time, on a platform without a test plan.
+// The library as at load time, on a platform without a test plan.
 class ModuleTest : public ::testing::Test
 {
   protected:

@@ -13,7 +13,7 @@
 #include <stdio.h>
 #include <string.h>
 
-/* The first element of that name among a node and the siblings behind it. */
+/* The first element of that name among a node and the siblings after it. */
 static mxml_node_t *find_sibling(mxml_node_t *node, const char *name, size_t length)
 {
     for (; node != nullptr; node = mxmlGetNextSibling(node)) {

@@ -48,7 +48,7 @@ static void open_log(void)
 }
 
 /* Writes the text as one line: a line feed is added where the text lacks it.
-   The array has room for it behind the text. */
+   The array has room for it after the text. */
 static void write_line(char *text, size_t length)
 {
     if (length == 0 || text[length - 1] != '\n') {
