@@ -100,6 +100,9 @@ constexpr int kStartWords = 4;
     }
     const pid_t start = fork();
     if (start == 0) {
+        for (const int number : signals) {
+            std::signal(number, SIG_IGN); // mksh unblocks them
+        }
         execv(words[0], words);
         fail(words[0]);
     }
