@@ -138,15 +138,18 @@ lay_out_container()
 # Waits for the supervisor, which is asked by every signal that comes here.
 wait_for_command()
 {
-	local pid=$1 signal status asked=''
+	local pid=$1 signal status=0 gate
 
 	for signal in ${signals//,/ }; do
 		# shellcheck disable=SC2064
-		trap "asked=yes; kill -$signal $pid 2>/dev/null" "$signal"
+		trap "kill -$signal $pid 2>/dev/null" "$signal"
 	done
-	while wait "$pid"; status=$?; [[ -n $asked ]]; do
-		asked=''
+	# not by wait alone: interrupted again and again, it may lose the status
+	exec {gate}<> <(:)
+	while kill -0 "$pid" 2>/dev/null; do
+		read -r -t 0.05 -u "$gate" || true
 	done
+	wait "$pid" || status=$?
 	exit "$status"
 }
 

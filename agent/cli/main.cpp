@@ -65,7 +65,7 @@ constexpr char kReportExamples[] =
     "      --description 'chip answers at 8 MHz'";
 
 constexpr char kSendExamples[] =
-    "Prints one line a command: the reply, empty where there is none. What the library\n"
+    "Prints one line a command: the reply, empty if there is none. What the library\n"
     "and the items print goes to standard error.\n"
     "\n"
     "Examples:\n"

@@ -604,25 +604,25 @@ TEST(CheckedValue, IsNotMissedWhereAQuoteIs)
 {
     EXPECT_EQ(
         stored("<P a=\"b c=\"d\">"),
-        "p.xml:1:12: error: not well-formed, invalid token: the library would not load it; mend it "
+        "p.xml:1:12: error: not well-formed, invalid token: the library would not load it; fix it "
         "here\n"
         "<P a=\"b c=\"d\">\n"
         "           ^\n");
     EXPECT_EQ(
         stored(plan_of(group("A", "<Cmd name=\"x\" args=\"\"\"/>"))),
-        "p.xml:1:44: error: not well-formed, invalid token: the library would not load it; mend it "
+        "p.xml:1:44: error: not well-formed, invalid token: the library would not load it; fix it "
         "here\n"
         "<P><CmdGroup name=\"A\"><Cmd name=\"x\" args=\"\"\"/></CmdGroup></P>\n"
         "                                           ^\n");
     EXPECT_EQ(
         stored("<P a\"/>"),
-        "p.xml:1:5: error: not well-formed, invalid token: the library would not load it; mend it "
+        "p.xml:1:5: error: not well-formed, invalid token: the library would not load it; fix it "
         "here\n"
         "<P a\"/>\n"
         "    ^\n");
     EXPECT_EQ(
         stored("<P 1/>"),
-        "p.xml:1:4: error: not well-formed, invalid token: the library would not load it; mend it "
+        "p.xml:1:4: error: not well-formed, invalid token: the library would not load it; fix it "
         "here\n"
         "<P 1/>\n"
         "   ^\n");

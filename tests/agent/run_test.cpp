@@ -1618,7 +1618,7 @@ TEST_F(Refusal, OfAPlanWithErrorsSaysWhichAndForceRunsIt)
     EXPECT_EQ(ended.out, "");
     EXPECT_THAT(ended.err, StartsWith(path + ":1:"));
     EXPECT_THAT(ended.err, HasSubstr(": error: "));
-    EXPECT_THAT(ended.err, EndsWith("\nfptest: nothing was run, because the plan has errors; mend "
+    EXPECT_THAT(ended.err, EndsWith("\nfptest: nothing was run, because the plan has errors; fix "
                                     "them, or run it as it is with --force\n"));
     const std::string findings = ended.err.substr(0, ended.err.rfind("fptest: "));
     EXPECT_THAT(run_fptest({"check", path}).out, StartsWith(findings));

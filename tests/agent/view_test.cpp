@@ -379,5 +379,5 @@ TEST_F(LiveView, CtrlCTwiceLeavesAtOnce)
     EXPECT_THAT(session.text(), HasSubstr("Ctrl-C again leaves at once"));
     session.type("\x03");
     EXPECT_EQ(session.wait_for_end(2), 130);
-    EXPECT_THAT(session.text(), HasSubstr("fptest: left at once"));
+    EXPECT_THAT(session.text(), HasSubstr("fptest: interrupted again"));
 }

@@ -126,7 +126,7 @@ TEST(Match, IsRefusedWhereTheFloorLeavesOutWhatTheModuleHasDone)
     EXPECT_THAT([&] { bench::Match(words, 1); },
                 ThrowsMessage<std::runtime_error>(
                     StrEq("words: the floor leaves something else behind; make it do what the "
-                          "module does")));
+                          "library does")));
 }
 
 TEST(Round, HasTheSidesBeginByTurns)
