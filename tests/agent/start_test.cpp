@@ -9,6 +9,7 @@
 #include <chrono>
 #include <csignal>
 #include <fcntl.h>
+#include <nlohmann/json.hpp>
 #include <pty.h>
 #include <string>
 #include <sys/file.h>
@@ -66,7 +67,7 @@ class Started : public FptestTest
 
 TEST_F(Started, SignalToItsGroupEndsTheRunAndNotTheModulesProcess)
 {
-    for (int turn = 0; turn < 60; ++turn) {
+    for (std::size_t turn = 0; turn < 60; ++turn) {
         const int signal = std::array{SIGINT, SIGTERM, SIGHUP}.at(turn % 3);
         FptestProcess fptest(start_of_run(plan(kOneSleeps)));
         ASSERT_TRUE(has_child(fptest.pid()));

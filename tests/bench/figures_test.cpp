@@ -23,7 +23,6 @@ namespace
 using bench::Curve;
 using bench::Point;
 using bench::Result;
-using ::testing::HasSubstr;
 
 std::vector<Point> power(double factor, double exponent)
 {

@@ -323,8 +323,9 @@ TEST_F(HostsTmp, HidesFilesAsIsSaidToWhoNamesThem)
 {
     const TemporaryDirectory own("/tmp");
     const TemporaryDirectory other("/tmp");
-    std::ofstream(own.path() / "plan.xml");
-    std::ofstream(other.path() / "plan.xml");
+    for (const auto &directory : {own.path(), other.path()}) {
+        const std::ofstream file(directory / "plan.xml");
+    }
     const auto err = [&](const std::string &word, const fs::path &directory) {
         return on_device({"true", word}, {}, {.directory = directory}).err;
     };

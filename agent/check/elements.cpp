@@ -1,0 +1,62 @@
+// SPDX-FileCopyrightText: 2026 The Quillmark authors
+// SPDX-License-Identifier: Apache-2.0
+
+#include "check/elements.h"
+
+#include "check/findings.h"
+#include "util/text.h"
+
+namespace fptest
+{
+
+namespace
+{
+
+constexpr std::size_t kShownPath = 80; // columns
+
+} // namespace
+
+std::string path_of(const std::string &group)
+{
+    return "'" + cut(one_line("root/" + group), kShownPath) + "'";
+}
+
+std::string path_of(const std::string &group, const std::string &item)
+{
+    return path_of(group + "/" + item);
+}
+
+std::string names_of(const Resolution &resolution)
+{
+    std::string first;
+    std::size_t count = 0;
+    for (const auto &element : resolution) {
+        if (element && ++count == 1) {
+            first = in_quotes(element->name.value());
+        }
+    }
+    return count == 0   ? "nothing"
+           : count == 1 ? first
+                        : first + " and " + std::to_string(count - 1) + " more";
+}
+
+std::string path_damage(std::string_view name)
+{
+    constexpr std::array<std::pair<char, const char *>, 4> kDamages = {
+        std::pair{'/', "is split at '/'"}, std::pair{':', "is cut at ':'"},
+        std::pair{'\t', "is cut at a tab"}, std::pair{'\n', "is cut at a line feed"}};
+    std::vector<std::string> damages;
+    for (const auto &[character, damage] : kDamages) {
+        if (name.find(character) != name.npos) {
+            damages.emplace_back(damage);
+        }
+    }
+    return listing(damages);
+}
+
+bool is_addressable(std::string_view name)
+{
+    return !name.empty() && name.size() <= kNameLimit && path_damage(name).empty();
+}
+
+} // namespace fptest

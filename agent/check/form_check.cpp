@@ -1,0 +1,320 @@
+// SPDX-FileCopyrightText: 2026 The Quillmark authors
+// SPDX-License-Identifier: Apache-2.0
+
+#include "check/checks.h"
+#include "check/wellformed.h"
+#include "plan/markup.h"
+#include "util/text.h"
+
+#include <algorithm>
+#include <cctype>
+#include <expat.h>
+#include <string_view>
+#include <utility>
+#include <vector>
+
+namespace fptest
+{
+
+namespace
+{
+
+constexpr std::size_t kNone = std::string::npos;
+constexpr std::size_t kShownName = 63; // columns
+
+bool is_name(std::string_view name)
+{
+    const auto first = static_cast<unsigned char>(name.front());
+    return (std::isalpha(first) != 0 || first == '_' || first >= 0x80) &&
+           std::ranges::all_of(name, [](unsigned char c) {
+               return std::isalnum(c) != 0 || c == '_' || c == '-' || c == '.' || c >= 0x80;
+           });
+}
+
+// The name of the innermost element that is open there; empty where none is.
+std::string open_at(const std::vector<Tag> &tags, std::size_t offset)
+{
+    std::vector<const std::string *> open;
+    for (const Tag &tag : tags) {
+        if (tag.end > offset || !tag.complete) {
+            break;
+        }
+        if (tag.kind == Tag::Kind::open) {
+            open.push_back(&tag.name);
+        } else if (tag.kind == Tag::Kind::close && !open.empty()) {
+            open.pop_back();
+        }
+    }
+    return open.empty() ? "" : cut(one_line(*open.back()), kShownName);
+}
+
+// Loads the text, after saying what of its form is wrong.
+class FormChecker
+{
+  public:
+    // stored: what of the text the library would get.
+    FormChecker(const std::string &text, const std::string &stored, Findings &findings)
+        : text_(text), stored_(stored), tags_(scan(text)), findings_(findings)
+    {
+    }
+
+    // Nothing where there is no use in looking at what the plan says.
+    std::optional<Plan> check()
+    {
+        give_values();
+        if (const std::optional<Flaw> flaw = find_flaw(repaired_)) {
+            report_values(original(flaw->offset));
+            report(*flaw);
+            return std::nullopt;
+        }
+        report_values(text_.size());
+        report_encoding();
+        const bool endless = report_endless_comments();
+        std::string why;
+        std::optional<Plan> plan = Plan::load(repaired_, &why);
+        if (!plan && !endless) {
+            report_refusal(why);
+        }
+        return plan;
+    }
+
+  private:
+    // The rest can be looked at only once every attribute has a value.
+    void give_values()
+    {
+        std::size_t done = 0;
+        for (const Tag &tag : tags_) {
+            for (const Attribute &attribute : tag.attributes) {
+                if (!attribute.has_value && is_name(attribute.name)) {
+                    repaired_.append(text_, done, attribute.end - done);
+                    done = attribute.end;
+                    repaired_ += kValue;
+                    given_.push_back(&attribute);
+                }
+            }
+        }
+        repaired_.append(text_, done);
+    }
+
+    // The place in the text itself.
+    [[nodiscard]] std::size_t original(std::size_t offset) const
+    {
+        for (const Attribute *attribute : given_) {
+            if (offset <= attribute->end) {
+                break;
+            }
+            offset -= std::min(kValue.size(), offset - attribute->end);
+        }
+        return offset;
+    }
+
+    void report_values(std::size_t up_to)
+    {
+        for (const Attribute *attribute : given_) {
+            if (attribute->begin < up_to) {
+                findings_.error(attribute->begin,
+                                "attribute " + in_quotes(attribute->name) +
+                                    " has no value: the library would not load the plan; write " +
+                                    cut(one_line(attribute->name), kShownName) +
+                                    "=\"\" or leave it out");
+            }
+        }
+    }
+
+    void report(const Flaw &flaw)
+    {
+        const std::size_t offset = place_of(flaw);
+        if (flaw.error == XML_ERROR_ABORTED) {
+            findings_.error(offset,
+                            std::string("an entity is declared here: the library would not ") +
+                                (Plan::load(stored_) ? "know it" : "load the plan") +
+                                "; write its text where it is used");
+            return;
+        }
+        findings_.error(offset, "not well-formed, " + reason(flaw.error, offset) +
+                                    ": the library would " +
+                                    (Plan::load(stored_) ? "load it all the same, and run what it "
+                                                           "took from it"
+                                                         : "not load it") +
+                                    advice(flaw.error, offset));
+    }
+
+    // Where a person looks for it: the parser names the tag for an entity in it,
+    // and the end of the text for what lacks its own.
+    [[nodiscard]] std::size_t place_of(const Flaw &flaw) const
+    {
+        const std::size_t last = text_.find_last_not_of(" \t\r\n");
+        const std::size_t offset = std::min(original(flaw.offset), last == kNone ? 0 : last + 1);
+        if (flaw.error == XML_ERROR_UNDEFINED_ENTITY) {
+            return undefined_entity(offset);
+        }
+        if (flaw.error == XML_ERROR_UNCLOSED_CDATA_SECTION && !tags_.empty()) {
+            return tags_.back().begin;
+        }
+        return offset;
+    }
+
+    [[nodiscard]] std::size_t undefined_entity(std::size_t begin) const
+    {
+        constexpr std::array<std::string_view, 6> kKnown = {"&lt;",   "&gt;",   "&amp;",
+                                                            "&quot;", "&apos;", "&#"};
+        for (std::size_t at = text_.find('&', begin); at != kNone; at = text_.find('&', at + 1)) {
+            const std::string_view entity = std::string_view(text_).substr(at);
+            if (std::ranges::none_of(kKnown, [entity](std::string_view known) {
+                    return entity.starts_with(known);
+                })) {
+                return at;
+            }
+        }
+        return begin;
+    }
+
+    [[nodiscard]] std::string reason(XML_Error error, std::size_t offset) const
+    {
+        if (error == XML_ERROR_INVALID_TOKEN) {
+            return "invalid token";
+        }
+        if (error == XML_ERROR_NO_ELEMENTS && !open_at(tags_, offset).empty()) {
+            return "the text ends too early";
+        }
+        return XML_ErrorString(error);
+    }
+
+    [[nodiscard]] std::string advice(XML_Error error, std::size_t offset) const
+    {
+        const std::string open = open_at(tags_, offset);
+        switch (error) {
+        case XML_ERROR_TAG_MISMATCH:
+            return "; close <" + open + "> before";
+        case XML_ERROR_NO_ELEMENTS:
+            return open.empty() ? "; write a plan" : "; close <" + open + ">";
+        case XML_ERROR_INVALID_TOKEN:
+            return token_advice(offset);
+        case XML_ERROR_UNCLOSED_TOKEN:
+        case XML_ERROR_UNCLOSED_CDATA_SECTION:
+            return "; end what begins here";
+        case XML_ERROR_PARTIAL_CHAR:
+            return "; complete the character";
+        case XML_ERROR_DUPLICATE_ATTRIBUTE:
+            return "; keep one of the two";
+        case XML_ERROR_JUNK_AFTER_DOC_ELEMENT:
+            return "; put everything into one element";
+        case XML_ERROR_UNDEFINED_ENTITY:
+            return "; write &amp; for a '&'";
+        case XML_ERROR_MISPLACED_XML_PI:
+            return "; begin the text with it";
+        case XML_ERROR_BAD_CHAR_REF:
+            return "; leave it out";
+        case XML_ERROR_UNKNOWN_ENCODING:
+        case XML_ERROR_INCORRECT_ENCODING:
+            return "; declare UTF-8, or leave the declaration out";
+        default:
+            return "; fix it here";
+        }
+    }
+
+    [[nodiscard]] std::string token_advice(std::size_t offset) const
+    {
+        const auto byte = static_cast<unsigned char>(offset < text_.size() ? text_[offset] : ' ');
+        if (offset > 0 && text_[offset - 1] == '&') {
+            return "; write &amp; for a '&'";
+        }
+        if (byte == '<') {
+            return "; write &lt; for a '<'";
+        }
+        if (byte >= 0x80) {
+            return "; save it as UTF-8";
+        }
+        if (std::iscntrl(byte) != 0 && std::isspace(byte) == 0) {
+            return "; leave the control character out";
+        }
+        return "; fix it here";
+    }
+
+    // Mini-XML ignores the declaration: it takes every text for UTF-8.
+    void report_encoding()
+    {
+        const std::size_t offset = first_not_utf8(text_);
+        // zero bytes are another finding
+        if (offset != kNone && text_.find('\0') == kNone) {
+            findings_.error(offset, "not UTF-8: the library looks at no encoding declaration, and "
+                                    "would read something else here; save it as UTF-8");
+        }
+    }
+
+    // Mini-XML sees the end of a comment only after something in it.
+    bool report_endless_comments()
+    {
+        constexpr std::string_view kEmpty = "<!---->";
+        bool found = false;
+        for (const Tag &tag : tags_) {
+            if (tag.kind == Tag::Kind::comment &&
+                text_.compare(tag.begin, kEmpty.size(), kEmpty) == 0) {
+                findings_.error(tag.begin,
+                                "an empty comment has no end for the library, which would take "
+                                "what follows for a comment as well; write something into it");
+                found = true;
+            }
+        }
+        return found;
+    }
+
+    void report_refusal(std::string why)
+    {
+        while (why.ends_with('.')) {
+            why.pop_back();
+        }
+        if (text_.find_first_of(" \t\r\n") == 0) {
+            findings_.error(0, "the library would not load a text that begins with white space; "
+                               "begin it with a '<'");
+            return;
+        }
+        if (const std::size_t beside = beside_root(); beside != kNone) {
+            findings_.error(beside, std::string("the library would not load a plan without a "
+                                                "declaration that has something beside its root "
+                                                "element; begin it with ") +
+                                        kDeclaration);
+            return;
+        }
+        findings_.error(undefined_entity(0), "well-formed, but the library would not load it: " +
+                                                 cut(one_line(why), 2 * 80) + "; fix that");
+    }
+
+    // What stands beside the root element, where Mini-XML takes that for a
+    // second root.
+    [[nodiscard]] std::size_t beside_root() const
+    {
+        std::size_t depth = 0;
+        for (const Tag &tag : tags_) {
+            const bool element = tag.kind == Tag::Kind::open || tag.kind == Tag::Kind::empty;
+            if (&tag == &tags_.front() && !element && tag.kind != Tag::Kind::comment) {
+                return kNone; // all else is below it
+            }
+            if (depth == 0 && !element && tag.kind != Tag::Kind::text) {
+                return tag.begin;
+            }
+            depth += tag.kind == Tag::Kind::open ? 1 : 0;
+            depth -= tag.kind == Tag::Kind::close && depth > 0 ? 1 : 0;
+        }
+        return kNone;
+    }
+
+    static constexpr std::string_view kValue = "=\"\"";
+
+    const std::string &text_;
+    const std::string &stored_;
+    std::vector<Tag> tags_;
+    std::string repaired_;
+    std::vector<const Attribute *> given_;
+    Findings &findings_;
+};
+
+} // namespace
+
+std::optional<Plan> check_form(const std::string &text, const std::string &stored,
+                               Findings &findings)
+{
+    return FormChecker(text, stored, findings).check();
+}
+
+} // namespace fptest

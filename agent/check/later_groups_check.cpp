@@ -1,0 +1,144 @@
+// SPDX-FileCopyrightText: 2026 The Quillmark authors
+// SPDX-License-Identifier: Apache-2.0
+
+#include "check/later_groups_check.h"
+
+#include <algorithm>
+#include <cctype>
+#include <string>
+#include <unordered_map>
+#include <utility>
+
+namespace fptest
+{
+
+namespace
+{
+
+// Spelled alike but for case, numbers and signs: one for another in a path is an
+// easy mistake.
+std::string likeness(std::string_view name)
+{
+    std::string letters;
+    for (const char c : name) {
+        const auto byte = static_cast<unsigned char>(c);
+        if (std::isalpha(byte) != 0 || byte >= 0x80) {
+            letters += static_cast<char>(std::tolower(byte));
+        }
+    }
+    return letters;
+}
+
+// An item that its group lacks is looked for in the groups after it, and its
+// position there is run here. That is so with every item of every later group:
+// said is where the wrong path comes easily, because another group has an item of
+// that name, or the earlier group one like it.
+class LaterGroupsCheck
+{
+  public:
+    LaterGroupsCheck(const Plan &plan, const SourceMap &places, const std::vector<Group> &groups,
+                     Findings &findings)
+        : plan_(plan), places_(places), findings_(findings)
+    {
+        for (const Group &group : groups) {
+            if (group.found) {
+                groups_.push_back({&group, addressable_items(group)});
+            }
+        }
+    }
+
+    void check()
+    {
+        for (const Entry &entry : groups_) {
+            for (const Item *item : entry.items) {
+                ++uses_[*item->name];
+            }
+        }
+        for (at_ = 0; at_ < groups_.size(); ++at_) {
+            check_group(groups_[at_]);
+            for (const Item *item : groups_[at_].items) {
+                after_last_[*item->name] = at_ + 1;
+                alike_[likeness(*item->name)] = at_;
+            }
+        }
+    }
+
+  private:
+    struct Entry {
+        const Group *group = nullptr;
+        std::vector<const Item *> items;
+    };
+
+    // The first of each name.
+    static std::vector<const Item *> addressable_items(const Group &group)
+    {
+        std::vector<const Item *> items;
+        std::unordered_set<std::string_view> names;
+        for (const Item &item : group.items) {
+            if (item.name && is_addressable(*item.name) && names.insert(*item.name).second) {
+                items.push_back(&item);
+            }
+        }
+        return items;
+    }
+
+    void check_group(const Entry &entry)
+    {
+        const Item *first = nullptr;
+        std::string text;
+        std::size_t more = 0;
+        for (const Item *item : entry.items) {
+            const Group *earlier = earlier_group(*item->name);
+            const auto run =
+                earlier != nullptr ? plan_.run_by(*earlier->name, *item->name) : std::nullopt;
+            if (!run || run->number == item->number) {
+                continue;
+            }
+            if (first != nullptr) {
+                ++more;
+                continue;
+            }
+            first = item;
+            text = "group " + in_quotes(*earlier->name) + " has no item " + in_quotes(*item->name) +
+                   ", and finds this one after it: " + path_of(*earlier->name, *item->name) +
+                   " would run " + names_of({run}) + "; check the group in paths to it";
+        }
+        if (first != nullptr) {
+            findings_.warning(places_.of(first->number, "name"),
+                              more > 0 ? text + ", and to " + std::to_string(more) + " more here"
+                                       : text);
+        }
+    }
+
+    // One before this group whose path with that name leads here.
+    [[nodiscard]] const Group *earlier_group(const std::string &name) const
+    {
+        const auto last = after_last_.find(name);
+        const std::size_t begin = last != after_last_.end() ? last->second : 0;
+        if (uses_.at(name) > 1 && begin < at_) {
+            return groups_[at_ - 1].group;
+        }
+        const auto alike = alike_.find(likeness(name));
+        return alike != alike_.end() && alike->second >= begin ? groups_[alike->second].group
+                                                               : nullptr;
+    }
+
+    const Plan &plan_;
+    const SourceMap &places_;
+    Findings &findings_;
+    std::vector<Entry> groups_;
+    std::size_t at_ = 0;
+    std::unordered_map<std::string, std::size_t> uses_;
+    std::unordered_map<std::string, std::size_t> after_last_; // group that has the name
+    std::unordered_map<std::string, std::size_t> alike_;      // the last group with such a name
+};
+
+} // namespace
+
+void check_later_groups(const Plan &plan, const SourceMap &places, const std::vector<Group> &groups,
+                        Findings &findings)
+{
+    LaterGroupsCheck(plan, places, groups, findings).check();
+}
+
+} // namespace fptest

@@ -1,0 +1,53 @@
+// SPDX-FileCopyrightText: 2026 The Quillmark authors
+// SPDX-License-Identifier: Apache-2.0
+
+#include "check/wellformed.h"
+
+#include <expat.h>
+#include <memory>
+#include <new>
+#include <type_traits>
+
+namespace fptest
+{
+
+namespace
+{
+
+// Entities in entities can go deeper than a stack, and the library knows none: the
+// declaration of one ends the parse.
+void XMLCALL stop_at_entity(void *parser, const XML_Char *, int, const XML_Char *, int,
+                            const XML_Char *, const XML_Char *, const XML_Char *, const XML_Char *)
+{
+    XML_StopParser(static_cast<XML_Parser>(parser), XML_FALSE);
+}
+
+} // namespace
+
+std::optional<Flaw> find_flaw(std::string_view text)
+{
+    constexpr std::size_t kPiece = 1U << 30U; // the parser counts in int
+    const std::unique_ptr<std::remove_pointer_t<XML_Parser>, decltype(&XML_ParserFree)> parser(
+        XML_ParserCreate(nullptr), &XML_ParserFree);
+    if (!parser) {
+        throw std::bad_alloc();
+    }
+    XML_UseParserAsHandlerArg(parser.get());
+    XML_SetEntityDeclHandler(parser.get(), stop_at_entity);
+    const std::size_t size = text.size();
+    bool last = false;
+    while (!last) {
+        const std::string_view piece = text.substr(0, kPiece);
+        text.remove_prefix(piece.size());
+        last = text.empty();
+        if (XML_Parse(parser.get(), piece.data(), static_cast<int>(piece.size()), last ? 1 : 0) !=
+            XML_STATUS_OK) {
+            const XML_Index index = XML_GetCurrentByteIndex(parser.get());
+            return Flaw{index < 0 ? 0 : std::min(static_cast<std::size_t>(index), size),
+                        XML_GetErrorCode(parser.get())};
+        }
+    }
+    return std::nullopt;
+}
+
+} // namespace fptest

@@ -1,0 +1,22 @@
+// SPDX-FileCopyrightText: 2026 The Quillmark authors
+// SPDX-License-Identifier: Apache-2.0
+
+#pragma once
+
+#include <cstddef>
+#include <expat.h>
+#include <optional>
+#include <string_view>
+
+namespace fptest
+{
+
+// Where a text ceases to be XML, and why.
+struct Flaw {
+    std::size_t offset = 0;
+    XML_Error error = XML_ERROR_NONE;
+};
+
+std::optional<Flaw> find_flaw(std::string_view text);
+
+} // namespace fptest
