@@ -5,6 +5,7 @@
 // linked with these calls renamed, so that any one of them can be made to fail.
 #pragma once
 
+#include <functional>
 #include <string>
 
 namespace mini_xml
@@ -15,10 +16,8 @@ constexpr char kMemory[] = "Mini-XML's memory";
 constexpr char kRead[] = "Mini-XML's read";
 constexpr char kWrite[] = "Mini-XML's write";
 
-// Makes that call of the function fail, counted from 1 from now on.
-void plan_fault(const std::string &function, long number);
-// Whether it has been made, and what was to be stored: "strdup(Cmd)".
-bool met();
-const std::string &met_in();
+// Makes that call of the function fail, counted from 1 from now on. Just before
+// it does, it calls the hook.
+void plan_fault(const std::string &function, long number, std::function<void()> hook);
 
 } // namespace mini_xml
