@@ -21,6 +21,7 @@ namespace
 
 constexpr std::size_t kNone = std::string::npos;
 constexpr std::size_t kShownName = 63; // columns
+constexpr std::size_t kShownWhy = 160;
 
 bool is_name(std::string_view name)
 {
@@ -277,7 +278,7 @@ class FormChecker
             return;
         }
         findings_.error(undefined_entity(0), "well-formed, but the library would not load it: " +
-                                                 cut(one_line(why), 2 * 80) + "; fix that");
+                                                 cut(one_line(why), kShownWhy) + "; fix that");
     }
 
     // What stands beside the root element, where Mini-XML takes that for a

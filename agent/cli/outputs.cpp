@@ -20,7 +20,10 @@ namespace fptest
 namespace
 {
 
-const NamedFile kModulesFile{"the library", kStoredPlan};
+NamedFile librarys_file()
+{
+    return {"the library", kStoredPlan};
+}
 
 // Whether both are one file, by whatever name, of which one would overwrite the
 // other: into a pipe or a terminal both may write.
@@ -91,7 +94,7 @@ void settle_outputs(RunOptions &options)
                        {"--json", options.json},
                        {"--junit", options.junit},
                        log_file(options.log),
-                       kModulesFile});
+                       librarys_file()});
     const auto reports = reports_on_standard_output(options);
     if (reports.size() > 1) {
         throw Failure(Exit::usage,
@@ -122,7 +125,7 @@ void require_writable_reports(const RunOptions &options)
 void require_log_of_its_own(const std::string &log, Beside beside)
 {
     const NamedFile file = log_file(log);
-    require_different({file, kModulesFile});
+    require_different({file, librarys_file()});
     struct stat output {
     };
     const bool is_regular = fstat(STDOUT_FILENO, &output) == 0 && S_ISREG(output.st_mode);

@@ -14,7 +14,6 @@
 #include <chrono>
 #include <cstdio>
 #include <poll.h>
-#include <ranges>
 #include <sstream>
 #include <thread>
 #include <unistd.h>
@@ -246,7 +245,7 @@ bool is_interrupted(const Signals &signals)
 void begin(Run &run, const std::vector<Listener *> &listeners, Signals &signals)
 {
     std::vector<Listener *> begun;
-    for (Listener *listener : std::views::reverse(listeners)) {
+    for (Listener *listener : std::vector(listeners.rbegin(), listeners.rend())) {
         listener->begin(run);
         begun.push_back(listener);
         const std::string failure = listener->failure();

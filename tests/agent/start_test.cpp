@@ -18,7 +18,6 @@
 using namespace fptest_runner;
 using device::kPlanFile;
 using device::read_file;
-using device::wait_for;
 using report_files::events_of;
 using report_files::outcomes;
 using report_files::parse_xml;
