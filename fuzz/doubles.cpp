@@ -72,7 +72,7 @@ void ignore_message(const char * /*message*/)
 // What a load has allocated and not freed: each block's number in it.
 std::map<const volatile void *, int> blocks;
 int next_block = 0;
-bool watching = false;
+thread_local bool watching = false; // libFuzzer's own thread allocates too
 
 void note_block(const volatile void *block, std::size_t /*size*/)
 {

@@ -328,6 +328,7 @@ class CommandLine
         command->add_option("FILE", check_.files, "test plans ('-': standard input)")
             ->type_name("")
             ->transform(desk_file())
+            ->check(not_empty())
             ->required();
         command
             ->add_option("--for", check_for_,
@@ -349,7 +350,8 @@ class CommandLine
                          "the plan ('-': standard input); without, the\n"
                          "stored one")
             ->type_name("")
-            ->transform(desk_file());
+            ->transform(desk_file())
+            ->check(not_empty());
     }
 
     void add_report()

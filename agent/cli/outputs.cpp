@@ -38,8 +38,11 @@ bool are_same_file(const std::string &one, const std::string &other)
                first.st_ino == second.st_ino;
     }
     std::error_code none;
-    const auto path = std::filesystem::weakly_canonical(one, none);
-    return !path.empty() && path == std::filesystem::weakly_canonical(other, none);
+    const auto whole = [&none](const std::string &path) {
+        return std::filesystem::weakly_canonical(
+            std::filesystem::absolute(end_of_links(path), none), none);
+    };
+    return whole(one) == whole(other);
 }
 
 // Not of a device that swallows everything: that may be named as often as one likes.

@@ -7,6 +7,7 @@
 #include "reporters/junit_document.h"
 #include "reporters/wording.h"
 #include "reporters/writer.h"
+#include "util/files.h"
 #include "util/write.h"
 
 #include <algorithm>
@@ -15,7 +16,6 @@
 #include <cstdio>
 #include <cstdlib>
 #include <fcntl.h>
-#include <filesystem>
 #include <functional>
 #include <optional>
 #include <string_view>
@@ -41,16 +41,6 @@ bool is_replaceable(const std::string &path)
     struct stat status {
     };
     return stat(path.c_str(), &status) != 0 || S_ISREG(status.st_mode);
-}
-
-// Where a symbolic link leads, which is to stay, also to a file that is not there yet.
-std::string real_path(std::filesystem::path path)
-{
-    std::error_code none;
-    for (int links = 0; links < 40 && std::filesystem::is_symlink(path, none); ++links) {
-        path = path.parent_path() / std::filesystem::read_symlink(path, none);
-    }
-    return path;
 }
 
 // What is written before it takes the place of the target.
@@ -143,7 +133,7 @@ class JunitReport : public Listener
         if (path_ == "-") {
             direct_.emplace("standard output", STDOUT_FILENO);
         } else if (is_replaceable(path_)) {
-            target_ = real_path(path_);
+            target_ = end_of_links(path_);
         } else {
             direct_.emplace(path_, O_WRONLY | O_APPEND, 0);
         }
@@ -328,7 +318,7 @@ class JunitReport : public Listener
 
 std::string junit_obstacle(const std::string &path)
 {
-    const std::string opened = is_replaceable(path) ? aside_of(real_path(path)) : path;
+    const std::string opened = is_replaceable(path) ? aside_of(end_of_links(path)) : path;
     const int error = path == "-" ? 0 : Writer::obstacle(opened);
     return error == 0 ? "" : failure_of(path, error);
 }

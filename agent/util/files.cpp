@@ -10,6 +10,7 @@
 #include <cerrno>
 #include <cstring>
 #include <fcntl.h>
+#include <filesystem>
 #include <unistd.h>
 
 namespace fptest
@@ -73,6 +74,16 @@ std::string why_unread()
     return errno != EFBIG
                ? std::strerror(errno)
                : "longer than the " + std::to_string(kFileLimit >> 20U) + " MiB that fptest reads";
+}
+
+std::string end_of_links(const std::string &path)
+{
+    std::error_code none;
+    std::filesystem::path end = path;
+    for (int links = 0; links < 40 && std::filesystem::is_symlink(end, none); ++links) {
+        end = end.parent_path() / std::filesystem::read_symlink(end, none);
+    }
+    return end;
 }
 
 } // namespace fptest

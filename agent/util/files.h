@@ -24,4 +24,7 @@ std::optional<std::string> read_file(const std::string &path, int flags = 0);
 // Why read_file() has just failed, for people.
 std::string why_unread();
 
+// Where a path leads through symbolic links, also to a file that is not there yet.
+std::string end_of_links(const std::string &path);
+
 } // namespace fptest

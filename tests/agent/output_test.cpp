@@ -18,6 +18,7 @@
 #include <string>
 #include <sys/stat.h>
 #include <unistd.h>
+#include <utility>
 
 using namespace fptest_runner;
 using device::read_file;
@@ -264,6 +265,17 @@ TEST_F(Output, FileThatHasTwoNamesIsWantedByOne)
                    "fptest: --json and --junit both want the file /tmp/scene/one: give them files "
                    "of their own",
                    {"run", "--json", work("one"), "--junit", work("two"), "--plan", path, "P/G"});
+    // nor are they there yet
+    ASSERT_EQ(chdir(kWork), 0);
+    ASSERT_EQ(symlink("none", work("three").c_str()), 0);
+    ASSERT_EQ(symlink("none", work("four").c_str()), 0);
+    for (const auto &[one, two] :
+         {std::pair{"x", "./x"}, {"x", "/tmp/scene/x"}, {"three", "four"}}) {
+        expect_refusal(2,
+                       std::string("fptest: --json and --junit both want the file ") + one +
+                           ": give them files of their own",
+                       {"run", "--json", one, "--junit", two, "--plan", path, "P/G"});
+    }
 }
 
 TEST_F(Output, ListHasNoReports)

@@ -241,6 +241,10 @@ TEST_F(Trust, TakesNoEmptyNameForAFile)
         expect_refusal(2, "fptest: " + option + ": its value is empty; see fptest run --help",
                        {"run", option, "", "P/G"});
     }
+    for (const std::string command : {"check", "show"}) {
+        expect_refusal(2, "fptest: FILE: its value is empty; see fptest " + command + " --help",
+                       {command, ""});
+    }
 }
 
 TEST_F(Trust, WritesNoTwoThingsIntoOneFile)
