@@ -6,6 +6,9 @@
 #include "check/findings.h"
 #include "util/text.h"
 
+#include <array>
+#include <utility>
+
 namespace fptest
 {
 
