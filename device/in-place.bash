@@ -147,7 +147,7 @@ wait_for_command()
 	# not by wait alone: interrupted again and again, it may lose the status
 	exec {gate}<> <(:)
 	while kill -0 "$pid" 2>/dev/null; do
-		read -r -t 0.05 -u "$gate" || true
+		read -r -t 0.01 -u "$gate" || true
 	done
 	wait "$pid" || status=$?
 	exit "$status"
