@@ -2,18 +2,29 @@
 // SPDX-License-Identifier: Apache-2.0
 
 #include "check/messages.h"
-#include "cli/commands.h"
+#include "cli/options.h"
 #include "plan/plan.h"
 #include "util/files.h"
 #include "util/text.h"
 
 #include <algorithm>
 #include <cstdio>
+#include <memory>
+#include <string>
+#include <vector>
 
 namespace fptest
 {
 namespace
 {
+
+constexpr char kCheckExamples[] = "Examples:\n"
+                                  "  fptest check plans/*.xml";
+
+struct CheckOptions {
+    std::vector<std::string> files;
+    PlanUse use = PlanUse::to_send;
+};
 
 // What it holds is known of a plan that loads.
 std::string size_of(const std::string &text, PlanUse use)
@@ -46,8 +57,6 @@ bool check_file(const std::string &file, const std::string &text, PlanUse use)
     return errors == 0;
 }
 
-} // namespace
-
 Exit check_files(const CheckOptions &options)
 {
     require_standard_output("fptest check");
@@ -68,6 +77,30 @@ Exit check_files(const CheckOptions &options)
         return Exit::usage;
     }
     return sound ? Exit::success : Exit::items_failed;
+}
+
+} // namespace
+
+void add_check(CLI::App &app, Action &chosen)
+{
+    const auto options = std::make_shared<CheckOptions>();
+    CLI::App &command =
+        add_subcommand(app, "check", "Say what the library would make of a plan", kCheckExamples,
+                       chosen, [options] { return check_files(*options); });
+    command.add_option("FILE", options->files, "test plans ('-': standard input)")
+        ->type_name("")
+        ->transform(desk_file())
+        ->check(not_empty())
+        ->required();
+    const auto set_use = [options](const std::string &use) {
+        options->use = use == "file" ? PlanUse::stored : PlanUse::to_send;
+    };
+    command
+        .add_option_function<std::string>("--for", set_use,
+                                          "how it is to be stored: by a command, which\n"
+                                          "cuts it, or as a file")
+        ->type_name("command|file")
+        ->check(one_of({"command", "file"}, "is neither command nor file"));
 }
 
 } // namespace fptest

@@ -7,6 +7,7 @@
 #include "plan/plan.h"
 #include "reporters/reporters.h"
 #include "reporters/views.h"
+#include "util/failure.h"
 #include "util/files.h"
 #include "util/text.h"
 

@@ -4,10 +4,11 @@
 // Where a run's results go, as the command line says.
 #pragma once
 
-#include "cli/commands.h"
+#include "cli/run_options.h"
 #include "run/results.h"
 
 #include <memory>
+#include <string>
 #include <vector>
 
 namespace fptest

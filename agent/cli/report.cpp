@@ -1,7 +1,7 @@
 // SPDX-FileCopyrightText: 2026 The Quillmark authors
 // SPDX-License-Identifier: Apache-2.0
 
-#include "cli/commands.h"
+#include "cli/options.h"
 #include "cli/outputs.h"
 #include "module/preflight.h"
 #include "module/stored_plan.h"
@@ -13,11 +13,31 @@
 #include <algorithm>
 #include <cerrno>
 #include <cstdio>
+#include <memory>
+#include <string>
 
 namespace fptest
 {
 namespace
 {
+
+constexpr char kReportExamples[] =
+    "Lets a shell script be an item. RESULT is 0, 1 or -2: the library has a text for\n"
+    "no other code.\n"
+    "\n"
+    "Examples:\n"
+    "  fptest report Bringup SpiCheck --progress 50 --result -2\n"
+    "  fptest report Bringup SpiCheck --progress 100 --result 0 \\\n"
+    "      --description 'chip answers at 8 MHz'";
+
+struct ReportOptions {
+    std::string group;
+    std::string item;
+    int progress = 0;
+    int result = 0;
+    std::string description;
+    std::string log;
+};
 
 // What the report adds to the file, at the most: each byte as an entity.
 constexpr std::size_t kLongestEntity = 6;
@@ -85,8 +105,6 @@ std::size_t find_item(const Plan &plan, const ReportOptions &options)
             names);
 }
 
-} // namespace
-
 Exit report(const ReportOptions &options)
 {
     require_log_of_its_own(options.log, Beside::nothing);
@@ -115,6 +133,28 @@ Exit report(const ReportOptions &options)
                                              "met");
     }
     return Exit::success;
+}
+
+} // namespace
+
+void add_report(CLI::App &app, Action &chosen)
+{
+    const auto options = std::make_shared<ReportOptions>();
+    CLI::App &command =
+        add_subcommand(app, "report", "Write an item's progress and result into the stored plan",
+                       kReportExamples, chosen, [options] { return report(*options); });
+    command.add_option("GROUP", options->group, "the item's group")->type_name("")->required();
+    command.add_option("ITEM", options->item, "the item's name")->type_name("")->required();
+    command.add_option("--progress", options->progress, "a number, 100 for the end")
+        ->type_name("N")
+        ->required()
+        ->check(range(-99999999, 999999999));
+    command.add_option("--result", options->result, "0, 1 or -2")
+        ->type_name("R")
+        ->required()
+        ->check(result_code());
+    command.add_option("--description", options->description, "free text")->type_name("TEXT");
+    add_log(command, options->log);
 }
 
 } // namespace fptest

@@ -2,9 +2,10 @@
 // SPDX-License-Identifier: Apache-2.0
 
 #include "check/messages.h"
-#include "cli/commands.h"
 #include "cli/desk_paths.h"
+#include "cli/options.h"
 #include "cli/outputs.h"
+#include "cli/run_options.h"
 #include "module/module_process.h"
 #include "module/preflight.h"
 #include "module/stored_plan.h"
@@ -19,6 +20,7 @@
 #include <cerrno>
 #include <cstdio>
 #include <cstring>
+#include <memory>
 #include <unistd.h>
 #include <utility>
 
@@ -26,6 +28,15 @@ namespace fptest
 {
 namespace
 {
+
+constexpr char kRunExamples[] =
+    "A PATH is root/group or root/group/item; the root may be any word.\n"
+    "\n"
+    "Examples:\n"
+    "  fptest run --plan plans/demo.xml demo/Bringup demo/Gather\n"
+    "  fptest run --timeout 30 --junit results.xml demo/Bringup/SpiCheck\n"
+    "  fptest run --plan plans/demo.xml --list\n"
+    "  prove --exec 'fptest run --tap' demo/Bringup";
 
 // What is to be run: the plan's text and what the library makes of it.
 struct Source {
@@ -178,7 +189,16 @@ Descriptor ready_device()
     return lock_device();
 }
 
-} // namespace
+Runner::Limits limits_of(const RunOptions &options)
+{
+    Runner::Limits limits;
+    if (options.timeout) {
+        limits.item = std::chrono::duration<double>(*options.timeout);
+    }
+    limits.grace = std::chrono::duration<double>(options.grace);
+    limits.exit_status = options.exit_status;
+    return limits;
+}
 
 Exit run(RunOptions options)
 {
@@ -236,7 +256,84 @@ Exit run(RunOptions options)
     run.until_fail = options.until_fail;
     run.pass_code = options.pass_code;
     run.vendor = vendor;
-    return run_rounds(options, *host, signals, run, work);
+    const auto owned = make_listeners(options);
+    std::vector<Listener *> listeners;
+    for (const auto &listener : owned) {
+        listeners.push_back(listener.get());
+    }
+    return run_rounds(listeners, limits_of(options), *host, signals, run, work);
+}
+
+} // namespace
+
+void add_run(CLI::App &app, Action &chosen)
+{
+    const auto options = std::make_shared<RunOptions>();
+    CLI::App &command = add_subcommand(app, "run", "Store a plan and run groups or items of it",
+                                       kRunExamples, chosen, [options] { return run(*options); });
+    command.add_option("PATH", options->paths, "what to run")->type_name("");
+    command
+        .add_option("--plan", options->plan,
+                    "store this plan first ('-': standard input);\n"
+                    "without, the stored plan is run")
+        ->type_name("FILE")
+        ->transform(desk_file())
+        ->check(not_empty());
+    command.add_flag("--as-sent", options->as_sent,
+                     "store it by a command, which cuts it after\n"
+                     "2048 bytes, and never as a file");
+    command.add_flag("--as-group", options->as_group,
+                     "one command for each group, not for each\n"
+                     "item");
+    command.add_option("--timeout", options->timeout, "stop an item that takes longer")
+        ->type_name("SECONDS")
+        ->check(range(0.001, 1000000.0));
+    command.add_option("--grace", options->grace, "then kill it after so long")
+        ->type_name("SECONDS")
+        ->capture_default_str()
+        ->check(range(0.0, 1000000.0));
+    command.add_flag("--exit-status", options->exit_status,
+                     "an item that ends with a status other than\n"
+                     "0 has failed");
+    command.add_option("--repeat", options->repeat, "run everything N times")
+        ->type_name("N")
+        ->check(range(1, 1000000));
+    command
+        .add_option("--for", options->time_limit,
+                    "begin another round of everything for so\n"
+                    "long: 90, 90s, 10m, 2h, 1d")
+        ->type_name("TIME")
+        ->transform(time_span());
+    command.add_flag("--until-fail", options->until_fail,
+                     "end with the first item that does not pass;\n"
+                     "begin another round until then");
+    command.add_flag("--list", options->list,
+                     "print what would be run and start nothing;\n"
+                     "without PATH, all that can be run");
+    command
+        .add_option("--junit", options->junit,
+                    "write the results as JUnit XML ('-': standard\n"
+                    "output)")
+        ->type_name("FILE")
+        ->check(not_empty());
+    command
+        .add_option("--json", options->json,
+                    "write them as JSON lines, as they come\n"
+                    "('-': standard output)")
+        ->type_name("FILE")
+        ->check(not_empty());
+    command.add_flag("--tap", options->tap,
+                     "write them as TAP to standard output, in\n"
+                     "place of the view");
+    command.add_option("--pass-code", options->pass_code, "the result that means passed")
+        ->type_name("N")
+        ->capture_default_str()
+        ->check(result_code());
+    command.add_flag("--force", options->force,
+                     "run in spite of errors in the plan and of\n"
+                     "missing programs");
+    command.add_flag("--quiet", options->quiet, "print only what did not pass");
+    add_log(command, options->log);
 }
 
 } // namespace fptest

@@ -1,7 +1,7 @@
 // SPDX-FileCopyrightText: 2026 The Quillmark authors
 // SPDX-License-Identifier: Apache-2.0
 
-#include "cli/commands.h"
+#include "cli/options.h"
 #include "cli/outputs.h"
 #include "module/module_process.h"
 #include "module/preflight.h"
@@ -15,12 +15,30 @@
 #include <chrono>
 #include <cstdio>
 #include <cstring>
+#include <memory>
+#include <string>
 #include <unistd.h>
+#include <vector>
 
 namespace fptest
 {
 namespace
 {
+
+constexpr char kSendExamples[] =
+    "Prints one line a command: the reply, empty if there is none. What the library\n"
+    "and the items print goes to standard error.\n"
+    "\n"
+    "Examples:\n"
+    "  fptest send pingtest XMLNodePath::demo/Bringup\n"
+    "  printf 'XMLFile::%s\\0XMLNodePath::demo/Bringup' \"$(cat plan.xml)\" |\n"
+    "      adb shell -T fptest send -0";
+
+struct SendOptions {
+    std::vector<std::string> commands;
+    bool from_input = false; // separated by zero bytes, and the replies as well
+    std::string log;
+};
 
 using namespace std::chrono_literals;
 
@@ -118,8 +136,6 @@ class Sender
     bool interrupted_ = false;
 };
 
-} // namespace
-
 Exit send(const SendOptions &options)
 {
     require_standard_output("fptest send");
@@ -154,6 +170,20 @@ Exit send(const SendOptions &options)
         }
     }
     return Exit::success;
+}
+
+} // namespace
+
+void add_send(CLI::App &app, Action &chosen)
+{
+    const auto options = std::make_shared<SendOptions>();
+    CLI::App &command = add_subcommand(app, "send", "Hand raw command strings to the library",
+                                       kSendExamples, chosen, [options] { return send(*options); });
+    command.add_option("COMMAND", options->commands, "HEAD::NAME::ARGUMENTS")->type_name("");
+    command.add_flag("-0", options->from_input,
+                     "read them from standard input instead, a\n"
+                     "zero byte after each, as after the replies");
+    add_log(command, options->log);
 }
 
 } // namespace fptest

@@ -1,7 +1,7 @@
 // SPDX-FileCopyrightText: 2026 The Quillmark authors
 // SPDX-License-Identifier: Apache-2.0
 
-#include "cli/commands.h"
+#include "cli/options.h"
 #include "plan/plan.h"
 #include "util/files.h"
 #include "util/terminal.h"
@@ -10,6 +10,8 @@
 #include <cerrno>
 #include <cstdio>
 #include <cstring>
+#include <memory>
+#include <string>
 #include <unistd.h>
 #include <vector>
 
@@ -17,6 +19,10 @@ namespace fptest
 {
 namespace
 {
+
+constexpr char kShowExamples[] = "Examples:\n"
+                                 "  fptest show\n"
+                                 "  fptest show results/annotated.xml";
 
 using Row = std::vector<std::string>;
 
@@ -64,8 +70,6 @@ std::string read_shown(const std::string &file)
                   one_line(path) + ": " + why_unread());
 }
 
-} // namespace
-
 Exit show(const std::string &file)
 {
     require_standard_output("fptest show");
@@ -81,6 +85,22 @@ Exit show(const std::string &file)
     }
     print(rows);
     return Exit::success;
+}
+
+} // namespace
+
+void add_show(CLI::App &app, Action &chosen)
+{
+    const auto file = std::make_shared<std::string>();
+    CLI::App &command = add_subcommand(app, "show", "Print an annotated plan as a table",
+                                       kShowExamples, chosen, [file] { return show(*file); });
+    command
+        .add_option("FILE", *file,
+                    "the plan ('-': standard input); without, the\n"
+                    "stored one")
+        ->type_name("")
+        ->transform(desk_file())
+        ->check(not_empty());
 }
 
 } // namespace fptest

@@ -4,6 +4,7 @@
 #include "module/stored_plan.h"
 
 #include "plan/plan.h"
+#include "plan/plan_text.h"
 #include "util/failure.h"
 #include "util/files.h"
 #include "util/write.h"
@@ -41,11 +42,11 @@ std::string whole_stored_plan()
 
 void mend_stored_plan()
 {
-    if (!mended(read_stored_plan().value_or(""))) {
+    if (!made_loadable(read_stored_plan().value_or(""))) {
         return;
     }
     const Descriptor lock = lock_stored_plan();
-    if (const auto text = mended(whole_stored_plan())) {
+    if (const auto text = made_loadable(whole_stored_plan())) {
         replace_stored_plan(*text);
     }
 }

@@ -291,4 +291,20 @@ Position Positions::of(std::size_t offset)
     return last_;
 }
 
+std::string with_empty_values(std::string_view text, const std::vector<Tag> &tags)
+{
+    std::string repaired;
+    std::size_t done = 0;
+    for (const Tag &tag : tags) {
+        for (const Attribute &place : tag.attributes) {
+            if (!place.has_value) {
+                repaired += text.substr(done, place.end - done);
+                repaired += "=\"\"";
+                done = place.end;
+            }
+        }
+    }
+    return repaired += text.substr(done);
+}
+
 } // namespace fptest

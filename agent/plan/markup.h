@@ -62,4 +62,7 @@ class Positions
     Position last_;
 };
 
+// The text with an empty value for each attribute of its tags that has none.
+std::string with_empty_values(std::string_view text, const std::vector<Tag> &tags);
+
 } // namespace fptest

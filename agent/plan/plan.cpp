@@ -23,29 +23,14 @@ namespace fptest
 namespace
 {
 
-// --- text as the library cuts it ---------------------------------------------
-
-constexpr std::size_t kPathLimit = 2047;
-constexpr std::size_t kProgramLimit = 1023; // characters of a name that are run
 constexpr char kBlanks[] = " \t\n\v\f\r";
-
-std::string up_to_any(std::string_view text, std::string_view ends)
-{
-    return std::string(text.substr(0, text.find_first_of(ends)));
-}
-
-// The name as it is run, without a suffix.
-std::string program_name(std::string_view name)
-{
-    return up_to_any(name.substr(0, kProgramLimit), std::string_view("\t\n\0", 3));
-}
 
 // The components that the library sees in the path of this group, or of this
 // item. A name that holds a '/' is two, an empty one is none.
 std::vector<std::string> components(const std::string &names)
 {
-    const std::string path =
-        up_to_any(("root/" + names).substr(0, kPathLimit), std::string_view(":\t\n\0", 4));
+    std::string path = ("root/" + names).substr(0, kPathLimit);
+    path.resize(std::min(path.find_first_of(std::string_view(":\t\n\0", 4)), path.size()));
     std::vector<std::string> parts;
     std::size_t at = path.find_first_not_of('/');
     while (at != path.npos) {
@@ -182,22 +167,6 @@ bool is_whole(const std::vector<Tag> &tags)
     return false;
 }
 
-std::string with_values(std::string_view text, const std::vector<Tag> &tags)
-{
-    std::string repaired;
-    std::size_t done = 0;
-    for (const Tag &tag : tags) {
-        for (const Attribute &place : tag.attributes) {
-            if (!place.has_value) {
-                repaired += text.substr(done, place.end - done);
-                repaired += "=\"\"";
-                done = place.end;
-            }
-        }
-    }
-    return repaired += text.substr(done);
-}
-
 bool belongs(const Tag &tag, mxml_node_t *node)
 {
     const std::string_view name = mxmlGetElement(node);
@@ -221,53 +190,6 @@ bool belongs(const Tag &tag, mxml_node_t *node)
 }
 
 } // namespace
-
-// --- what the library makes of texts -------------------------------------------
-
-std::string stored_part(std::string_view text)
-{
-    text.remove_prefix(std::min(text.find_first_not_of(':'), text.size()));
-    return up_to_any(text, std::string_view(":\0", 2)).substr(0, kPlanLimit);
-}
-
-std::optional<std::string> vendor_suffix(int vendor)
-{
-    switch (vendor) {
-    case 0:
-        return "";
-    case 1:
-        return "_ca";
-    case 2:
-        return "_ca_qsee";
-    default:
-        return std::nullopt;
-    }
-}
-
-bool is_gatherer(std::string_view name, int vendor)
-{
-    return (vendor == 0 || vendor == 1) && program_name(name) == kGatherer;
-}
-
-std::string program_of(std::string_view name, std::string_view suffix)
-{
-    std::string program = program_name(name);
-    program += suffix.substr(0, kCommandLimit - program.size());
-    return "/system/bin/" + program;
-}
-
-bool is_plain_name(std::string_view name)
-{
-    return std::ranges::all_of(name, [](unsigned char c) {
-        return std::isalnum(c) != 0 || c >= 0x80 || std::strchr("_-.,+@%", c) != nullptr;
-    });
-}
-
-std::string command_line(std::string_view name, const std::optional<std::string> &args,
-                         std::string_view suffix)
-{
-    return program_of(name, suffix) + " " + args.value_or("(null)");
-}
 
 // --- plans ----------------------------------------------------------------------
 
@@ -359,7 +281,7 @@ std::optional<Plan> Plan::read(std::string_view text)
     if (!is_whole(tags)) {
         return std::nullopt;
     }
-    std::optional<Plan> plan = load(with_values(cleaned, tags));
+    std::optional<Plan> plan = load(with_empty_values(cleaned, tags));
     if (!plan) {
         return std::nullopt;
     }
@@ -502,8 +424,6 @@ std::optional<Plan::Element> Plan::run_item(const std::string &group, const std:
                : std::nullopt;
 }
 
-// --- texts of plans -------------------------------------------------------------
-
 std::vector<Tag> element_tags(const Plan &plan, std::string_view text)
 {
     std::vector<Tag> tags = scan(text);
@@ -512,100 +432,6 @@ std::vector<Tag> element_tags(const Plan &plan, std::string_view text)
     return std::equal(tags.begin(), tags.end(), elements.begin(), elements.end(), belongs)
                ? tags
                : std::vector<Tag>();
-}
-
-namespace
-{
-
-// Copies a text, leaving out attributes with the blanks in front of them.
-class Cutter
-{
-  public:
-    explicit Cutter(const std::string &text) : text_(text)
-    {
-    }
-    void cut(const Attribute &place)
-    {
-        const std::size_t end = text_.find_last_not_of(kBlanks, place.begin - 1) + 1;
-        left_.append(text_, done_, end - done_);
-        done_ = place.end;
-    }
-    void insert(std::size_t place, const std::string &text)
-    {
-        left_.append(text_, done_, place - done_);
-        left_ += text;
-        done_ = place;
-    }
-    std::string rest()
-    {
-        return left_.append(text_, done_);
-    }
-
-  private:
-    const std::string &text_;
-    std::string left_;
-    std::size_t done_ = 0;
-};
-
-// The tags of the text's elements; nothing where it is not whole.
-std::optional<std::vector<Tag>> whole_tags(const std::string &text)
-{
-    const std::optional<Plan> plan = Plan::read(text);
-    return plan ? std::optional(element_tags(*plan, text)) : std::nullopt;
-}
-
-} // namespace
-
-std::optional<std::string> without_reports(const std::string &text,
-                                           const std::vector<std::size_t> &numbers,
-                                           const std::string &mark)
-{
-    const auto tags = whole_tags(text);
-    if (!tags) {
-        return std::nullopt;
-    }
-    Cutter cutter(text);
-    for (std::size_t number = 0; number < tags->size(); ++number) {
-        const Tag &tag = (*tags)[number];
-        if (tag.kind > Tag::Kind::empty || std::ranges::find(numbers, number) == numbers.end()) {
-            continue;
-        }
-        cutter.insert(tag.begin + 1 + tag.name.size(),
-                      std::string(" ") + kMark + "=\"" + mark + "\"");
-        for (const Attribute &place : tag.attributes) {
-            if (place.name == "progress" || place.name == "result" || place.name == "description" ||
-                place.name == kMark) {
-                cutter.cut(place);
-            }
-        }
-    }
-    return cutter.rest();
-}
-
-std::optional<std::string> mended(const std::string &text)
-{
-    if (Plan::load(text) || !Plan::read(text)) {
-        return std::nullopt;
-    }
-    const std::string cleaned = clean(text);
-    return with_values(cleaned, scan(cleaned));
-}
-
-std::optional<std::string> without_marks(const std::string &text)
-{
-    const auto tags = whole_tags(text);
-    if (!tags) {
-        return std::nullopt;
-    }
-    Cutter cutter(text);
-    for (const Tag &tag : *tags) {
-        for (const Attribute &place : tag.attributes) {
-            if (place.name == kMark) {
-                cutter.cut(place);
-            }
-        }
-    }
-    return cutter.rest();
 }
 
 } // namespace fptest

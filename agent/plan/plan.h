@@ -1,11 +1,12 @@
 // SPDX-FileCopyrightText: 2026 The Quillmark authors
 // SPDX-License-Identifier: Apache-2.0
 
-// Test plans as the library sees them: the same library loads them, and the same
-// lookups tell which item a command really runs.
+// Test plans as the library sees them: Mini-XML loads them, and the same lookups tell
+// which item a command really runs.
 #pragma once
 
 #include "plan/item_report.h"
+#include "plan/library_rules.h"
 #include "plan/markup.h"
 
 #include <cstddef>
@@ -19,36 +20,6 @@
 
 namespace fptest
 {
-
-inline constexpr char kStoredPlan[] = "/data/vorlane/src1.xml";
-inline constexpr std::size_t kPlanLimit = 2048;    // bytes that a command stores of a plan
-inline constexpr std::size_t kPathLimit = 2047;    // bytes of a node path
-inline constexpr std::size_t kNameLimit = 63;      // characters of a name in a node path
-inline constexpr std::size_t kStopLimit = 28;      // characters of a name that ps is asked for
-inline constexpr std::size_t kCommandLimit = 1024; // characters of an item's command line
-inline constexpr char kGatherer[] = "SensorProbe";
-inline constexpr unsigned short kTriggerPort = 34952;
-
-// What an "XMLFile" command stores of this text: it ends at the first ':' (those
-// at its very start are passed over) or zero byte, and holds 2048 bytes at most.
-std::string stored_part(std::string_view text);
-
-// "", "_ca" or "_ca_qsee"; nothing for a vendor that runs no item.
-std::optional<std::string> vendor_suffix(int vendor);
-
-// Whether the item of that name is started in the background and triggered.
-bool is_gatherer(std::string_view name, int vendor);
-
-// The program of an item: the library cuts its name at a tab or line feed.
-std::string program_of(std::string_view name, std::string_view suffix);
-
-// Whether the shell takes the name as it stands; else the program is another one.
-bool is_plain_name(std::string_view name);
-
-// The command line that the library runs for an item, whole; it runs the first
-// 1024 characters.
-std::string command_line(std::string_view name, const std::optional<std::string> &args,
-                         std::string_view suffix);
 
 class Plan
 {
@@ -131,24 +102,5 @@ std::string as_loaded(const std::string &value);
 // The tags that a plan's elements were read from, in the same order; none where
 // the text has others than Mini-XML has seen.
 std::vector<Tag> element_tags(const Plan &plan, std::string_view text);
-
-// An attribute by which an item's element is known to be as fptest has left it: a
-// process that saves an old copy of the plan brings back one without.
-inline constexpr char kMark[] = "fptest-run";
-
-// The text without the progress, result and description of these elements, which
-// get the mark; otherwise byte for byte as it was. Nothing where the text is not
-// whole.
-std::optional<std::string> without_reports(const std::string &text,
-                                           const std::vector<std::size_t> &numbers,
-                                           const std::string &mark);
-
-// The text made loadable, where it is whole but does not load: attributes without a
-// value get an empty one, what no plan can hold is made visible. Nothing where it
-// need not or cannot be done.
-std::optional<std::string> mended(const std::string &text);
-
-// The text without any marks. Nothing where it is not whole.
-std::optional<std::string> without_marks(const std::string &text);
 
 } // namespace fptest

@@ -6,7 +6,6 @@
 #include "util/text.h"
 
 #include <algorithm>
-#include <array>
 #include <csignal>
 #include <string_view>
 #include <utility>
@@ -77,21 +76,6 @@ std::string total(const Run &run)
         text += ", round " + std::to_string(run.round);
     }
     return text + ", " + duration(run.seconds);
-}
-
-std::string name_of_signal(int signal)
-{
-    // the C library's own table has no name that all of them have
-    static constexpr std::pair<int, const char *> kNames[] = {
-        {SIGHUP, "SIGHUP"},   {SIGINT, "SIGINT"},   {SIGQUIT, "SIGQUIT"}, {SIGILL, "SIGILL"},
-        {SIGTRAP, "SIGTRAP"}, {SIGABRT, "SIGABRT"}, {SIGBUS, "SIGBUS"},   {SIGFPE, "SIGFPE"},
-        {SIGKILL, "SIGKILL"}, {SIGUSR1, "SIGUSR1"}, {SIGSEGV, "SIGSEGV"}, {SIGUSR2, "SIGUSR2"},
-        {SIGPIPE, "SIGPIPE"}, {SIGALRM, "SIGALRM"}, {SIGTERM, "SIGTERM"}, {SIGXCPU, "SIGXCPU"},
-        {SIGXFSZ, "SIGXFSZ"}, {SIGSYS, "SIGSYS"},
-    };
-    const auto *const found =
-        std::ranges::find(kNames, signal, &std::pair<int, const char *>::first);
-    return found != std::end(kNames) ? found->second : "signal " + std::to_string(signal);
 }
 
 std::string how_it_ended(const ItemRun &item)

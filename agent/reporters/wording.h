@@ -20,9 +20,6 @@ std::string heading(const Run &run);
 // "3 passed, 1 failed, 2 to go, 12.0 s"
 std::string total(const Run &run);
 
-// "SIGSEGV", "signal 40"
-std::string name_of_signal(int signal);
-
 // "exit status 5", "died by SIGSEGV"; empty where there is nothing to be said: it
 // ended with 0, or by the signal that stopped it.
 std::string how_it_ended(const ItemRun &item);

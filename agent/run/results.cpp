@@ -3,6 +3,11 @@
 
 #include "run/results.h"
 
+#include <algorithm>
+#include <csignal>
+#include <iterator>
+#include <utility>
+
 namespace fptest
 {
 
@@ -96,6 +101,21 @@ const char *word(Outcome outcome)
         return "stopped";
     }
     return "";
+}
+
+std::string name_of_signal(int signal)
+{
+    // the C library's own table has no name that all of them have
+    static constexpr std::pair<int, const char *> kNames[] = {
+        {SIGHUP, "SIGHUP"},   {SIGINT, "SIGINT"},   {SIGQUIT, "SIGQUIT"}, {SIGILL, "SIGILL"},
+        {SIGTRAP, "SIGTRAP"}, {SIGABRT, "SIGABRT"}, {SIGBUS, "SIGBUS"},   {SIGFPE, "SIGFPE"},
+        {SIGKILL, "SIGKILL"}, {SIGUSR1, "SIGUSR1"}, {SIGSEGV, "SIGSEGV"}, {SIGUSR2, "SIGUSR2"},
+        {SIGPIPE, "SIGPIPE"}, {SIGALRM, "SIGALRM"}, {SIGTERM, "SIGTERM"}, {SIGXCPU, "SIGXCPU"},
+        {SIGXFSZ, "SIGXFSZ"}, {SIGSYS, "SIGSYS"},
+    };
+    const auto *const found =
+        std::ranges::find(kNames, signal, &std::pair<int, const char *>::first);
+    return found != std::end(kNames) ? found->second : "signal " + std::to_string(signal);
 }
 
 std::string of_round(const Run &run)

@@ -123,6 +123,9 @@ void summarize(Run &run);
 // "passed", "failed", "no result", "timed out", "stopped", "not run"
 const char *word(Outcome outcome);
 
+// "SIGSEGV", "signal 40"
+std::string name_of_signal(int signal);
+
 // " (round 2)" where there is more than one.
 std::string of_round(const Run &run);
 

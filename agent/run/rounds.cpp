@@ -3,10 +3,10 @@
 
 #include "run/rounds.h"
 
-#include "cli/outputs.h"
 #include "module/preflight.h"
 #include "module/stored_plan.h"
 #include "plan/plan.h"
+#include "plan/plan_text.h"
 #include "util/files.h"
 #include "util/text.h"
 
@@ -258,30 +258,15 @@ void begin(Run &run, const std::vector<Listener *> &listeners, Signals &signals)
     }
 }
 
-Runner::Limits limits_of(const RunOptions &options)
-{
-    Runner::Limits limits;
-    if (options.timeout) {
-        limits.item = std::chrono::duration<double>(*options.timeout);
-    }
-    limits.grace = std::chrono::duration<double>(options.grace);
-    limits.exit_status = options.exit_status;
-    return limits;
-}
-
 } // namespace
 
-Exit run_rounds(const RunOptions &options, Host &host, Signals &signals, Run &run, const Work &work)
+Exit run_rounds(const std::vector<Listener *> &listeners, const Runner::Limits &limits, Host &host,
+                Signals &signals, Run &run, const Work &work)
 {
-    const auto owned = make_listeners(options);
-    std::vector<Listener *> listeners;
-    for (const auto &listener : owned) {
-        listeners.push_back(listener.get());
-    }
     run.suites = work.suites;
     run.start = std::chrono::system_clock::now();
     begin(run, listeners, signals);
-    Runner runner(host, signals, run, listeners, limits_of(options));
+    Runner runner(host, signals, run, listeners, limits);
     bool broken = false;
     try {
         Rounds(runner, run, listeners, work).run_all();

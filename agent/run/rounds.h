@@ -4,17 +4,19 @@
 // Runs the rounds of a run, and tells of them.
 #pragma once
 
-#include "cli/commands.h"
 #include "module/module_process.h"
 #include "run/planner.h"
 #include "run/runner.h"
+#include "util/failure.h"
+
+#include <vector>
 
 namespace fptest
 {
 
 // How fptest is to end. Throws a Failure where the run, or one of its reports, could
 // not be carried through.
-Exit run_rounds(const RunOptions &options, Host &host, Signals &signals, Run &run,
-                const Work &work);
+Exit run_rounds(const std::vector<Listener *> &listeners, const Runner::Limits &limits, Host &host,
+                Signals &signals, Run &run, const Work &work);
 
 } // namespace fptest

@@ -4,7 +4,7 @@
 #include "run/runner.h"
 
 #include "module/stored_plan.h"
-#include "reporters/wording.h"
+#include "plan/plan_text.h"
 #include "run/trigger.h"
 #include "util/files.h"
 #include "util/text.h"
@@ -46,8 +46,8 @@ std::string reported(const ItemReport &report)
                : "reported the result " + report.result.value_or("");
 }
 
-// As it reads once the plan has been mended.
-ItemReport as_mended(ItemReport report)
+// As it reads once the plan has been made loadable.
+ItemReport as_made_loadable(ItemReport report)
 {
     if (report.result_without_value) {
         report.result_without_value = false;
@@ -566,7 +566,7 @@ void Runner::read_late_report(Judged &judged, const Plan &plan)
     }
     const ItemReport report = plan.report(number);
     const bool has_reported = report.result || report.result_without_value;
-    if (!has_reported || as_mended(report) == as_mended(judged.report)) {
+    if (!has_reported || as_made_loadable(report) == as_made_loadable(judged.report)) {
         return;
     }
     judged.report = report;

@@ -4,6 +4,7 @@
 // Test plans as the library sees them. What it runs is compared with its own
 // lookups, done on the same tree by the same calls of Mini-XML.
 #include "plan/plan.h"
+#include "plan/plan_text.h"
 
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>

@@ -1,12 +1,8 @@
 // SPDX-FileCopyrightText: 2026 The Quillmark authors
 // SPDX-License-Identifier: Apache-2.0
 
-// What fptest does, one function a sub-command. Each returns how the program is
-// to end, or throws a Failure.
+// What the command line says of a run.
 #pragma once
-
-#include "check/check.h"
-#include "util/failure.h"
 
 #include <optional>
 #include <string>
@@ -35,31 +31,5 @@ struct RunOptions {
     std::string json;
     std::string log;
 };
-
-struct CheckOptions {
-    std::vector<std::string> files;
-    PlanUse use = PlanUse::to_send;
-};
-
-struct ReportOptions {
-    std::string group;
-    std::string item;
-    int progress = 0;
-    int result = 0;
-    std::string description;
-    std::string log;
-};
-
-struct SendOptions {
-    std::vector<std::string> commands;
-    bool from_input = false; // separated by zero bytes, and the replies as well
-    std::string log;
-};
-
-Exit run(RunOptions options);
-Exit check_files(const CheckOptions &options);
-Exit show(const std::string &file); // empty: the stored plan
-Exit report(const ReportOptions &options);
-Exit send(const SendOptions &options);
 
 } // namespace fptest

@@ -1,0 +1,135 @@
+// SPDX-FileCopyrightText: 2026 The Quillmark authors
+// SPDX-License-Identifier: Apache-2.0
+
+#include "cli/options.h"
+
+#include "cli/desk_paths.h"
+#include "cli/usage.h"
+#include "util/text.h"
+
+#include <algorithm>
+#include <charconv>
+#include <sstream>
+#include <utility>
+
+namespace fptest
+{
+namespace
+{
+
+// What is wrong with a value, which a shell's variable may have left empty.
+std::string refused(const std::string &value, const std::string &why)
+{
+    return value.empty() ? "its value is empty" : "'" + one_line(value) + "' " + why;
+}
+
+template <typename Number> CLI::Validator number_in(Number least, Number most)
+{
+    return {[least, most](std::string &text) {
+                Number number{};
+                const char *end = text.data() + text.size();
+                const auto [stop, error] = std::from_chars(text.data(), end, number);
+                const bool is_number = error == std::errc{} && stop == end;
+                // said so that what is not a number at all is in no range
+                if (is_number && number >= least && number <= most) {
+                    return std::string();
+                }
+                std::ostringstream complaint;
+                complaint.precision(10);
+                complaint << "is no number from " << least << " to " << most;
+                return refused(text, complaint.str());
+            },
+            ""};
+}
+
+} // namespace
+
+CLI::App &add_subcommand(CLI::App &app, const char *name, const char *purpose, const char *examples,
+                         Action &chosen, Action action)
+{
+    CLI::App *command = app.add_subcommand(name, purpose);
+    command->footer(examples);
+    command->failure_message(usage_line);
+    command->callback([&chosen, action = std::move(action)] { chosen = action; });
+    return *command;
+}
+
+void add_log(CLI::App &command, std::string &log)
+{
+    command
+        .add_option("--log", log,
+                    "append the library's log to FILE; without, it\n"
+                    "goes where VR_LOG_FILE says, or nowhere")
+        ->type_name("FILE")
+        ->check(not_empty());
+}
+
+CLI::Validator range(double least, double most)
+{
+    return number_in(least, most);
+}
+
+CLI::Validator range(int least, int most)
+{
+    return number_in(least, most);
+}
+
+CLI::Validator time_span()
+{
+    return {[](std::string &text) {
+                constexpr double kMostDays = 1000;
+                static constexpr std::pair<char, double> kUnits[] = {
+                    {'s', 1}, {'m', 60}, {'h', 3600}, {'d', 86400}};
+                double number = 0;
+                const char *const last = text.data() + text.size();
+                const auto [stop, error] = std::from_chars(text.data(), last, number);
+                double seconds = error == std::errc{} && stop == last ? number : 0;
+                for (const auto &[unit, size] : kUnits) {
+                    if (error == std::errc{} && stop + 1 == last && *stop == unit) {
+                        seconds = number * size;
+                    }
+                }
+                if (seconds > kMostDays * 86400) {
+                    return refused(text, "is longer than 1000 days");
+                }
+                if (!(seconds >= 0.001)) {
+                    return refused(text, "is no time as 90, 90s, 10m, 2h or 1d");
+                }
+                std::ostringstream put_down;
+                put_down.precision(17);
+                put_down << seconds;
+                text = put_down.str();
+                return std::string();
+            },
+            ""};
+}
+
+CLI::Validator one_of(std::vector<std::string> words, std::string otherwise)
+{
+    return {[words = std::move(words), otherwise = std::move(otherwise)](std::string &text) {
+                return std::ranges::find(words, text) != words.end() ? ""
+                                                                     : refused(text, otherwise);
+            },
+            ""};
+}
+
+CLI::Validator result_code()
+{
+    return one_of({"0", "1", "-2"}, "is none of 0, 1 and -2");
+}
+
+CLI::Validator not_empty()
+{
+    return {[](std::string &text) { return text.empty() ? refused(text, "") : ""; }, ""};
+}
+
+CLI::Validator desk_file()
+{
+    return {[](std::string &text) {
+                text = found_on_desk(text);
+                return std::string();
+            },
+            ""};
+}
+
+} // namespace fptest

@@ -1,0 +1,27 @@
+// SPDX-FileCopyrightText: 2026 The Quillmark authors
+// SPDX-License-Identifier: Apache-2.0
+
+// What fptest does, a file for each sub-command: each function adds one, with its
+// options, help and examples.
+#pragma once
+
+#include "util/failure.h"
+
+#include <CLI/CLI.hpp>
+
+#include <functional>
+
+namespace fptest
+{
+
+// Says how the program is to end, or throws a Failure.
+using Action = std::function<Exit()>;
+
+// Where the command line names it, chosen is what it does.
+void add_run(CLI::App &app, Action &chosen);
+void add_check(CLI::App &app, Action &chosen);
+void add_show(CLI::App &app, Action &chosen);
+void add_report(CLI::App &app, Action &chosen);
+void add_send(CLI::App &app, Action &chosen);
+
+} // namespace fptest

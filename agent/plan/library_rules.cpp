@@ -1,0 +1,75 @@
+// SPDX-FileCopyrightText: 2026 The Quillmark authors
+// SPDX-License-Identifier: Apache-2.0
+
+#include "plan/library_rules.h"
+
+#include <algorithm>
+#include <cctype>
+#include <cstring>
+
+namespace fptest
+{
+namespace
+{
+
+constexpr std::size_t kProgramLimit = 1023; // characters of a name that are run
+
+std::string up_to_any(std::string_view text, std::string_view ends)
+{
+    return std::string(text.substr(0, text.find_first_of(ends)));
+}
+
+// The name as it is run, without a suffix.
+std::string program_name(std::string_view name)
+{
+    return up_to_any(name.substr(0, kProgramLimit), std::string_view("\t\n\0", 3));
+}
+
+} // namespace
+
+std::string stored_part(std::string_view text)
+{
+    text.remove_prefix(std::min(text.find_first_not_of(':'), text.size()));
+    return up_to_any(text, std::string_view(":\0", 2)).substr(0, kPlanLimit);
+}
+
+std::optional<std::string> vendor_suffix(int vendor)
+{
+    switch (vendor) {
+    case 0:
+        return "";
+    case 1:
+        return "_ca";
+    case 2:
+        return "_ca_qsee";
+    default:
+        return std::nullopt;
+    }
+}
+
+bool is_gatherer(std::string_view name, int vendor)
+{
+    return (vendor == 0 || vendor == 1) && program_name(name) == kGatherer;
+}
+
+std::string program_of(std::string_view name, std::string_view suffix)
+{
+    std::string program = program_name(name);
+    program += suffix.substr(0, kCommandLimit - program.size());
+    return "/system/bin/" + program;
+}
+
+bool is_plain_name(std::string_view name)
+{
+    return std::ranges::all_of(name, [](unsigned char c) {
+        return std::isalnum(c) != 0 || c >= 0x80 || std::strchr("_-.,+@%", c) != nullptr;
+    });
+}
+
+std::string command_line(std::string_view name, const std::optional<std::string> &args,
+                         std::string_view suffix)
+{
+    return program_of(name, suffix) + " " + args.value_or("(null)");
+}
+
+} // namespace fptest

@@ -1,0 +1,110 @@
+// SPDX-FileCopyrightText: 2026 The Quillmark authors
+// SPDX-License-Identifier: Apache-2.0
+
+#include "plan/plan_text.h"
+
+#include "plan/plan.h"
+#include "util/text.h"
+
+#include <algorithm>
+#include <string_view>
+
+namespace fptest
+{
+namespace
+{
+
+constexpr char kBlanks[] = " \t\n\v\f\r";
+
+// Copies a text, leaving out attributes with the blanks in front of them.
+class AttributeEraser
+{
+  public:
+    explicit AttributeEraser(const std::string &text) : text_(text)
+    {
+    }
+    void erase(const Attribute &place)
+    {
+        const std::size_t end = text_.find_last_not_of(kBlanks, place.begin - 1) + 1;
+        left_.append(text_, done_, end - done_);
+        done_ = place.end;
+    }
+    void insert(std::size_t place, const std::string &text)
+    {
+        left_.append(text_, done_, place - done_);
+        left_ += text;
+        done_ = place;
+    }
+    std::string rest()
+    {
+        return left_.append(text_, done_);
+    }
+
+  private:
+    const std::string &text_;
+    std::string left_;
+    std::size_t done_ = 0;
+};
+
+// The tags of the text's elements; nothing where it is not whole.
+std::optional<std::vector<Tag>> whole_tags(const std::string &text)
+{
+    const std::optional<Plan> plan = Plan::read(text);
+    return plan ? std::optional(element_tags(*plan, text)) : std::nullopt;
+}
+
+} // namespace
+
+std::optional<std::string> without_reports(const std::string &text,
+                                           const std::vector<std::size_t> &numbers,
+                                           const std::string &mark)
+{
+    const auto tags = whole_tags(text);
+    if (!tags) {
+        return std::nullopt;
+    }
+    AttributeEraser eraser(text);
+    for (std::size_t number = 0; number < tags->size(); ++number) {
+        const Tag &tag = (*tags)[number];
+        if (tag.kind > Tag::Kind::empty || std::ranges::find(numbers, number) == numbers.end()) {
+            continue;
+        }
+        eraser.insert(tag.begin + 1 + tag.name.size(),
+                      std::string(" ") + kMark + "=\"" + mark + "\"");
+        for (const Attribute &place : tag.attributes) {
+            if (place.name == "progress" || place.name == "result" || place.name == "description" ||
+                place.name == kMark) {
+                eraser.erase(place);
+            }
+        }
+    }
+    return eraser.rest();
+}
+
+std::optional<std::string> made_loadable(const std::string &text)
+{
+    if (Plan::load(text) || !Plan::read(text)) {
+        return std::nullopt;
+    }
+    const std::string cleaned = clean(text);
+    return with_empty_values(cleaned, scan(cleaned));
+}
+
+std::optional<std::string> without_marks(const std::string &text)
+{
+    const auto tags = whole_tags(text);
+    if (!tags) {
+        return std::nullopt;
+    }
+    AttributeEraser eraser(text);
+    for (const Tag &tag : *tags) {
+        for (const Attribute &place : tag.attributes) {
+            if (place.name == kMark) {
+                eraser.erase(place);
+            }
+        }
+    }
+    return eraser.rest();
+}
+
+} // namespace fptest
