@@ -115,6 +115,7 @@ int main(int argc, char **argv)
     fptest::fill_standard_descriptors();
     // a reader that has left is met as an error where it is written to
     std::signal(SIGPIPE, SIG_IGN);
+    std::signal(SIGXFSZ, SIG_IGN); // as is a limit of a file's size
     Exit status = Exit::success;
     try {
         status = CommandLine().run(argc, argv);

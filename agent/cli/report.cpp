@@ -109,6 +109,7 @@ Exit report(const ReportOptions &options)
 {
     require_log_of_its_own(options.log, Beside::nothing);
     choose_log(options.log);
+    mend_stored_plan(); // or a report that has spoiled it would cost this one
     const Descriptor lock = lock_stored_plan();
     const std::string text = read_stored();
     const Plan plan = load_stored(text);

@@ -51,7 +51,7 @@ struct Source {
 std::string read_plan(const std::string &file)
 {
     const std::string path = file.empty() ? kStoredPlan : file;
-    if (auto text = read_file(path)) {
+    if (auto text = file.empty() ? read_stored_plan() : read_file(path)) {
         return *text;
     }
     if (!file.empty()) {

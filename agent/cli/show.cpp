@@ -2,6 +2,7 @@
 // SPDX-License-Identifier: Apache-2.0
 
 #include "cli/options.h"
+#include "module/stored_plan.h"
 #include "plan/plan.h"
 #include "util/files.h"
 #include "util/terminal.h"
@@ -58,7 +59,7 @@ void print(const std::vector<Row> &rows)
 std::string read_shown(const std::string &file)
 {
     const std::string path = file.empty() ? kStoredPlan : file;
-    if (auto text = read_file(path)) {
+    if (auto text = file.empty() ? read_stored_plan() : read_file(path)) {
         return *text;
     }
     if (file.empty() && errno == ENOENT) {

@@ -124,7 +124,8 @@ std::string usage_line(const CLI::App *app, const CLI::Error &error)
         text = surplus(*app, command, text);
         break;
     case CLI::ExitCodes::RequiredError:
-        text = commands.empty() ? "no command is given" : text;
+        // what is missing may be there, misspelt
+        text = commands.empty() ? "no command is given" : surplus(*app, command, text);
         break;
     default:
         break;

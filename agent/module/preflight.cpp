@@ -86,6 +86,13 @@ void require_device()
                                              " is not writable: " + std::strerror(errno) +
                                              "; make it, or run this as another user");
     }
+    struct stat plan {
+    };
+    if (stat(kStoredPlan, &plan) == 0 && !S_ISREG(plan.st_mode) && !S_ISDIR(plan.st_mode)) {
+        // whoever opened it could wait for ever
+        throw Failure(Exit::environment,
+                      std::string(kStoredPlan) + " is no regular file: remove it");
+    }
 }
 
 void require_room(std::size_t bytes)

@@ -277,6 +277,7 @@ void reset_signals()
     }
     // not ignored, because items would inherit that
     std::signal(SIGPIPE, [](int) {});
+    std::signal(SIGXFSZ, [](int) {});
     sigset_t none;
     sigemptyset(&none);
     sigprocmask(SIG_SETMASK, &none, nullptr);

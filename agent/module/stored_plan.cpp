@@ -30,13 +30,8 @@ std::optional<std::string> read_stored_plan()
 std::string whole_stored_plan()
 {
     std::string text;
-    for (int tries = 0; tries < 20; ++tries) {
-        text = read_stored_plan().value_or("");
-        if (Plan::read(text) || Plan::load(text)) {
-            break;
-        }
-        std::this_thread::sleep_for(std::chrono::milliseconds(10));
-    }
+    made_of_stored_plan(
+        text, [](const std::string &plan) { return Plan::read(plan) || Plan::load(plan); });
     return text;
 }
 

@@ -6,8 +6,10 @@
 
 #include "common/descriptor.h"
 
+#include <chrono>
 #include <optional>
 #include <string>
+#include <thread>
 
 namespace fptest
 {
@@ -15,7 +17,24 @@ namespace fptest
 // Its text as it is; nothing where it cannot be read, errno then says why.
 std::optional<std::string> read_stored_plan();
 
-// Its text, read again for a while where somebody is just writing it; then as it is.
+// What is made of its text. That is read again for a while where nothing can be made of
+// it: somebody may just be writing it.
+template <typename Make> auto made_of_stored_plan(std::string &text, const Make &make)
+{
+    using Clock = std::chrono::steady_clock;
+    const auto begin = Clock::now();
+    for (int tries = 1;; ++tries) {
+        text = read_stored_plan().value_or("");
+        auto made = make(text);
+        // of a large one that is damaged each try takes its time
+        if (made || (tries > 1 && Clock::now() - begin > std::chrono::milliseconds(500))) {
+            return made;
+        }
+        std::this_thread::sleep_for(std::chrono::milliseconds(10));
+    }
+}
+
+// Its text, whole where that comes to be; else as it is.
 std::string whole_stored_plan();
 
 // Makes one load again that a report has spoiled, so that the next items can

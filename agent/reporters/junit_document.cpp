@@ -265,11 +265,24 @@ Tests tests_of_round(const Run &run)
     return tests;
 }
 
+namespace
+{
+
+// Whether there is an error for rounds that have not begun. Where their number is open
+// that is the next one, unless something else says that the run was cut off.
+bool has_rounds_left(const Run &run)
+{
+    const bool is_open = !run.finished && (!run.rounds || run.round < *run.rounds);
+    return rounds_to_come(run) > 0 || (is_open && tests_of_round(run).errors == 0);
+}
+
+} // namespace
+
 std::string junit_head(const Run &run, const Tests &before)
 {
     Tests tests = before;
     tests += tests_of_round(run);
-    if (rounds_to_come(run) > 0) {
+    if (has_rounds_left(run)) {
         ++tests.all;
         ++tests.errors;
     }
@@ -300,21 +313,20 @@ std::string junit_how_it_stands(const Run &run)
 
 std::string junit_tail(const Run &run)
 {
-    std::string text;
-    if (const std::size_t rounds = rounds_to_come(run); rounds > 0) {
-        const int first = run.round + 1;
-        const std::string name =
-            rounds == 1 ? "round " + std::to_string(first)
-                        : "rounds " + std::to_string(first) + " to " + std::to_string(*run.rounds);
-        Tests tests;
-        tests.all = 1;
-        tests.errors = 1;
-        text = "  <testsuite" + attribute("name", name) + attributes(tests) + time_attribute(0) +
-               timestamp_attribute(run.start) + ">\n    <testcase" +
-               attribute("classname", "rounds") + attribute("name", name) + time_attribute(0) +
-               ">\n" + not_run(run, "", false) + "    </testcase>\n  </testsuite>\n";
+    if (!has_rounds_left(run)) {
+        return "</testsuites>\n";
     }
-    return text + "</testsuites>\n";
+    const int first = run.round + 1;
+    const std::string name = rounds_to_come(run) > 1 ? "rounds " + std::to_string(first) + " to " +
+                                                           std::to_string(*run.rounds)
+                                                     : "round " + std::to_string(first);
+    Tests tests;
+    tests.all = 1;
+    tests.errors = 1;
+    return "  <testsuite" + attribute("name", name) + attributes(tests) + time_attribute(0) +
+           timestamp_attribute(run.start) + ">\n    <testcase" + attribute("classname", "rounds") +
+           attribute("name", name) + time_attribute(0) + ">\n" + not_run(run, "", false) +
+           "    </testcase>\n  </testsuite>\n</testsuites>\n";
 }
 
 } // namespace fptest

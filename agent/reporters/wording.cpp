@@ -116,7 +116,7 @@ std::string remark(const ItemRun &item)
     if (text.empty() && item.signal != 0 && !explained) {
         return {}; // how it ended is said already
     }
-    if (explained || text.empty()) {
+    if (explained || item.overruled || text.empty()) {
         text = one_line(item.reason) + (text.empty() || item.reason.empty() ? "" : ": ") + text;
     }
     return text;

@@ -43,6 +43,7 @@ struct ItemRun {
     // was not started.
     std::optional<int> exit_status = std::nullopt;
     int signal = 0;
+    bool overruled = false; // it failed whatever it reported, as the reason says
     std::vector<Leftover> left_running = {};
 };
 

@@ -28,19 +28,6 @@ using Clock = std::chrono::steady_clock;
 
 // --- the stored plan ----------------------------------------------------------
 
-// Reads the stored plan until it is whole: somebody may just be writing it.
-template <typename Edit> auto edited_plan(const Edit &edit, std::string &text)
-{
-    for (int tries = 0;; ++tries) {
-        text = read_stored_plan().value_or("");
-        auto edited = edit(text);
-        if (edited || tries == 50) {
-            return edited;
-        }
-        std::this_thread::sleep_for(std::chrono::milliseconds(10));
-    }
-}
-
 std::string new_mark()
 {
     static unsigned count = 0;
@@ -63,8 +50,8 @@ void clear_reports(Job &job)
     const std::string mark = new_mark();
     const Descriptor lock = lock_stored_plan();
     std::string text;
-    const auto cleared = edited_plan(
-        [&](const std::string &plan) { return without_reports(plan, numbers, mark); }, text);
+    const auto cleared = made_of_stored_plan(
+        text, [&](const std::string &plan) { return without_reports(plan, numbers, mark); });
     if (!cleared && Plan::load(text)) {
         return; // a forced one that is not well-formed: nobody has reported in it
     }
@@ -92,10 +79,13 @@ void clear_marks()
 {
     const Descriptor lock = lock_stored_plan();
     std::string text;
-    const auto cleared =
-        edited_plan([](const std::string &plan) { return without_marks(plan); }, text);
-    if (cleared && *cleared != text) {
-        replace_stored_plan(*cleared);
+    const auto cleared = made_of_stored_plan(text, without_marks);
+    try {
+        if (cleared && *cleared != text) {
+            replace_stored_plan(*cleared);
+        }
+    } catch (const Failure &) {
+        return; // the disk is full: they stay, and the next run replaces them
     }
 }
 

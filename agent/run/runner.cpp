@@ -10,6 +10,7 @@
 #include "util/text.h"
 
 #include <algorithm>
+#include <cstdlib>
 #include <sys/wait.h>
 #include <thread>
 #include <unistd.h>
@@ -57,6 +58,17 @@ ItemReport as_made_loadable(ItemReport report)
     return report;
 }
 
+// What the item died by; 0 where it ended by itself. A shell that has not become the
+// item, as for quotes in its arguments, says so by its own exit status.
+int signal_of(int status)
+{
+    if (WIFSIGNALED(status)) {
+        return WTERMSIG(status);
+    }
+    const int signal = WEXITSTATUS(status) - 128;
+    return name_of_signal(signal).starts_with("SIG") ? signal : 0;
+}
+
 // Whether that element is the item still, and not one of another plan.
 bool is_item(const Plan &plan, std::size_t number, const std::string &name)
 {
@@ -65,6 +77,15 @@ bool is_item(const Plan &plan, std::size_t number, const std::string &name)
     }
     const char *found = mxmlElementGetAttr(plan.elements()[number], "name");
     return found != nullptr && name == found;
+}
+
+// Whether a process with an old copy of the plan may have brought that back.
+bool is_earlier(const ItemReport &report, const ItemReport &last)
+{
+    const auto progress = [](const ItemReport &one) {
+        return std::atol(one.progress.value_or("0").c_str());
+    };
+    return report.result == last.result && progress(report) < progress(last);
 }
 
 // One without it is as a process with an old copy of the plan has written it.
@@ -256,14 +277,14 @@ const ItemRun &Runner::item(const Place &place) const
 
 bool Runner::gathers(const Active &active) const
 {
-    return is_gatherer(item(active.place).name, run_.vendor);
+    return is_gatherer(item(active.place).name, vendor_);
 }
 
 // --- an item's start and end --------------------------------------------------
 
 void Runner::start_next(const Job &job, std::size_t &next, const Host::Event &event)
 {
-    run_.vendor = event.value;
+    vendor_ = event.value;
     const std::size_t at = next++;
     if (at >= job.targets.size() || !job.targets[at]) {
         return;
@@ -282,6 +303,10 @@ void Runner::start_next(const Job &job, std::size_t &next, const Host::Event &ev
                                    SteadyClock::now() - event.time);
     for (Listener *listener : listeners_) {
         listener->started(run_, active.place);
+    }
+    if (vendor_ != run_.vendor) {
+        append_output(item(active.place).output,
+                      "fptest: the vendor is " + std::to_string(vendor_) + " by now\n");
     }
 }
 
@@ -306,10 +331,11 @@ void Runner::end_item(const Host::Event &event)
         append_output(result.output, output);
         active.moved_on = true;
         active.moved_on_at = on_run_clock(event.time);
-        if (!WIFSIGNALED(event.value)) {
+        const int signal = signal_of(event.value);
+        if (signal == 0) {
             result.exit_status = WEXITSTATUS(event.value);
         } else if (!active.was_stopped) { // else it is fptest's own, or the library's
-            result.signal = WTERMSIG(event.value);
+            result.signal = signal;
         }
         result.left_running = left;
         finish(active, active.moved_on_at);
@@ -354,13 +380,14 @@ void Runner::finish(Active &active, TimePoint end)
         active.stop = Outcome::timed_out; // over before that was seen
     }
     judge(active);
+    if (gathers(active) && active_.size() == 1 && !active.stop) {
+        result.left_running = note_left_running(active.target.element);
+    }
     if (gathers(active) && !(result.report.progress == "100" && result.report.result)) {
         gatherer_may_report_late_ = true;
         signal_each(host_.processes().of_gatherer(), SIGTERM);
     }
-    if (!result.left_running.empty() || gathers(active)) {
-        judged_.push_back({active.place, active.target, result.report});
-    }
+    judged_.push_back({active.place, active.target, result.report});
     mend_stored_plan();
 }
 
@@ -376,6 +403,7 @@ void Runner::judge(const Active &active)
     } else if (!module_gone_.empty()) {
         result.outcome = has_reported ? Outcome::failed : Outcome::silent;
         result.reason = module_gone_;
+        result.overruled = has_reported;
     } else if (result.signal != 0) {
         result.outcome = Outcome::failed;
         result.reason = "died by " + name_of_signal(result.signal) +
@@ -383,6 +411,11 @@ void Runner::judge(const Active &active)
     } else if (!has_reported || active.report_lost) {
         result.outcome = Outcome::silent;
         result.reason = why_silent(active);
+    } else if (!active.gatherer_end.empty() && report.progress != "100") {
+        result.outcome = Outcome::failed;
+        result.reason = "the gatherer ended at progress " + report.progress.value_or("0") +
+                        ", though it " + reported(report);
+        result.overruled = true;
     } else if (limits_.exit_status && result.exit_status.value_or(0) != 0) {
         result.outcome = Outcome::failed;
         result.reason = "ended with exit status " + std::to_string(*result.exit_status) +
@@ -415,9 +448,9 @@ std::string Runner::why_stopped(const Active &active)
 
 std::string Runner::why_silent(const Active &active)
 {
-    const auto suffix = vendor_suffix(run_.vendor);
+    const auto suffix = vendor_suffix(vendor_);
     if (!suffix) {
-        return "vendor " + std::to_string(run_.vendor) + " runs no item";
+        return "vendor " + std::to_string(vendor_) + " runs no item";
     }
     const std::string program = program_of(item(active.place).name, *suffix);
     if (is_plain_name(item(active.place).name) && access(program.c_str(), X_OK) != 0) {
@@ -481,6 +514,9 @@ void Runner::look()
         if (text && Plan::read(*text)) {
             plan_status_ = status;
             read_reports(*text);
+            if (!Plan::load(*text)) {
+                mend_stored_plan(); // or who reports next could not
+            }
         }
     }
     for (Active &active : active_) {
@@ -541,7 +577,11 @@ void Runner::read_report(Active &active, const Plan &plan)
     }
     ItemRun &result = item(active.place);
     ItemReport report = plan.report(number);
-    if (report == result.report) {
+    if (report.result == "") { // it has been made loadable already
+        report.result.reset();
+        report.result_without_value = true;
+    }
+    if (as_made_loadable(report) == as_made_loadable(result.report)) {
         return;
     }
     active.undone = result.report.result && !report.result;
@@ -566,7 +606,8 @@ void Runner::read_late_report(Judged &judged, const Plan &plan)
     }
     const ItemReport report = plan.report(number);
     const bool has_reported = report.result || report.result_without_value;
-    if (!has_reported || as_made_loadable(report) == as_made_loadable(judged.report)) {
+    if (!has_reported || as_made_loadable(report) == as_made_loadable(judged.report) ||
+        is_earlier(report, judged.report)) {
         return;
     }
     judged.report = report;

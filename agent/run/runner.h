@@ -104,7 +104,7 @@ class Runner
 
     static constexpr std::size_t kNoElement = static_cast<std::size_t>(-1);
 
-    // An item that has been judged while something that may report it goes on.
+    // An item that has been judged, and may be reported still.
     struct Judged {
         Place place;
         Job::Target target;
@@ -165,6 +165,7 @@ class Runner
     TimePoint last_suspension_;
     SteadyClock::duration last_suspended_{};
     TimePoint began_ = now();
+    int vendor_ = run_.vendor; // which the library read for the item that it came to last
     int signal_ = 0;
     TimePoint signal_taken_at_;
     bool stop_asked_ = false;               // and not yet answered

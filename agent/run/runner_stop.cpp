@@ -26,7 +26,7 @@ using namespace std::chrono_literals;
 constexpr auto kTurn = 25ms;
 constexpr auto kBetweenStops = 250ms;
 constexpr auto kBeforeRelease = 300ms;
-constexpr auto kBeforeGivingUp = 10s; // on what was killed
+constexpr auto kBeforeGivingUp = 5s; // on what was killed: device/run waits for 10 s in all
 // What only takes a moment longer to end has not been left running.
 constexpr auto kEnding = 100ms;
 
@@ -54,6 +54,9 @@ void Runner::read_signals()
         }
         if (signal_ != 0 && signal == SIGHUP) {
             continue; // a terminal that closes sends it once more, or after its Ctrl-C
+        }
+        if (signal_ == SIGHUP && signal == SIGTERM && now() - signal_taken_at_ < 1s) {
+            continue; // a shell that is left sends a job that it had stopped both
         }
         if (signal_ != 0) {
             // the reports are as far as they were written; the host's process
@@ -113,11 +116,10 @@ void Runner::stop_what_is_due(bool command_runs)
         now() - signal_taken_at_ > limits_.grace + kBeforeGivingUp) {
         host_.kill_module(); // it comes to no item, and does not return
     }
-    // the library stops only what it started last: an earlier gatherer gets a signal
+    // the library stops only what it started last: an earlier gatherer gets signals alone
     for (Active &active : active_) {
         if (&active != &active_.back() && !active.done && active.stop) {
-            active.was_stopped = true;
-            finish(active, now());
+            stop_gatherer(active, false, now() - active.stop_wanted_at);
         }
     }
 }
@@ -159,6 +161,9 @@ void Runner::stop_gatherer(Active &active, bool command_runs, SteadyClock::durat
         release_trigger();
     }
     const std::vector<Leftover> left = host_.processes().of_gatherer();
+    if (&active != &active_.back() && signal_each(left, SIGTERM)) {
+        signal_each(left, SIGCONT); // one that is suspended would not see it
+    }
     if (waited > limits_.grace && signal_each(left, SIGKILL)) {
         active.was_stopped = true;
         active.killed = true;
@@ -259,7 +264,7 @@ void Runner::make_way_for(const Job &job)
         end_left_running();
     }
     const auto is_gatherers = [&](const auto &target) {
-        return target && is_gatherer(run_.suites[job.suite].items[target->item].name, run_.vendor);
+        return target && is_gatherer(run_.suites[job.suite].items[target->item].name, vendor_);
     };
     if (std::ranges::any_of(job.targets, is_gatherers)) {
         if (gatherer_may_report_late_) {

@@ -236,7 +236,7 @@ TEST_F(Report, WantsAPlan)
 
 TEST_F(Report, WantsAPlanThatLoads)
 {
-    const std::string broken = "<P><CmdGroup name=\"G\"><Cmd name=\"I\" result/></CmdGroup></P>";
+    const std::string broken = "<P><CmdGroup name=\"G\"><Cmd name=\"I\" result=";
     write_file(kPlanFile, broken);
     const Ended ended = report({"G", "I", "--progress", "1", "--result", "0"});
     EXPECT_EQ(ended.status, 3);

@@ -292,6 +292,20 @@ TEST_F(RoundReports, AreRedInJunitFromTheFirstMomentOn)
     EXPECT_EQ(top.attributes.at("errors"), "3");
 }
 
+TEST_F(RoundReports, AreRedInJunitWhereAnOpenRunIsCutOffBetweenItsRounds)
+{
+    RunOfItems run = two_items(std::nullopt);
+    run.time_limit = 3600;
+    run.finished = false;
+    run.why_unfinished = "interrupted by SIGTERM";
+    const auto report = junit_report(path("xml"));
+    Playback(*report, run).play();
+    const Element top = parse_xml(read_file(path("xml")));
+    EXPECT_EQ(verdicts(top).back(), "rounds/round 2: not run");
+    EXPECT_EQ(top.attributes.at("tests"), "3");
+    EXPECT_EQ(top.attributes.at("errors"), "1");
+}
+
 TEST_F(RoundReports, SkipWhatIsLeftAfterTheItemThatWasWaitedForInJunit)
 {
     RunOfItems run = two_items(std::nullopt);

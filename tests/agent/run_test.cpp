@@ -531,7 +531,8 @@ TEST_F(Run, TakesNoResultOfAnEarlierRoundForOneOfThis)
     EXPECT_EQ(ended.status, 1);
     EXPECT_THAT(outcomes(json()),
                 ElementsAre("Item: passed", "Other: passed", "Third: failed", "Item: no result",
-                            "Other: passed", "Third: no result"));
+                            "Other: passed", "Third: failed"));
+    EXPECT_EQ(reasons(json()).at(5), "died by SIGABRT");
     EXPECT_THAT(ended.out, HasSubstr("G/Item (round 1): passed"));
     EXPECT_THAT(ended.out, HasSubstr("G/Item (round 2): no result"));
     EXPECT_THAT(ended.out, HasSubstr("2 rounds"));

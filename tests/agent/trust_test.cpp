@@ -319,3 +319,118 @@ TEST_F(Trust, SendsNothingIntoARun)
     file("go", "");
     EXPECT_EQ(fptest.wait().status, 0);
 }
+
+// --- what an item counts as, whatever it reported -----------------------------------
+
+TEST_F(Trust, FailsWhatHasCrashedHoweverItsArgsAreWritten)
+{
+    const std::string crash = "report G 100 0 fine crash";
+    const Ended ended = run({{"Item", crash + " 'a b'"},
+                             {"Other", crash + " $((1+1))"},
+                             {"Third", crash + " 2>&amp;1"},
+                             {"Fourth", "report G 100 0 fine"}});
+    EXPECT_EQ(ended.status, 1);
+    EXPECT_THAT(outcomes(),
+                ElementsAre("Item: failed", "Other: failed", "Third: failed", "Fourth: passed"));
+    EXPECT_EQ(of_end(0, "reason"), "died by SIGABRT, though it reported the result 0");
+}
+
+TEST_F(Trust, TellsAReportThatComesInTheMomentOfTheItemsEnd)
+{
+    // the child ends before it would count as left running
+    const Ended ended =
+        run({{"Script", "'(sleep 0.05; fptest report G Script --progress 100 --result 1 "
+                        "--description dead) &amp; fptest report G Script --progress 100 "
+                        "--result 0'"},
+             {"Item", "sleep 0.5 report G 100 0 fine"}});
+    EXPECT_THAT(outcomes(), ElementsAre("Script: passed", "Item: passed"));
+    EXPECT_THAT(ended.out,
+                HasSubstr("G/Script: late report, result 1: dead; it changes nothing\n"));
+}
+
+TEST_F(Trust, TellsAReportThatGoesIntoAnItemBeforeItsOwn)
+{
+    const Ended ended = run({{"Item", "report G 100 0 fine"},
+                             {"Script", "'fptest report G Item --progress 100 --result 1 "
+                                        "--description pasted'"}});
+    EXPECT_THAT(outcomes(), ElementsAre("Item: passed", "Script: no result"));
+    EXPECT_THAT(ended.out,
+                HasSubstr("G/Item: late report, result 1: pasted; it changes nothing\n"));
+}
+
+TEST_F(Trust, LosesNoReportThatComesAfterOneThatSpoilsThePlan)
+{
+    run({{"Script", "'/system/bin/Item report-null G 100 0; fptest report G Script --progress "
+                    "100 --result 1 --description dead'"},
+         {"Item", "report G 100 0 fine"}});
+    EXPECT_THAT(outcomes(), ElementsAre("Script: failed", "Item: passed"));
+    EXPECT_EQ(of_end(0, "description"), "dead");
+}
+
+TEST_F(Trust, FailsAGathererThatEndsBeforeItIsDone)
+{
+    FptestProcess fptest(
+        {"run", "--json", work("json"), "--plan",
+         plan(device::plan_of({{"G", {{"SensorProbe", "--group G --seconds 60"}}}})), "P/G"});
+    ASSERT_TRUE(device::wait_for(
+        [] { return device::processes_named("/system/bin/SensorProbe").size() == 1; }, 20));
+    usleep(500'000); // it has been told by now
+    ASSERT_EQ(
+        run_fptest({"report", "G", "SensorProbe", "--progress", "50", "--result", "0"}).status, 0);
+    kill(device::processes_named("/system/bin/SensorProbe").at(0).pid, SIGSEGV);
+    EXPECT_EQ(fptest.wait().status, 1);
+    EXPECT_THAT(outcomes(), ElementsAre("SensorProbe: failed"));
+    EXPECT_EQ(of_end(0, "reason"),
+              "the gatherer ended at progress 50, though it reported the result 0");
+}
+
+TEST_F(Trust, KillsAGathererThatIgnoresTheStopInAGroupAsWell)
+{
+    run({{"SensorProbe",
+          "--help >/dev/null; exec /system/bin/Stubborn ignore-stop gather sleep 60"},
+         {"Item", "sleep 4 report G 100 0 fine"}},
+        {"--as-group", "--timeout", "1", "--grace", "0.5"});
+    EXPECT_THAT(outcomes(), ElementsAre("SensorProbe: timed out", "Item: timed out"));
+    EXPECT_THAT(of_end(0, "reason"), StartsWith("killed after 1."));
+    EXPECT_THAT(device::processes_named("/system/bin/Stubborn"), ::testing::IsEmpty());
+}
+
+TEST_F(Trust, NamesWhatAGathererLeavesRunning)
+{
+    run({{"SensorProbe", "--help >/dev/null; setsid sleep 30 &amp; exec /system/bin/Item gather "
+                         "report-here G SensorProbe 100 0 fine"},
+         {"Item", "report G 100 0 fine"}});
+    const auto ends = report_files::events_of(read_file(work("json")), "end");
+    ASSERT_THAT(outcomes(), ElementsAre("SensorProbe: passed", "Item: passed"));
+    ASSERT_EQ(ends.at(0).at("left_running").size(), 1U);
+    EXPECT_TRUE(ends.at(1).at("left_running").empty());
+}
+
+// --- limits of the machine ------------------------------------------------------------
+
+TEST_F(Trust, GoesOnWhereAReportIsTooLongForTheLimitOfFiles)
+{
+    plan(kOnePasses);
+    const Ended ended = fptest_runner::run_program(
+        {"/system/bin/sh", "-c",
+         "ulimit -f 2; exec fptest run --quiet --repeat 20 --json /tmp/scene/json --plan "
+         "/tmp/scene/plan.xml P/G"},
+        {{"VR_LOG_FILE", std::nullopt}});
+    EXPECT_EQ(ended.status, 3);
+    EXPECT_THAT(ended.out, testing::EndsWith("fptest: /tmp/scene/json: File too large; the run "
+                                             "went on without it\n"));
+}
+
+TEST_F(Trust, OpensNoFifoInPlaceOfThePlan)
+{
+    unlink(kPlanFile);
+    ASSERT_EQ(mkfifo(kPlanFile, 0600), 0);
+    const std::string path = plan(kOnePasses);
+    for (const device::Lines &arguments :
+         {device::Lines{"run", "--plan", path, "P/G"}, {"run", "P/G"}, {"send", "pingtest"}}) {
+        expect_refusal(3, "fptest: /data/vorlane/src1.xml is no regular file: remove it",
+                       arguments);
+    }
+    EXPECT_EQ(run_fptest({"show"}).status, 2);
+    unlink(kPlanFile);
+}
