@@ -9,10 +9,8 @@
 #include <gtest/gtest.h>
 
 #include <algorithm>
-#include <array>
-#include <cstdio>
+#include <cstdlib>
 #include <filesystem>
-#include <stdexcept>
 #include <string>
 #include <vector>
 
@@ -32,17 +30,9 @@ using Lines = std::vector<std::string>;
 
 Lines output_of(const std::string &command)
 {
-    std::FILE *const pipe = popen(command.c_str(), "r");
-    if (pipe == nullptr) {
-        throw std::runtime_error("cannot be started: " + command);
-    }
-    std::string text;
-    std::array<char, 4096> buffer{};
-    while (const std::size_t got = std::fread(buffer.data(), 1, buffer.size(), pipe)) {
-        text.append(buffer.data(), got);
-    }
-    EXPECT_EQ(pclose(pipe), 0) << command;
-    Lines lines = lines_of(text);
+    const Directory directory;
+    EXPECT_EQ(std::system(("(" + command + ") >" + directory.path("out")).c_str()), 0) << command;
+    Lines lines = lines_of(read_file(directory.path("out")));
     for (std::string &line : lines) {
         line.pop_back();
     }
@@ -180,6 +170,9 @@ TEST_F(Completion, OffersTheStoredPlansNodePaths)
     EXPECT_THAT(offered("run --tap demo/Bringup demo/G"),
                 UnorderedElementsAre("demo/Gather", "demo/Gather/SensorProbe"));
     EXPECT_THAT(offered("run demo/Bringup/S"), ElementsAre("demo/Bringup/SpiCheck"));
+    // the root is called as anyone likes
+    EXPECT_THAT(offered("run other/Ga"),
+                UnorderedElementsAre("other/Gather", "other/Gather/SensorProbe"));
 }
 
 TEST_F(Completion, AsksForThePlanThatIsNamed)
@@ -188,19 +181,9 @@ TEST_F(Completion, AsksForThePlanThatIsNamed)
     EXPECT_EQ(calls(), "run|--plan|plans/demo.xml|--list|");
     offered("run --plan = 'plans/other\\ plan.xml' ''");
     EXPECT_EQ(calls(), "run|--plan|plans/demo.xml|--list|run|--plan|plans/other plan.xml|--list|");
-}
-
-TEST_F(Completion, LooksForAPlanAtHome)
-{
     setenv("HOME", "/home/me", 1);
     offered("run --plan '~/a.xml' ''");
-    EXPECT_EQ(calls(), "run|--plan|/home/me/a.xml|--list|");
-}
-
-TEST_F(Completion, TakesAnyWordForTheRoot)
-{
-    EXPECT_THAT(offered("run other/Ga"),
-                UnorderedElementsAre("other/Gather", "other/Gather/SensorProbe"));
+    EXPECT_TRUE(calls().ends_with("run|--plan|/home/me/a.xml|--list|"));
 }
 
 TEST_F(Completion, OffersNothingWhereThereIsNoPlan)
@@ -223,7 +206,7 @@ TEST_F(Completion, OffersGroupsAndThenTheirItems)
     EXPECT_THAT(offered("report Bringup SpiCheck ''"), IsEmpty());
 }
 
-TEST_F(Completion, NeverRunsWhatAPlanSays)
+TEST_F(Completion, QuotesWhatAPlanSays)
 {
     lists("demo/$(touch bad)/`touch bad`;touch bad  x\n"
           "demo/two words/an item's  y\n");
@@ -236,10 +219,6 @@ TEST_F(Completion, NeverRunsWhatAPlanSays)
     EXPECT_THAT(offered("run 'demo/two\\ wo'"),
                 UnorderedElementsAre("demo/two\\ words", "demo/two\\ words/an\\ item\\'s"));
     EXPECT_FALSE(std::filesystem::exists(directory_.path("bad")));
-}
-
-TEST_F(Completion, FindsWhatHasBeenTypedWithoutQuoting)
-{
     lists("demo/G/a,b  x\n");
     EXPECT_THAT(offered("run demo/G/a,"), ElementsAre("demo/G/a\\,b"));
 }

@@ -7,6 +7,7 @@
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
 
+#include <array>
 #include <random>
 #include <string>
 #include <string_view>
@@ -22,36 +23,16 @@ using namespace std::string_view_literals;
 namespace
 {
 
-const char *kind_name(Tag::Kind kind)
-{
-    switch (kind) {
-    case Tag::Kind::open:
-        return "open";
-    case Tag::Kind::empty:
-        return "empty";
-    case Tag::Kind::close:
-        return "close";
-    case Tag::Kind::comment:
-        return "comment";
-    case Tag::Kind::cdata:
-        return "cdata";
-    case Tag::Kind::instruction:
-        return "instruction";
-    case Tag::Kind::declaration:
-        return "declaration";
-    case Tag::Kind::text:
-        return "text";
-    }
-    return "?";
-}
-
 // "KIND NAME|what stands there", with " ..." after what is not complete.
 std::vector<std::string> scanned(std::string_view text)
 {
+    constexpr std::array<const char *, 8> kKinds = {
+        "open", "empty", "close", "comment", "cdata", "instruction", "declaration", "text"};
     std::vector<std::string> tags;
     for (const Tag &tag : fptest::scan(text)) {
-        tags.push_back(std::string(kind_name(tag.kind)) + (tag.name.empty() ? "" : " " + tag.name) +
-                       "|" + std::string(text.substr(tag.begin, tag.end - tag.begin)) +
+        tags.push_back(std::string(kKinds.at(static_cast<std::size_t>(tag.kind))) +
+                       (tag.name.empty() ? "" : " ") + tag.name + "|" +
+                       std::string(text.substr(tag.begin, tag.end - tag.begin)) +
                        (tag.complete ? "" : " ..."));
     }
     return tags;
@@ -75,10 +56,17 @@ std::vector<std::string> attributes(std::string_view text)
     return list;
 }
 
-std::string place(std::string_view text, std::size_t offset)
+// "LINE:COLUMN" of every byte, of the end and of what is after it.
+std::string places(std::string_view text)
 {
-    const Position position = fptest::Positions(text).of(offset);
-    return std::to_string(position.line) + ":" + std::to_string(position.column);
+    std::string all;
+    fptest::Positions positions(text);
+    for (std::size_t offset = 0; offset <= text.size() + 1; ++offset) {
+        const Position place = positions.of(offset);
+        all += (offset > 0 ? " " : "") + std::to_string(place.line) + ":" +
+               std::to_string(place.column);
+    }
+    return all;
 }
 
 // --- tags -------------------------------------------------------------------
@@ -109,24 +97,17 @@ TEST(Scan, EndsATagAfterQuotesOnly)
 {
     EXPECT_THAT(scanned("<a b='<c>/>'><d e=\"?>'/>\"/>"),
                 ElementsAre("open a|<a b='<c>/>'>", "empty d|<d e=\"?>'/>\"/>"));
-}
-
-TEST(Scan, TakesATagEndedByAQuestionMarkForAnEmptyOne)
-{
+    // a question mark, too, makes it an empty one
     EXPECT_THAT(scanned("<a b='c'?>d"), ElementsAre("empty a|<a b='c'?>", "text|d"));
 }
 
-TEST(Scan, SeesNoEndInACommentOfNothing)
+TEST(Scan, SeesNoEndInACommentOfNothingOrAfterThreeHyphens)
 {
     EXPECT_THAT(scanned("<!----><a/><!-- b --><c/>"),
                 ElementsAre("comment|<!----><a/><!-- b -->", "empty c|<c/>"));
     EXPECT_THAT(scanned("<!--><a/>-->"), ElementsAre("comment|<!--><a/>-->"));
     EXPECT_THAT(scanned("<!---><a/>-->"), ElementsAre("comment|<!---><a/>-->"));
     EXPECT_THAT(scanned("<!--a-->b"), ElementsAre("comment|<!--a-->", "text|b"));
-}
-
-TEST(Scan, SeesNoEndOfACommentAfterThreeHyphens)
-{
     EXPECT_THAT(scanned("<!-- a ---> b --> c"), ElementsAre("comment|<!-- a ---> b -->", "text|c"));
 }
 
@@ -162,28 +143,20 @@ TEST(Scan, TakesWhatBreaksOff)
     EXPECT_THAT(scanned("<?xml ?"), ElementsAre("instruction xml|<?xml ? ..."));
 }
 
-TEST(Scan, GoesOnWithTheNextTagWhereOneBreaksOff)
+TEST(Scan, GoesOnWithTheNextTagWhereOneBreaksOffAndPassesOverStrayCharacters)
 {
     EXPECT_THAT(scanned("<a b=\"c\"\n<d/>"),
                 ElementsAre("open a|<a b=\"c\"\n ...", "empty d|<d/>"));
     EXPECT_THAT(scanned("<a<d/>"), ElementsAre("open a|<a ...", "empty d|<d/>"));
-}
-
-TEST(Scan, PassesOverStrayCharactersInATag)
-{
     EXPECT_THAT(scanned("<a / b='c' ?d>"), ElementsAre("open a|<a / b='c' ?d>"));
 }
 
 // --- attributes --------------------------------------------------------------
 
-TEST(ScannedAttributes, HaveNamesAndValuesInEitherQuotes)
+TEST(ScannedAttributes, HaveNamesAndValuesInEitherQuotesWithOrWithoutBlanksBetweenThem)
 {
     EXPECT_THAT(attributes("<Cmd name=\"x\" args='a \"b\"'\n\td = \"\" />"),
                 ElementsAre("name|name=\"x\"|x", "args|args='a \"b\"'|a \"b\"", "d|d = \"\"|"));
-}
-
-TEST(ScannedAttributes, MayStandWithoutBlanksBetweenThem)
-{
     EXPECT_THAT(attributes("<a b=\"c\"d='e'/>"), ElementsAre("b|b=\"c\"|c", "d|d='e'|e"));
 }
 
@@ -259,64 +232,38 @@ TEST(Scan, CoversWhateverItIsGiven)
 
 TEST(PositionInText, CountsLinesAndColumnsFromOne)
 {
-    EXPECT_EQ(place("", 0), "1:1");
-    EXPECT_EQ(place("abc", 0), "1:1");
-    EXPECT_EQ(place("abc", 2), "1:3");
-    EXPECT_EQ(place("abc", 3), "1:4");
-    EXPECT_EQ(place("a\nbc\n\nd", 1), "1:2");
-    EXPECT_EQ(place("a\nbc\n\nd", 2), "2:1");
-    EXPECT_EQ(place("a\nbc\n\nd", 5), "3:1");
-    EXPECT_EQ(place("a\nbc\n\nd", 6), "4:1");
-    EXPECT_EQ(place("a\n", 2), "2:1");
-}
-
-TEST(PositionInText, TakesAPlaceAfterTheEndForTheEnd)
-{
-    EXPECT_EQ(place("a\nbc", 99), "2:3");
-}
-
-TEST(PositionInText, CountsACharacterOfSeveralBytesOnce)
-{
-    EXPECT_EQ(place("\xC3\xA9\xE2\x82\xAC\xF0\x9F\x98\x80x", 0), "1:1");
-    EXPECT_EQ(place("\xC3\xA9\xE2\x82\xAC\xF0\x9F\x98\x80x", 2), "1:2");
-    EXPECT_EQ(place("\xC3\xA9\xE2\x82\xAC\xF0\x9F\x98\x80x", 5), "1:3");
-    EXPECT_EQ(place("\xC3\xA9\xE2\x82\xAC\xF0\x9F\x98\x80x", 9), "1:4");
+    EXPECT_EQ(places(""), "1:1 1:1");
+    EXPECT_EQ(places("abc"), "1:1 1:2 1:3 1:4 1:4");
+    EXPECT_EQ(places("a\nbc\n\nd"), "1:1 1:2 2:1 2:2 2:3 3:1 4:1 4:2 4:2");
+    EXPECT_EQ(places("a\n"), "1:1 1:2 2:1 2:1");
 }
 
 TEST(PositionInText, IsThatOfTheCharacterThatItStandsIn)
 {
-    EXPECT_EQ(place("x\xE2\x82\xACy", 2), "1:2");
-    EXPECT_EQ(place("x\xE2\x82\xACy", 3), "1:2");
-    EXPECT_EQ(place("x\xE2\x82\xACy", 4), "1:3");
+    EXPECT_EQ(places("\u00E9\u20AC\U0001F600x"), "1:1 1:1 1:2 1:2 1:2 1:3 1:3 1:3 1:3 1:4 1:5 1:5");
 }
 
 TEST(PositionInText, CountsBytesThatAreNoUtf8OneByOne)
 {
-    EXPECT_EQ(place("\xFF\xA9\xC3x\xE2\x82", 3), "1:4");
-    EXPECT_EQ(place("\xFF\xA9\xC3x\xE2\x82", 4), "1:5");
-    EXPECT_EQ(place("\xFF\xA9\xC3x\xE2\x82", 5), "1:6");
-    EXPECT_EQ(place("\xFF\xA9\xC3x\xE2\x82", 6), "1:7");
-}
-
-TEST(PositionInText, KnowsNoTwoByteCharacterBelowC2)
-{
-    EXPECT_EQ(place("\xC1\x80\xC2\x80", 2), "1:3");
-    EXPECT_EQ(place("\xC1\x80\xC2\x80", 4), "1:4");
-}
-
-TEST(PositionInText, CountsATabAndACarriageReturnOnce)
-{
-    EXPECT_EQ(place("\t\t<a>\r\nb", 2), "1:3");
-    EXPECT_EQ(place("\t\t<a>\r\nb", 6), "1:7");
-    EXPECT_EQ(place("\t\t<a>\r\nb", 7), "2:1");
+    EXPECT_EQ(places("\xFF\xA9\xC3x\xE2\x82"), "1:1 1:2 1:3 1:4 1:5 1:6 1:7 1:7");
+    EXPECT_EQ(places("\xC1\x80\xC2\x80"), "1:1 1:2 1:3 1:3 1:4 1:4");
 }
 
 TEST(PositionInText, DoesNotCountAByteOrderMark)
 {
-    EXPECT_EQ(place("\xEF\xBB\xBF<a>\n\xEF\xBB\xBFx", 0), "1:1");
-    EXPECT_EQ(place("\xEF\xBB\xBF<a>\n\xEF\xBB\xBFx", 3), "1:1");
-    EXPECT_EQ(place("\xEF\xBB\xBF<a>\n\xEF\xBB\xBFx", 5), "1:3");
-    EXPECT_EQ(place("\xEF\xBB\xBF<a>\n\xEF\xBB\xBFx", 10), "2:2");
+    EXPECT_EQ(places("\uFEFF<\n\uFEFFx"), "1:1 1:1 1:1 1:1 1:2 2:1 2:1 2:1 2:2 2:3 2:3");
+}
+
+TEST(PositionInText, ComesInAnyOrder)
+{
+    const std::string text = "\uFEFFa\n\u00E9b";
+    fptest::Positions positions(text);
+    for (const std::size_t offset : {7, 6, 7, 3, 1, 8}) {
+        const Position place = positions.of(offset);
+        const Position alone = fptest::Positions(text).of(offset);
+        EXPECT_EQ(place.line, alone.line) << offset;
+        EXPECT_EQ(place.column, alone.column) << offset;
+    }
 }
 
 } // namespace

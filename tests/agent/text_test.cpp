@@ -46,27 +46,16 @@ constexpr char kSmile[] = "\U0001F600"; // 4 bytes, 2 columns
 
 // --- what is valid -----------------------------------------------------------
 
-TEST(Clean, LeavesPlainTextAlone)
+TEST(Clean, LeavesPlainTextAndTheFirstAndTheLastCharacterOfEverySizeAlone)
 {
-    EXPECT_EQ(clean("3 dead pixels, limit 2 ~"), "3 dead pixels, limit 2 ~");
-    EXPECT_EQ(clean(""), "");
-}
-
-TEST(Clean, LeavesTheFirstAndTheLastCharacterOfEverySizeAlone)
-{
-    for (const char *text : {"\u00A0", "\u07FF", "\u0800", "\uD7FF", "\uE000", "\uFFFD", "\uFFFE",
-                             "\uFFFF", "\U00010000", "\U0010FFFF"}) {
+    for (const char *text : {"", "3 dead pixels, limit 2 ~", "\u00A0", "\u07FF", "\u0800", "\uD7FF",
+                             "\uE000", "\uFFFD", "\uFFFE", "\uFFFF", "\U00010000", "\U0010FFFF"}) {
         EXPECT_EQ(clean(text), text);
         EXPECT_EQ(one_line(text), text);
     }
 }
 
-TEST(Clean, KeepsTabsAndLineEnds)
-{
-    EXPECT_EQ(clean("a\tb\nc\r\n"), "a\tb\nc\r\n");
-}
-
-TEST(Clean, ShowsEveryOtherControlCharacterByItsPicture)
+TEST(Clean, ShowsEveryControlCharacterButTabsAndLineEndsByItsPicture)
 {
     for (int code = 0; code < 0x20; ++code) {
         const std::string picture = {'\xE2', '\x90', static_cast<char>(0x80 + code)};
@@ -76,7 +65,7 @@ TEST(Clean, ShowsEveryOtherControlCharacterByItsPicture)
         EXPECT_EQ(one_line(byte), picture) << code;
     }
     EXPECT_EQ(clean("\x7F"), "\u2421");
-    EXPECT_EQ(clean("\x1B[31mred"), "\u241B[31mred");
+    EXPECT_EQ(clean("\x1B[31m\0red"s), "\u241B[31m\u2400red");
 }
 
 TEST(Clean, ReplacesTheControlCharactersAboveAscii)
@@ -88,34 +77,21 @@ TEST(Clean, ReplacesTheControlCharactersAboveAscii)
     }
 }
 
-struct Invalid {
-    const char *what;
-    std::string bytes;
-};
-
 TEST(Clean, ReplacesEveryByteThatIsNoUtf8)
 {
-    const std::vector<Invalid> all = {
-        {"a byte that only continues", "\x80"},
-        {"another one", "\xBF"},
-        {"two bytes for one of ASCII", "\xC0\x80"},
-        {"the last of those", "\xC1\xBF"},
-        {"three bytes where two do", "\xE0\x9F\xBF"},
-        {"four bytes where three do", "\xF0\x8F\xBF\xBF"},
-        {"the first surrogate", "\xED\xA0\x80"},
-        {"the last surrogate", "\xED\xBF\xBF"},
-        {"beyond the last character", "\xF4\x90\x80\x80"},
-        {"a first byte of five", "\xF8\x88\x80\x80\x80"},
-        {"another one", "\xF9\x80\x80\x80\x80"},
-        {"a first byte of six", "\xFD\x80\x80\x80\x80\x80"},
-        {"the last byte there is", "\xFF"},
-    };
-    for (const Invalid &one : all) {
-        std::string expected = "<";
-        for (std::size_t at = 0; at < one.bytes.size(); ++at) {
+    for (const std::string bytes :
+         {"\x80", "\xBF",                 // go on with no character
+          "\xC0\x80", "\xC1\xBF",         // two bytes for one of ASCII
+          "\xE0\x9F\xBF",                 // three bytes where two do
+          "\xF0\x8F\xBF\xBF",             // four bytes where three do
+          "\xED\xA0\x80", "\xED\xBF\xBF", // surrogates
+          "\xF4\x90\x80\x80",             // beyond the last character
+          "\xF8\x88\x80\x80\x80", "\xF9\x80\x80\x80\x80", "\xFD\x80\x80\x80\x80\x80", "\xFF"}) {
+        std::string expected;
+        for (std::size_t left = bytes.size(); left > 0; --left) {
             expected += "\uFFFD";
         }
-        EXPECT_EQ(clean("<" + one.bytes + ">"), expected + ">") << one.what;
+        EXPECT_EQ(clean("<" + bytes + ">"), "<" + expected + ">") << testing::PrintToString(bytes);
     }
 }
 
@@ -126,16 +102,6 @@ TEST(Clean, ReplacesACharacterThatBreaksOffAndGoesOnAfterIt)
     EXPECT_EQ(clean("a\xF0\x9F\x98"), "a\uFFFD\uFFFD\uFFFD");
     EXPECT_EQ(clean(std::string_view("a\u00E9").substr(0, 2)), "a\uFFFD");
     EXPECT_EQ(clean("\xE6x\xC3\xC3\xA9"), "\uFFFDx\uFFFD\u00E9");
-}
-
-TEST(Clean, TakesAZeroByteForACharacterLikeOthers)
-{
-    EXPECT_EQ(clean("a\0b"s), "a\u2400b");
-}
-
-TEST(OneLine, ShowsTabsAndLineEndsByTheirPictures)
-{
-    EXPECT_EQ(one_line("a\tb\nc\r"), "a\u2409b\u240Ac\u240D");
 }
 
 TEST(OneLine, TurnsNoText)
@@ -168,10 +134,7 @@ TEST(Columns, CountsWhatATerminalShows)
     EXPECT_EQ(columns(kSmile), 2U);
     EXPECT_EQ(columns("e"s + kAccent), 1U);
     EXPECT_EQ(columns("\uFFFD\u241B"), 2U);
-}
-
-TEST(Columns, TakesOneForACharacterThatTheLibraryDoesNotKnow)
-{
+    // which the C library does not know
     EXPECT_EQ(columns("\uFFFF"), 1U);
     EXPECT_EQ(columns("\U0010FFFF"), 1U);
 }
@@ -207,47 +170,43 @@ TEST(ColumnsDeathTest, AreOneForEachCharacterWhereNoLocaleTells)
         ::testing::ExitedWithCode(0), "");
 }
 
-TEST(Fit, PadsAShorterText)
-{
-    EXPECT_EQ(fit("abc", 5), "abc  ");
-    EXPECT_EQ(fit("", 2), "  ");
-    EXPECT_EQ(fit("abc", 3), "abc");
-    EXPECT_EQ(fit("", 0), "");
-}
-
-TEST(Fit, CutsALongerText)
-{
-    EXPECT_EQ(fit("SensorProbe", 8), "Senso...");
-    EXPECT_EQ(fit("SensorProbe", 10), "SensorP...");
-    EXPECT_EQ(fit("SensorProbe", 11), "SensorProbe");
-}
-
-TEST(Fit, GivesDotsAloneWhereThereIsNoRoomForMore)
-{
-    EXPECT_EQ(fit("abcdef", 4), "a...");
-    EXPECT_EQ(fit("abcdef", 3), "...");
-    EXPECT_EQ(fit("abcdef", 2), "..");
-    EXPECT_EQ(fit("abcdef", 1), ".");
-    EXPECT_EQ(fit("abcdef", 0), "");
-}
-
-TEST(Fit, CutsNoWideCharacterInHalves)
+TEST(Fit, PadsWhatIsCut)
 {
     const std::string three = "\u65E5\u672C\u8A9E";
-    EXPECT_EQ(fit(three, 6), three);
-    EXPECT_EQ(fit(three, 5), "\u65E5...");
-    EXPECT_EQ(fit(three + "x", 6), "\u65E5... ");
-    EXPECT_EQ(fit(three, 4), "... ");
-    EXPECT_EQ(cut(three, 4), "...");
-    EXPECT_EQ(fit("\U0001F600\U0001F600\U0001F600", 5), "\U0001F600...");
-}
-
-TEST(Fit, LeavesAccentsWithTheirLetter)
-{
-    EXPECT_EQ(fit("abe\u0301\u0323def", 6), "abe\u0301\u0323def");
-    EXPECT_EQ(fit("abe\u0301\u0323defg", 6), "abe\u0301\u0323...");
-    EXPECT_EQ(fit("abe\u0301\u0323defg", 5), "ab...");
-    EXPECT_EQ(fit("e\u0301", 3), "e\u0301  ");
+    struct Fitted {
+        std::string text;
+        std::size_t width;
+        std::string fitted;
+    };
+    for (const auto &[text, width, fitted] : std::vector<Fitted>{
+             {"", 2, ""},
+             {"", 0, ""},
+             {"abc", 5, "abc"},
+             {"abc", 3, "abc"},
+             {"SensorProbe", 8, "Senso..."},
+             {"SensorProbe", 10, "SensorP..."},
+             {"SensorProbe", 11, "SensorProbe"},
+             // dots alone where there is no room for more
+             {"abcdef", 4, "a..."},
+             {"abcdef", 3, "..."},
+             {"abcdef", 2, ".."},
+             {"abcdef", 1, "."},
+             {"abcdef", 0, ""},
+             // no half of a wide character
+             {three, 6, three},
+             {three, 5, "\u65E5..."},
+             {three + "x", 6, "\u65E5..."},
+             {three, 4, "..."},
+             {"\U0001F600\U0001F600\U0001F600", 5, "\U0001F600..."},
+             // accents with their letter
+             {"abe\u0301\u0323def", 6, "abe\u0301\u0323def"},
+             {"abe\u0301\u0323defg", 6, "abe\u0301\u0323..."},
+             {"abe\u0301\u0323defg", 5, "ab..."},
+             {"e\u0301", 3, "e\u0301"},
+         }) {
+        EXPECT_EQ(cut(text, width), fitted) << width;
+        EXPECT_EQ(fit(text, width), fitted + std::string(width - columns(fitted), ' ')) << width;
+    }
 }
 
 TEST(Fit, AlwaysTakesExactlyThatManyColumns)
@@ -266,14 +225,6 @@ TEST(Fit, AlwaysTakesExactlyThatManyColumns)
         EXPECT_EQ(clean(fit(text, width)), fit(text, width)) << text;
         EXPECT_LE(columns(cut(text, width)), width) << text;
     }
-}
-
-TEST(Cut, PadsNothing)
-{
-    EXPECT_EQ(cut("abc", 5), "abc");
-    EXPECT_EQ(cut("abc", 3), "abc");
-    EXPECT_EQ(cut("abcd", 3), "...");
-    EXPECT_EQ(cut("abcdefg", 6), "abc...");
 }
 
 // --- words -------------------------------------------------------------------
@@ -302,14 +253,10 @@ TEST(Nearest, TakesADifferenceInCaseLightly)
     EXPECT_EQ(nearest("aa", {"AA"}), "AA");
 }
 
-TEST(Nearest, PrefersTheSameCase)
+TEST(Nearest, PrefersTheSameCaseAndThenTheFirst)
 {
     EXPECT_EQ(nearest("Scan", {"scan", "Scam", "Scan"}), "Scan");
     EXPECT_EQ(nearest("sCan", {"Scan", "scan"}), "scan");
-}
-
-TEST(Nearest, TakesTheFirstOfEquallyNearOnes)
-{
     EXPECT_EQ(nearest("Scan3", {"Scan1", "Scan2"}), "Scan1");
     EXPECT_EQ(nearest("Scan3", {"Scan2", "Scan1"}), "Scan2");
 }
@@ -353,17 +300,13 @@ TEST(Listing, ReadsLikeASentence)
 
 // --- times -------------------------------------------------------------------
 
-TEST(Duration, IsInTenthsBelowAMinute)
+TEST(Duration, IsInTenthsBelowAMinuteAndThenAClock)
 {
     EXPECT_EQ(duration(0), "0.0 s");
     EXPECT_EQ(duration(0.3), "0.3 s");
     EXPECT_EQ(duration(0.25), "0.3 s");
     EXPECT_EQ(duration(12), "12.0 s");
     EXPECT_EQ(duration(59.94), "59.9 s");
-}
-
-TEST(Duration, IsAClockFromAMinuteOn)
-{
     EXPECT_EQ(duration(59.96), "1:00");
     EXPECT_EQ(duration(60), "1:00");
     EXPECT_EQ(duration(185), "3:05");
