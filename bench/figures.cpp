@@ -4,10 +4,12 @@
 #include "figures.h"
 
 #include <algorithm>
-#include <array>
-#include <cmath>
+#include <cerrno>
 #include <cstddef>
 #include <cstdio>
+#include <cstring>
+#include <stdexcept>
+#include <unistd.h>
 
 namespace bench
 {
@@ -62,7 +64,23 @@ std::string bytes_text(double bytes)
     return decimal(kilobytes, kilobytes < 999.5 ? 1 : 0) + " KB";
 }
 
-std::string table_line(const std::vector<std::string> &columns, const Widths &widths)
+namespace
+{
+
+std::FILE *out = stdout;
+bool is_missed = false;
+
+} // namespace
+
+void set_library_output_aside()
+{
+    out = fdopen(dup(STDOUT_FILENO), "w");
+    if (out == nullptr || std::freopen("/dev/null", "w", stdout) == nullptr) {
+        throw std::runtime_error("standard output cannot be set aside");
+    }
+}
+
+void print(const std::vector<std::string> &columns, const Widths &widths)
 {
     std::string line;
 
@@ -71,24 +89,28 @@ std::string table_line(const std::vector<std::string> &columns, const Widths &wi
         std::snprintf(text.data(), text.size(), "%*s", widths.at(at), columns.at(at).c_str());
         line += text.data();
     }
-    return line.substr(0, line.find_last_not_of(' ') + 1) + "\n";
+    line.erase(line.find_last_not_of(' ') + 1);
+    if (std::fprintf(out, "%s\n", line.c_str()) < 0 || std::fflush(out) != 0) {
+        throw std::runtime_error(std::string("standard output cannot be written: ") +
+                                 std::strerror(errno));
+    }
 }
 
-std::string heading()
+std::string verdict(double figure, double limit, double spread)
 {
-    return table_line({"", "module", "floor", "ratio", "+-", "limit", ""});
+    if (limit <= 0) {
+        return "";
+    }
+    if (figure <= limit) {
+        return "ok";
+    }
+    is_missed = true;
+    return figure - spread <= limit ? "unclear" : "MISSED";
 }
 
-std::string result_line(const std::string &name, const Result &result)
+bool is_a_limit_missed()
 {
-    const bool judged = result.limit > 0;
-    return table_line({name, time_text(result.module), time_text(result.floor),
-                       decimal(result.ratio, 3), decimal(result.spread, 3),
-                       judged ? decimal(result.limit, 2) : "-",
-                       !judged           ? ""
-                       : result.barely() ? "unclear"
-                       : result.missed() ? "MISSED"
-                                         : "ok"});
+    return is_missed;
 }
 
 } // namespace bench

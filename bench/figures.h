@@ -5,40 +5,23 @@
 #pragma once
 
 #include <array>
+#include <chrono>
 #include <string>
 #include <vector>
 
 namespace bench
 {
 
-// The outcome of a contest: seconds for one call, medians over the rounds.
-struct Result {
-    double module = 0;
-    double floor = 0;
-    double ratio = 0;  // the median round's
-    double spread = 0; // half of what the middle half of the rounds spans
-    double limit = 0;  // of the ratio; 0: none
-
-    [[nodiscard]] bool missed() const
-    {
-        return limit > 0 && ratio > limit;
-    }
-    // No more than the rounds differ among themselves.
-    [[nodiscard]] bool barely() const
-    {
-        return missed() && ratio - spread <= limit;
-    }
-};
-
-// A table, and whether a limit is missed in it.
-struct Verdict {
-    std::string table;
-    bool missed = false;
-};
-
 double median(std::vector<double> values);
 // Half of what the middle half of the values spans.
 double spread(std::vector<double> values);
+
+template <typename Job> double seconds_of(Job job)
+{
+    const auto start = std::chrono::steady_clock::now();
+    job();
+    return std::chrono::duration<double>(std::chrono::steady_clock::now() - start).count();
+}
 
 // 1000 as 1,000
 std::string grouped(long number);
@@ -46,12 +29,19 @@ std::string time_text(double seconds);
 std::string bytes_text(double bytes);
 std::string decimal(double value, int places);
 
-// A printed line. A column's width is negative where its text stands left.
+// The library prints a line for each item. So that it is not among the figures,
+// standard output goes nowhere from now on, and the figures go where that went.
+void set_library_output_aside();
+
+// Prints a line. A column's width is negative where its text stands left.
 using Widths = std::array<int, 8>;
 inline constexpr Widths kCaseWidths{-27, 9, 9, 8, 8, 7, 8};
-std::string table_line(const std::vector<std::string> &columns, const Widths &widths = kCaseWidths);
+void print(const std::vector<std::string> &columns, const Widths &widths = kCaseWidths);
 
-std::string heading();
-std::string result_line(const std::string &name, const Result &result);
+// What a limit makes of a figure: "ok", "MISSED", or "unclear" where the figure varies by
+// more than it is too high; nothing where there is no limit (0).
+std::string verdict(double figure, double limit, double spread = 0);
+// Whether any verdict was that a limit is missed.
+bool is_a_limit_missed();
 
 } // namespace bench

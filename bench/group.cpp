@@ -1,20 +1,20 @@
 // SPDX-FileCopyrightText: 2026 The Quillmark authors
 // SPDX-License-Identifier: Apache-2.0
 
+#include "baseline.h"
 #include "cases.h"
 #include "figures.h"
-#include "floor.h"
 #include "plan.h"
 #include "quiet_vorlane.h"
 
 #include "quillmark.h"
 
-#include <algorithm>
 #include <array>
 #include <chrono>
 #include <cstdio>
 #include <cstdlib>
 #include <cstring>
+#include <memory>
 #include <string>
 #include <sys/wait.h>
 #include <unistd.h>
@@ -31,10 +31,10 @@ void query_presence()
 {
     std::array<char, 129> line{};
 
-    FLOOR_LOG("\ncbuf=%s\n", kQuery);
+    BASELINE_LOG("\ncbuf=%s\n", kQuery);
     FILE *query = popen(kQuery, "r");
     if (fgets(line.data(), line.size(), query) == nullptr) {
-        FLOOR_LOG("target process not exist!\n");
+        BASELINE_LOG("target process not exist!\n");
     }
     pclose(query);
 }
@@ -43,15 +43,15 @@ void query_presence()
 // the "vendor" line printed for each item, the command line is made of the plan.
 void run_item()
 {
-    FLOOR_LOG("enter... !\n");
-    FLOOR_LOG("enter...\n");
-    FLOOR_LOG("curernt leaf node name = %s\n", "true");
-    FLOOR_LOG("leave...\n");
-    FLOOR_LOG("mxmlElementGetAttr name=%s- args=%s\n", "true", "");
+    BASELINE_LOG("enter... !\n");
+    BASELINE_LOG("enter...\n");
+    BASELINE_LOG("curernt leaf node name = %s\n", "true");
+    BASELINE_LOG("leave...\n");
+    BASELINE_LOG("mxmlElementGetAttr name=%s- args=%s\n", "true", "");
     query_presence();
-    FLOOR_LOG("tpCmd:%s\n", kCommand);
+    BASELINE_LOG("tpCmd:%s\n", kCommand);
     [[maybe_unused]] const int ended = std::system(kCommand);
-    FLOOR_LOG("leave... !\n");
+    BASELINE_LOG("leave... !\n");
 }
 
 // When items began, as the log tells.
@@ -81,77 +81,66 @@ pid_t next_process()
     return child;
 }
 
-// One call is one item: a turn is the command for the group. What counts is the
-// median item of it, as no process is started at the same pace twice.
-class GroupRun : public Contest
+// How long items took, up to the next one's beginning. The median, as no process is
+// started at the same pace twice.
+double seconds_for_one()
 {
-  public:
-    explicit GroupRun(int items)
-        : Contest("group run, " + grouped(items) + " items", 1.02, items, items < 100 ? 2.0 : kLong)
-    {
+    std::vector<double> items;
+    for (std::size_t item = 1; item < beginnings.size(); ++item) {
+        const std::chrono::duration<double> took = beginnings[item] - beginnings[item - 1];
+        items.push_back(took.count());
     }
-    void prepare() override
-    {
-        load_into_module(trivial_plan(calls()));
-        next_process_ = next_process();
-    }
-    void start() override
-    {
-        beginnings.clear();
-        quiet_on_log(note_beginning);
-    }
-    void clear() override
-    {
-        quiet_on_log(nullptr);
-    }
-    double for_one(double /* turn */) override
-    {
-        std::vector<double> items;
-        for (std::size_t item = 1; item < beginnings.size(); ++item) {
-            const std::chrono::duration<double> took = beginnings[item] - beginnings[item - 1];
-            items.push_back(took.count());
-        }
-        return median(items);
-    }
-    void module(int /* items */) override
-    {
-        FPTEST_RunTestCmd(("XMLNodePath::" + path_).c_str(), reply_.data(), 64);
-    }
-    void floor(int items) override
-    {
-        FLOOR_LOG("testHead is : %s\n", "XMLNodePath");
-        FLOOR_LOG("testName is : %s\n", path_.c_str());
-        FLOOR_LOG("Input cmdline : %s\n", path_.c_str());
-        FLOOR_LOG("level = %d\n", 2);
-        FLOOR_LOG("node name = %s\n", kGroup);
-        FLOOR_LOG("enter...\n");
-        FLOOR_LOG("root node:%s\n", "Plan");
-        FLOOR_LOG("mid node:%s\n", kGroup);
-        FLOOR_LOG("Enter node length calculate!\n");
-        FLOOR_LOG("input level = %d\n", 2);
-        FLOOR_LOG("node length = %d!\n", items);
-        for (int item = 0; item < items; ++item) {
-            run_item();
-        }
-    }
+    return median(items);
+}
 
-    // How many processes were started.
-    std::string outcome() override
-    {
-        return is_alone() ? std::to_string(next_process() - next_process_) : "";
-    }
+const std::string kPath = std::string("Plan/") + kGroup;
 
-  private:
-    const std::string path_ = std::string("Plan/") + kGroup;
-    std::array<char, 64> reply_{};
-    pid_t next_process_ = 0;
-};
+void run_bare(int items)
+{
+    BASELINE_LOG("testHead is : %s\n", "XMLNodePath");
+    BASELINE_LOG("testName is : %s\n", kPath.c_str());
+    BASELINE_LOG("Input cmdline : %s\n", kPath.c_str());
+    BASELINE_LOG("level = %d\n", 2);
+    BASELINE_LOG("node name = %s\n", kGroup);
+    BASELINE_LOG("enter...\n");
+    BASELINE_LOG("root node:%s\n", "Plan");
+    BASELINE_LOG("mid node:%s\n", kGroup);
+    BASELINE_LOG("Enter node length calculate!\n");
+    BASELINE_LOG("input level = %d\n", 2);
+    BASELINE_LOG("node length = %d!\n", items);
+    for (int item = 0; item < items; ++item) {
+        run_item();
+    }
+}
 
 } // namespace
 
-std::unique_ptr<Contest> group_run(int items)
+Comparison group_run(int items)
 {
-    return std::make_unique<GroupRun>(items);
+    const auto before = std::make_shared<pid_t>();
+    return {.name = "group run, " + grouped(items) + " items",
+            .limit = 1.02,
+            .seconds = items < 100 ? 2.0 : kLong,
+            .prepare =
+                [=] {
+                    load_into_library(trivial_plan(items));
+                    *before = next_process();
+                },
+            .library =
+                [] {
+                    std::array<char, 64> reply{};
+                    FPTEST_RunTestCmd(("XMLNodePath::" + kPath).c_str(), reply.data(), 64);
+                },
+            .baseline = [=] { run_bare(items); },
+            .start =
+                [] {
+                    beginnings.clear();
+                    quiet_on_log(note_beginning);
+                },
+            .clear = [] { quiet_on_log(nullptr); },
+            .seconds_for_one = seconds_for_one,
+            // how many processes were started
+            .outcome = [=] { return is_alone() ? std::to_string(next_process() - *before) : ""; }};
 }
 
 double presence_query_share(int turns)
@@ -159,13 +148,10 @@ double presence_query_share(int turns)
     std::vector<double> query;
     std::vector<double> both;
     for (int turn = 0; turn < turns; ++turn) {
-        const auto start = std::chrono::steady_clock::now();
-        query_presence();
-        const auto asked = std::chrono::steady_clock::now();
-        [[maybe_unused]] const int ended = std::system(kCommand);
-        const auto end = std::chrono::steady_clock::now();
-        query.push_back(std::chrono::duration<double>(asked - start).count());
-        both.push_back(std::chrono::duration<double>(end - start).count());
+        query.push_back(seconds_of(query_presence));
+        both.push_back(query.back() + seconds_of([] {
+                           [[maybe_unused]] const int ended = std::system(kCommand);
+                       }));
     }
     return median(query) / median(both);
 }

@@ -4,34 +4,25 @@
 // How costs grow with the number of items.
 #pragma once
 
-#include "figures.h"
-
 #include <string>
+#include <utility>
 #include <vector>
 
 namespace bench
 {
 
-struct Point {
-    double items;
-    double seconds;
-};
-
+// Seconds by the number of items.
 struct Curve {
     std::string name;
-    std::vector<Point> points;
+    std::vector<std::pair<double, double>> points;
 };
 
-// b of the curve a * items^b that fits best: least squares of the logarithms.
-double exponent(const std::vector<Point> &points);
-
+// b of the curve a * items^b that fits best.
+double exponent(const Curve &curve);
 // That of the last two points alone: what small plans cost besides flattens a fit.
-double last_exponent(const std::vector<Point> &points);
+double last_exponent(const Curve &curve);
 
-// The last curve is what all others are judged by: none may grow faster.
-Verdict growth_table(const std::vector<Curve> &curves, bool judge);
-
-// The curves on logarithmic axes, as an SVG document.
-std::string chart(const std::vector<Curve> &curves);
+// No curve may grow faster than the search.
+void print_growth(const std::vector<Curve> &curves, const Curve &search, bool judge);
 
 } // namespace bench

@@ -3,12 +3,16 @@
 
 // A process of which nothing is wanted but its memory.
 //
-//   idle_agent            prints its resident kilobytes
-//   idle_agent LIBRARY    is an agent with a plan loaded: prints its resident
-//                         kilobytes, then the bytes of its heap in use after 20
-//                         commands and after 1,000
+//   idle_agent [LIBRARY]
+//
+// Prints on standard error, where the library prints nothing, in bytes: what is
+// resident once a plan is stored, loaded and saved; its heap in use after 20 commands,
+// and after 1,000. Without the library nothing is done in between.
+#include "quillmark.h"
+
 #include <array>
 #include <cstdio>
+#include <cstdlib>
 #include <cstring>
 #include <dlfcn.h>
 #include <fcntl.h>
@@ -19,90 +23,60 @@
 namespace
 {
 
-struct Module {
-    int (*run)(const char *, char *, int);
-    int (*report)(const char *, const char *, int, int, const char *);
-    void (*read_back)(char *, int);
+struct Library {
+    decltype(&FPTEST_RunTestCmd) run;
+    decltype(&FPTEST_SetTransation) report;
+    decltype(&FPTEST_ExtractResultMsg) read_back;
 };
 
-template <typename Function> void look_up(void *library, const char *name, Function &function)
+template <typename Function> bool look_up(void *library, const char *name, Function &function)
 {
     void *symbol = dlsym(library, name);
     static_assert(sizeof symbol == sizeof function);
     std::memcpy(&function, &symbol, sizeof symbol);
+    return symbol != nullptr;
 }
 
-Module open_module(const char *path)
-{
-    Module module{};
-    void *library = dlopen(path, RTLD_NOW);
-    if (library == nullptr) {
-        std::fprintf(stderr, "idle_agent: %s\n", dlerror());
-        return module;
-    }
-    look_up(library, "FPTEST_RunTestCmd", module.run);
-    look_up(library, "FPTEST_SetTransation", module.report);
-    look_up(library, "FPTEST_ExtractResultMsg", module.read_back);
-    return module;
-}
-
-long resident_kilobytes()
+// Without streams, which are memory too.
+long resident_bytes()
 {
     std::array<char, 4096> text{};
     const int fd = open("/proc/self/status", O_RDONLY);
     [[maybe_unused]] const ssize_t got = read(fd, text.data(), text.size() - 1);
     close(fd);
-    long kilobytes = -1;
     const char *line = std::strstr(text.data(), "VmRSS:");
-    if (line != nullptr) {
-        kilobytes = std::strtol(line + std::strlen("VmRSS:"), nullptr, 10);
-    }
-    return kilobytes;
+    return line != nullptr ? std::strtol(line + std::strlen("VmRSS:"), nullptr, 10) * 1024 : -1;
 }
 
-const char *plan_command()
+std::string plan_command()
 {
-    static std::string command;
-    if (command.empty()) {
-        command = "XMLFile::<Plan>\n\t<CmdGroup name=\"Bench\">\n";
-        for (int item = 0; item < 40; ++item) {
-            command += "\t\t<Cmd name=\"true\" args=\"" + std::to_string(item) + "\"/>\n";
-        }
-        command += "</CmdGroup>\n</Plan>\n";
+    std::string command = "XMLFile::<Plan>\n\t<CmdGroup name=\"Bench\">\n";
+    for (int item = 0; item < 40; ++item) {
+        command += "\t\t<Cmd name=\"true\" args=\"" + std::to_string(item) + "\"/>\n";
     }
-    return command.c_str();
+    return command + "</CmdGroup>\n</Plan>\n";
 }
 
-void send(const Module &module, const char *command)
+void send(const Library &library, const char *command)
 {
     std::array<char, 64> reply{};
-    module.run(command, reply.data(), 64);
+    library.run(command, reply.data(), 64);
 }
 
 // Twenty commands of every kind. The last ones have the plan loaded and saved.
-void send_twenty(const Module &module)
+void send_twenty(const Library &library, const std::string &plan)
 {
-    static std::array<char, 65536> plan;
+    static std::array<char, 65536> text;
 
-    send(module, "pingtest");
-    send(module, "Unknown::name::arguments");
-    send(module, plan_command());
-    send(module, "XMLNodePath::Plan/Bench/true");
-    send(module, "XMLNodePath::Plan/Missing");
+    send(library, "pingtest");
+    send(library, "Unknown::name::arguments");
+    send(library, plan.c_str());
+    send(library, "XMLNodePath::Plan/Bench/true");
+    send(library, "XMLNodePath::Plan/Missing");
     for (int progress = 0; progress < 14; ++progress) {
-        module.report("Bench", "true", progress, 0, "contact 97 %");
+        library.report("Bench", "true", progress, 0, "contact 97 %");
     }
-    module.read_back(plan.data(), static_cast<int>(plan.size()));
-}
-
-// What the library prints is not to be mixed with what this does.
-int set_output_aside()
-{
-    const int output = dup(STDOUT_FILENO);
-    const int nowhere = open("/dev/null", O_WRONLY);
-    dup2(nowhere, STDOUT_FILENO);
-    close(nowhere);
-    return output;
+    library.read_back(text.data(), static_cast<int>(text.size()));
 }
 
 } // namespace
@@ -110,23 +84,27 @@ int set_output_aside()
 int main(int argc, char **argv)
 {
     if (argc < 2) {
-        std::printf("%ld\n", resident_kilobytes());
+        std::fprintf(stderr, "%ld 0 0\n", resident_bytes());
         return 0;
     }
-    const Module module = open_module(argv[1]);
-    if (module.run == nullptr || module.report == nullptr || module.read_back == nullptr) {
+    void *file = dlopen(argv[1], RTLD_NOW);
+    Library library{};
+    if (file == nullptr || !look_up(file, "FPTEST_RunTestCmd", library.run) ||
+        !look_up(file, "FPTEST_SetTransation", library.report) ||
+        !look_up(file, "FPTEST_ExtractResultMsg", library.read_back)) {
+        std::fprintf(stderr, "idle_agent: %s\n", dlerror());
         return 1;
     }
-    const int output = set_output_aside();
-    send(module, "pingtest");
-    send(module, plan_command());
-    module.report("Bench", "true", 100, 0, "contact 97 %");
-    const long resident = resident_kilobytes();
-    send_twenty(module);
+    const std::string plan = plan_command();
+    send(library, "pingtest");
+    send(library, plan.c_str());
+    library.report("Bench", "true", 100, 0, "contact 97 %");
+    const long resident = resident_bytes();
+    send_twenty(library, plan);
     const std::size_t before = mallinfo2().uordblks;
     for (int commands = 20; commands < 1000; commands += 20) {
-        send_twenty(module);
+        send_twenty(library, plan);
     }
-    dprintf(output, "%ld %zu %zu\n", resident, before, mallinfo2().uordblks);
+    std::fprintf(stderr, "%ld %zu %zu\n", resident, before, mallinfo2().uordblks);
     return 0;
 }

@@ -9,6 +9,7 @@
 #include "common/descriptor.h"
 
 #include <fcntl.h>
+#include <memory>
 #include <mxml.h>
 #include <stdexcept>
 
@@ -19,183 +20,116 @@ namespace
 
 constexpr double kLimit = 1.15;
 
-// Which floor: what a load needs, or Mini-XML's part of it.
-enum class Floor { open_load_close, load_alone };
-
-class FirstLoad : public Contest
+mxml_node_t *open_load_close(int /* open_file */)
 {
-  public:
-    FirstLoad(std::string name, double limit, int items, Floor floor)
-        : Contest(std::move(name), limit, 1, 0.2), items_(items), floor_(floor)
-    {
-    }
-    void prepare() override
-    {
-        write_plan(fresh_plan(items_));
-        file_ = Descriptor(open(kPlanPath, O_RDONLY | O_CLOEXEC));
-    }
-    void module(int /* calls */) override
-    {
-        tree_ = unit::load_configs_file(kPlanPath);
-    }
-    void floor(int /* calls */) override
-    {
-        if (floor_ == Floor::load_alone) {
-            bare_ = mxmlLoadFd(nullptr, file_.get(), nullptr);
-        } else {
-            const int fd = open(kPlanPath, O_RDONLY);
-            bare_ = mxmlLoadFd(nullptr, fd, nullptr);
-            close(fd);
-        }
-        tree_ = bare_;
-    }
-    void clear() override
-    {
-        unit::drop();
-        mxmlDelete(bare_);
-        tree_ = bare_ = nullptr;
-        lseek(file_.get(), 0, SEEK_SET);
-    }
-    // The elements alone: the white space between them is the library's to remove.
-    std::string outcome() override
-    {
-        std::string names;
-        for (mxml_node_t *node = tree_; node != nullptr;
-             node = mxmlWalkNext(node, tree_, MXML_DESCEND)) {
-            const char *name = mxmlElementGetAttr(node, "name");
-            names += name != nullptr ? std::string(name) + "\n" : "";
-        }
-        return names;
-    }
+    const int fd = open(kPlanPath, O_RDONLY);
+    mxml_node_t *tree = mxmlLoadFd(nullptr, fd, nullptr);
+    close(fd);
+    return tree;
+}
 
-  private:
-    int items_;
-    Floor floor_;
-    Descriptor file_{-1};
-    mxml_node_t *tree_ = nullptr;
-    mxml_node_t *bare_ = nullptr;
+mxml_node_t *load_alone(int open_file)
+{
+    return mxmlLoadFd(nullptr, open_file, nullptr);
+}
+
+// The elements alone: the white space between them is the library's to remove.
+std::string names_in(mxml_node_t *tree)
+{
+    std::string names;
+    for (mxml_node_t *node = tree; node != nullptr; node = mxmlWalkNext(node, tree, MXML_DESCEND)) {
+        const char *name = mxmlElementGetAttr(node, "name");
+        names += name != nullptr ? std::string(name) + "\n" : "";
+    }
+    return names;
+}
+
+struct Loaded {
+    Descriptor file{-1};
+    mxml_node_t *tree = nullptr;
+    mxml_node_t *bare = nullptr;
 };
 
-// Lookups in a plan that the library has loaded, of each item in turn.
-class Lookup : public Contest
+Comparison load(const std::string &name, double limit, int items, mxml_node_t *(*bare_load)(int))
 {
-  public:
-    Lookup(const std::string &name, int items)
-        : Contest(name + ", " + grouped(items) + " items", 0, items > 100 ? 8 : 64, 0.05),
-          places_(items), items_(items)
-    {
-    }
-    ~Lookup() override
-    {
-        unit::drop();
-    }
-    void prepare() override
-    {
-        write_plan(fresh_plan(items_));
-        tree_ = unit::load_configs_file(kPlanPath);
-        if (tree_ == nullptr) {
-            throw std::runtime_error(std::string(kPlanPath) + ": the library has not loaded it");
-        }
-        for (int index = 0; index < items_; ++index) {
-            names_.push_back(item_name(index));
-        }
-    }
-    // None: what the search costs is a curve of its own.
-    void floor(int /* calls */) override
-    {
-    }
+    const auto loaded = std::make_shared<Loaded>();
+    return {.name = name,
+            .limit = limit,
+            .seconds = 0.2,
+            .prepare =
+                [=] {
+                    unit::drop();
+                    write_plan(fresh_plan(items));
+                    loaded->file = Descriptor(open(kPlanPath, O_RDONLY | O_CLOEXEC));
+                },
+            .library = [=] { loaded->tree = unit::load_configs_file(kPlanPath); },
+            .baseline = [=] { loaded->tree = loaded->bare = bare_load(loaded->file.get()); },
+            .clear =
+                [=] {
+                    unit::drop();
+                    mxmlDelete(loaded->bare);
+                    loaded->tree = loaded->bare = nullptr;
+                    lseek(loaded->file.get(), 0, SEEK_SET);
+                },
+            .outcome = [=] { return names_in(loaded->tree); }};
+}
 
-  protected:
-    [[nodiscard]] mxml_node_t *tree() const
-    {
-        return tree_;
-    }
-    int next()
-    {
-        return places_.next();
-    }
-    [[nodiscard]] const char *name(int index) const
-    {
-        return names_.at(static_cast<std::size_t>(index)).c_str();
-    }
-
-  private:
-    Places places_;
-    int items_;
-    mxml_node_t *tree_ = nullptr;
-    std::vector<std::string> names_;
-};
-
-class LookupByName : public Lookup
+// Of each item in turn, in a plan that the library has loaded. Without a baseline:
+// what the search costs is a curve of its own.
+Comparison lookup(int items, void (*look_up)(mxml_node_t *tree, int index, const char *name))
 {
-  public:
-    explicit LookupByName(int items) : Lookup("lookup by name", items)
-    {
-    }
-    void module(int calls) override
-    {
-        for (int call = 0; call < calls; ++call) {
-            unit::get_node_index(kGroup, name(next()));
-        }
-    }
-};
-
-class LookupByPosition : public Lookup
-{
-  public:
-    explicit LookupByPosition(int items) : Lookup("lookup by position", items)
-    {
-    }
-    void module(int calls) override
-    {
-        for (int call = 0; call < calls; ++call) {
-            unit::get_node_byIndex(tree(), kGroup, next());
-        }
-    }
-};
-
-class Search : public Lookup
-{
-  public:
-    explicit Search(int items) : Lookup("document search", items)
-    {
-    }
-    void module(int calls) override
-    {
-        for (int call = 0; call < calls; ++call) {
-            mxmlFindElement(tree(), tree(), "Cmd", "name", name(next()), MXML_DESCEND);
-        }
-    }
-};
+    const auto tree = std::make_shared<mxml_node_t *>();
+    return {.name = "lookup",
+            .calls = items > 100 ? 8 : 64,
+            .prepare =
+                [=] {
+                    unit::drop();
+                    write_plan(fresh_plan(items));
+                    *tree = unit::load_configs_file(kPlanPath);
+                    if (*tree == nullptr) {
+                        throw std::runtime_error(std::string(kPlanPath) +
+                                                 ": the library has not loaded it");
+                    }
+                },
+            .library =
+                [=, places = Places(items)]() mutable {
+                    const auto &[index, name] = places.next();
+                    look_up(*tree, index, name.c_str());
+                }};
+}
 
 } // namespace
 
-std::unique_ptr<Contest> first_load(int items)
+Comparison first_load(int items)
 {
-    return std::make_unique<FirstLoad>("first load, " + grouped(items) + " items", kLimit, items,
-                                       Floor::open_load_close);
+    return load("first load, " + grouped(items) + " items", kLimit, items, open_load_close);
 }
 
-std::unique_ptr<Contest> first_load_to_parser(int items)
+Comparison first_load_to_parser(int items)
 {
     const double limit = items < 1000 ? 0 : kLimit; // of a small plan, open is most of it
-    return std::make_unique<FirstLoad>("  " + grouped(items) + ", mxmlLoadFd alone", limit, items,
-                                       Floor::load_alone);
+    return load("  " + grouped(items) + ", mxmlLoadFd alone", limit, items, load_alone);
 }
 
-std::unique_ptr<Contest> lookup_by_name(int items)
+Comparison lookup_by_name(int items)
 {
-    return std::make_unique<LookupByName>(items);
+    return lookup(items, [](mxml_node_t * /* tree */, int /* index */, const char *name) {
+        unit::get_node_index(kGroup, name);
+    });
 }
 
-std::unique_ptr<Contest> lookup_by_position(int items)
+Comparison lookup_by_position(int items)
 {
-    return std::make_unique<LookupByPosition>(items);
+    return lookup(items, [](mxml_node_t *tree, int index, const char * /* name */) {
+        unit::get_node_byIndex(tree, kGroup, index);
+    });
 }
 
-std::unique_ptr<Contest> search(int items)
+Comparison search(int items)
 {
-    return std::make_unique<Search>(items);
+    return lookup(items, [](mxml_node_t *tree, int /* index */, const char *name) {
+        mxmlFindElement(tree, tree, "Cmd", "name", name, MXML_DESCEND);
+    });
 }
 
 } // namespace bench

@@ -19,6 +19,11 @@ namespace bench
 namespace
 {
 
+std::string item_name(int index)
+{
+    return "Item" + std::to_string(index);
+}
+
 // As the library writes one.
 template <typename Attributes> std::string plan_of(int items, Attributes attributes)
 {
@@ -49,11 +54,6 @@ std::string trivial_plan(int items)
     return plan_of(items, [](int) { return std::string("name=\"true\" args=\"\""); });
 }
 
-std::string item_name(int index)
-{
-    return "Item" + std::to_string(index);
-}
-
 std::string fresh_plan(int items)
 {
     return plan_of(items, [](int index) {
@@ -70,17 +70,21 @@ std::string reported_plan(int items)
 }
 
 // Steps of about three eighths, without a common divisor: all are met.
-Places::Places(int items) : items_(items), step_(items * 3 / 8 + 1)
+Places::Places(int items)
 {
-    while (std::gcd(items_, step_) != 1) {
-        ++step_;
+    int step = items * 3 / 8 + 1;
+    while (std::gcd(items, step) != 1) {
+        ++step;
+    }
+    for (int index = 0; std::ssize(all_) < items; index = (index + step) % items) {
+        all_.emplace_back(index, item_name(index));
     }
 }
 
-int Places::next()
+const std::pair<int, std::string> &Places::next()
 {
-    const int place = at_;
-    at_ = (at_ + step_) % items_;
+    const auto &place = all_[next_];
+    next_ = (next_ + 1) % all_.size();
     return place;
 }
 
@@ -99,7 +103,7 @@ std::string read_plan()
     return {std::istreambuf_iterator<char>(file), {}};
 }
 
-void load_into_module(const std::string &text)
+void load_into_library(const std::string &text)
 {
     const LeftOpen left_open;
     FPTEST_RunTestCmd("XMLFile::<Plan/>", nullptr, 0);

@@ -4,8 +4,11 @@
 // Test plans of any size, and how the library gets them.
 #pragma once
 
+#include <cstddef>
 #include <set>
 #include <string>
+#include <utility>
+#include <vector>
 
 namespace bench
 {
@@ -19,19 +22,18 @@ std::string trivial_plan(int items);
 // Items of names of their own, as they are sent and with a report each.
 std::string fresh_plan(int items);
 std::string reported_plan(int items);
-std::string item_name(int index);
 
-// Every item once, all over the plan: a few are as good as all for a mean.
+// Every item once, by its index and name, all over the plan: a few are as good as
+// all for a mean.
 class Places
 {
   public:
     explicit Places(int items);
-    int next();
+    const std::pair<int, std::string> &next();
 
   private:
-    int items_;
-    int step_;
-    int at_ = 0;
+    std::vector<std::pair<int, std::string>> all_;
+    std::size_t next_ = 0;
 };
 
 // Puts a text of any length where the plan is stored.
@@ -40,9 +42,9 @@ std::string read_plan();
 
 // Has the library load that plan. It takes 2,048 bytes at most in a command: it
 // is sent a short plan, which drops its cached one, and that is overwritten.
-void load_into_module(const std::string &text);
+void load_into_library(const std::string &text);
 
-// Closes what the library, and a floor after it, leave open.
+// Closes what the library, and a baseline after it, leave open.
 class LeftOpen
 {
   public:

@@ -1,14 +1,12 @@
 // SPDX-FileCopyrightText: 2026 The Quillmark authors
 // SPDX-License-Identifier: Apache-2.0
 
+#include "baseline.h"
 #include "cases.h"
-#include "floor.h"
 #include "plan.h"
 #include "quiet_vorlane.h"
 #include "sockwrap.h"
 #include "unit.h"
-
-#include "common/descriptor.h"
 
 #include <array>
 #include <netinet/in.h>
@@ -36,42 +34,31 @@ sockaddr_in address_of(in_addr_t host)
 // The gatherer of both sides: this thread itself, at the moment when the server
 // is about to accept. So nobody waits for a scheduler, and what a round trip
 // takes is the calls.
-class Client
-{
-  public:
-    static void connect()
-    {
-        const sockaddr_in address = address_of(htonl(INADDR_LOOPBACK));
-        [[maybe_unused]] const int connected =
-            ::connect(socket_.get(), reinterpret_cast<const sockaddr *>(&address), sizeof address);
-    }
-    static void receive()
-    {
-        const ssize_t got = read(socket_.get(), text_.data(), text_.size());
-        received_ = got > 0 ? static_cast<std::size_t>(got) : 0;
-    }
-    // At once, without lingering in the network's tables.
-    static void leave()
-    {
-        const linger at_once{1, 0};
-        setsockopt(socket_.get(), SOL_SOCKET, SO_LINGER, &at_once, sizeof at_once);
-        socket_ = Descriptor(-1);
-    }
-    static void renew()
-    {
-        received_ = 0;
-        socket_ = Descriptor(socket(AF_INET, SOCK_STREAM | SOCK_CLOEXEC, 0));
-    }
-    static std::string text()
-    {
-        return {text_.data(), received_};
-    }
-
-  private:
-    static inline Descriptor socket_{-1};
-    static inline std::array<char, 64> text_{};
-    static inline std::size_t received_ = 0;
+struct Gatherer {
+    int socket = -1;
+    std::array<char, 64> text{};
+    std::size_t received = 0;
 };
+
+Gatherer gatherer;
+
+void connect_gatherer()
+{
+    const sockaddr_in address = address_of(htonl(INADDR_LOOPBACK));
+    [[maybe_unused]] const int connected =
+        connect(gatherer.socket, reinterpret_cast<const sockaddr *>(&address), sizeof address);
+}
+
+void receive()
+{
+    const ssize_t got = read(gatherer.socket, gatherer.text.data(), gatherer.text.size());
+    gatherer.received = got > 0 ? static_cast<std::size_t>(got) : 0;
+}
+
+void renew_gatherer()
+{
+    gatherer = {.socket = socket(AF_INET, SOCK_STREAM | SOCK_CLOEXEC, 0)};
+}
 
 void serve_bare()
 {
@@ -85,56 +72,39 @@ void serve_bare()
     Bind(server, reinterpret_cast<const sockaddr *>(&here), sizeof here);
     listen(server, 5);
     const int connection = Accept(server, reinterpret_cast<sockaddr *>(&there), &length);
-    FLOOR_LOG("retWri=%d", (int)write(connection, kText.data(), kText.size()));
-    FLOOR_LOG("retWri success\n");
+    BASELINE_LOG("retWri=%d", (int)write(connection, kText.data(), kText.size()));
+    BASELINE_LOG("retWri success\n");
     close(server);
 }
 
-class Trigger : public Contest
-{
-  public:
-    Trigger() : Contest("trigger round trip", 1.05, 1, 0.1)
-    {
-    }
-    ~Trigger() override
-    {
-        quiet_on_accept(nullptr);
-    }
-    void prepare() override
-    {
-        quiet_on_accept(Client::connect);
-        Client::renew();
-    }
-    void module(int /* calls */) override
-    {
-        unit::Sock_Init1();
-        Client::receive();
-    }
-    void floor(int /* calls */) override
-    {
-        serve_bare();
-        Client::receive();
-    }
-    void clear() override
-    {
-        Client::leave();
-        left_open_.close_all();
-        Client::renew();
-    }
-    std::string outcome() override
-    {
-        return Client::text();
-    }
-
-  private:
-    const LeftOpen left_open_;
-};
-
 } // namespace
 
-std::unique_ptr<Contest> trigger()
+Comparison trigger()
 {
-    return std::make_unique<Trigger>();
+    return {.name = "trigger round trip",
+            .limit = 1.05,
+            .seconds = 0.1,
+            .prepare =
+                [] {
+                    quiet_on_accept(connect_gatherer);
+                    renew_gatherer();
+                },
+            .library =
+                [] {
+                    unit::Sock_Init1();
+                    receive();
+                },
+            .baseline =
+                [] {
+                    serve_bare();
+                    receive();
+                },
+            .clear =
+                [left_open = LeftOpen()] {
+                    left_open.close_all(); // the gatherer too
+                    renew_gatherer();
+                },
+            .outcome = [] { return std::string(gatherer.text.data(), gatherer.received); }};
 }
 
 } // namespace bench

@@ -1,0 +1,171 @@
+// SPDX-FileCopyrightText: 2026 The Quillmark authors
+// SPDX-License-Identifier: Apache-2.0
+
+// What the benchmarks refuse: baselines that do not do the library's job, and wrong
+// command lines.
+#include "../quoted.h"
+#include "comparison.h"
+#include "quiet_vorlane.h"
+
+#include <gmock/gmock.h>
+#include <gtest/gtest.h>
+
+#include <array>
+#include <cstdarg>
+#include <cstdio>
+#include <ostream>
+#include <stdexcept>
+#include <string>
+#include <sys/wait.h>
+
+namespace
+{
+
+void (*listener)(const char *format, va_list arguments);
+
+void log(const char *format, ...)
+{
+    if (listener != nullptr) {
+        va_list arguments;
+        va_start(arguments, format);
+        listener(format, arguments);
+        va_end(arguments);
+    }
+}
+
+} // namespace
+
+// The log of these tests, in the place of the quiet one.
+extern "C" void quiet_on_log(void (*new_listener)(const char *format, va_list arguments))
+{
+    listener = new_listener;
+}
+
+namespace
+{
+
+using ::testing::StrEq;
+using ::testing::ThrowsMessage;
+
+struct Baseline {
+    const char *name;
+    const char *log;
+    const char *outcome;
+    const char *refusal; // empty: it is taken
+};
+
+void PrintTo(const Baseline &baseline, std::ostream *stream)
+{
+    *stream << baseline.name;
+}
+
+class PairedRun : public ::testing::TestWithParam<Baseline>
+{
+};
+
+TEST_P(PairedRun, IsOfSidesThatDoTheSame)
+{
+    const Baseline &baseline = GetParam();
+    std::string place;
+    std::string turns; // a letter for each turn
+    const bench::Comparison words{.name = "words",
+                                  .seconds = 0,
+                                  .prepare = [&] { place.clear(); },
+                                  .library =
+                                      [&] {
+                                          turns += 'L';
+                                          log("%s => said %s\n", "library", "it");
+                                          place = "word";
+                                      },
+                                  .baseline =
+                                      [&] {
+                                          turns += 'b';
+                                          if (*baseline.log != '\0') {
+                                              log("b => %s\n", baseline.log);
+                                          }
+                                          place += baseline.outcome;
+                                      },
+                                  .outcome = [&] { return place; }};
+
+    if (*baseline.refusal != '\0') {
+        EXPECT_THAT(
+            [&] { bench::PairedRun(words, 1); },
+            ThrowsMessage<std::runtime_error>(StrEq(std::string("words: ") + baseline.refusal)));
+        return;
+    }
+    bench::PairedRun run(words, 1);
+    turns.clear();
+    for (int turn = 0; turn < 4; ++turn) {
+        run.round(); // no longer than a turn
+    }
+    EXPECT_EQ(turns, "LbbLLbbL");
+}
+
+INSTANTIATE_TEST_SUITE_P(
+    Bench, PairedRun,
+    ::testing::Values(Baseline{"Same", "said it", "word", ""},
+                      Baseline{"AnotherLog", "said nothing", "word",
+                               "log line 1 is 'said it', its baseline's is 'said nothing'; make "
+                               "the baseline log what the library logs"},
+                      Baseline{"LessLog", "", "word",
+                               "log line 1 is 'said it', its baseline's is '(none)'; make the "
+                               "baseline log what the library logs"},
+                      Baseline{"LessDone", "said it", "",
+                               "the baseline leaves something else behind; make it do what the "
+                               "library does"}),
+    [](const auto &test) { return test.param.name; });
+
+struct Refusal {
+    const char *name;
+    const char *arguments;
+    const char *line;
+};
+
+void PrintTo(const Refusal &refusal, std::ostream *stream)
+{
+    *stream << refusal.arguments;
+}
+
+class BadCommandLine : public ::testing::TestWithParam<Refusal>
+{
+};
+
+TEST_P(BadCommandLine, GetsOneLineAndStatus2)
+{
+    const auto &[name, arguments, line] = GetParam();
+    const std::string command =
+        quoted(QUILLMARK_SOURCE_DIR "/scripts/bench") + " " + arguments + " 2>&1";
+    std::array<char, 4096> buffer{};
+    std::string output;
+
+    FILE *pipe = popen(command.c_str(), "r");
+    while (fgets(buffer.data(), buffer.size(), pipe) != nullptr) {
+        output += buffer.data();
+    }
+    const int status = pclose(pipe);
+
+    EXPECT_EQ(output, std::string("scripts/bench: ") + line + "\n");
+    EXPECT_EQ(WEXITSTATUS(status), 2);
+}
+
+INSTANTIATE_TEST_SUITE_P(
+    Bench, BadCommandLine,
+    ::testing::Values(
+        Refusal{"Unknown", "--fast", "unknown argument '--fast'; see scripts/bench --help"},
+        Refusal{"FilterWithoutOne", "--filter",
+                "--filter wants an argument; see scripts/bench --help"},
+        Refusal{"EmptyFilter", "--filter ''",
+                "--filter wants an argument; see scripts/bench --help"},
+        Refusal{"NoFilter", "--filter '('", "--filter '(' is not a regular expression"},
+        Refusal{"JsonIntoADirectory", "--json /tmp",
+                "--json /tmp: this is a directory; name a file in it"},
+        Refusal{"JsonThatCannotBe", "--json /proc/figures",
+                "--json /proc/figures: this cannot be written"},
+        Refusal{"JsonWithoutDirectory", "--json /nowhere/figures.json",
+                "--json /nowhere/figures.json: there is no such directory"},
+        Refusal{"WriteOfSome", "--write --filter ping",
+                "--write keeps figures, and wants all of them: leave out the options that spare "
+                "some"}),
+    [](const auto &refusal) { return refusal.param.name; });
+
+} // namespace
