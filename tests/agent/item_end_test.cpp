@@ -4,7 +4,7 @@
 // How items end, and what they leave: time limits, exit statuses and signals, items
 // that do not stop, processes left running, reports that come late.
 #include "fptest_runner.h"
-#include "report_files.h"
+#include "support/reports.h"
 
 #include <algorithm>
 #include <csignal>
@@ -13,14 +13,14 @@
 #include <unistd.h>
 
 using namespace fptest_runner;
+using device::eventually;
 using device::kPlanFile;
 using device::Lines;
 using device::plan_of;
 using device::processes_named;
 using device::read_file;
-using device::wait_for;
-using report_files::events_of;
-using report_files::outcomes;
+using support::events_of;
+using support::outcomes;
 using ::testing::AllOf;
 using ::testing::ElementsAre;
 using ::testing::Ge;
@@ -110,7 +110,7 @@ TEST_F(ItemEnd, PastTheLimitIsTimedOutThoughNobodyWatched)
                                    {"--timeout", "0.5"}));
     ASSERT_TRUE(wait_for_file("begun"));
     fptest.signal(SIGSTOP);
-    ASSERT_TRUE(wait_for([] { return running_items().empty(); }, 30));
+    ASSERT_TRUE(eventually([] { return running_items().empty(); }, 30));
     fptest.signal(SIGCONT);
     EXPECT_EQ(fptest.wait().status, 1);
     EXPECT_THAT(outcomes(json()), ElementsAre("Item: timed out"));
@@ -179,7 +179,7 @@ TEST_F(ItemEnd, SecondInterruptionLeavesNoItemThatIgnoresTheStop)
     std::this_thread::sleep_for(std::chrono::milliseconds(300));
     fptest.signal(SIGINT);
     EXPECT_EQ(fptest.wait().status, 130);
-    EXPECT_TRUE(wait_for([] { return running_items().empty(); }, 20));
+    EXPECT_TRUE(eventually([] { return running_items().empty(); }, 20));
 }
 
 TEST_F(ItemEnd, HangUpAfterAnInterruptionIsTheSameInterruption)
@@ -443,7 +443,7 @@ TEST_F(ItemEnd, GathererThatEndsWithoutAReportIsNotWaitedFor)
 {
     FptestProcess fptest(with_plan({{"SensorProbe", "--group G --seconds 60"}}));
     ASSERT_TRUE(
-        wait_for([] { return processes_named("/system/bin/SensorProbe").size() == 1; }, 20));
+        eventually([] { return processes_named("/system/bin/SensorProbe").size() == 1; }, 20));
     std::this_thread::sleep_for(std::chrono::milliseconds(500)); // it has been told by now
     for (const device::Process &process : processes_named("/system/bin/SensorProbe")) {
         kill(process.pid, SIGKILL);
@@ -473,7 +473,7 @@ TEST_F(ItemEnd, GathererThatIsSuspendedIsKilled)
     FptestProcess fptest(with_plan({{"SensorProbe", "--group G --seconds 60"}},
                                    {"--timeout", "1", "--grace", "0.5"}));
     ASSERT_TRUE(
-        wait_for([] { return processes_named("/system/bin/SensorProbe").size() == 1; }, 20));
+        eventually([] { return processes_named("/system/bin/SensorProbe").size() == 1; }, 20));
     for (const device::Process &process : processes_named("/system/bin/SensorProbe")) {
         kill(process.pid, SIGSTOP);
     }
@@ -489,13 +489,13 @@ TEST_F(ItemEnd, SuspendedRunSuspendsItsItemsAndNoTimePasses)
     Start start;
     start.arguments = with_plan({{"Item", "note /tmp/scene/begun sleep 1.5 report G 100 0 fine"}},
                                 {"--timeout", "2.5"});
-    start.has_own_group = true;
+    start.prepare = in_own_group;
     FptestProcess fptest(start);
     ASSERT_TRUE(wait_for_file("begun"));
     fptest.signal(SIGTSTP);
-    ASSERT_TRUE(wait_for([&] { return is_suspended(fptest.pid()); }, 20));
+    ASSERT_TRUE(eventually([&] { return is_suspended(fptest.pid()); }, 20));
     for (const device::Process &process : processes_named("/system/bin/Item")) {
-        EXPECT_TRUE(wait_for([&] { return is_suspended(process.pid); }, 20));
+        EXPECT_TRUE(eventually([&] { return is_suspended(process.pid); }, 20));
     }
     std::this_thread::sleep_for(std::chrono::seconds(3));
     fptest.signal(SIGCONT);
@@ -507,14 +507,14 @@ TEST_F(ItemEnd, SuspendedRunSuspendsTheGatherer)
 {
     Start start;
     start.arguments = with_plan({{"SensorProbe", "--group G --seconds 1.5"}}, {"--timeout", "10"});
-    start.has_own_group = true;
+    start.prepare = in_own_group;
     FptestProcess fptest(start);
     ASSERT_TRUE(
-        wait_for([] { return processes_named("/system/bin/SensorProbe").size() == 1; }, 20));
+        eventually([] { return processes_named("/system/bin/SensorProbe").size() == 1; }, 20));
     fptest.signal(SIGTSTP);
-    ASSERT_TRUE(wait_for([&] { return is_suspended(fptest.pid()); }, 20));
+    ASSERT_TRUE(eventually([&] { return is_suspended(fptest.pid()); }, 20));
     for (const device::Process &process : processes_named("/system/bin/SensorProbe")) {
-        EXPECT_TRUE(wait_for([&] { return is_suspended(process.pid); }, 20));
+        EXPECT_TRUE(eventually([&] { return is_suspended(process.pid); }, 20));
     }
     fptest.signal(SIGCONT);
     EXPECT_EQ(fptest.wait().status, 0);
@@ -524,7 +524,7 @@ TEST_F(ItemEnd, RunThatNobodyCouldResumeIsNotSuspended)
 {
     Start start;
     start.arguments = with_plan({{"Item", "note /tmp/scene/begun sleep 1 report G 100 0 fine"}});
-    start.has_own_session = true;
+    start.prepare = in_own_session;
     FptestProcess fptest(start);
     ASSERT_TRUE(wait_for_file("begun"));
     fptest.signal(SIGTSTP);
@@ -536,15 +536,15 @@ TEST_F(ItemEnd, RunThatIsKilledWhileSuspendedLeavesNoItem)
 {
     Start start;
     start.arguments = with_plan({{"Item", "note /tmp/scene/begun sleep 60"}});
-    start.has_own_group = true;
+    start.prepare = in_own_group;
     FptestProcess fptest(start);
     ASSERT_TRUE(wait_for_file("begun"));
     fptest.signal(SIGTSTP);
-    ASSERT_TRUE(wait_for([&] { return is_suspended(fptest.pid()); }, 20));
+    ASSERT_TRUE(eventually([&] { return is_suspended(fptest.pid()); }, 20));
     fptest.signal(SIGKILL);
     fptest.wait();
-    EXPECT_TRUE(wait_for([] { return running_items().empty(); }, 20));
-    EXPECT_TRUE(wait_for([] { return processes_named(FPTEST_PROGRAM).empty(); }, 20));
+    EXPECT_TRUE(eventually([] { return running_items().empty(); }, 20));
+    EXPECT_TRUE(eventually([] { return processes_named(FPTEST_PROGRAM).empty(); }, 20));
 }
 
 } // namespace

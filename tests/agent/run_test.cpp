@@ -5,7 +5,7 @@
 // is told of it.
 #include "fptest_runner.h"
 #include "network.h"
-#include "report_files.h"
+#include "support/reports.h"
 
 #include <algorithm>
 #include <csignal>
@@ -19,6 +19,7 @@
 #include <unistd.h>
 
 using namespace fptest_runner;
+using device::eventually;
 using device::kPlanFile;
 using device::kTriggerPort;
 using device::Lines;
@@ -26,16 +27,19 @@ using device::plan_of;
 using device::processes_named;
 using device::read_file;
 using device::set_vendor;
-using device::wait_for;
 using device::write_file;
-using report_files::Element;
-using report_files::events_of;
-using report_files::outcomes;
-using report_files::parse_tap;
-using report_files::parse_xml;
-using report_files::Point;
-using report_files::Tap;
-using report_files::verdict_of;
+using support::Element;
+using support::events_of;
+using support::outcomes;
+using support::parse_tap;
+using support::parse_xml;
+using support::Point;
+using support::reasons;
+using support::Tally;
+using support::tally_of_json;
+using support::tally_of_junit;
+using support::tally_of_tap;
+using support::Tap;
 using ::testing::Each;
 using ::testing::EndsWith;
 using ::testing::Not;
@@ -48,88 +52,6 @@ namespace
 {
 
 using Json = nlohmann::json;
-
-// --- reports ----------------------------------------------------------------------
-
-Lines reasons(const std::string &json)
-{
-    Lines all;
-    for (const Json &end : events_of(json, "end")) {
-        all.push_back(end.at("reason").is_null() ? "" : end.at("reason").get<std::string>());
-    }
-    return all;
-}
-
-struct Tally {
-    std::size_t passed = 0;
-    std::size_t failed = 0;
-    std::size_t not_run = 0;
-
-    bool operator==(const Tally &) const = default;
-};
-
-void PrintTo(const Tally &tally, std::ostream *stream)
-{
-    *stream << tally.passed << " passed, " << tally.failed << " failed, " << tally.not_run
-            << " not run";
-}
-
-Tally tally_of_json(const std::string &text)
-{
-    Tally tally;
-    for (const Json &end : events_of(text, "end")) {
-        const std::string outcome = end.at("outcome");
-        ++(outcome == "passed"    ? tally.passed
-           : outcome == "not run" ? tally.not_run
-                                  : tally.failed);
-    }
-    const auto finish = events_of(text, "finish");
-    EXPECT_THAT(finish, SizeIs(1));
-    if (!finish.empty()) {
-        EXPECT_EQ(finish[0].at("passed"), tally.passed);
-        EXPECT_EQ(finish[0].at("failed"), tally.failed);
-        EXPECT_EQ(finish[0].at("not_run"), tally.not_run);
-    }
-    return tally;
-}
-
-std::size_t number(const Element &element, const std::string &attribute)
-{
-    return std::stoul(element.attributes.at(attribute));
-}
-
-Tally tally_of_junit(const std::string &text)
-{
-    Tally tally;
-    const Element top = parse_xml(text);
-    for (const Element &suite : top.all("testsuite")) {
-        for (const Element &test : suite.all("testcase")) {
-            const std::string verdict = verdict_of(test);
-            ++(verdict == "passed"    ? tally.passed
-               : verdict == "not run" ? tally.not_run
-                                      : tally.failed);
-        }
-    }
-    // what a break has kept from being run is no success
-    EXPECT_EQ(number(top, "tests"), tally.passed + tally.failed + tally.not_run);
-    EXPECT_EQ(number(top, "failures") + number(top, "errors"), tally.failed + tally.not_run);
-    EXPECT_EQ(number(top, "skipped"), 0U);
-    return tally;
-}
-
-Tally tally_of_tap(const std::string &text)
-{
-    Tally tally;
-    const Tap tap = parse_tap(text);
-    EXPECT_EQ(tap.planned, tap.points.size());
-    for (const Point &suite : tap.points) {
-        EXPECT_EQ(suite.planned, suite.inside.size());
-        for (const Point &point : suite.inside) {
-            ++(point.skipped ? tally.not_run : point.ok ? tally.passed : tally.failed);
-        }
-    }
-    return tally;
-}
 
 // --- plans ------------------------------------------------------------------------
 
@@ -388,7 +310,7 @@ TEST_F(Run, ShowsProgressWhileAnItemRuns)
         {"--plan",
          plan(group_of({{"Item", "report G 30 -2 begun await /tmp/scene/go report G 100 0 x"}})),
          "P/G"}));
-    ASSERT_TRUE(wait_for([] { return events_so_far("progress") == 1; }, 30));
+    ASSERT_TRUE(eventually([] { return events_so_far("progress") == 1; }, 30));
     const Json progress = events_of(json(), "progress")[0];
     EXPECT_EQ(progress.at("progress"), "30");
     EXPECT_EQ(progress.at("result"), "-2");
@@ -405,7 +327,7 @@ TEST_F(Run, AsksTheModuleForNothingWhileACommandRuns)
          plan(group_of({{"Item", "report G 30 -2 a sleep 0.1 report G 60 -2 b sleep 0.1 "
                                  "note /tmp/scene/half await /tmp/scene/go report G 100 0 x"}})),
          "P/G"}));
-    ASSERT_TRUE(wait_for([] { return events_so_far("progress") > 1; }, 30));
+    ASSERT_TRUE(eventually([] { return events_so_far("progress") > 1; }, 30));
     ASSERT_TRUE(wait_for_file("half"));
     const std::string log = read_file(device::kLogFile);
     const std::string since = log.substr(log.find("Input cmdline : P/G/Item"));
@@ -674,7 +596,7 @@ TEST_F(Run, TakesTheReportsOfAShellScript)
                                     "fptest report G Script --progress 100 --result 0 "
                                     "--description &quot;by a script&quot;")}});
     FptestProcess fptest(with_json({"--plan", plan(text), "P/G"}));
-    EXPECT_TRUE(wait_for([] { return events_so_far("progress") > 0; }, 30));
+    EXPECT_TRUE(eventually([] { return events_so_far("progress") > 0; }, 30));
     file("go", "");
     const Ended ended = fptest.wait();
     EXPECT_EQ(ended.status, 0) << ended.err;
@@ -777,44 +699,33 @@ TEST_F(Run, StopsAGathererThatDoesNotReportInTime)
         group_of({{"SensorProbe", "--group G --seconds 30"}, {"Other", kItemPasses}});
     EXPECT_EQ(run({"--timeout", "1", "--plan", plan(text), "P/G"}).status, 1);
     EXPECT_THAT(outcomes(json()), ElementsAre("SensorProbe: timed out", "Other: passed"));
-    EXPECT_TRUE(wait_for([] { return processes_named("/system/bin/SensorProbe").empty(); }));
+    EXPECT_TRUE(eventually([] { return processes_named("/system/bin/SensorProbe").empty(); }));
 }
 
 // A gatherer of the test's own that is running already. It reports in steps.
-pid_t start_gatherer(const Lines &words)
+support::Start gatherer_of(Lines words)
 {
-    const pid_t pid = fork();
-    if (pid == 0) {
-        Lines arguments = words;
-        arguments.insert(arguments.begin(), "/system/bin/SensorProbe");
-        std::vector<char *> argv;
-        for (const std::string &argument : arguments) {
-            argv.push_back(const_cast<char *>(argument.c_str()));
-        }
-        argv.push_back(nullptr);
-        execv("/system/bin/Item", argv.data());
-        _exit(127);
-    }
-    EXPECT_TRUE(wait_for([] { return !processes_named("/system/bin/SensorProbe").empty(); }));
-    return pid;
+    words.insert(words.begin(), "/system/bin/SensorProbe");
+    return {.arguments = words, .program = "/system/bin/Item"};
 }
 
 TEST_F(Run, TakesNoStepOfAGathererForItsEnd)
 {
-    const pid_t gatherer =
-        start_gatherer({"gather", "report", "G", "50", "0", "half", "note", "/tmp/scene/half",
-                        "await", "/tmp/scene/go", "report", "G", "100", "1", "whole"});
+    support::Process gatherer(
+        gatherer_of({"gather", "report", "G", "50", "0", "half", "note", "/tmp/scene/half", "await",
+                     "/tmp/scene/go", "report", "G", "100", "1", "whole"}));
+    EXPECT_TRUE(eventually([] { return !processes_named("/system/bin/SensorProbe").empty(); }));
     FptestProcess fptest(with_json(
         {"--plan", plan(group_of({{"SensorProbe", ""}, {"Item", "note /tmp/scene/next"}})),
          "P/G"}));
-    ASSERT_TRUE(wait_for([] { return events_so_far("progress") == 1; }, 30));
+    ASSERT_TRUE(eventually([] { return events_so_far("progress") == 1; }, 30));
     EXPECT_THAT(events_of(json(), "end"), IsEmpty());
     file("go", "");
     EXPECT_EQ(fptest.wait().status, 1);
     EXPECT_THAT(outcomes(json()), ElementsAre("SensorProbe: failed", "Item: no result"));
     EXPECT_EQ(events_of(json(), "end").at(0).at("description"), "whole");
     // a stop would take what is left of it for an item
-    EXPECT_EQ(waitpid(gatherer, nullptr, 0), gatherer);
+    gatherer.wait();
 }
 
 TEST_F(Run, WaitsOnlySoLongForAGatherersReport)
@@ -831,7 +742,7 @@ TEST_F(Run, WaitsOnlySoLongForAGatherersReport)
 TEST_F(Run, InterruptsTheWaitForAGatherer)
 {
     FptestProcess fptest(with_json({"--plan", plan(kGathererThatNeverComes), "P/G"}));
-    EXPECT_TRUE(wait_for([] { return module_waits_for_gatherer(); }, 30));
+    EXPECT_TRUE(eventually([] { return module_waits_for_gatherer(); }, 30));
     fptest.signal(SIGINT);
     const Ended ended = fptest.wait();
     EXPECT_EQ(ended.status, 130);
@@ -1017,17 +928,17 @@ TEST_F(Run, WritesTapThatProveReads)
     start.arguments = {"run", "--tap", "--plan", plan(three_that_note()), "P/G"};
     Ended ended = run_fptest(start);
     EXPECT_EQ(ended.status, 0) << ended.err;
-    report_files::Finished finished = report_files::prove(file("tap", ended.out));
-    EXPECT_EQ(finished.status, 0) << finished.output;
-    EXPECT_THAT(finished.output, HasSubstr("All tests successful."));
+    Ended finished = support::prove(file("tap", ended.out));
+    EXPECT_EQ(finished.status, 0) << finished.out;
+    EXPECT_THAT(finished.out, HasSubstr("All tests successful."));
 
     start.arguments = {"run", "--tap", "--plan", plan(group_of({{"Item", "report G 100 1 x"}})),
                        "P/G"};
     ended = run_fptest(start);
     EXPECT_EQ(ended.status, 1);
-    finished = report_files::prove(file("tap", ended.out));
-    EXPECT_EQ(finished.status, 1) << finished.output;
-    EXPECT_THAT(finished.output, HasSubstr("Failed test:  1"));
+    finished = support::prove(file("tap", ended.out));
+    EXPECT_EQ(finished.status, 1) << finished.out;
+    EXPECT_THAT(finished.out, HasSubstr("Failed test:  1"));
 }
 
 struct Hostile {
@@ -1142,7 +1053,7 @@ TEST_F(Run, KeepsApartWhatItemsPrintThoughItComesLate)
     ASSERT_TRUE(wait_for_file("begun"));
     fptest.signal(SIGSTOP);
     file("go", "");
-    ASSERT_TRUE(wait_for([] { return running_items().empty(); }, 30));
+    ASSERT_TRUE(eventually([] { return running_items().empty(); }, 30));
     fptest.signal(SIGCONT);
     ASSERT_TRUE(wait_for_file("last"));
     file("end", "");
@@ -1196,7 +1107,8 @@ TEST_F(Run, HoldsNoMoreOfAnOutputThanItTells)
     FptestProcess fptest(with_json({"--plan", plan(text), "P/G"}));
     ASSERT_TRUE(wait_for_file("printed"));
     const std::string output = "/proc/" + std::to_string(fptest.module()) + "/fd/1";
-    EXPECT_TRUE(wait_for([&] { return memory_behind(output) < 1000000; })) << memory_behind(output);
+    EXPECT_TRUE(eventually([&] { return memory_behind(output) < 1000000; }))
+        << memory_behind(output);
     const std::string highest = device::status_field(fptest.pid(), "VmHWM");
     EXPECT_LT(std::stol(highest), 50000) << highest;
     file("go", "");
@@ -1262,7 +1174,7 @@ TEST_P(Interrupted, StopsTheItemAndMarksTheRest)
                                        {"Fourth", "note /tmp/scene/after"}});
     FptestProcess fptest({"run", "--tap", "--junit", work("junit"), "--json", work("json"),
                           "--plan", plan(text), "P/G", "P/G/Item"});
-    ASSERT_TRUE(wait_for([] { return events_so_far("progress") == 2; }, 30));
+    ASSERT_TRUE(eventually([] { return events_so_far("progress") == 2; }, 30));
     fptest.signal(GetParam());
     const Ended ended = fptest.wait();
     EXPECT_EQ(ended.status, 130);
@@ -1283,6 +1195,8 @@ TEST_P(Interrupted, StopsTheItemAndMarksTheRest)
 
     const std::string junit = read_file(work("junit"));
     EXPECT_EQ(tally_of_junit(junit), (Tally{1, 1, 3}));
+    // what a break has kept from being run is no success
+    EXPECT_EQ(parse_xml(junit).attributes.at("skipped"), "0");
     for (const Element &suite : parse_xml(junit).all("testsuite")) {
         EXPECT_EQ(suite.properties()["finished"], "false");
         for (const Element &test : suite.all("testcase")) {
@@ -1308,7 +1222,7 @@ TEST_P(Interrupted, SaysSoInTheView)
 {
     FptestProcess fptest(
         with_json({"--plan", plan(group_of({{"Item", kSleeps}, {"Other", kItemPasses}})), "P/G"}));
-    ASSERT_TRUE(wait_for([] { return events_so_far("progress") == 1; }, 30));
+    ASSERT_TRUE(eventually([] { return events_so_far("progress") == 1; }, 30));
     fptest.signal(GetParam());
     const Ended ended = fptest.wait();
     EXPECT_EQ(ended.status, 130);
@@ -1327,7 +1241,7 @@ INSTANTIATE_TEST_SUITE_P(, Interrupted, ::testing::Values(SIGINT, SIGTERM, SIGHU
 TEST_F(Run, RunsNothingWhereItIsInterruptedBefore)
 {
     Start start;
-    start.is_interrupted = true;
+    start.prepare = interrupted_before;
     start.arguments = with_json({"--plan", plan(three_that_note()), "P/G"});
     const Ended ended = run_fptest(start);
     EXPECT_EQ(ended.status, 130);
@@ -1391,7 +1305,7 @@ TEST_F(Run, LeavesAtOnceWhenInterruptedTwice)
         FptestProcess fptest(with_json({"--junit", work("junit"), "--plan", plan(text), "P/G"}));
         ASSERT_TRUE(wait_for_file("begun"));
         fptest.signal(first);
-        ASSERT_TRUE(wait_for([] { return !processes_stopped().empty(); }, 30));
+        ASSERT_TRUE(eventually([] { return !processes_stopped().empty(); }, 30));
         EXPECT_FALSE(fptest.has_ended());
         EXPECT_LT(seconds_to_end(fptest, second), 1);
         EXPECT_EQ(fptest.err(),
@@ -1401,7 +1315,7 @@ TEST_F(Run, LeavesAtOnceWhenInterruptedTwice)
         const Element junit = parse_xml(read_file(work("junit")));
         EXPECT_EQ(junit.children.at(0).properties()["finished"], "false");
         // it has its item stopped, which would be taken for the next one's first stop
-        EXPECT_TRUE(wait_for([] { return processes_named(FPTEST_PROGRAM).empty(); }, 20));
+        EXPECT_TRUE(eventually([] { return processes_named(FPTEST_PROGRAM).empty(); }, 20));
         DeviceTest::TearDown();
     }
     EXPECT_FALSE(is_there("after"));
@@ -1413,7 +1327,7 @@ TEST_F(Run, StopsWhatRunsAfterItHasLeftAtOnce)
     const std::string text = group_of({{"Item", std::string("note /tmp/scene/begun ") + kSleeps},
                                        {"Other", "note /tmp/scene/after"}});
     FptestProcess fptest(with_json({"--as-group", "--plan", plan(text), "P/G"}));
-    ASSERT_TRUE(wait_for([] { return events_so_far("progress") == 1; }, 30));
+    ASSERT_TRUE(eventually([] { return events_so_far("progress") == 1; }, 30));
     fptest.signal(SIGINT);
     fptest.signal(SIGTERM);
     EXPECT_EQ(fptest.wait().status, 130);
@@ -1434,7 +1348,7 @@ class CutOff : public Run
         FptestProcess fptest(
             with_json({way, "--junit", work("junit"), "--plan", plan(text), "P/G"}));
         ASSERT_TRUE(wait_for_file("begun"));
-        ASSERT_TRUE(wait_for([] { return events_so_far("start") == 2; }, 30));
+        ASSERT_TRUE(eventually([] { return events_so_far("start") == 2; }, 30));
         fptest.signal(SIGKILL);
         EXPECT_EQ(fptest.wait().status, -SIGKILL);
 
@@ -1448,7 +1362,7 @@ class CutOff : public Run
 
         expect_items_to_end();
         EXPECT_FALSE(is_there("after"));
-        EXPECT_TRUE(wait_for([] { return processes_named(FPTEST_PROGRAM).empty(); }, 20));
+        EXPECT_TRUE(eventually([] { return processes_named(FPTEST_PROGRAM).empty(); }, 20));
     }
 };
 
@@ -1478,7 +1392,7 @@ TEST_F(CutOff, LetsTheNextRunBeginWhenItsItemsHaveEnded)
     fptest.signal(SIGKILL);
     fptest.wait();
     Ended ended;
-    EXPECT_TRUE(wait_for([&] {
+    EXPECT_TRUE(eventually([&] {
         ended = run({"P/G/SensorProbe"});
         return ended.status != 3;
     }));
@@ -1489,10 +1403,10 @@ TEST_F(CutOff, LetsTheNextRunBeginWhenItsItemsHaveEnded)
 TEST_F(CutOff, LetsThePortGoThatAGathererWasWaitedForAt)
 {
     FptestProcess fptest({"run", "--plan", plan(kGathererThatNeverComes), "P/G"});
-    ASSERT_TRUE(wait_for([] { return module_waits_for_gatherer(); }, 30));
+    ASSERT_TRUE(eventually([] { return module_waits_for_gatherer(); }, 30));
     fptest.signal(SIGKILL);
-    EXPECT_TRUE(wait_for([] { return !module_waits_for_gatherer(); }, 20));
-    EXPECT_TRUE(wait_for([] { return processes_named(FPTEST_PROGRAM).empty(); }, 20));
+    EXPECT_TRUE(eventually([] { return !module_waits_for_gatherer(); }, 20));
+    EXPECT_TRUE(eventually([] { return processes_named(FPTEST_PROGRAM).empty(); }, 20));
 }
 
 TEST_F(CutOff, LosesTheItemInWhichTheModulesProcessEndedAndNoOther)
@@ -1675,7 +1589,7 @@ TEST_F(Refusal, WhereThePlansDirectoryIsNotWritable)
 {
     fs::permissions("/data/vorlane", fs::perms::owner_read | fs::perms::owner_exec);
     Start start;
-    start.is_plain_user = true;
+    start.prepare = as_plain_user;
     start.arguments = {"run", "--plan", plan(kTwoGroups), "P/Bringup"};
     expect(3,
            "fptest: /data/vorlane is not writable: Permission denied; make it, or run this as "
@@ -1690,7 +1604,7 @@ TEST_F(Refusal, OutsideOfADevice)
         GTEST_SKIP() << "in place, /system/bin cannot be hidden from one program";
     }
     Start start;
-    start.is_no_device = true;
+    start.prepare = without_device;
     start.arguments = {"run", "--plan", plan(kTwoGroups), "P/Bringup"};
     expect(3,
            "fptest: this machine is no device: there is no /system/bin/sh; on a desk, run it as: "
@@ -1807,7 +1721,7 @@ TEST_F(Refusal, OfASecondRunAtTheSameTime)
 {
     write_file(kPlanFile, group_of({{"Item", "await /tmp/scene/go report G 100 0 x"}}));
     FptestProcess first({"run", "P/G"});
-    ASSERT_TRUE(wait_for([] { return !processes_named("/system/bin/Item").empty(); }, 30));
+    ASSERT_TRUE(eventually([] { return !processes_named("/system/bin/Item").empty(); }, 30));
     const std::string stored = read_file(kPlanFile);
     const Ended second = run_fptest({"run", "--plan", plan(kTwoGroups), "P/Bringup"});
     EXPECT_EQ(second.status, 3);

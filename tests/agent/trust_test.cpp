@@ -4,7 +4,7 @@
 // Nothing counts as passed that has not passed in this run, and nothing that the
 // user has asked for is left out without a word.
 #include "fptest_runner.h"
-#include "report_files.h"
+#include "support/reports.h"
 
 #include <algorithm>
 #include <csignal>
@@ -14,12 +14,12 @@
 #include <unistd.h>
 
 using device::kPlanFile;
+using device::lines_of;
 using device::read_file;
 using device::start_program;
 using fptest_runner::Ended;
 using fptest_runner::expect_refusal;
 using fptest_runner::FptestProcess;
-using fptest_runner::lines_of;
 using fptest_runner::run_fptest;
 using ::testing::ElementsAre;
 using ::testing::HasSubstr;
@@ -34,7 +34,7 @@ class Trust : public FptestTest
   protected:
     static device::Lines outcomes()
     {
-        return report_files::outcomes(read_file(work("json")));
+        return support::outcomes(read_file(work("json")));
     }
     // Runs the group G of these items.
     static Ended run(const std::vector<device::PlanItem> &items, const device::Lines &options = {})
@@ -48,7 +48,7 @@ class Trust : public FptestTest
     // A value of an item's end.
     static std::string of_end(std::size_t item, const char *name)
     {
-        return report_files::events_of(read_file(work("json")), "end").at(item).at(name);
+        return support::events_of(read_file(work("json")), "end").at(item).at(name);
     }
 };
 

@@ -56,7 +56,7 @@ TEST_F(Gatherer, FirstCommandStartsItAndTriggersIt)
     run_path("P/G/SensorProbe");
 
     EXPECT_EQ(processes_named(kProbe).size(), 1U);
-    EXPECT_TRUE(wait_for([] { return read_back().find("result=\"0\"") != std::string::npos; }));
+    EXPECT_TRUE(eventually([] { return read_back().find("result=\"0\"") != std::string::npos; }));
     EXPECT_THAT(log_lines(), ::testing::IsSupersetOf(
                                  {"ResourceReduce| target process not exist!",
                                   "SingleItemExecute| tpCmd:/system/bin/SensorProbe --group G",
@@ -161,7 +161,7 @@ TEST_F(Gatherer, IsAwaitedOnEveryLocalAddressForAsLongAsItTakes)
         run_path("P/G/SensorProbe");
         returned = true;
     });
-    EXPECT_TRUE(wait_for([] { return !listeners().empty(); }));
+    EXPECT_TRUE(eventually([] { return !listeners().empty(); }));
     EXPECT_THAT(listeners(), ElementsAre("00000000:8888"));
     std::this_thread::sleep_for(std::chrono::milliseconds(500));
     EXPECT_FALSE(returned);
@@ -192,7 +192,7 @@ TEST_F(Gatherer, TakenPortGoesUnnoticedAndTheCommandWaitsElsewhere)
 
     std::thread command([] { run_path("P/G/SensorProbe"); });
     Lines found;
-    EXPECT_TRUE(wait_for([&] {
+    EXPECT_TRUE(eventually([&] {
         found = listeners();
         std::erase(found, "0100007F:8888");
         return !found.empty();
@@ -264,7 +264,7 @@ TEST_F(Gatherer, StartedInTheBackgroundItStaysUnreapedWhenItEnds)
     const auto is_zombie = [](const Process &process) {
         return process.parent == getpid() && process.state == 'Z';
     };
-    EXPECT_TRUE(wait_for([&] {
+    EXPECT_TRUE(eventually([&] {
         const auto all = processes();
         return std::any_of(all.begin(), all.end(), is_zombie);
     }));
