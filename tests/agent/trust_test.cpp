@@ -3,13 +3,11 @@
 
 // Nothing counts as passed that has not passed in this run, and nothing that the
 // user has asked for is left out without a word.
-#include "fptest_runner.h"
-#include "support/reports.h"
+#include "run_test.h"
 
 #include <algorithm>
 #include <csignal>
 #include <fcntl.h>
-#include <nlohmann/json.hpp>
 #include <sys/stat.h>
 #include <unistd.h>
 
@@ -29,26 +27,13 @@ using ::testing::StartsWith;
 namespace
 {
 
-class Trust : public FptestTest
+class Trust : public Run
 {
   protected:
-    static device::Lines outcomes()
-    {
-        return support::outcomes(read_file(work("json")));
-    }
-    // Runs the group G of these items.
-    static Ended run(const std::vector<device::PlanItem> &items, const device::Lines &options = {})
-    {
-        device::Lines arguments = {"run", "--json", work("json"), "--plan",
-                                   plan(device::plan_of({{"G", items}}))};
-        arguments.insert(arguments.end(), options.begin(), options.end());
-        arguments.emplace_back("P/G");
-        return run_fptest(arguments);
-    }
     // A value of an item's end.
     static std::string of_end(std::size_t item, const char *name)
     {
-        return support::events_of(read_file(work("json")), "end").at(item).at(name);
+        return end_of(item).at(name);
     }
 };
 
@@ -105,7 +90,7 @@ TEST_F(Trust, TakesNoResultOfAnEarlierRunThoughThePlanIsGivenAnew)
     const std::size_t end = old.find("/>");
     file("old", std::string(old).insert(end, " progress=\"100\" result=\"0\" description=\"old\""));
     const Ended ended =
-        run({{"Script", "'cat /tmp/scene/old >/data/vorlane/src1.xml; sleep 0.2'"}});
+        run_group({{"Script", "'cat /tmp/scene/old >/data/vorlane/src1.xml; sleep 0.2'"}});
     EXPECT_EQ(ended.status, 1);
     EXPECT_THAT(outcomes(), ElementsAre("Script: no result"));
     EXPECT_THAT(of_end(0, "reason"),
@@ -114,7 +99,8 @@ TEST_F(Trust, TakesNoResultOfAnEarlierRunThoughThePlanIsGivenAnew)
 
 TEST_F(Trust, TellsAReportThatIsWrittenOverFromNone)
 {
-    run({{"Script", "'cp /data/vorlane/src1.xml /tmp/scene/old; fptest report G Script --progress "
+    run_group(
+        {{"Script", "'cp /data/vorlane/src1.xml /tmp/scene/old; fptest report G Script --progress "
                     "100 --result 0; sleep 0.3; cat /tmp/scene/old >/data/vorlane/src1.xml; sleep "
                     "0.3'"}});
     EXPECT_THAT(outcomes(), ElementsAre("Script: no result"));
@@ -125,7 +111,8 @@ TEST_F(Trust, TellsAReportThatIsWrittenOverFromNone)
 // As "> /dev/stderr" does: the file is no pipe.
 TEST_F(Trust, KeepsWhatIsPrintedAfterAnItemHasTruncatedItsOutput)
 {
-    run({{"Item", "flood 30000"},
+    run_group(
+        {{"Item", "flood 30000"},
          {"Script", "'echo before; sleep 0.2; echo checking >/dev/stderr; sleep 0.2; echo after'"},
          {"Other", "say other sleep 0.2 complain again"},
          {"Third", "flood 60000"}});
@@ -136,11 +123,11 @@ TEST_F(Trust, KeepsWhatIsPrintedAfterAnItemHasTruncatedItsOutput)
 
 TEST_F(Trust, RunsNoGathererWhosePortAnItemHasTaken)
 {
-    const std::vector<device::PlanItem> items = {
-        {"Script", "'fptest report G Script --progress 100 --result 0; nc -l -p 34952 "
-                   "&lt;/dev/null >/dev/null 2>/dev/null &amp; sleep 0.3'"},
-        {"SensorProbe", "--group G --seconds 0"}};
-    Ended ended = run(items);
+    const Items items = {{"Script",
+                          "'fptest report G Script --progress 100 --result 0; nc -l -p 34952 "
+                          "&lt;/dev/null >/dev/null 2>/dev/null &amp; sleep 0.3'"},
+                         {"SensorProbe", "--group G --seconds 0"}};
+    Ended ended = run_group(items);
     EXPECT_EQ(ended.status, 3);
     EXPECT_EQ(
         lines_of(ended.err).back(),
@@ -149,7 +136,7 @@ TEST_F(Trust, RunsNoGathererWhosePortAnItemHasTaken)
     EXPECT_THAT(outcomes(), ElementsAre("Script: passed", "SensorProbe: not run"));
 
     // where the library comes to it without being asked first
-    ended = run(items, {"--as-group", "--timeout", "0.5", "--grace", "0.2"});
+    ended = run_group(items, {"--as-group", "--timeout", "0.5", "--grace", "0.2"});
     EXPECT_EQ(ended.status, 1);
     EXPECT_THAT(outcomes(), ElementsAre("Script: passed", "SensorProbe: timed out"));
     EXPECT_LT(ended.seconds, 20);
@@ -157,7 +144,7 @@ TEST_F(Trust, RunsNoGathererWhosePortAnItemHasTaken)
 
 TEST_F(Trust, LeavesTheGathererThatStaysRoomForWhatItPrints)
 {
-    run({{"SensorProbe", "--group G --seconds 0"}});
+    run_group({{"SensorProbe", "--group G --seconds 0"}});
     const auto gatherers = device::processes_named("/system/bin/SensorProbe");
     ASSERT_EQ(gatherers.size(), 1U);
     const std::string output = "/proc/" + std::to_string(gatherers[0].pid) + "/fd/1";

@@ -182,12 +182,7 @@ TEST_F(Gatherer, TakenPortGoesUnnoticedAndTheCommandWaitsElsewhere)
 {
     start_program({kHolder, "--sleep", "60"});
     store_plan();
-    const Socket other(socket(AF_INET, SOCK_STREAM, 0));
-    const int on = 1; // an earlier connection may linger
-    setsockopt(other.get(), SOL_SOCKET, SO_REUSEADDR, &on, sizeof on);
-    sockaddr_in address = loopback(kTriggerPort);
-    ASSERT_EQ(bind(other.get(), reinterpret_cast<sockaddr *>(&address), sizeof address), 0);
-    ASSERT_EQ(listen(other.get(), 1), 0);
+    const Socket other = listen_on(kTriggerPort);
     log_lines();
 
     std::thread command([] { run_path("P/G/SensorProbe"); });
