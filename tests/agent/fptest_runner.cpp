@@ -3,29 +3,20 @@
 
 #include "fptest_runner.h"
 
-#include "become.h"
-
 #include <algorithm>
 #include <array>
 #include <cerrno>
 #include <csignal>
 #include <cstdlib>
-#include <fcntl.h>
 #include <filesystem>
 #include <linux/capability.h>
-#include <linux/close_range.h>
 #include <linux/securebits.h>
 #include <regex>
 #include <sched.h>
-#include <sstream>
-#include <stdexcept>
-#include <sys/mman.h>
 #include <sys/mount.h>
 #include <sys/prctl.h>
-#include <sys/stat.h>
 #include <sys/statvfs.h>
 #include <sys/syscall.h>
-#include <sys/wait.h>
 #include <unistd.h>
 
 namespace fs = std::filesystem;
@@ -42,61 +33,10 @@ namespace fptest_runner
 namespace
 {
 
-// All of it can be read while somebody writes, and nobody waits for a reader.
-Descriptor make_file(const std::string &text = "")
-{
-    Descriptor file(memfd_create("fptest-test", MFD_CLOEXEC));
-    if (!file.is_open() ||
-        write(file.get(), text.data(), text.size()) != static_cast<ssize_t>(text.size()) ||
-        lseek(file.get(), 0, SEEK_SET) != 0) {
-        throw std::runtime_error("no memory for a file");
-    }
-    return file;
-}
-
-std::string text_of(const Descriptor &file)
-{
-    struct stat status {
-    };
-    fstat(file.get(), &status);
-    std::string text(static_cast<std::size_t>(status.st_size), '\0');
-    const ssize_t got = pread(file.get(), text.data(), text.size(), 0);
-    text.resize(static_cast<std::size_t>(std::max<ssize_t>(got, 0)));
-    return text;
-}
-
-Start start_of(const std::vector<std::string> &arguments, const std::string &input = "")
-{
-    Start start;
-    start.arguments = arguments;
-    start.input = input;
-    return start;
-}
-
-// Whatever is missing here makes the test fail by what the program then does.
-void drop_privileges()
-{
-    // fails where there are none to be dropped, as in a device of namespaces
-    prctl(PR_SET_SECUREBITS, SECBIT_NOROOT | SECBIT_NOROOT_LOCKED);
-    __user_cap_header_struct header{_LINUX_CAPABILITY_VERSION_3, 0};
-    std::array<__user_cap_data_struct, 2> none{};
-    if (syscall(SYS_capset, &header, none.data()) != 0) {
-        _exit(126);
-    }
-}
-
-void hide_the_device()
-{
-    if (unshare(CLONE_NEWUSER | CLONE_NEWNS) != 0 ||
-        mount("none", "/system/bin", "tmpfs", 0, nullptr) != 0) {
-        _exit(126);
-    }
-}
-
 device::Lines found(const std::string &log, const std::regex &shape)
 {
     device::Lines all;
-    for (const std::string &line : lines_of(device::read_file(log))) {
+    for (const std::string &line : device::lines_of(device::read_file(log))) {
         std::smatch match;
         if (std::regex_match(line, match, shape)) {
             all.push_back(match[1]);
@@ -109,92 +49,27 @@ device::Lines found(const std::string &log, const std::regex &shape)
 
 // --- a process ------------------------------------------------------------------
 
+FptestProcess::FptestProcess(Start start)
+    : Process([&start] {
+          start.arguments.insert(start.arguments.begin(), FPTEST_PROGRAM);
+          // it would say at each start what goes with the device
+          start.environment.try_emplace("QUILLMARK_DEVICE", std::nullopt);
+          return start;
+      }())
+{
+}
+
 FptestProcess::FptestProcess(const std::vector<std::string> &arguments)
-    : FptestProcess(start_of(arguments))
+    : FptestProcess(Start{.arguments = arguments})
 {
-}
-
-FptestProcess::FptestProcess(const Start &start)
-    : input_(make_file(start.input)), output_(make_file()), errors_(make_file())
-{
-    pid_ = fork();
-    if (pid_ < 0) {
-        throw std::runtime_error("no process for fptest");
-    }
-    if (pid_ == 0) {
-        become(start);
-    }
-}
-
-void FptestProcess::become(const Start &start) const
-{
-    if (start.has_own_group) {
-        setpgid(0, 0);
-    }
-    if (start.has_own_session) {
-        setsid();
-    }
-    dup2(input_.get(), STDIN_FILENO);
-    dup2(output_.get(), STDOUT_FILENO);
-    dup2(errors_.get(), STDERR_FILENO);
-    if (!start.output.empty()) {
-        // a terminal becomes that of the session only where it can be read
-        const int file = open(start.output.c_str(), O_RDWR | O_CREAT | O_TRUNC, 0644);
-        dup2(file, STDOUT_FILENO);
-        close(file);
-    }
-    // as a shell in front starts it, however the tests were started
-    close_range(STDERR_FILENO + 1, ~0U, CLOSE_RANGE_CLOEXEC);
-    for (const int number : {SIGINT, SIGTERM, SIGHUP, SIGQUIT, SIGPIPE}) {
-        std::signal(number, SIG_DFL);
-    }
-    for (const int number : start.ignored) {
-        std::signal(number, SIG_IGN);
-    }
-    unsetenv("QUILLMARK_DEVICE"); // it would say at each start what goes with the device
-    for (const auto &[name, value] : start.environment) {
-        if (value) {
-            setenv(name.c_str(), value->c_str(), 1);
-        } else {
-            unsetenv(name.c_str());
-        }
-    }
-    if (start.is_no_device) {
-        hide_the_device();
-    }
-    if (start.is_plain_user) {
-        drop_privileges();
-    }
-    if (start.is_interrupted) {
-        sigset_t set;
-        sigemptyset(&set);
-        sigaddset(&set, SIGINT);
-        sigprocmask(SIG_BLOCK, &set, nullptr);
-        raise(SIGINT);
-    }
-    std::vector<char *> argv = {const_cast<char *>(FPTEST_PROGRAM)};
-    for (const std::string &argument : start.arguments) {
-        argv.push_back(const_cast<char *>(argument.c_str()));
-    }
-    argv.push_back(nullptr);
-    execv(argv[0], argv.data());
-    _exit(127);
-}
-
-FptestProcess::~FptestProcess()
-{
-    if (!ended_ && pid_ > 0) {
-        kill(pid_, SIGKILL);
-        waitpid(pid_, nullptr, 0);
-    }
 }
 
 pid_t FptestProcess::module() const
 {
     pid_t module = 0;
-    EXPECT_TRUE(device::wait_for([&] {
+    EXPECT_TRUE(device::eventually([&] {
         for (const device::Process &process : device::processes()) {
-            if (process.parent == pid_ && process.state != 'Z') {
+            if (process.parent == pid() && process.state != 'Z') {
                 module = process.pid;
             }
         }
@@ -203,44 +78,43 @@ pid_t FptestProcess::module() const
     return module;
 }
 
-void FptestProcess::signal(int number) const
+// Whatever is missing here makes the test fail by what the program then does.
+void as_plain_user()
 {
-    EXPECT_EQ(kill(pid_, number), 0);
-}
-
-std::string FptestProcess::out() const
-{
-    return text_of(output_);
-}
-
-std::string FptestProcess::err() const
-{
-    return text_of(errors_);
-}
-
-bool FptestProcess::has_ended()
-{
-    int status = 0;
-    if (!ended_ && waitpid(pid_, &status, WNOHANG) == pid_) {
-        ended_ = Ended();
-        ended_->status = WIFEXITED(status) ? WEXITSTATUS(status) : -WTERMSIG(status);
-        ended_->out = out();
-        ended_->err = err();
-        ended_->seconds =
-            std::chrono::duration<double>(std::chrono::steady_clock::now() - began_).count();
+    // fails where there are none to be dropped, as in a device of namespaces
+    prctl(PR_SET_SECUREBITS, SECBIT_NOROOT | SECBIT_NOROOT_LOCKED);
+    __user_cap_header_struct header{_LINUX_CAPABILITY_VERSION_3, 0};
+    std::array<__user_cap_data_struct, 2> none{};
+    if (syscall(SYS_capset, &header, none.data()) != 0) {
+        _exit(126);
     }
-    return ended_.has_value();
 }
 
-Ended FptestProcess::wait(double seconds)
+void without_device()
 {
-    if (!device::wait_for([this] { return has_ended(); }, seconds)) {
-        ADD_FAILURE() << "fptest has not ended within " << seconds << " s; it has printed\n"
-                      << out() << err();
-        kill(pid_, SIGKILL);
-        EXPECT_TRUE(device::wait_for([this] { return has_ended(); }));
+    if (unshare(CLONE_NEWUSER | CLONE_NEWNS) != 0 ||
+        mount("none", "/system/bin", "tmpfs", 0, nullptr) != 0) {
+        _exit(126);
     }
-    return ended_.value();
+}
+
+void interrupted_before()
+{
+    sigset_t set;
+    sigemptyset(&set);
+    sigaddset(&set, SIGINT);
+    sigprocmask(SIG_BLOCK, &set, nullptr);
+    raise(SIGINT);
+}
+
+void in_own_group()
+{
+    setpgid(0, 0);
+}
+
+void in_own_session()
+{
+    setsid();
 }
 
 Ended run_fptest(const Start &start)
@@ -250,7 +124,7 @@ Ended run_fptest(const Start &start)
 
 Ended run_fptest(const std::vector<std::string> &arguments, const std::string &input)
 {
-    return run_fptest(start_of(arguments, input));
+    return run_fptest({.arguments = arguments, .input = input});
 }
 
 void expect_refusal(int status, const std::string &line, const std::vector<std::string> &arguments)
@@ -261,39 +135,12 @@ void expect_refusal(int status, const std::string &line, const std::vector<std::
     EXPECT_EQ(ended.out, "");
 }
 
-Ended run_program(const std::vector<std::string> &arguments,
-                  const std::map<std::string, std::optional<std::string>> &environment)
+Ended run_program(const std::vector<std::string> &arguments)
 {
-    const Descriptor output = make_file();
-    const pid_t pid = fork();
-    if (pid == 0) {
-        const int null = open("/dev/null", O_RDONLY);
-        dup2(null, STDIN_FILENO);
-        dup2(output.get(), STDOUT_FILENO);
-        dup2(output.get(), STDERR_FILENO);
-        become(arguments, environment);
-    }
-    int status = 0;
-    if (pid < 0 || waitpid(pid, &status, 0) != pid) {
-        throw std::runtime_error("no process for " + arguments.at(0));
-    }
-    Ended ended;
-    ended.status = WIFEXITED(status) ? WEXITSTATUS(status) : -WTERMSIG(status);
-    ended.out = text_of(output);
-    return ended;
+    return support::run({.arguments = arguments, .is_one_stream = true});
 }
 
 // --- texts ----------------------------------------------------------------------
-
-device::Lines lines_of(const std::string &text)
-{
-    device::Lines lines;
-    std::istringstream stream(text);
-    for (std::string line; std::getline(stream, line);) {
-        lines.push_back(line);
-    }
-    return lines;
-}
 
 std::string without_times(const std::string &text)
 {
@@ -369,7 +216,7 @@ bool FptestTest::is_there(const std::string &name)
 
 bool FptestTest::wait_for_file(const std::string &name)
 {
-    return device::wait_for([&] { return is_there(name); }, 30);
+    return device::eventually([&] { return is_there(name); }, 30);
 }
 
 device::Lines FptestTest::running_items()
@@ -387,7 +234,7 @@ device::Lines FptestTest::running_items()
 
 void FptestTest::expect_items_to_end()
 {
-    if (!device::wait_for([] { return running_items().empty(); }, 20)) {
+    if (!device::eventually([] { return running_items().empty(); }, 20)) {
         for (const device::Process &process : device::processes()) {
             ADD_FAILURE() << process.pid << " below " << process.parent << ", " << process.state
                           << " " << process.name << " "

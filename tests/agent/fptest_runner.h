@@ -5,12 +5,9 @@
 // input, and what comes of it. Waited for, or left running to be signalled.
 #pragma once
 
-#include "common/descriptor.h"
 #include "device_test.h"
+#include "support/process.h"
 
-#include <chrono>
-#include <map>
-#include <optional>
 #include <string>
 #include <sys/types.h>
 #include <vector>
@@ -18,62 +15,27 @@
 namespace fptest_runner
 {
 
-struct Start {
-    std::vector<std::string> arguments;
-    std::string input;
-    // A value, or nothing to take the variable away.
-    std::map<std::string, std::optional<std::string>> environment;
-    std::string output;          // a file for standard output, in place of keeping it
-    bool is_plain_user = false;  // modes of files hold for it, as they do not for root
-    bool is_no_device = false;   // it finds an empty /system/bin
-    bool is_interrupted = false; // SIGINT has come before it does anything
-    bool has_own_group = false;  // of processes, as a shell with job control starts it
-    bool has_own_session = false;
-    std::vector<int> ignored; // signals, as by nohup
-};
+using support::Ended;
+using support::lines_of;
+using support::Start;
 
-struct Ended {
-    int status = 0; // minus the number of the signal that ended it
-    std::string out;
-    std::string err;
-    double seconds = 0;
-};
-
-class FptestProcess
+// Its arguments are those after the program's name.
+class FptestProcess : public support::Process
 {
   public:
-    explicit FptestProcess(const Start &start);
+    explicit FptestProcess(Start start);
     explicit FptestProcess(const std::vector<std::string> &arguments);
-    ~FptestProcess(); // kills it if it is still there
-    FptestProcess(const FptestProcess &) = delete;
-    FptestProcess &operator=(const FptestProcess &) = delete;
 
-    pid_t pid() const
-    {
-        return pid_;
-    }
     // Its process that runs the library, waited for.
     pid_t module() const;
-    void signal(int number) const;
-
-    // What it has printed so far.
-    std::string out() const;
-    std::string err() const;
-
-    bool has_ended();
-    // A test failure where it does not end in that time; it is killed then.
-    Ended wait(double seconds = 60);
-
-  private:
-    [[noreturn]] void become(const Start &start) const;
-
-    Descriptor input_;
-    Descriptor output_;
-    Descriptor errors_;
-    std::chrono::steady_clock::time_point began_ = std::chrono::steady_clock::now();
-    pid_t pid_ = -1;
-    std::optional<Ended> ended_;
 };
+
+// How it may be started: each is a Start's prepare.
+void as_plain_user();      // modes of files hold for it, as they do not for root
+void without_device();     // it finds an empty /system/bin
+void interrupted_before(); // SIGINT has come before it does anything
+void in_own_group();       // of processes, as a shell with job control starts it
+void in_own_session();
 
 // Runs it to its end.
 Ended run_fptest(const Start &start);
@@ -82,12 +44,8 @@ Ended run_fptest(const std::vector<std::string> &arguments, const std::string &i
 // It ends with that status and says why in that line, and nothing else.
 void expect_refusal(int status, const std::string &line, const std::vector<std::string> &arguments);
 
-// Another program of this system, by its path and with everything it prints in out.
-Ended run_program(const std::vector<std::string> &arguments,
-                  const std::map<std::string, std::optional<std::string>> &environment = {});
-
-// Without their line feeds.
-device::Lines lines_of(const std::string &text);
+// Another program of this system, with everything it prints in out.
+Ended run_program(const std::vector<std::string> &arguments);
 
 // The text with its times, like "0.3 s", made the same.
 std::string without_times(const std::string &text);

@@ -305,7 +305,7 @@ TEST_F(Fptest, ChecksArgsWhereThereIsNoShellToAsk)
     const std::string before = "<P><CmdGroup name=\"G\"><Cmd name=\"X\" args=\"";
     const std::string after = "\"/></CmdGroup></P>";
     Start start;
-    start.is_no_device = true;
+    start.prepare = without_device;
     start.arguments = {"check", "-"};
     start.input = before + "it's" + after;
     EXPECT_EQ(lines_of(run_fptest(start).out).front(),

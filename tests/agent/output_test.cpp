@@ -3,7 +3,7 @@
 
 // Where results go, and readers that do not read them.
 #include "fptest_runner.h"
-#include "report_files.h"
+#include "support/reports.h"
 #include "terminal_session.h"
 #include "util/text.h"
 
@@ -21,11 +21,11 @@
 #include <utility>
 
 using namespace fptest_runner;
+using device::eventually;
 using device::read_file;
-using device::wait_for;
-using report_files::events_of;
-using report_files::outcomes;
-using report_files::parse_xml;
+using support::events_of;
+using support::outcomes;
+using support::parse_xml;
 using ::testing::ElementsAre;
 using ::testing::HasSubstr;
 using ::testing::SizeIs;
@@ -108,7 +108,7 @@ TEST_F(Output, TerminalThatIsStoppedHoldsUpNothing)
                             80, 24);
     ASSERT_TRUE(session.wait_for_text("running"));
     session.type(kStop);
-    EXPECT_TRUE(wait_for(has_finished_in_json, 20));
+    EXPECT_TRUE(eventually(has_finished_in_json, 20));
     EXPECT_THAT(outcomes(read_file(work("json"))), ElementsAre("Item: timed out", "Other: passed"));
     EXPECT_LT(events_of(read_file(work("json")), "end").at(0).at("seconds"), 2.5);
     EXPECT_THAT(session.text(), ::testing::Not(HasSubstr("timed out")));
@@ -132,8 +132,8 @@ TEST_F(Output, PipeThatIsFullHoldsUpNothingAndLosesNothing)
     start.arguments = {"run", "--json", work("fifo"), "--plan", plan(kLoud), "P/G"};
     FptestProcess fptest(start);
     EXPECT_TRUE(wait_for_file("third"));
-    EXPECT_TRUE(
-        wait_for([&] { return fptest.out().find("1 passed, 2 failed") != std::string::npos; }, 20))
+    EXPECT_TRUE(eventually(
+        [&] { return fptest.out().find("1 passed, 2 failed") != std::string::npos; }, 20))
         << fptest.out();
     EXPECT_FALSE(fptest.has_ended()) << "what is written waits for its reader";
     const std::string text = read_to_end(reader);
@@ -148,8 +148,8 @@ TEST_F(Output, FifoWithoutAReaderHoldsUpNothing)
     ASSERT_EQ(mkfifo(work("fifo").c_str(), 0600), 0);
     FptestProcess fptest({"run", "--timeout", "1", "--json", work("fifo"), "--junit", work("junit"),
                           "--plan", plan(kTwoItems), "P/G"});
-    EXPECT_TRUE(
-        wait_for([&] { return fptest.out().find("1 passed, 1 failed") != std::string::npos; }, 20))
+    EXPECT_TRUE(eventually(
+        [&] { return fptest.out().find("1 passed, 1 failed") != std::string::npos; }, 20))
         << fptest.out();
     EXPECT_EQ(parse_xml(read_file(work("junit"))).children.at(0).properties()["finished"], "true");
     const Descriptor reader(open(work("fifo").c_str(), O_RDONLY | O_CLOEXEC));
@@ -161,8 +161,8 @@ TEST_F(Output, SignalEndsTheWaitForAReader)
 {
     const Descriptor reader = unread_fifo();
     FptestProcess fptest({"run", "--json", work("fifo"), "--plan", plan(kLoud), "P/G"});
-    ASSERT_TRUE(
-        wait_for([&] { return fptest.out().find("1 passed, 2 failed") != std::string::npos; }, 30));
+    ASSERT_TRUE(eventually(
+        [&] { return fptest.out().find("1 passed, 2 failed") != std::string::npos; }, 30));
     fptest.signal(SIGINT);
     const Ended ended = fptest.wait(5);
     EXPECT_EQ(ended.status, 130);
@@ -181,7 +181,8 @@ TEST_F(Output, InterruptedRunEndsItsItemWhileNobodyReads)
     ASSERT_TRUE(wait_for_file("third"));
     fptest.signal(SIGTERM);
     expect_items_to_end();
-    EXPECT_TRUE(wait_for([&] { return fptest.out().find("Bail out!") != std::string::npos; }, 20));
+    EXPECT_TRUE(
+        eventually([&] { return fptest.out().find("Bail out!") != std::string::npos; }, 20));
     fptest.signal(SIGTERM);
     EXPECT_EQ(fptest.wait(5).status, 130);
 }

@@ -249,7 +249,7 @@ TEST_F(Report, SaysThatThePlanIsNotWritable)
 {
     fs::permissions(kPlanFile, fs::perms::owner_read);
     Start start;
-    start.is_plain_user = true;
+    start.prepare = as_plain_user;
     start.arguments = {"report", "Bringup", "SpiCheck", "--progress", "1", "--result", "0"};
     const Ended ended = run_fptest(start);
     EXPECT_EQ(ended.status, 3);

@@ -3,10 +3,11 @@
 
 // What reports say of rounds, of breaks, and of how items ended.
 #include "playback.h"
-#include "report_files.h"
 #include "reporters/reporters.h"
 #include "reporters/views.h"
 #include "reporters/wording.h"
+#include "support/reports.h"
+#include "support/temporary_directory.h"
 
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
@@ -22,7 +23,7 @@
 #include <unistd.h>
 
 using namespace playback;
-using namespace report_files;
+using namespace support;
 using namespace std::chrono_literals;
 using ::testing::ElementsAre;
 using ::testing::HasSubstr;
@@ -102,7 +103,7 @@ class RoundReports : public ::testing::Test
         });
     }
 
-    Directory directory_;
+    TemporaryDirectory directory_;
 };
 
 void play_one(Playback &playback)
@@ -195,7 +196,7 @@ TEST_F(RoundReports, PlanTheRoundsAtTheEndWhereTapDoesNotKnowTheirNumber)
     EXPECT_EQ(parse_tap(text).planned, 4U);
     // the version that prove knows
     write_file(path("tap"), "TAP version 13\n" + text.substr(15));
-    EXPECT_THAT(prove(path("tap")).output, Not(HasSubstr("Parse errors")));
+    EXPECT_THAT(prove(path("tap")).out, Not(HasSubstr("Parse errors")));
 }
 
 TEST_F(RoundReports, SkipTheRestOfABrokenRoundInTap)

@@ -3,7 +3,7 @@
 
 // Runs of many rounds: how they end, and what they take.
 #include "fptest_runner.h"
-#include "report_files.h"
+#include "support/reports.h"
 
 #include <gmock/gmock.h>
 #include <nlohmann/json.hpp>
@@ -15,12 +15,12 @@
 #include <unistd.h>
 
 using namespace fptest_runner;
+using device::eventually;
 using device::read_file;
-using device::wait_for;
-using report_files::Element;
-using report_files::events_of;
-using report_files::parse_xml;
-using report_files::verdict_of;
+using support::Element;
+using support::events_of;
+using support::parse_xml;
+using support::verdict_of;
 using ::testing::ElementsAre;
 using ::testing::HasSubstr;
 using ::testing::StartsWith;
@@ -158,8 +158,8 @@ TEST_F(Rounds, TakeNothingWhileTheyHaveNotBegun)
 {
     FptestProcess fptest({"run", "--repeat", "1000000", "--json", work("json"), "--junit",
                           work("junit"), "--tap", "--plan", plan(kPasses), "P/G"});
-    ASSERT_TRUE(
-        wait_for([&] { return fptest.out().find("ok 3 - G (round 3)") != std::string::npos; }, 20));
+    ASSERT_TRUE(eventually(
+        [&] { return fptest.out().find("ok 3 - G (round 3)") != std::string::npos; }, 20));
     const std::string most = device::status_field(fptest.pid(), "VmHWM");
     EXPECT_LT(std::stol(most), 32 * 1024) << most;
     fptest.signal(SIGTERM);
@@ -187,7 +187,7 @@ TEST_F(Rounds, TakeNoMoreMemoryHoweverManyHaveBeenRun)
                           "P/G"});
     const pid_t module = fptest.module();
     const auto held_in = [&](int round) {
-        EXPECT_TRUE(wait_for(
+        EXPECT_TRUE(eventually(
             [&] {
                 return fptest.out().find(" - G (round " + std::to_string(round) + ")\n") !=
                        std::string::npos;
@@ -208,7 +208,7 @@ TEST_F(Rounds, LookAtSignalsFromTheFirstMomentOn)
 {
     Start start;
     start.arguments = {"run", "--repeat", "1000000", "--plan", plan(kPasses), "P/G"};
-    start.is_interrupted = true;
+    start.prepare = interrupted_before;
     const Ended ended = run_fptest(start);
     EXPECT_EQ(ended.status, 130);
     EXPECT_EQ(without_times(ended.out), "/tmp/scene/plan.xml: 1 item, vendor 0, 1000000 rounds\n"
@@ -230,7 +230,7 @@ TEST_F(Rounds, AreRedInJunitWhereTheRunIsKilled)
         return verdicts() == device::Lines{"Item (round 1): passed", "Other (round 1): running",
                                            "Third (round 1): not run", "rounds 2 to 5: not run"};
     };
-    EXPECT_TRUE(wait_for(is_running, 10)) << read_file(work("junit"));
+    EXPECT_TRUE(eventually(is_running, 10)) << read_file(work("junit"));
     fptest.signal(SIGKILL);
     EXPECT_EQ(fptest.wait().status, -SIGKILL);
     const Element top = parse_xml(read_file(work("junit")));

@@ -13,11 +13,11 @@
 #include <unistd.h>
 
 using namespace fptest_runner;
+using device::eventually;
 using device::kPlanFile;
 using device::plan_of;
 using device::processes_named;
 using device::read_file;
-using device::wait_for;
 using device::write_file;
 using ::testing::Not;
 
@@ -128,7 +128,7 @@ TEST_F(Send, ShowsWhatAnItemPrintsWhileItRuns)
 {
     write_file(kPlanFile, plan_of({{"G", {{"Item", "say begun await /tmp/scene/go"}}}}));
     FptestProcess fptest({"send", "pingtest", "XMLNodePath::P/G", "XMLNodePath::P/G"});
-    EXPECT_TRUE(wait_for([&] { return fptest.err().find("begun\n") != std::string::npos; }, 30));
+    EXPECT_TRUE(eventually([&] { return fptest.err().find("begun\n") != std::string::npos; }, 30));
     // a reply as soon as there is one
     EXPECT_EQ(fptest.out(), "Ping Success!\n");
     file("go", "");
@@ -185,7 +185,7 @@ TEST_F(Send, StopsAlsoWhatAnInterruptedGroupWouldStartNext)
     fptest.signal(SIGINT);
     EXPECT_EQ(fptest.wait().status, 130);
     expect_items_to_end();
-    EXPECT_TRUE(wait_for([] { return processes_named(FPTEST_PROGRAM).empty(); }, 20));
+    EXPECT_TRUE(eventually([] { return processes_named(FPTEST_PROGRAM).empty(); }, 20));
 }
 
 TEST_F(Send, WaitsForTheEndOfAReportBeforeItsPlanIsLoaded)
@@ -265,7 +265,7 @@ TEST_F(Send, WantsADevice)
         GTEST_SKIP() << "in place, /system/bin cannot be hidden from one program";
     }
     Start start;
-    start.is_no_device = true;
+    start.prepare = without_device;
     start.arguments = {"send", "XMLFile::<P/>"};
     const Ended ended = run_fptest(start);
     EXPECT_EQ(ended.status, 3);

@@ -3,7 +3,7 @@
 
 // Signals in the first moments of fptest run, and those that it was started to ignore.
 #include "fptest_runner.h"
-#include "report_files.h"
+#include "support/reports.h"
 
 #include <array>
 #include <chrono>
@@ -18,9 +18,9 @@
 using namespace fptest_runner;
 using device::kPlanFile;
 using device::read_file;
-using report_files::events_of;
-using report_files::outcomes;
-using report_files::parse_xml;
+using support::events_of;
+using support::outcomes;
+using support::parse_xml;
 using ::testing::ElementsAre;
 
 namespace
@@ -38,7 +38,7 @@ class Started : public FptestTest
         Start start;
         start.arguments = {"run",         "--json", work("json"), "--junit",
                            work("junit"), "--plan", path,         "P/G"};
-        start.has_own_session = true;
+        start.prepare = in_own_session;
         return start;
     }
 
@@ -49,7 +49,7 @@ class Started : public FptestTest
         EXPECT_EQ(suite.properties()["reason"], reason);
     }
 
-    // Without the pauses of wait_for(), so that its process is met when it is new.
+    // Without the pauses of eventually(), so that its process is met when it is new.
     static bool has_child(pid_t pid)
     {
         const std::string children =
@@ -109,7 +109,10 @@ TEST_F(Started, SignalsThatAreIgnoredStayIgnored)
              "await /tmp/scene/go report G 100 0 fine\"/></CmdGroup></P>");
     for (const int signal : {SIGHUP, SIGINT}) {
         Start start = start_of_run(path);
-        start.ignored = {signal};
+        start.prepare = [signal] {
+            in_own_session();
+            std::signal(signal, SIG_IGN);
+        };
         FptestProcess fptest(start);
         ASSERT_TRUE(wait_for_file("begun"));
         fptest.signal(signal);

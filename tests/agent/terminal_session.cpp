@@ -3,19 +3,16 @@
 
 #include "terminal_session.h"
 
-#include "become.h"
+#include "support/wait.h"
 
 #include <cerrno>
 #include <chrono>
-#include <csignal>
-#include <cstdlib>
 #include <poll.h>
 #include <pty.h>
 #include <stdexcept>
 #include <sys/ioctl.h>
-#include <sys/wait.h>
-#include <thread>
 #include <unistd.h>
+#include <utmp.h>
 
 namespace
 {
@@ -68,7 +65,7 @@ double now()
 } // namespace
 
 TerminalSession::TerminalSession(const std::vector<std::string> &arguments, int columns, int rows,
-                                 const Environment &environment)
+                                 const support::Environment &environment)
     : columns_(columns), rows_(rows), vterm_(vterm_new(rows, columns)),
       screen_(vterm_obtain_screen(vterm_))
 {
@@ -89,32 +86,31 @@ TerminalSession::TerminalSession(const std::vector<std::string> &arguments, int 
     winsize size{};
     size.ws_col = static_cast<unsigned short>(columns);
     size.ws_row = static_cast<unsigned short>(rows);
-    pid_ = forkpty(&terminal_, nullptr, nullptr, &size);
-    if (pid_ < 0) {
+    int terminal = -1;
+    int programs_side = -1;
+    if (openpty(&terminal, &programs_side, nullptr, nullptr, &size) != 0) {
         throw std::runtime_error("no terminal to be had");
     }
-    if (pid_ == 0) {
-        setenv("TERM", "xterm-256color", 1);
-        unsetenv("NO_COLOR");
-        unsetenv("QUILLMARK_DEVICE"); // it would say at each start what goes with the device
-        std::signal(SIGHUP, SIG_DFL); // the tests may have been started by nohup
-        become(arguments, environment);
-    }
+    terminal_ = Descriptor(terminal);
+    const Descriptor other_side(programs_side);
+    support::Start start{.arguments = arguments, .environment = environment};
+    start.environment.insert({{"TERM", "xterm-256color"},
+                              {"NO_COLOR", std::nullopt},
+                              // it would say at each start what goes with the device
+                              {"QUILLMARK_DEVICE", std::nullopt}});
+    start.shares_streams = true;
+    start.prepare = [programs_side] { login_tty(programs_side); };
+    process_.emplace(start);
 }
 
 TerminalSession::~TerminalSession()
 {
-    if (pid_ > 0) {
-        kill(pid_, SIGKILL);
-        waitpid(pid_, nullptr, 0);
-    }
-    close(terminal_);
     vterm_free(vterm_);
 }
 
 void TerminalSession::type(std::string_view keys)
 {
-    if (write(terminal_, keys.data(), keys.size()) != static_cast<ssize_t>(keys.size())) {
+    if (write(terminal_.get(), keys.data(), keys.size()) != static_cast<ssize_t>(keys.size())) {
         throw std::runtime_error("the terminal takes no keys");
     }
 }
@@ -127,17 +123,17 @@ void TerminalSession::resize(int columns, int rows)
     columns_ = columns;
     rows_ = rows;
     vterm_set_size(vterm_, rows, columns);
-    ioctl(terminal_, TIOCSWINSZ, &size);
+    ioctl(terminal_.get(), TIOCSWINSZ, &size);
 }
 
 bool TerminalSession::read_some(int milliseconds)
 {
-    pollfd polled{terminal_, POLLIN, 0};
+    pollfd polled{terminal_.get(), POLLIN, 0};
     if (at_end_ || poll(&polled, 1, milliseconds) <= 0) {
         return !at_end_;
     }
     char buffer[4096];
-    const ssize_t got = read(terminal_, buffer, sizeof buffer);
+    const ssize_t got = read(terminal_.get(), buffer, sizeof buffer);
     if (got <= 0) { // EIO once nobody has the other side open
         at_end_ = got == 0 || errno != EINTR;
         return !at_end_;
@@ -169,15 +165,10 @@ int TerminalSession::wait_for_end(double seconds)
     const double end = now() + seconds;
     while (now() < end && read_some(20)) {
     }
-    int status = 0;
-    while (now() < end) {
-        if (waitpid(pid_, &status, WNOHANG) == pid_) {
-            pid_ = -1;
-            return WIFEXITED(status) ? WEXITSTATUS(status) : -WTERMSIG(status);
-        }
-        std::this_thread::sleep_for(std::chrono::milliseconds(5));
+    if (!support::eventually([this] { return process_->has_ended(); }, end - now())) {
+        throw std::runtime_error("the program has not ended:\n" + text());
     }
-    throw std::runtime_error("the program has not ended:\n" + text());
+    return process_->wait().status;
 }
 
 std::vector<std::string> TerminalSession::lines() const

@@ -4,8 +4,10 @@
 // A program on a terminal of its own: what it shows is what a person would see.
 #pragma once
 
+#include "common/descriptor.h"
+#include "support/process.h"
+
 #include <functional>
-#include <map>
 #include <optional>
 #include <string>
 #include <string_view>
@@ -16,13 +18,9 @@
 class TerminalSession
 {
   public:
-    using Environment = std::map<std::string, std::optional<std::string>>;
-
-    // Starts the program at once. The environment's changes: a value, or nothing
-    // to take the variable away.
+    // Starts the program at once; it is ended with this object.
     TerminalSession(const std::vector<std::string> &arguments, int columns, int rows,
-                    const Environment &environment = {});
-    // Ends the program if it is still there.
+                    const support::Environment &environment = {});
     ~TerminalSession();
     TerminalSession(const TerminalSession &) = delete;
     TerminalSession &operator=(const TerminalSession &) = delete;
@@ -50,7 +48,7 @@ class TerminalSession
     }
     pid_t pid() const
     {
-        return pid_;
+        return process_->pid();
     }
     int columns() const
     {
@@ -69,8 +67,8 @@ class TerminalSession
 
     int columns_;
     int rows_;
-    int terminal_ = -1;
-    pid_t pid_ = -1;
+    Descriptor terminal_{-1};
+    std::optional<support::Process> process_;
     bool at_end_ = false;
     VTerm *vterm_;
     VTermScreen *screen_;

@@ -3,23 +3,21 @@
 
 // Nothing counts as passed that has not passed in this run, and nothing that the
 // user has asked for is left out without a word.
-#include "fptest_runner.h"
-#include "report_files.h"
+#include "run_test.h"
 
 #include <algorithm>
 #include <csignal>
 #include <fcntl.h>
-#include <nlohmann/json.hpp>
 #include <sys/stat.h>
 #include <unistd.h>
 
 using device::kPlanFile;
+using device::lines_of;
 using device::read_file;
 using device::start_program;
 using fptest_runner::Ended;
 using fptest_runner::expect_refusal;
 using fptest_runner::FptestProcess;
-using fptest_runner::lines_of;
 using fptest_runner::run_fptest;
 using ::testing::ElementsAre;
 using ::testing::HasSubstr;
@@ -29,26 +27,13 @@ using ::testing::StartsWith;
 namespace
 {
 
-class Trust : public FptestTest
+class Trust : public Run
 {
   protected:
-    static device::Lines outcomes()
-    {
-        return report_files::outcomes(read_file(work("json")));
-    }
-    // Runs the group G of these items.
-    static Ended run(const std::vector<device::PlanItem> &items, const device::Lines &options = {})
-    {
-        device::Lines arguments = {"run", "--json", work("json"), "--plan",
-                                   plan(device::plan_of({{"G", items}}))};
-        arguments.insert(arguments.end(), options.begin(), options.end());
-        arguments.emplace_back("P/G");
-        return run_fptest(arguments);
-    }
     // A value of an item's end.
     static std::string of_end(std::size_t item, const char *name)
     {
-        return report_files::events_of(read_file(work("json")), "end").at(item).at(name);
+        return end_of(item).at(name);
     }
 };
 
@@ -105,7 +90,7 @@ TEST_F(Trust, TakesNoResultOfAnEarlierRunThoughThePlanIsGivenAnew)
     const std::size_t end = old.find("/>");
     file("old", std::string(old).insert(end, " progress=\"100\" result=\"0\" description=\"old\""));
     const Ended ended =
-        run({{"Script", "'cat /tmp/scene/old >/data/vorlane/src1.xml; sleep 0.2'"}});
+        run_group({{"Script", "'cat /tmp/scene/old >/data/vorlane/src1.xml; sleep 0.2'"}});
     EXPECT_EQ(ended.status, 1);
     EXPECT_THAT(outcomes(), ElementsAre("Script: no result"));
     EXPECT_THAT(of_end(0, "reason"),
@@ -114,7 +99,8 @@ TEST_F(Trust, TakesNoResultOfAnEarlierRunThoughThePlanIsGivenAnew)
 
 TEST_F(Trust, TellsAReportThatIsWrittenOverFromNone)
 {
-    run({{"Script", "'cp /data/vorlane/src1.xml /tmp/scene/old; fptest report G Script --progress "
+    run_group(
+        {{"Script", "'cp /data/vorlane/src1.xml /tmp/scene/old; fptest report G Script --progress "
                     "100 --result 0; sleep 0.3; cat /tmp/scene/old >/data/vorlane/src1.xml; sleep "
                     "0.3'"}});
     EXPECT_THAT(outcomes(), ElementsAre("Script: no result"));
@@ -125,7 +111,8 @@ TEST_F(Trust, TellsAReportThatIsWrittenOverFromNone)
 // As "> /dev/stderr" does: the file is no pipe.
 TEST_F(Trust, KeepsWhatIsPrintedAfterAnItemHasTruncatedItsOutput)
 {
-    run({{"Item", "flood 30000"},
+    run_group(
+        {{"Item", "flood 30000"},
          {"Script", "'echo before; sleep 0.2; echo checking >/dev/stderr; sleep 0.2; echo after'"},
          {"Other", "say other sleep 0.2 complain again"},
          {"Third", "flood 60000"}});
@@ -136,11 +123,11 @@ TEST_F(Trust, KeepsWhatIsPrintedAfterAnItemHasTruncatedItsOutput)
 
 TEST_F(Trust, RunsNoGathererWhosePortAnItemHasTaken)
 {
-    const std::vector<device::PlanItem> items = {
-        {"Script", "'fptest report G Script --progress 100 --result 0; nc -l -p 34952 "
-                   "&lt;/dev/null >/dev/null 2>/dev/null &amp; sleep 0.3'"},
-        {"SensorProbe", "--group G --seconds 0"}};
-    Ended ended = run(items);
+    const Items items = {{"Script",
+                          "'fptest report G Script --progress 100 --result 0; nc -l -p 34952 "
+                          "&lt;/dev/null >/dev/null 2>/dev/null &amp; sleep 0.3'"},
+                         {"SensorProbe", "--group G --seconds 0"}};
+    Ended ended = run_group(items);
     EXPECT_EQ(ended.status, 3);
     EXPECT_EQ(
         lines_of(ended.err).back(),
@@ -149,7 +136,7 @@ TEST_F(Trust, RunsNoGathererWhosePortAnItemHasTaken)
     EXPECT_THAT(outcomes(), ElementsAre("Script: passed", "SensorProbe: not run"));
 
     // where the library comes to it without being asked first
-    ended = run(items, {"--as-group", "--timeout", "0.5", "--grace", "0.2"});
+    ended = run_group(items, {"--as-group", "--timeout", "0.5", "--grace", "0.2"});
     EXPECT_EQ(ended.status, 1);
     EXPECT_THAT(outcomes(), ElementsAre("Script: passed", "SensorProbe: timed out"));
     EXPECT_LT(ended.seconds, 20);
@@ -157,7 +144,7 @@ TEST_F(Trust, RunsNoGathererWhosePortAnItemHasTaken)
 
 TEST_F(Trust, LeavesTheGathererThatStaysRoomForWhatItPrints)
 {
-    run({{"SensorProbe", "--group G --seconds 0"}});
+    run_group({{"SensorProbe", "--group G --seconds 0"}});
     const auto gatherers = device::processes_named("/system/bin/SensorProbe");
     ASSERT_EQ(gatherers.size(), 1U);
     const std::string output = "/proc/" + std::to_string(gatherers[0].pid) + "/fd/1";
@@ -325,24 +312,24 @@ TEST_F(Trust, SendsNothingIntoARun)
 TEST_F(Trust, FailsWhatHasCrashedHoweverItsArgsAreWritten)
 {
     const std::string crash = "report G 100 0 fine crash";
-    const Ended ended = run({{"Item", crash + " 'a b'"},
-                             {"Other", crash + " $((1+1))"},
-                             {"Third", crash + " 2>&amp;1"},
-                             {"Fourth", "report G 100 0 fine"}});
+    const Ended ended = run_group({{"Item", crash + " 'a b'"},
+                                   {"Other", crash + " $((1+1))"},
+                                   {"Third", crash + " 2>&amp;1"},
+                                   {"Fourth", "report G 100 0 fine"}});
     EXPECT_EQ(ended.status, 1);
     EXPECT_THAT(outcomes(),
                 ElementsAre("Item: failed", "Other: failed", "Third: failed", "Fourth: passed"));
-    EXPECT_EQ(of_end(0, "reason"), "died by SIGABRT, though it reported the result 0");
+    EXPECT_EQ(reasons().at(0), "died by SIGABRT, though it reported the result 0");
 }
 
 TEST_F(Trust, TellsAReportThatComesInTheMomentOfTheItemsEnd)
 {
     // the child ends before it would count as left running
     const Ended ended =
-        run({{"Script", "'(sleep 0.05; fptest report G Script --progress 100 --result 1 "
-                        "--description dead) &amp; fptest report G Script --progress 100 "
-                        "--result 0'"},
-             {"Item", "sleep 0.5 report G 100 0 fine"}});
+        run_group({{"Script", "'(sleep 0.05; fptest report G Script --progress 100 --result 1 "
+                              "--description dead) &amp; fptest report G Script --progress 100 "
+                              "--result 0'"},
+                   {"Item", "sleep 0.5 report G 100 0 fine"}});
     EXPECT_THAT(outcomes(), ElementsAre("Script: passed", "Item: passed"));
     EXPECT_THAT(ended.out,
                 HasSubstr("G/Script: late report, result 1: dead; it changes nothing\n"));
@@ -350,9 +337,9 @@ TEST_F(Trust, TellsAReportThatComesInTheMomentOfTheItemsEnd)
 
 TEST_F(Trust, TellsAReportThatGoesIntoAnItemBeforeItsOwn)
 {
-    const Ended ended = run({{"Item", "report G 100 0 fine"},
-                             {"Script", "'fptest report G Item --progress 100 --result 1 "
-                                        "--description pasted'"}});
+    const Ended ended = run_group({{"Item", "report G 100 0 fine"},
+                                   {"Script", "'fptest report G Item --progress 100 --result 1 "
+                                              "--description pasted'"}});
     EXPECT_THAT(outcomes(), ElementsAre("Item: passed", "Script: no result"));
     EXPECT_THAT(ended.out,
                 HasSubstr("G/Item: late report, result 1: pasted; it changes nothing\n"));
@@ -360,11 +347,12 @@ TEST_F(Trust, TellsAReportThatGoesIntoAnItemBeforeItsOwn)
 
 TEST_F(Trust, LosesNoReportThatComesAfterOneThatSpoilsThePlan)
 {
-    run({{"Script", "'/system/bin/Item report-null G 100 0; fptest report G Script --progress "
+    run_group(
+        {{"Script", "'/system/bin/Item report-null G 100 0; fptest report G Script --progress "
                     "100 --result 1 --description dead'"},
          {"Item", "report G 100 0 fine"}});
     EXPECT_THAT(outcomes(), ElementsAre("Script: failed", "Item: passed"));
-    EXPECT_EQ(of_end(0, "description"), "dead");
+    EXPECT_EQ(description(0), "dead");
 }
 
 TEST_F(Trust, FailsAGathererThatEndsBeforeItIsDone)
@@ -372,7 +360,7 @@ TEST_F(Trust, FailsAGathererThatEndsBeforeItIsDone)
     FptestProcess fptest(
         {"run", "--json", work("json"), "--plan",
          plan(device::plan_of({{"G", {{"SensorProbe", "--group G --seconds 60"}}}})), "P/G"});
-    ASSERT_TRUE(device::wait_for(
+    ASSERT_TRUE(support::eventually(
         [] { return device::processes_named("/system/bin/SensorProbe").size() == 1; }, 20));
     usleep(500'000); // it has been told by now
     ASSERT_EQ(
@@ -380,27 +368,28 @@ TEST_F(Trust, FailsAGathererThatEndsBeforeItIsDone)
     kill(device::processes_named("/system/bin/SensorProbe").at(0).pid, SIGSEGV);
     EXPECT_EQ(fptest.wait().status, 1);
     EXPECT_THAT(outcomes(), ElementsAre("SensorProbe: failed"));
-    EXPECT_EQ(of_end(0, "reason"),
+    EXPECT_EQ(reasons().at(0),
               "the gatherer ended at progress 50, though it reported the result 0");
 }
 
 TEST_F(Trust, KillsAGathererThatIgnoresTheStopInAGroupAsWell)
 {
-    run({{"SensorProbe",
-          "--help >/dev/null; exec /system/bin/Stubborn ignore-stop gather sleep 60"},
-         {"Item", "sleep 4 report G 100 0 fine"}},
-        {"--as-group", "--timeout", "1", "--grace", "0.5"});
+    run_group({{"SensorProbe",
+                "--help >/dev/null; exec /system/bin/Stubborn ignore-stop gather sleep 60"},
+               {"Item", "sleep 4 report G 100 0 fine"}},
+              {"--as-group", "--timeout", "1", "--grace", "0.5"});
     EXPECT_THAT(outcomes(), ElementsAre("SensorProbe: timed out", "Item: timed out"));
-    EXPECT_THAT(of_end(0, "reason"), StartsWith("killed after 1."));
+    EXPECT_THAT(reasons().at(0), StartsWith("killed after 1."));
     EXPECT_THAT(device::processes_named("/system/bin/Stubborn"), ::testing::IsEmpty());
 }
 
 TEST_F(Trust, NamesWhatAGathererLeavesRunning)
 {
-    run({{"SensorProbe", "--help >/dev/null; setsid sleep 30 &amp; exec /system/bin/Item gather "
+    run_group(
+        {{"SensorProbe", "--help >/dev/null; setsid sleep 30 &amp; exec /system/bin/Item gather "
                          "report-here G SensorProbe 100 0 fine"},
          {"Item", "report G 100 0 fine"}});
-    const auto ends = report_files::events_of(read_file(work("json")), "end");
+    const auto ends = events("end");
     ASSERT_THAT(outcomes(), ElementsAre("SensorProbe: passed", "Item: passed"));
     ASSERT_EQ(ends.at(0).at("left_running").size(), 1U);
     EXPECT_TRUE(ends.at(1).at("left_running").empty());
@@ -411,13 +400,14 @@ TEST_F(Trust, NamesWhatAGathererLeavesRunning)
 TEST_F(Trust, GoesOnWhereAReportIsTooLongForTheLimitOfFiles)
 {
     plan(kOnePasses);
-    const Ended ended = fptest_runner::run_program(
-        {"/system/bin/sh", "-c",
-         "ulimit -f 2; exec fptest run --quiet --repeat 20 --json /tmp/scene/json --plan "
-         "/tmp/scene/plan.xml P/G"},
-        {{"VR_LOG_FILE", std::nullopt}});
+    support::Start start;
+    start.arguments = {"/system/bin/sh", "-c",
+                       "ulimit -f 2; exec fptest run --quiet --repeat 20 --json /tmp/scene/json "
+                       "--plan /tmp/scene/plan.xml P/G"};
+    start.environment = {{"VR_LOG_FILE", std::nullopt}}; // items write to it
+    const Ended ended = support::run(start);
     EXPECT_EQ(ended.status, 3);
-    EXPECT_THAT(ended.out, testing::EndsWith("fptest: /tmp/scene/json: File too large; the run "
+    EXPECT_THAT(ended.err, testing::EndsWith("fptest: /tmp/scene/json: File too large; the run "
                                              "went on without it\n"));
 }
 

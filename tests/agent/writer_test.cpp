@@ -5,7 +5,8 @@
 #include "reporters/writer.h"
 
 #include "common/descriptor.h"
-#include "report_files.h"
+#include "support/temporary_directory.h"
+#include "support/wait.h"
 
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
@@ -14,9 +15,7 @@
 #include <chrono>
 #include <csignal>
 #include <fcntl.h>
-#include <functional>
 #include <sys/stat.h>
-#include <thread>
 #include <unistd.h>
 
 namespace
@@ -24,16 +23,9 @@ namespace
 
 using namespace fptest;
 using namespace std::chrono_literals;
-using report_files::Directory;
-using report_files::read_file;
-
-bool wait_for(const std::function<bool()> &condition)
-{
-    for (int tries = 0; tries < 2000 && !condition(); ++tries) {
-        std::this_thread::sleep_for(5ms);
-    }
-    return condition();
-}
+using support::eventually;
+using support::read_file;
+using support::TemporaryDirectory;
 
 // A pipe; nobody reads it but on request.
 class Pipe
@@ -87,7 +79,7 @@ class WriterTest : public ::testing::Test
     {
         std::signal(SIGPIPE, SIG_IGN);
     }
-    Directory directory_;
+    TemporaryDirectory directory_;
 };
 
 constexpr std::size_t kMoreThanAPipe = 300'000;
@@ -115,7 +107,7 @@ TEST_F(WriterTest, WaitsForNoReaderAndLosesNothing)
     EXPECT_LT(std::chrono::steady_clock::now() - begin, 2s);
     EXPECT_TRUE(writer.is_pending());
     EXPECT_EQ(pipe.read(expected.size()), expected);
-    EXPECT_TRUE(wait_for([&] { return !writer.is_pending(); }));
+    EXPECT_TRUE(eventually([&] { return !writer.is_pending(); }));
     EXPECT_EQ(writer.failure(), "");
 }
 
@@ -143,7 +135,7 @@ TEST_F(WriterTest, TellsThatItsReaderHasLeftWhileItWaited)
     writer.write(std::string(kMoreThanAPipe, 'x'));
     EXPECT_TRUE(writer.is_pending());
     pipe.close_reader();
-    EXPECT_TRUE(wait_for([&] { return !writer.is_pending(); }));
+    EXPECT_TRUE(eventually([&] { return !writer.is_pending(); }));
     EXPECT_EQ(writer.failure(), "the pipe: Broken pipe");
 }
 
@@ -193,7 +185,7 @@ TEST_F(WriterTest, TellsAtOnceWhatCannotBeOpened)
 
 TEST(WrittenFile, MustBeThereStill)
 {
-    const Directory directory;
+    const TemporaryDirectory directory;
     const std::string path = directory.path("file");
     Writer writer(path, O_WRONLY | O_CREAT | O_APPEND, 0600);
     writer.write("a");

@@ -6,17 +6,11 @@
 #include <algorithm>
 #include <array>
 #include <cctype>
-#include <chrono>
 #include <csignal>
 #include <cstdlib>
 #include <filesystem>
-#include <fstream>
-#include <iterator>
 #include <regex>
 #include <spawn.h>
-#include <sstream>
-#include <sys/wait.h>
-#include <thread>
 #include <unistd.h>
 
 namespace fs = std::filesystem;
@@ -55,16 +49,6 @@ bool is_of(pid_t process, const std::string &text)
     return text.find(pid) != std::string::npos || text.find(":pid=") == std::string::npos;
 }
 
-Lines lines_of(const std::string &text)
-{
-    Lines lines;
-    std::istringstream stream(text);
-    for (std::string line; std::getline(stream, line);) {
-        lines.push_back(line);
-    }
-    return lines;
-}
-
 } // namespace
 
 std::string plan_of(const std::vector<std::pair<std::string, std::vector<PlanItem>>> &groups)
@@ -98,20 +82,6 @@ std::string read_back(int room)
     std::string buffer(static_cast<std::size_t>(room) + 1, '\0');
     FPTEST_ExtractResultMsg(buffer.data(), room);
     return buffer.c_str();
-}
-
-std::string read_file(const std::string &path)
-{
-    const std::ifstream file(path, std::ios::binary);
-    std::ostringstream text; // makes nothing of a process that has ended
-    text << file.rdbuf();
-    return text.str();
-}
-
-void write_file(const std::string &path, const std::string &text)
-{
-    std::ofstream file(path, std::ios::binary | std::ios::trunc);
-    ASSERT_TRUE(file << text << std::flush) << path;
 }
 
 void set_vendor(const std::string &text)
@@ -230,21 +200,8 @@ pid_t start_program(const std::vector<std::string> &arguments)
     pid_t pid = 0;
     EXPECT_EQ(posix_spawn(&pid, argv[0], nullptr, nullptr, argv.data(), environ), 0) << argv[0];
     // it has its own name only once it has been executed
-    EXPECT_TRUE(wait_for([&] { return !processes_named(arguments[0]).empty(); }));
+    EXPECT_TRUE(eventually([&] { return !processes_named(arguments[0]).empty(); }));
     return pid;
-}
-
-bool wait_for(const std::function<bool()> &condition, double seconds)
-{
-    using namespace std::chrono;
-    const auto end = steady_clock::now() + duration<double>(seconds);
-    while (!condition()) {
-        if (steady_clock::now() >= end) {
-            return false;
-        }
-        std::this_thread::sleep_for(milliseconds(5));
-    }
-    return true;
 }
 
 } // namespace device

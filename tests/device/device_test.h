@@ -6,11 +6,12 @@
 #pragma once
 
 #include "quillmark.h"
+#include "support/files.h"
+#include "support/wait.h"
 
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
 
-#include <functional>
 #include <string>
 #include <sys/types.h>
 #include <utility>
@@ -24,7 +25,11 @@ inline constexpr char kParameterFile[] = "/etc/vorlane/sysparms/vr_common_cfg.xm
 inline constexpr char kLogFile[] = "/tmp/vr.log";
 inline constexpr unsigned short kTriggerPort = 34952;
 
-using Lines = std::vector<std::string>;
+using support::eventually;
+using support::Lines;
+using support::lines_of;
+using support::read_file;
+using support::write_file;
 
 // --- plans and commands ----------------------------------------------------
 
@@ -45,9 +50,6 @@ void run_path(const std::string &path);
 std::string read_back(int room = 64 * 1024);
 
 // --- files -----------------------------------------------------------------
-
-std::string read_file(const std::string &path);
-void write_file(const std::string &path, const std::string &text);
 
 // The parameter file, with this text for the vendor selector.
 void set_vendor(const std::string &text);
@@ -85,8 +87,6 @@ std::vector<std::pair<int, std::string>> descriptors();
 
 // Starts a program by its whole path, and expects that it is there.
 pid_t start_program(const std::vector<std::string> &arguments);
-
-bool wait_for(const std::function<bool()> &condition, double seconds = 10);
 
 } // namespace device
 

@@ -6,6 +6,7 @@
 // signals. After each fault the next command without one works.
 #include "device_test.h"
 #include "network.h"
+#include "support/process.h"
 
 #include <algorithm>
 #include <array>
@@ -193,62 +194,17 @@ Lines lines_of_read_back(std::size_t size)
 
 // --- processes of the test's own ---------------------------------------------
 
-// A host beside the test's own process. Its failures are in its exit status.
-class OtherHost
+// A host beside the test's own process.
+class OtherHost : public support::Process
 {
   public:
-    template <typename Body> explicit OtherHost(Body body)
-    {
-        std::fflush(nullptr);
-        pid_ = fork();
-        if (pid_ == 0) {
-            body();
-            std::fflush(nullptr);
-            _exit(::testing::Test::HasFailure() ? EXIT_FAILURE : EXIT_SUCCESS);
-        }
-    }
-    ~OtherHost()
-    {
-        if (!waited_) {
-            kill(pid_, SIGKILL);
-            status();
-        }
-    }
-    OtherHost(const OtherHost &) = delete;
-    OtherHost &operator=(const OtherHost &) = delete;
+    using Process::Process;
 
-    [[nodiscard]] pid_t pid() const
-    {
-        return pid_;
-    }
-    [[nodiscard]] bool has_ended() const
-    {
-        siginfo_t info{};
-        EXPECT_EQ(waitid(P_PID, static_cast<id_t>(pid_), &info, WEXITED | WNOHANG | WNOWAIT), 0);
-        return info.si_pid == pid_;
-    }
-    // Waits for its end, but not for ever.
     int status()
     {
-        if (!wait_for([this] { return has_ended(); }, 30)) {
-            ADD_FAILURE() << "the host does not end";
-            kill(pid_, SIGKILL);
-        }
-        int status = 0;
-        EXPECT_EQ(waitpid(pid_, &status, 0), pid_);
-        waited_ = true;
-        return status;
+        return wait(30).status;
     }
-
-  private:
-    pid_t pid_ = -1;
-    bool waited_ = false;
 };
-
-bool was_ended_by(int signal, int status)
-{
-    return WIFSIGNALED(status) && WTERMSIG(status) == signal;
-}
 
 // A limit of this process while this lives.
 class Limit
@@ -497,7 +453,7 @@ class MissingShell : public PrivateMounts
     // launcher's own look may have taken one that has ended at once.
     static std::multiset<int> exit_codes(pid_t running = -1)
     {
-        EXPECT_TRUE(wait_for([=] {
+        EXPECT_TRUE(eventually([=] {
             const auto all = processes();
             return std::none_of(all.begin(), all.end(), [=](const Process &process) {
                 return process.parent == getpid() && process.pid != running && process.state != 'Z';
@@ -548,7 +504,7 @@ TEST_F(MissingShell, OfTheLauncherStartsNoGatherer)
     EXPECT_THAT(ran(), ElementsAre("/system/bin/Note|x"));
 
     std::thread command([] { run_path("P/G/SensorProbe"); });
-    EXPECT_TRUE(wait_for([] { return !listeners().empty(); }));
+    EXPECT_TRUE(eventually([] { return !listeners().empty(); }));
     EXPECT_EQ(receive(connect_to(kTriggerPort)), "gather again!");
     command.join();
     EXPECT_EQ(log_lines(), lines_of_gatherer("--help", kNotFound, kTriggered));
@@ -677,9 +633,10 @@ TEST_F(DirectoryInThePlansPlace, IsReadBackWithoutEndAndEveryTryIsLogged)
         read_back();
         ADD_FAILURE() << "the read-back has returned";
     });
-    EXPECT_TRUE(wait_for([&] { return host.has_ended(); }));
+    // as long as nobody has waited for it, its counters can be read
+    EXPECT_TRUE(eventually([&] { return status_field(host.pid(), "State").starts_with("Z"); }));
     const long reads = count_in(host.pid(), "syscr");
-    EXPECT_TRUE(was_ended_by(SIGALRM, host.status()));
+    EXPECT_EQ(host.status(), -SIGALRM);
 
     const Lines lines = log_lines(host.pid());
     ASSERT_GE(lines.size(), 100U);
@@ -760,7 +717,7 @@ TEST_P(FileSizeLimit, OfNothingKeepsAStoredPlanOut)
         EXPECT_EQ(status, 0);
         EXPECT_EQ(lines(), all);
     } else {
-        EXPECT_TRUE(was_ended_by(SIGXFSZ, status)) << "the library changes no disposition";
+        EXPECT_EQ(status, -SIGXFSZ) << "the library changes no disposition";
         EXPECT_EQ(lines(), Lines(all.begin(), all.end() - 2));
     }
     EXPECT_EQ(fs::file_size(kPlanFile), 0U);
@@ -775,7 +732,7 @@ TEST_P(FileSizeLimit, CutsASavedPlan)
         EXPECT_EQ(status, 0);
         EXPECT_EQ(lines(), all);
     } else {
-        EXPECT_TRUE(was_ended_by(SIGXFSZ, status)) << "the library changes no disposition";
+        EXPECT_EQ(status, -SIGXFSZ) << "the library changes no disposition";
         EXPECT_EQ(lines(), Lines(all.begin(), all.end() - 3));
     }
     EXPECT_EQ(read_file(kPlanFile), saved(1, "d").substr(0, kLimit));
@@ -870,7 +827,7 @@ class DescriptorLimit : public Fault, public ::testing::WithParamInterface<rlim_
                                                        : kTriggered));
         EXPECT_EQ(room(), room_before - (room_before > 0 ? 1 : 0))
             << "the connection stays open, or else the listening socket";
-        EXPECT_TRUE(wait_for([] {
+        EXPECT_TRUE(eventually([] {
             const auto all = processes();
             return std::none_of(all.begin(), all.end(), [](const Process &process) {
                 return process.parent == getpid() && process.state != 'Z';
@@ -956,7 +913,7 @@ class FailingGatherer : public Fault
 
     static void await_listener()
     {
-        EXPECT_TRUE(wait_for([] { return !listeners().empty(); }));
+        EXPECT_TRUE(eventually([] { return !listeners().empty(); }));
         EXPECT_THAT(listeners(), ElementsAre("00000000:8888"));
     }
 
@@ -966,7 +923,7 @@ class FailingGatherer : public Fault
     {
         await_listener();
         kill(host.pid(), SIGSTOP);
-        EXPECT_TRUE(wait_for([&] { return status_field(host.pid(), "State")[0] == 'T'; }));
+        EXPECT_TRUE(eventually([&] { return status_field(host.pid(), "State")[0] == 'T'; }));
         {
             const Socket client = connect_to(kTriggerPort);
             if (says_goodbye) {
@@ -1012,7 +969,7 @@ TEST_F(FailingGatherer, ThatResetsItsConnectionIsLoggedAndTheNextIsTriggered)
             EXPECT_EQ(open_sockets(), 2U);
         });
         connect_and_reset(host, says_goodbye);
-        EXPECT_TRUE(wait_for([] { return unlink("/tmp/triggered") == 0; }));
+        EXPECT_TRUE(eventually([] { return unlink("/tmp/triggered") == 0; }));
         await_listener();
         const Socket client = connect_to(kTriggerPort);
         EXPECT_EQ(receive(client).substr(0, 13), "gather again!");
@@ -1024,14 +981,14 @@ TEST_F(FailingGatherer, ThatLeavesWithoutReadingIsNotNoticed)
 {
     OtherHost host([] {
         EXPECT_EQ(trigger(), kTriggered);
-        EXPECT_TRUE(wait_for([] { return unlink("/tmp/left") == 0; }));
+        EXPECT_TRUE(eventually([] { return unlink("/tmp/left") == 0; }));
         EXPECT_EQ(trigger(), kTriggered);
         EXPECT_EQ(open_sockets(), 2U);
     });
     await_listener();
     {
         const Socket client = connect_to(kTriggerPort);
-        EXPECT_TRUE(wait_for([] { return listeners().empty(); })); // it has been told
+        EXPECT_TRUE(eventually([] { return listeners().empty(); })); // it has been told
     } // unread, so that this resets the connection
     write_file("/tmp/left", "");
     await_listener();
@@ -1048,7 +1005,7 @@ TEST_F(FailingGatherer, EndsAHostThatDoesNotIgnoreSigpipe)
         ADD_FAILURE() << "the command has returned";
     });
     connect_and_reset(host, true);
-    EXPECT_TRUE(was_ended_by(SIGPIPE, host.status())) << "the library changes no disposition";
+    EXPECT_EQ(host.status(), -SIGPIPE) << "the library changes no disposition";
     EXPECT_EQ(log_lines(host.pid()).back(), "SingleItemExecute| \nrow=1");
 }
 
@@ -1060,7 +1017,7 @@ TEST_F(FailingGatherer, ThatNeverConnectsHoldsTheHostUntilItIsEnded)
     EXPECT_FALSE(host.has_ended());
     EXPECT_THAT(listeners(), ElementsAre("00000000:8888"));
     kill(host.pid(), SIGKILL);
-    EXPECT_TRUE(was_ended_by(SIGKILL, host.status()));
+    EXPECT_EQ(host.status(), -SIGKILL);
     EXPECT_THAT(listeners(), IsEmpty());
     EXPECT_EQ(read_file(kPlanFile), kPlan);
 
@@ -1087,7 +1044,7 @@ TEST_F(FailingGatherer, FindsThePortHeldByAListenerWhoseAcceptHasFailed)
         EXPECT_EQ(trigger(),
                   Lines({"VRSOCK: bind failed(98),Address already in use"}) + kTriggered);
     });
-    EXPECT_TRUE(wait_for([] { return listeners().size() == 2; }));
+    EXPECT_TRUE(eventually([] { return listeners().size() == 2; }));
     EXPECT_EQ(receive(connect_to(kTriggerPort)), "") << "nobody accepts on the old one";
     Lines found = listeners();
     std::erase(found, "00000000:8888");
@@ -1114,8 +1071,9 @@ class HostsSignals : public Fault
     // Once the gatherer has gathered; its report is a child of the same name.
     static pid_t gatherer()
     {
-        EXPECT_TRUE(wait_for([] { return read_back().find("result=\"0\"") != std::string::npos; }));
-        EXPECT_TRUE(wait_for([] { return processes_named(kProbe).size() == 1; }));
+        EXPECT_TRUE(
+            eventually([] { return read_back().find("result=\"0\"") != std::string::npos; }));
+        EXPECT_TRUE(eventually([] { return processes_named(kProbe).size() == 1; }));
         log_lines();
         const auto running = processes_named(kProbe);
         return running.empty() ? -1 : running[0].pid;
@@ -1142,7 +1100,7 @@ class HostsSignals : public Fault
         EXPECT_THAT(log_lines(),
                     ElementsAre("FPTEST_SuspendItemExecute| enter... !",
                                 "FPTEST_SuspendItemExecute| pid = " + std::to_string(pid)));
-        EXPECT_TRUE(wait_for([] { return processes_named(kProbe).empty(); }));
+        EXPECT_TRUE(eventually([] { return processes_named(kProbe).empty(); }));
     }
 };
 
@@ -1153,7 +1111,7 @@ TEST_F(HostsSignals, IgnoredSigchldLeavesNothingToWaitForAndChangesNothingElse)
     EXPECT_EQ(waitpid(-1, nullptr, WNOHANG), -1);
     run_gatherer();
     stop_gatherer();
-    EXPECT_TRUE(wait_for([] { return waitpid(-1, nullptr, WNOHANG) == -1 && errno == ECHILD; }));
+    EXPECT_TRUE(eventually([] { return waitpid(-1, nullptr, WNOHANG) == -1 && errno == ECHILD; }));
     EXPECT_EQ(std::signal(SIGCHLD, SIG_DFL), SIG_IGN);
 }
 

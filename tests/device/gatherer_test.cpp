@@ -56,7 +56,7 @@ TEST_F(Gatherer, FirstCommandStartsItAndTriggersIt)
     run_path("P/G/SensorProbe");
 
     EXPECT_EQ(processes_named(kProbe).size(), 1U);
-    EXPECT_TRUE(wait_for([] { return read_back().find("result=\"0\"") != std::string::npos; }));
+    EXPECT_TRUE(eventually([] { return read_back().find("result=\"0\"") != std::string::npos; }));
     EXPECT_THAT(log_lines(), ::testing::IsSupersetOf(
                                  {"ResourceReduce| target process not exist!",
                                   "SingleItemExecute| tpCmd:/system/bin/SensorProbe --group G",
@@ -161,7 +161,7 @@ TEST_F(Gatherer, IsAwaitedOnEveryLocalAddressForAsLongAsItTakes)
         run_path("P/G/SensorProbe");
         returned = true;
     });
-    EXPECT_TRUE(wait_for([] { return !listeners().empty(); }));
+    EXPECT_TRUE(eventually([] { return !listeners().empty(); }));
     EXPECT_THAT(listeners(), ElementsAre("00000000:8888"));
     std::this_thread::sleep_for(std::chrono::milliseconds(500));
     EXPECT_FALSE(returned);
@@ -182,17 +182,12 @@ TEST_F(Gatherer, TakenPortGoesUnnoticedAndTheCommandWaitsElsewhere)
 {
     start_program({kHolder, "--sleep", "60"});
     store_plan();
-    const Socket other(socket(AF_INET, SOCK_STREAM, 0));
-    const int on = 1; // an earlier connection may linger
-    setsockopt(other.get(), SOL_SOCKET, SO_REUSEADDR, &on, sizeof on);
-    sockaddr_in address = loopback(kTriggerPort);
-    ASSERT_EQ(bind(other.get(), reinterpret_cast<sockaddr *>(&address), sizeof address), 0);
-    ASSERT_EQ(listen(other.get(), 1), 0);
+    const Socket other = listen_on(kTriggerPort);
     log_lines();
 
     std::thread command([] { run_path("P/G/SensorProbe"); });
     Lines found;
-    EXPECT_TRUE(wait_for([&] {
+    EXPECT_TRUE(eventually([&] {
         found = listeners();
         std::erase(found, "0100007F:8888");
         return !found.empty();
@@ -264,7 +259,7 @@ TEST_F(Gatherer, StartedInTheBackgroundItStaysUnreapedWhenItEnds)
     const auto is_zombie = [](const Process &process) {
         return process.parent == getpid() && process.state == 'Z';
     };
-    EXPECT_TRUE(wait_for([&] {
+    EXPECT_TRUE(eventually([&] {
         const auto all = processes();
         return std::any_of(all.begin(), all.end(), is_zombie);
     }));

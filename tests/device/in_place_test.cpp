@@ -288,7 +288,7 @@ TEST_F(InPlace, RefusesToStopItemsWhileAProcessNineIsAlive)
         std::regex("\ndevice/run: 'kill 9 [0-9]+' is not run: process 9 is alive here and would "
                    "get the signal\n")))
         << outcome.err;
-    EXPECT_EQ(lines(outcome.err).size(), 2U) << outcome.err;
+    EXPECT_EQ(lines_of(outcome.err).size(), 2U) << outcome.err;
 }
 
 TEST_F(InPlace, RunsEveryOtherCommandWhileAProcessNineIsAlive)

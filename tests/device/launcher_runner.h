@@ -4,10 +4,13 @@
 // device/run as a person or a test runner starts it, and what comes of it.
 #pragma once
 
+#include "support/process.h"
+#include "support/temporary_directory.h"
+#include "support/wait.h"
+
 #include <gtest/gtest.h>
 
 #include <filesystem>
-#include <functional>
 #include <map>
 #include <string>
 #include <vector>
@@ -33,15 +36,12 @@ struct Outcome {
 
 struct Surroundings {
     fs::path directory = tree;
-    std::map<std::string, std::string> variables{};
+    support::Environment variables{};
     std::string input{};
 };
 
-int shell_status(int wait_status);
-
-// The last step of a child process.
-[[noreturn]] void become(const Words &words, const Surroundings &surroundings = {});
-
+support::Start start_of(const Words &words, const Surroundings &surroundings = {});
+Outcome outcome_of(support::Process &process);
 Outcome run(const Words &words, const Surroundings &surroundings = {});
 
 Outcome on_device(const Words &command, const Words &options = {},
@@ -58,8 +58,7 @@ Outcome refused(const Words &arguments, const Surroundings &surroundings = {});
 inline constexpr const char *say_signals_option = "--say-signals";
 int say_signals();
 
-// Tries for a while.
-bool eventually(const std::function<bool()> &condition);
+using support::eventually;
 
 // ---- texts ------------------------------------------------------------------
 
@@ -68,30 +67,14 @@ inline const std::string header = "USER     PID   PPID  VSIZE  RSS     WCHAN    
 
 Words operator+(Words left, const Words &right);
 Words split(const std::string &text);
-Words lines(const std::string &text);
 std::string last_line(const std::string &text);
+
+using support::lines_of;
 
 // ---- files ------------------------------------------------------------------
 
-class TemporaryDirectory
-{
-  public:
-    explicit TemporaryDirectory(const fs::path &parent = fs::temp_directory_path());
-    TemporaryDirectory(const TemporaryDirectory &) = delete;
-    TemporaryDirectory &operator=(const TemporaryDirectory &) = delete;
-    ~TemporaryDirectory();
-
-    const fs::path &path() const
-    {
-        return path_;
-    }
-    fs::path program(const std::string &name, const std::string &script) const;
-
-  private:
-    fs::path path_;
-};
-
-std::string content(const fs::path &path);
+using support::read_file;
+using support::TemporaryDirectory;
 
 // ---- what the machine allows ------------------------------------------------
 

@@ -142,7 +142,7 @@ TEST(Launcher, HelpFitsATerminalAndNamesEveryOption)
 
     EXPECT_EQ(outcome.status, 0);
     EXPECT_EQ(outcome.err, "");
-    EXPECT_TRUE(std::ranges::all_of(lines(outcome.out), [](auto &l) { return l.size() <= 80; }));
+    EXPECT_TRUE(std::ranges::all_of(lines_of(outcome.out), [](auto &l) { return l.size() <= 80; }));
     for (const char *option : {"--data DIR", "--out DIR", "--bin DIR", "--vendor N", "--build DIR",
                                "--in-place", "--help", "125", "127"}) {
         EXPECT_NE(outcome.out.find(option), std::string::npos) << option;
@@ -235,7 +235,7 @@ TEST_F(Device, TheLibcsSystemAndPopenUseMksh)
 
 TEST_F(Device, SystemBinHoldsToolboxToolsAndItems)
 {
-    const Words found = lines(on_device({"ls", "/system/bin"}).out);
+    const Words found = lines_of(on_device({"ls", "/system/bin"}).out);
 
     for (const std::string name :
          {"sh", "ps", "grep", "kill", "sleep", "cat", "SpiCheck", "SpiCheck_ca", "SpiCheck_ca_qsee",
@@ -259,9 +259,9 @@ TEST_F(Device, KeepsDataInTheDirectoryNamed)
     const fs::path kept = host.path() / "made/on/the/way";
 
     EXPECT_EQ(shell("echo first >/data/vorlane/file", {"--data", kept}).status, 0);
-    EXPECT_EQ(content(kept / "file"), "first\n");
+    EXPECT_EQ(read_file(kept / "file"), "first\n");
     EXPECT_EQ(on_device({"cat", "/data/vorlane/file"}, {"--data", kept}).out, "first\n");
-    EXPECT_EQ(content(kept / "file"), "first\n");
+    EXPECT_EQ(read_file(kept / "file"), "first\n");
 }
 
 TEST_F(Device, TakesDataRelativeToTheCallersDirectory)
@@ -270,7 +270,7 @@ TEST_F(Device, TakesDataRelativeToTheCallersDirectory)
 
     shell("echo x >/data/vorlane/file", {"--data", "kept"}, {.directory = host.path()});
 
-    EXPECT_EQ(content(host.path() / "kept/file"), "x\n");
+    EXPECT_EQ(read_file(host.path() / "kept/file"), "x\n");
 }
 
 TEST_F(Device, HasNoParameterFileUnlessAVendorIsNamed)
@@ -358,7 +358,7 @@ std::vector<Words> processes(const Outcome &outcome)
     static const std::regex line("([^ ]+) +([0-9]+) +([0-9]+) +([0-9]+) +([0-9]+) +([0-9a-f]{8}) "
                                  "([0-9a-f]{8}) ([A-Za-z]) (.+)");
     std::vector<Words> result;
-    const Words all = lines(outcome.out);
+    const Words all = lines_of(outcome.out);
 
     EXPECT_EQ(all.empty() ? "" : all.front(), header);
     for (std::size_t i = 1; i < all.size(); ++i) {
@@ -511,7 +511,7 @@ TEST_F(Ps, AQueryForTheGathererFindsEveryVariantOfIt)
     for (const std::string program : {"SensorProbe", "SensorProbe_ca"}) {
         const Outcome outcome = shell("/system/bin/sh -c '/system/bin/" + program +
                                       " --group g' & sleep 0.4; ps | grep /system/bin/SensorProbe");
-        ASSERT_EQ(lines(outcome.out).size(), 1U) << outcome.out;
+        ASSERT_EQ(lines_of(outcome.out).size(), 1U) << outcome.out;
         EXPECT_TRUE(outcome.out.ends_with(" /system/bin/" + program + "\n")) << outcome.out;
     }
 }
@@ -581,7 +581,7 @@ TEST_F(NamespaceDevice, ProcessNineIsNobody)
 
 TEST_F(NamespaceDevice, HasTheLoopbackAloneAndItIsUp)
 {
-    const Words interfaces = lines(on_device({"cat", "/proc/net/dev"}).out);
+    const Words interfaces = lines_of(on_device({"cat", "/proc/net/dev"}).out);
 
     ASSERT_EQ(interfaces.size(), 3U); // two are headers
     EXPECT_TRUE(interfaces[2].starts_with("    lo:")) << interfaces[2];

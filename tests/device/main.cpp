@@ -3,6 +3,8 @@
 
 // These tests run on the virtual device. Started anywhere else, the program
 // starts itself again there, so that it never touches the machine it is on.
+#include "support/process.h"
+
 #include <gtest/gtest.h>
 
 #include <csignal>
@@ -12,8 +14,6 @@
 #include <string>
 #include <string_view>
 #include <sys/prctl.h>
-#include <sys/wait.h>
-#include <unistd.h>
 #include <vector>
 
 namespace
@@ -21,32 +21,20 @@ namespace
 
 constexpr int kDeviceFailed = 125; // device/run's own failure
 constexpr int kSkipped = 77;       // known to CTest
+constexpr double kPatience = 24 * 60 * 60;
 
 int run_on_device(const std::vector<std::string> &arguments)
 {
-    const pid_t pid = fork();
-    if (pid == 0) {
-        prctl(PR_SET_PDEATHSIG, SIGTERM); // nobody is to wait for what a time limit has ended
-        std::vector<const char *> argv;
-        for (const std::string &argument : arguments) {
-            argv.push_back(argument.c_str());
-        }
-        argv.push_back(nullptr);
-        execv(argv[0], const_cast<char *const *>(argv.data()));
-        std::perror(argv[0]);
-        _exit(kDeviceFailed);
-    }
-    int status = 0;
-    if (pid < 0 || waitpid(pid, &status, 0) != pid) {
-        std::perror("fork");
+    support::Start start{.arguments = arguments, .shares_streams = true};
+    // nobody is to wait for what a time limit has ended
+    start.prepare = [] { prctl(PR_SET_PDEATHSIG, SIGTERM); };
+    const int status = support::Process(start).wait(kPatience).status;
+    if (status < 0) {
+        std::fprintf(stderr, "the tests were ended by signal %d\n", -status);
         return EXIT_FAILURE;
     }
-    if (!WIFEXITED(status)) {
-        std::fprintf(stderr, "the tests were ended by signal %d\n", WTERMSIG(status));
-        return EXIT_FAILURE;
-    }
-    if (WEXITSTATUS(status) != kDeviceFailed) {
-        return WEXITSTATUS(status);
+    if (status != kDeviceFailed) {
+        return status;
     }
     const char *ci = std::getenv("CI");
     const bool must_run = ci != nullptr && std::string_view(ci) == "true";

@@ -3,7 +3,6 @@
 
 #include "network.h"
 
-#include <chrono>
 #include <filesystem>
 #include <fstream>
 #include <iterator>
@@ -11,20 +10,12 @@
 #include <set>
 #include <sstream>
 #include <sys/socket.h>
-#include <thread>
 #include <unistd.h>
 
 namespace fs = std::filesystem;
 
 namespace device
 {
-
-Socket::~Socket()
-{
-    if (descriptor_ >= 0) {
-        close(descriptor_);
-    }
-}
 
 sockaddr_in loopback(unsigned short port)
 {
@@ -35,19 +26,28 @@ sockaddr_in loopback(unsigned short port)
     return address;
 }
 
+Socket listen_on(unsigned short port)
+{
+    Socket server(socket(AF_INET, SOCK_STREAM | SOCK_CLOEXEC, 0));
+    const int on = 1; // an earlier connection may linger
+    setsockopt(server.get(), SOL_SOCKET, SO_REUSEADDR, &on, sizeof on);
+    sockaddr_in address = loopback(port);
+    EXPECT_EQ(bind(server.get(), reinterpret_cast<sockaddr *>(&address), sizeof address), 0);
+    EXPECT_EQ(listen(server.get(), 1), 0);
+    return server;
+}
+
 Socket connect_to(unsigned short port)
 {
-    for (int tries = 0; tries < 2000; ++tries) {
-        Socket client(socket(AF_INET, SOCK_STREAM | SOCK_CLOEXEC, 0));
-        const sockaddr_in address = loopback(port);
-        if (connect(client.get(), reinterpret_cast<const sockaddr *>(&address), sizeof address) ==
-            0) {
-            return client;
-        }
-        std::this_thread::sleep_for(std::chrono::milliseconds(5));
-    }
-    ADD_FAILURE() << "nobody listens on port " << port;
-    return Socket(-1);
+    Socket client(-1);
+    const sockaddr_in address = loopback(port);
+    EXPECT_TRUE(eventually([&] {
+        client = Socket(socket(AF_INET, SOCK_STREAM | SOCK_CLOEXEC, 0));
+        return connect(client.get(), reinterpret_cast<const sockaddr *>(&address),
+                       sizeof address) == 0;
+    })) << "nobody listens on port "
+        << port;
+    return client;
 }
 
 std::string receive(const Socket &client)

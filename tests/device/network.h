@@ -4,40 +4,21 @@
 // Clients of the trigger channel, as the gatherer is one.
 #pragma once
 
+#include "common/descriptor.h"
 #include "device_test.h"
 
 #include <netinet/in.h>
 #include <string>
-#include <utility>
 
 namespace device
 {
 
-// A descriptor that is closed with its owner.
-class Socket
-{
-  public:
-    explicit Socket(int descriptor) : descriptor_(descriptor)
-    {
-    }
-    ~Socket();
-    Socket(const Socket &) = delete;
-    Socket &operator=(const Socket &) = delete;
-    Socket(Socket &&other) noexcept : descriptor_(std::exchange(other.descriptor_, -1))
-    {
-    }
-    Socket &operator=(Socket &&) = delete;
-
-    [[nodiscard]] int get() const
-    {
-        return descriptor_;
-    }
-
-  private:
-    int descriptor_;
-};
+using Socket = Descriptor;
 
 sockaddr_in loopback(unsigned short port);
+
+// One that listens there, at this machine's own address.
+Socket listen_on(unsigned short port);
 
 // Tries until somebody listens.
 Socket connect_to(unsigned short port);

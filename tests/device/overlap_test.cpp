@@ -47,14 +47,14 @@ TEST_P(Overlap, SuspensionEndsTheItemAndTheCommandReturns)
             returned = true;
         });
         pid_t pid = 0;
-        EXPECT_TRUE(wait_for([&] {
+        EXPECT_TRUE(eventually([&] {
             const auto running = processes_named("/system/bin/Note");
             pid = running.empty() ? 0 : running[0].pid;
             return pid != 0;
         }));
         EXPECT_FALSE(returned);
         EXPECT_EQ(FPTEST_SuspendItemExecute(), 0);
-        EXPECT_TRUE(wait_for([&] { return returned.load(); })) << "the item is still running";
+        EXPECT_TRUE(eventually([&] { return returned.load(); })) << "the item is still running";
         if (!returned) {
             kill(pid, SIGKILL);
         }

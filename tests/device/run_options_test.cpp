@@ -74,13 +74,13 @@ TEST_F(Out, IsMadeAndIsTheWorkingDirectoryThatStays)
 
     EXPECT_EQ(outcome.out, results.string() + "\n");
     EXPECT_EQ(outcome.status, 0);
-    EXPECT_EQ(content(results / "file"), "text\n");
+    EXPECT_EQ(read_file(results / "file"), "text\n");
 }
 
 TEST_F(Out, MayBeTheCallersDirectory)
 {
     EXPECT_EQ(from_caller({"sh", "-c", "cat plans/demo.xml >copy"}, {"--out", "."}).status, 0);
-    EXPECT_EQ(content(caller.path() / "copy"), content(tree / "plans/demo.xml"));
+    EXPECT_EQ(read_file(caller.path() / "copy"), read_file(tree / "plans/demo.xml"));
 }
 
 TEST_F(Out, IsWrittenThroughALink)
@@ -102,9 +102,9 @@ TEST_F(Out, KeepsTheReportsOfAPlanInTheCallersDirectory)
 
         EXPECT_EQ(outcome.status, 0) << outcome.err;
         EXPECT_EQ(outcome.err.find("fptest: "), std::string::npos) << outcome.err;
-        EXPECT_NE(content(caller.path() / results / "results.xml").find("SpiCheck"),
+        EXPECT_NE(read_file(caller.path() / results / "results.xml").find("SpiCheck"),
                   std::string::npos);
-        EXPECT_NE(content(caller.path() / results / "results.jsonl").find("SpiCheck"),
+        EXPECT_NE(read_file(caller.path() / results / "results.jsonl").find("SpiCheck"),
                   std::string::npos);
     }
 }
@@ -126,7 +126,7 @@ TEST(WritableDirectory, IsNoneOfADirectoryThatIsGone)
             {.directory = TemporaryDirectory().path()});
 
     EXPECT_EQ(outcome.status, 125);
-    Words said = lines(outcome.err);
+    Words said = lines_of(outcome.err);
     std::erase_if(said, [](auto &line) { return line.starts_with("shell-init: "); }); // bash's
     EXPECT_EQ(said, Words{"device/run: the current directory is gone"});
 }
@@ -266,7 +266,7 @@ TEST_F(UsersProgram, WhoseInterpreterIsMissingIsNamed)
 
     EXPECT_EQ(outcome.out, "mine\n");
     EXPECT_EQ(outcome.status, 0);
-    Words said = lines(outcome.err);
+    Words said = lines_of(outcome.err);
     std::erase_if(said, [](auto &line) { return line.starts_with("device/run: in place: "); });
     const auto missing = [](const std::string &name, const std::string &interpreter) {
         return "device/run: --bin: " + name + " cannot be started: there is no " + interpreter +
@@ -290,7 +290,7 @@ TEST_F(UsersProgram, WhoseInterpreterIsMissingIsNoCommand)
                                         : on_device({name}, {"--bin", own.path()});
 
             EXPECT_EQ(outcome.status, 127);
-            EXPECT_EQ(lines(outcome.err).back(),
+            EXPECT_EQ(lines_of(outcome.err).back(),
                       "device/run: " + (is_given_as_a_path ? "./" + name : name) +
                           " cannot be started: there is no " + interpreter + " on the device");
         }
@@ -364,8 +364,8 @@ TEST_F(Values, MayFollowAnEqualsSign)
              "--out=" + root + "/out", "--vendor=2", "--build=" + build.string(), "MyItem"});
 
     EXPECT_EQ(outcome.status, 0) << outcome.err;
-    EXPECT_EQ(content(host.path() / "out/file"), "x\n");
-    EXPECT_NE(content(host.path() / "data/vr_common_cfg.xml").find("<vendor>2<"),
+    EXPECT_EQ(read_file(host.path() / "out/file"), "x\n");
+    EXPECT_NE(read_file(host.path() / "data/vr_common_cfg.xml").find("<vendor>2<"),
               std::string::npos);
 }
 

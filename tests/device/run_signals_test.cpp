@@ -14,11 +14,9 @@
 #include <fcntl.h>
 #include <optional>
 #include <pty.h>
-#include <stdexcept>
-#include <sys/wait.h>
 #include <thread>
 #include <unistd.h>
-#include <utility>
+#include <utmp.h>
 
 using namespace launcher;
 using namespace std::chrono_literals;
@@ -62,7 +60,7 @@ std::vector<pid_t> processes_with(const std::string &word)
     for (const auto &entry : fs::directory_iterator("/proc")) {
         const std::string id = entry.path().filename();
         if (std::ranges::all_of(id, [](unsigned char c) { return std::isdigit(c); }) &&
-            ('\0' + content(entry.path() / "cmdline")).find('\0' + word + '\0') !=
+            ('\0' + read_file(entry.path() / "cmdline")).find('\0' + word + '\0') !=
                 std::string::npos) {
             found.push_back(std::stoi(id));
         }
@@ -81,21 +79,6 @@ std::string unique_length()
 class RunningDevice
 {
   public:
-    RunningDevice() : front_(unique_length()), behind_(unique_length())
-    {
-        pid_ = fork();
-        if (pid_ == 0) {
-            become({device_run, "sh", "-c", "sleep " + behind_ + " & exec sleep " + front_}, {});
-        }
-    }
-    RunningDevice(const RunningDevice &) = delete;
-    RunningDevice &operator=(const RunningDevice &) = delete;
-    ~RunningDevice()
-    {
-        if (pid_ > 0) {
-            end_by(SIGKILL);
-        }
-    }
     bool has_started() const
     {
         return eventually([this] { return count() == 2; });
@@ -106,10 +89,8 @@ class RunningDevice
     }
     int end_by(int signal)
     {
-        int status = 0;
-        kill(pid_, signal);
-        waitpid(std::exchange(pid_, -1), &status, 0);
-        return shell_status(status);
+        process_.signal(signal);
+        return outcome_of(process_).status;
     }
 
   private:
@@ -117,9 +98,10 @@ class RunningDevice
     {
         return processes_with(front_).size() + processes_with(behind_).size();
     }
-    std::string front_;
-    std::string behind_;
-    pid_t pid_ = -1;
+    std::string front_ = unique_length();
+    std::string behind_ = unique_length();
+    support::Process process_{
+        start_of({device_run, "sh", "-c", "sleep " + behind_ + " & exec sleep " + front_})};
 };
 
 TEST_F(Device, SigtermEndsItAndEverythingOnIt)
@@ -151,32 +133,57 @@ TEST_F(Device, WhatCommandLeavesRunningEndsWithIt)
 
 // ---- keys -------------------------------------------------------------------
 
+// A program at a terminal of its own, until that is closed.
+class AtATerminal
+{
+  public:
+    explicit AtATerminal(const Words &words)
+    {
+        int terminal = -1;
+        int other_side = -1;
+        EXPECT_EQ(openpty(&terminal, &other_side, nullptr, nullptr, nullptr), 0);
+        terminal_ = Descriptor(terminal);
+        const Descriptor closed(other_side);
+        support::Start start = start_of(words);
+        start.shares_streams = true;
+        start.prepare = [other_side] { login_tty(other_side); };
+        process_.emplace(start);
+    }
+    int terminal() const
+    {
+        return terminal_.get();
+    }
+    void close()
+    {
+        terminal_ = Descriptor(-1);
+    }
+    Outcome outcome()
+    {
+        return outcome_of(*process_);
+    }
+
+  private:
+    Descriptor terminal_{-1};
+    std::optional<support::Process> process_;
+};
+
 // Runs a script on a device at a terminal, and types a key when it says "ready".
 Outcome at_a_terminal(const std::string &script, char key)
 {
-    int terminal = -1;
-    Outcome outcome;
-
-    const pid_t child = forkpty(&terminal, nullptr, nullptr, nullptr);
-    if (child == 0) {
-        become({device_run, "--", "sh", "-c", script}, {});
-    }
+    AtATerminal device({device_run, "--", "sh", "-c", script});
+    std::string out;
     bool typed = false;
     for (std::array<char, 4096> buffer{};;) {
-        const ssize_t got = read(terminal, buffer.data(), buffer.size());
+        const ssize_t got = read(device.terminal(), buffer.data(), buffer.size());
         if (got <= 0) {
             break;
         }
-        outcome.out.append(buffer.data(), static_cast<std::size_t>(got));
-        if (!typed && outcome.out.find("ready") != std::string::npos) {
-            typed = write(terminal, &key, 1) == 1;
+        out.append(buffer.data(), static_cast<std::size_t>(got));
+        if (!typed && out.find("ready") != std::string::npos) {
+            typed = write(device.terminal(), &key, 1) == 1;
         }
     }
-    int status = 0;
-    waitpid(child, &status, 0);
-    close(terminal);
-    outcome.status = shell_status(status);
-    return outcome;
+    return {device.outcome().status, out, ""};
 }
 
 constexpr char ctrl_c = '\x03';
@@ -244,26 +251,17 @@ class SignalledDevice
   public:
     explicit SignalledDevice(const Words &command, const Words &options = {}, int errors = -1)
     {
-        pid_ = fork();
-        if (pid_ == 0) {
+        support::Start start = start_of(Words{device_run} + options + Words{"--"} + command,
+                                        {.directory = directory_.path()});
+        start.shares_streams = true;
+        start.prepare = [this, errors] {
             setpgid(0, 0);
             const int file = open(said().c_str(), O_WRONLY | O_CREAT | O_APPEND, 0600);
             dup2(file, STDOUT_FILENO);
             dup2(errors < 0 ? file : errors, STDERR_FILENO);
-            close(file);
-            become(Words{device_run} + options + Words{"--"} + command,
-                   {.directory = directory_.path()});
-        }
-        setpgid(pid_, pid_);
-    }
-    SignalledDevice(const SignalledDevice &) = delete;
-    SignalledDevice &operator=(const SignalledDevice &) = delete;
-    ~SignalledDevice()
-    {
-        if (pid_ > 0) {
-            kill(pid_, SIGKILL);
-            wait();
-        }
+        };
+        process_.emplace(start);
+        setpgid(process_->pid(), process_->pid());
     }
     const fs::path &directory() const
     {
@@ -277,24 +275,22 @@ class SignalledDevice
     std::string out() const
     {
         std::string text;
-        for (const std::string &line : lines(content(said()))) {
+        for (const std::string &line : lines_of(read_file(said()))) {
             text += line.starts_with("device/run: in place: ") ? "" : line + "\n";
         }
         return text;
     }
     void signal(int number) const
     {
-        kill(pid_, number);
+        process_->signal(number);
     }
     void signal_group(int number) const
     {
-        kill(-pid_, number);
+        process_->signal_group(number);
     }
     int wait()
     {
-        int status = 0;
-        waitpid(std::exchange(pid_, -1), &status, 0);
-        return shell_status(status);
+        return outcome_of(*process_).status;
     }
 
   private:
@@ -303,7 +299,7 @@ class SignalledDevice
         return directory_.path() / "said";
     }
     TemporaryDirectory directory_;
-    pid_t pid_ = -1;
+    std::optional<support::Process> process_;
 };
 
 const Words signal_sayer = {this_program, say_signals_option};
@@ -444,7 +440,7 @@ class SlowBwrap
     TemporaryDirectory directory_;
     std::string left_ = unique_length();
     std::string path_ = std::getenv("PATH");
-    std::string real_ = lines(run({"sh", "-c", "command -v bwrap"}).out).at(0);
+    std::string real_ = lines_of(run({"sh", "-c", "command -v bwrap"}).out).at(0);
 };
 
 TEST_F(NamespaceDevice, SignalsToItsGroupDoNotMeetWhatTriesTheBox)
@@ -548,32 +544,30 @@ TEST_F(Device, ATimeLimitLeavesWholeReports)
                             "--junit", "results.xml", "demo/Endurance"},
                            {"--out", "."});
     ASSERT_TRUE(eventually([&] {
-        return content(device.directory() / "results").find("\"start\"") != std::string::npos;
+        return read_file(device.directory() / "results").find("\"start\"") != std::string::npos;
     }));
 
     device.signal(SIGTERM);
     device.signal_group(SIGTERM);
 
     EXPECT_EQ(device.wait(), 130) << device.out();
-    EXPECT_NE(content(device.directory() / "results").find("\"finish\""), std::string::npos);
-    EXPECT_NE(content(device.directory() / "results.xml").find("</testsuites>"), std::string::npos);
+    EXPECT_NE(read_file(device.directory() / "results").find("\"finish\""), std::string::npos);
+    EXPECT_NE(read_file(device.directory() / "results.xml").find("</testsuites>"),
+              std::string::npos);
 }
 
 TEST_F(NamespaceDevice, ItsCallersEndIsAHangUp)
 {
     const TemporaryDirectory host;
     const fs::path said = host.path() / "said";
-    const pid_t caller = fork();
-    if (caller == 0) {
-        become({"sh", "-c", "\"$0\" \"$1\" \"$2\" >\"$3\" 2>&1; :", device_run, this_program,
-                say_signals_option, said});
-    }
-    ASSERT_TRUE(eventually([&] { return content(said) == "ready\n"; }));
+    support::Process caller(start_of({"sh", "-c", "\"$0\" \"$1\" \"$2\" >\"$3\" 2>&1; :",
+                                      device_run, this_program, say_signals_option, said}));
+    ASSERT_TRUE(eventually([&] { return read_file(said) == "ready\n"; }));
 
-    kill(caller, SIGKILL);
-    waitpid(caller, nullptr, 0);
+    caller.signal(SIGKILL);
+    caller.wait();
 
-    EXPECT_TRUE(eventually([&] { return content(said) == "ready\nHUP\n"; })) << content(said);
+    EXPECT_TRUE(eventually([&] { return read_file(said) == "ready\nHUP\n"; })) << read_file(said);
 }
 
 TEST_F(NamespaceDevice, TheEndOfItsCallersThreadIsNoHangUp)
@@ -597,20 +591,16 @@ TEST_F(Device, AClosedTerminalComesToCommandOnce)
     for (const std::string first : {"exec ", ""}) {
         const TemporaryDirectory host;
         const fs::path said = host.path() / "said";
-        int terminal = -1;
-        const pid_t child = forkpty(&terminal, nullptr, nullptr, nullptr);
-        if (child == 0) {
-            become({"sh", "-c", first + "\"$0\" \"$1\" \"$2\" >\"$3\" 2>&1; :", device_run,
-                    this_program, say_signals_option, said});
-        }
-        ASSERT_TRUE(eventually([&] { return last_line(content(said)) == "ready"; }));
+        AtATerminal shell({"sh", "-c", first + "\"$0\" \"$1\" \"$2\" >\"$3\" 2>&1; :", device_run,
+                           this_program, say_signals_option, said});
+        ASSERT_TRUE(eventually([&] { return last_line(read_file(said)) == "ready"; }));
 
-        close(terminal);
+        shell.close();
 
-        EXPECT_TRUE(eventually([&] { return last_line(content(said)) == "HUP"; }));
-        waitpid(child, nullptr, 0);
+        EXPECT_TRUE(eventually([&] { return last_line(read_file(said)) == "HUP"; }));
+        shell.outcome();
         std::this_thread::sleep_for(700ms);
-        EXPECT_EQ(lines(content(said)).end()[-2], "ready") << content(said);
+        EXPECT_EQ(lines_of(read_file(said)).end()[-2], "ready") << read_file(said);
     }
 }
 

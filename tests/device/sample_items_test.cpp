@@ -34,7 +34,7 @@ class SampleItems : public Device
     // What the plan says of an item: the attributes after its name.
     std::string report(const std::string &item) const
     {
-        const std::string plan = content(kept.path() / "src1.xml");
+        const std::string plan = read_file(kept.path() / "src1.xml");
         const std::string start = "<Cmd name=\"" + item + "\"";
         const auto begin = plan.find(start);
         const auto end = plan.find("/>", begin);
@@ -53,7 +53,7 @@ class SampleItems : public Device
     {
         static const std::regex line("iResult=(-?[0-9]+) - iProgress=([0-9]+) - iDesc=.+");
         Words found;
-        for (const std::string &text : lines(outcome.err)) {
+        for (const std::string &text : lines_of(outcome.err)) {
             std::smatch values;
             if (std::regex_search(text, values, line)) {
                 found.push_back(values[2].str() + ":" + values[1].str());
@@ -118,13 +118,13 @@ TEST_F(SampleItems, BurnInIsStillRunningAfterAWhileAndEndsBySigterm)
 
 TEST_F(SampleItems, QuietRunNeverReports)
 {
-    const std::string before = content(kept.path() / "src1.xml");
+    const std::string before = read_file(kept.path() / "src1.xml");
 
     const Outcome outcome = on_plan("QuietRun --group sensor --seconds 0.05");
 
     EXPECT_EQ(outcome.status, 0);
     EXPECT_EQ(outcome.err.find("FPTEST_"), std::string::npos);
-    EXPECT_EQ(content(kept.path() / "src1.xml"), before);
+    EXPECT_EQ(read_file(kept.path() / "src1.xml"), before);
 }
 
 TEST_F(SampleItems, VendorVariantsReportUnderThePlansName)
@@ -168,7 +168,7 @@ TEST_F(SampleItems, LeaveAWholePlanWhenStopped)
     on_plan("for i in 0 1 2 3 4 5 6 7 8 9; do BurnIn --group sensor --seconds 0.01 & "
             "sleep 0.00$i; kill $!; done; sleep 1");
 
-    EXPECT_TRUE(content(kept.path() / "src1.xml").ends_with("</Plan>\n"));
+    EXPECT_TRUE(read_file(kept.path() / "src1.xml").ends_with("</Plan>\n"));
 }
 
 TEST_F(SampleItems, SayInOneLineWhatIsWrongWithTheirOptions)
@@ -212,7 +212,7 @@ class Gatherer : public SampleItems
     std::string complaint(const Outcome &outcome) const
     {
         std::string found;
-        for (const std::string &line : lines(outcome.err)) {
+        for (const std::string &line : lines_of(outcome.err)) {
             found += line.starts_with("SensorProbe: ") ? line + "\n" : "";
         }
         return found;
@@ -227,7 +227,7 @@ TEST_F(Gatherer, GathersEachTimeItIsTold)
     EXPECT_EQ(complaint(outcome), "");
     EXPECT_EQ(report("SensorProbe"),
               " progress=\"100\" result=\"0\" description=\"gathering 2, 64 samples\"");
-    EXPECT_TRUE(content(kept.path() / "readings.txt").starts_with("gatherings 2\n"));
+    EXPECT_TRUE(read_file(kept.path() / "readings.txt").starts_with("gatherings 2\n"));
 }
 
 TEST_F(Gatherer, DoesNothingUntilItIsTold)

@@ -40,7 +40,7 @@ TEST_F(Suspension, RunningItemIsStoppedAndItsCommandReturns)
     store(plan_of({{"G", {{"Note", "--sleep 60"}}}}));
     pid_t pid = 0;
     const double seconds = stop_while_running("P/G/Note", [&] {
-        EXPECT_TRUE(wait_for([] { return !processes_named("/system/bin/Note").empty(); }));
+        EXPECT_TRUE(eventually([] { return !processes_named("/system/bin/Note").empty(); }));
         pid = processes_named("/system/bin/Note").at(0).pid;
         EXPECT_EQ(FPTEST_SuspendItemExecute(), 0);
     });
@@ -56,7 +56,7 @@ TEST_F(Suspension, StoppedItemIsFollowedByTheNextOfItsGroup)
 {
     store(plan_of({{"G", {{"Note", "--sleep 60"}, {"ab", "next"}}}}));
     stop_while_running("P/G", [] {
-        EXPECT_TRUE(wait_for([] { return !ran().empty(); }));
+        EXPECT_TRUE(eventually([] { return !ran().empty(); }));
         EXPECT_EQ(FPTEST_SuspendItemExecute(), 0);
     });
     EXPECT_THAT(ran(), ElementsAre("/system/bin/Note|--sleep|60", "/system/bin/ab|next"));
@@ -67,7 +67,7 @@ TEST_F(Suspension, ItemIsFoundUnderItsVendorsName)
     set_vendor("1");
     store(plan_of({{"G", {{"Note", "--sleep 60"}}}}));
     stop_while_running("P/G/Note", [] {
-        EXPECT_TRUE(wait_for([] { return !processes_named("/system/bin/Note_ca").empty(); }));
+        EXPECT_TRUE(eventually([] { return !processes_named("/system/bin/Note_ca").empty(); }));
         EXPECT_EQ(FPTEST_SuspendItemExecute(), 0);
     });
     EXPECT_THAT(processes_named("/system/bin/Note_ca"), IsEmpty());
@@ -79,11 +79,11 @@ TEST_F(Suspension, GathererIsStoppedAfterItsCommandHasReturned)
     run_path("P/G/SensorProbe");
     ASSERT_THAT(processes_named("/system/bin/SensorProbe"), ::testing::SizeIs(1));
     // its report is a child of the same name: let that be over
-    ASSERT_TRUE(wait_for([] { return read_back().find("result=\"0\"") != std::string::npos; }));
-    ASSERT_TRUE(wait_for([] { return processes_named("/system/bin/SensorProbe").size() == 1; }));
+    ASSERT_TRUE(eventually([] { return read_back().find("result=\"0\"") != std::string::npos; }));
+    ASSERT_TRUE(eventually([] { return processes_named("/system/bin/SensorProbe").size() == 1; }));
 
     EXPECT_EQ(FPTEST_SuspendItemExecute(), 0);
-    EXPECT_TRUE(wait_for([] { return processes_named("/system/bin/SensorProbe").empty(); }));
+    EXPECT_TRUE(eventually([] { return processes_named("/system/bin/SensorProbe").empty(); }));
 }
 
 TEST_F(Suspension, NameIsCutTo28CharactersForTheListing)
@@ -137,7 +137,7 @@ TEST_F(Suspension, ListingThatIsMissingIsNotFoundEither)
     EXPECT_EQ(FPTEST_SuspendItemExecute(), -1);
     EXPECT_THAT(log_lines(), ElementsAre("FPTEST_SuspendItemExecute| enter... !",
                                          "FPTEST_SuspendItemExecute| target process not exist!"));
-    EXPECT_TRUE(wait_for([] {
+    EXPECT_TRUE(eventually([] {
         const auto all = processes();
         return std::any_of(all.begin(), all.end(), [](const Process &process) {
             return process.parent == getpid() && process.state == 'Z';
@@ -179,7 +179,7 @@ TEST_F(Suspension, LineOfASingleWordStillRunsAKillCommand)
         ::testing::internal::CaptureStderr();
         EXPECT_EQ(FPTEST_SuspendItemExecute(), 0);
         // the shell's complaint about "kill 9 (null)" tells that it was run
-        EXPECT_TRUE(wait_for([] {
+        EXPECT_TRUE(eventually([] {
             const auto all = processes();
             return std::none_of(all.begin(), all.end(), [](const Process &process) {
                 return process.parent == getpid() && process.state != 'Z';
@@ -200,7 +200,7 @@ TEST_F(Suspension, EveryCallLeavesItsStreamAndItsChildren)
         EXPECT_EQ(descriptors().size(), before + call);
         EXPECT_TRUE(descriptors().back().second.starts_with("pipe:"));
     }
-    EXPECT_TRUE(wait_for([] {
+    EXPECT_TRUE(eventually([] {
         const auto all = processes();
         return std::count_if(all.begin(), all.end(), [](const Process &process) {
                    return process.parent == getpid() && process.state == 'Z';

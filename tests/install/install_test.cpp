@@ -11,8 +11,6 @@
 #include <algorithm>
 #include <cstdlib>
 #include <filesystem>
-#include <fstream>
-#include <iterator>
 #include <regex>
 #include <string>
 #include <vector>
@@ -22,6 +20,7 @@ namespace fs = std::filesystem;
 namespace
 {
 
+using support::read_file;
 using ::testing::AllOf;
 using ::testing::ElementsAreArray;
 using ::testing::HasSubstr;
@@ -34,15 +33,9 @@ const std::string kConsumers = kSource + "/tests/install/consumer";
 // What it prints; a failure of the test where its exit status is not 0.
 std::string output_of(const std::string &command)
 {
-    const Outcome outcome = run(command);
-    EXPECT_EQ(outcome.status, 0) << command << "\n" << outcome.output;
-    return outcome.output;
-}
-
-std::string read(const fs::path &file)
-{
-    std::ifstream stream(file, std::ios::binary);
-    return {std::istreambuf_iterator<char>(stream), {}};
+    const Ended outcome = run_shell(command);
+    EXPECT_EQ(outcome.status, 0) << command << "\n" << outcome.out;
+    return outcome.out;
 }
 
 std::string in_one_line(const std::string &text)
@@ -55,20 +48,13 @@ class Install : public ::testing::Test
   protected:
     Install()
     {
-        // in the build, which the virtual device shows
-        std::string name = WORK_DIRECTORY "/work-XXXXXX";
-        work_ = mkdtemp(name.data());
         unsetenv("LD_LIBRARY_PATH");
         unsetenv("PKG_CONFIG_PATH");
-    }
-    ~Install() override
-    {
-        fs::remove_all(work_);
     }
 
     [[nodiscard]] std::string work(const std::string &name) const
     {
-        return work_ / name;
+        return work_.path(name);
     }
 
     // Installs a build and moves what it has put there. Gives the new place.
@@ -95,7 +81,7 @@ class Install : public ::testing::Test
     }
 
   private:
-    fs::path work_;
+    const TemporaryDirectory work_{WORK_DIRECTORY}; // in the build, which the device shows
 };
 
 std::vector<std::string> files_below(const fs::path &directory)
@@ -186,8 +172,8 @@ TEST_F(Install, NamesNoPathOfTheTreeOrTheBuildOrTheFirstPrefix)
     for (const auto &entry : fs::recursive_directory_iterator(prefix)) {
         if (entry.is_regular_file()) {
             ++looked_at;
-            EXPECT_THAT(read(entry), AllOf(Not(HasSubstr(kSource)), Not(HasSubstr(kBuild)),
-                                           Not(HasSubstr(work("first")))))
+            EXPECT_THAT(read_file(entry), AllOf(Not(HasSubstr(kSource)), Not(HasSubstr(kBuild)),
+                                                Not(HasSubstr(work("first")))))
                 << entry.path();
         }
     }
@@ -243,8 +229,8 @@ TEST_F(Install, AMakersLibraryTakesThePlaceOfTheInstalledOne)
 
 TEST_F(Install, PlainCompilerBuildsTheAgentThatTheReadmeShows)
 {
-    const std::string source = read(kConsumers + "/agent.c");
-    EXPECT_THAT(read(kSource + "/README.md"),
+    const std::string source = read_file(kConsumers + "/agent.c");
+    EXPECT_THAT(read_file(kSource + "/README.md"),
                 HasSubstr("```c\n" + source.substr(source.find("#include")) + "```"));
 
     output_of(kCompile + quoted(work("agent")) + " " + flags(install()));
@@ -256,8 +242,8 @@ TEST_F(Install, PkgConfigTellsACompilerItsFlags)
     const std::string prefix = install();
     const std::string libraries = prefix + "/" INSTALL_LIBDIR;
     // by another name: pkg-config prints nothing where a path has an apostrophe
-    const Directory directory;
-    const std::string link = directory.path() + "/prefix";
+    const TemporaryDirectory directory;
+    const std::string link = directory.path("prefix");
     fs::create_directory_symlink(prefix, link);
     const std::string ask =
         "PKG_CONFIG_PATH=" + quoted(link + "/" INSTALL_LIBDIR "/pkgconfig") + " pkg-config ";
@@ -278,19 +264,19 @@ TEST_F(Install, FindPackageGivesATargetForCAndCpp)
     const std::string build = consumer("find_package", "-DCMAKE_PREFIX_PATH=" + quoted(install()));
     expect_agent_works(build + "/agent");
     expect_reader_works(build + "/reader");
-    EXPECT_THAT(read(build + "/CMakeCache.txt"),
+    EXPECT_THAT(read_file(build + "/CMakeCache.txt"),
                 HasSubstr("quillmark_DIR:PATH=" + work("moved") + "/"));
 }
 
 TEST_F(Install, FindPackageRefusesAnotherMajorVersion)
 {
     const std::string options = "-DCMAKE_PREFIX_PATH=" + quoted(install());
-    EXPECT_EQ(run(configure("find_package", options + " -DWANTED=1.0.0")).status, 0);
+    EXPECT_EQ(run_shell(configure("find_package", options + " -DWANTED=1.0.0")).status, 0);
     for (const char *version : {"0.9", "1.999", "2.0"}) {
-        const Outcome outcome =
-            run(configure("find_package", options + " -DWANTED=" + std::string(version)));
+        const Ended outcome =
+            run_shell(configure("find_package", options + " -DWANTED=" + std::string(version)));
         EXPECT_NE(outcome.status, 0) << version;
-        EXPECT_THAT(in_one_line(outcome.output),
+        EXPECT_THAT(in_one_line(outcome.out),
                     HasSubstr("quillmarkConfig.cmake, version: " PROJECT_VERSION));
     }
 }
@@ -298,14 +284,14 @@ TEST_F(Install, FindPackageRefusesAnotherMajorVersion)
 TEST_F(Install, FindPackageSaysThatMiniXmlIsMissing)
 {
     // nothing but what is named is looked for in a root that does not exist
-    const Outcome outcome = run(
+    const Ended outcome = run_shell(
         configure("find_package",
                   "-Dquillmark_DIR=" + quoted(install() + "/" INSTALL_LIBDIR "/cmake/quillmark") +
                       " -DCMAKE_FIND_ROOT_PATH=/nowhere"
                       " -DCMAKE_FIND_ROOT_PATH_MODE_INCLUDE=ONLY"
                       " -DCMAKE_FIND_ROOT_PATH_MODE_LIBRARY=ONLY"));
     EXPECT_NE(outcome.status, 0);
-    EXPECT_THAT(in_one_line(outcome.output),
+    EXPECT_THAT(in_one_line(outcome.out),
                 HasSubstr("Reason given by package: Mini-XML is missing: install libmxml-dev, or "
                           "set MINIXML_INCLUDE_DIR "
                           "and MINIXML_LIBRARY"));

@@ -12,8 +12,6 @@
 #include <nlohmann/json.hpp>
 
 #include <filesystem>
-#include <fstream>
-#include <iterator>
 #include <regex>
 #include <set>
 #include <sstream>
@@ -36,11 +34,11 @@ using ::testing::UnorderedElementsAreArray;
 constexpr char kToolchain[] = "build/cmake/android.toolchain.cmake";
 
 // Configures a preset with the NDK there; the text with single blanks.
-Outcome configure(const std::string &preset, const std::string &ndk, const std::string &more)
+Ended configure(const std::string &preset, const std::string &ndk, const std::string &more)
 {
-    Outcome outcome = run("cd " + quoted(kSource) + " && ANDROID_NDK_ROOT=" + quoted(ndk) +
-                          " cmake --preset " + preset + " " + more);
-    outcome.output = std::regex_replace(outcome.output, std::regex("\\s+"), " ");
+    Ended outcome = run_shell("cd " + quoted(kSource) + " && ANDROID_NDK_ROOT=" + quoted(ndk) +
+                              " cmake --preset " + preset + " " + more);
+    outcome.out = std::regex_replace(outcome.out, std::regex("\\s+"), " ");
     return outcome;
 }
 
@@ -50,54 +48,54 @@ TEST(AndroidPresets, AskTheNdkForAnArchitectureAndNoCppRuntime)
                                                              {"android-armv7", "armeabi-v7a"},
                                                              {"android-x86_64", "x86_64"}};
     for (const auto &[preset, abi] : presets) {
-        const Directory ndk;
+        const TemporaryDirectory ndk;
         ndk.write(kToolchain, "message(FATAL_ERROR \"asked: ${ANDROID_ABI} ${ANDROID_PLATFORM} "
                               "${ANDROID_STL} ${CMAKE_BUILD_TYPE}\")\n");
 
-        EXPECT_THAT(configure(preset, ndk.path(), "-B " + quoted(ndk.path() + "/build")).output,
+        EXPECT_THAT(configure(preset, ndk.path(), "-B " + quoted(ndk.path("build"))).out,
                     HasSubstr("asked: " + std::string(abi) + " android-28 none MinSizeRel"));
     }
 }
 
 TEST(AndroidPresets, NdkThatIsMissingIsAskedFor)
 {
-    const Directory directory;
+    const TemporaryDirectory directory;
     // it leads there from the tree's root, where CMake is started
     const std::string relative =
         std::filesystem::path(directory.path()).lexically_relative(kSource);
     directory.write(kToolchain, "message(FATAL_ERROR \"read\")\n");
 
-    const std::string none = directory.path() + "/none";
+    const std::string none = directory.path("none");
     const std::pair<std::string, std::string> complaints[] = {
         {"", "names no NDK: ''"},
         {none, "names no NDK: '" + none + "'"},
         {relative, "is not an absolute path: '" + relative + "'"}};
     for (const auto &[ndk, complaint] : complaints) {
-        const Outcome outcome =
-            configure("android-arm64", ndk, "-B " + quoted(directory.path() + "/build"));
+        const Ended outcome =
+            configure("android-arm64", ndk, "-B " + quoted(directory.path("build")));
 
         EXPECT_NE(outcome.status, 0);
-        EXPECT_THAT(outcome.output, HasSubstr("ANDROID_NDK_ROOT " + complaint +
-                                              "; set it to the directory that holds "
-                                              "build/cmake/android.toolchain.cmake"));
+        EXPECT_THAT(outcome.out, HasSubstr("ANDROID_NDK_ROOT " + complaint +
+                                           "; set it to the directory that holds "
+                                           "build/cmake/android.toolchain.cmake"));
     }
 }
 
 // The alignments of the segments that are loaded.
 Words alignments_of(const std::string &library)
 {
-    const Outcome listing = run("readelf --program-headers --wide " + quoted(library));
-    EXPECT_EQ(listing.status, 0) << listing.output;
-    return last_words(listing.output, "^ *LOAD");
+    const Ended listing = run_shell("readelf --program-headers --wide " + quoted(library));
+    EXPECT_EQ(listing.status, 0) << listing.out;
+    return last_words(listing.out, "^ *LOAD");
 }
 
 TEST(AndroidPresets, MakeASmallLibraryFor16KilobytePagesWithTheMakersOwn)
 {
     const std::string musl = "x86_64-linux-musl";
-    if (run("uname -m").output != "x86_64\n") {
+    if (run_shell("uname -m").out != "x86_64\n") {
         GTEST_SKIP() << "the emulator's preset, but another machine";
     }
-    const Directory ndk;
+    const TemporaryDirectory ndk;
     const std::string place = ndk.path();
     ndk.write(kToolchain, "set(CMAKE_SYSTEM_NAME Android)\n"
                           "set(CMAKE_SYSTEM_VERSION 1)\n"
@@ -116,14 +114,14 @@ TEST(AndroidPresets, MakeASmallLibraryFor16KilobytePagesWithTheMakersOwn)
     const std::filesystem::path header = MINIXML_HEADER;
     std::filesystem::copy_file(header, place + "/mxml.h"); // alone, without its neighbours
 
-    const Outcome configured =
+    const Ended configured =
         configure("android-x86_64", place,
                   "-B " + quoted(place + "/built") + " -DMINIXML_INCLUDE_DIR=" + quoted(place) +
                       " -DMINIXML_LIBRARY=" + quoted(MINIXML_LIBRARY) +
                       " -DVORLANE_LIBRARIES=" + quoted(make_makers_libraries(ndk)));
-    ASSERT_EQ(configured.status, 0) << configured.output;
-    const Outcome built = run("cmake --build " + quoted(place + "/built"));
-    ASSERT_EQ(built.status, 0) << built.output;
+    ASSERT_EQ(configured.status, 0) << configured.out;
+    const Ended built = run_shell("cmake --build " + quoted(place + "/built"));
+    ASSERT_EQ(built.status, 0) << built.out;
 
     const std::string library = place + "/built/libquillmark.so";
     EXPECT_FALSE(std::filesystem::is_symlink(library)) << "Android knows no versions of libraries";
@@ -136,20 +134,13 @@ TEST(AndroidPresets, MakeASmallLibraryFor16KilobytePagesWithTheMakersOwn)
     EXPECT_THAT(alignments_of(library), Not(SizeIs(0)));
     EXPECT_THAT(alignments_of(library), Each("0x4000"));
     EXPECT_LE(std::filesystem::file_size(library), 24 * 1024U);
-    EXPECT_THAT(run("readelf --sections --wide " + quoted(library)).output,
+    EXPECT_THAT(run_shell("readelf --sections --wide " + quoted(library)).out,
                 Not(HasSubstr(".symtab")));
 }
 
 // --- Android.bp -------------------------------------------------------------------
 
 const std::string kBlueprint = kSource + "/Android.bp";
-
-std::string text_of(const std::string &file)
-{
-    std::ifstream stream(file);
-    EXPECT_TRUE(stream) << file;
-    return {std::istreambuf_iterator<char>(stream), {}};
-}
 
 std::vector<std::string> all_matches(const std::string &text, const std::string &pattern)
 {
@@ -164,7 +155,7 @@ std::vector<std::string> all_matches(const std::string &text, const std::string 
 // The strings of a property of the library.
 std::vector<std::string> property(const std::string &name)
 {
-    const std::string text = text_of(kBlueprint);
+    const std::string text = support::read_file(kBlueprint);
     const std::string library = text.substr(text.find("\ncc_library_shared {"));
     std::smatch value;
     const std::regex wanted("\n    " + name + ": (\\[[^\\]]*\\]|[^\n]*)");
@@ -177,10 +168,10 @@ std::vector<std::string> property(const std::string &name)
 // A command's words, as the shell takes them.
 Words words_of(const std::string &command)
 {
-    const Outcome listing = run("printf '%s\\n' " + command);
-    EXPECT_EQ(listing.status, 0) << listing.output;
+    const Ended listing = run_shell("printf '%s\\n' " + command);
+    EXPECT_EQ(listing.status, 0) << listing.out;
     Words words;
-    std::istringstream lines(listing.output);
+    std::istringstream lines(listing.out);
     for (std::string word; std::getline(lines, word);) {
         words.push_back(word);
     }
@@ -191,7 +182,8 @@ Words words_of(const std::string &command)
 std::vector<Words> compile_commands()
 {
     std::vector<Words> commands;
-    const auto all = nlohmann::json::parse(text_of(QUILLMARK_BINARY_DIR "/compile_commands.json"));
+    const auto all =
+        nlohmann::json::parse(support::read_file(QUILLMARK_BINARY_DIR "/compile_commands.json"));
     for (const auto &unit : all) {
         const std::string command = unit.at("command");
         if (command.find(" -o CMakeFiles/quillmark.dir/") != std::string::npos) {
@@ -215,9 +207,9 @@ Words words_after(const std::string &beginning, const Words &words)
 
 TEST(AndroidBlueprint, IsFormattedAsAndroidsOwn)
 {
-    const Outcome formatted = run("bpfmt -d " + quoted(kBlueprint));
+    const Ended formatted = run_shell("bpfmt -d " + quoted(kBlueprint));
     EXPECT_EQ(formatted.status, 0);
-    EXPECT_EQ(formatted.output, "");
+    EXPECT_EQ(formatted.out, "");
 }
 
 TEST(AndroidBlueprint, CompilesWhatCMakeDoes)

@@ -26,13 +26,13 @@ class BareLibc : public ::testing::TestWithParam<const char *>
 
 TEST_P(BareLibc, IsAllThatTheModuleIsCompiledAndLinkedWith)
 {
-    const Directory directory;
-    const std::string machine = run("uname -m | tr -d '\\n'").output + "-linux-musl";
+    const TemporaryDirectory directory;
+    const std::string machine = run_shell("uname -m | tr -d '\\n'").out + "-linux-musl";
 
-    const Outcome made = run(quoted(kTools + "bare-libc") + " " + quoted(directory.path()) +
-                             " /usr/include/" + machine + " /usr/lib/" + machine + "/libc.so " +
-                             quoted(MINIXML_HEADER) + " ld " + GetParam());
-    EXPECT_EQ(made.status, 0) << made.output;
+    const Ended made = run_shell(quoted(kTools + "bare-libc") + " " + quoted(directory.path()) +
+                                 " /usr/include/" + machine + " /usr/lib/" + machine + "/libc.so " +
+                                 quoted(MINIXML_HEADER) + " ld " + GetParam());
+    EXPECT_EQ(made.status, 0) << made.out;
 }
 
 INSTANTIATE_TEST_SUITE_P(Compilers, BareLibc,
@@ -62,9 +62,9 @@ std::set<std::string> libc_names()
 TEST(ShippedLibrary, AsksNothingElseOfItsCLibrary)
 {
     const std::set<std::string> shared = libc_names();
-    const Outcome listing = run("nm --dynamic --undefined-only " + quoted(QUILLMARK_LIBRARY));
-    ASSERT_EQ(listing.status, 0) << listing.output;
-    std::istringstream lines(listing.output);
+    const Ended listing = run_shell("nm --dynamic --undefined-only " + quoted(QUILLMARK_LIBRARY));
+    ASSERT_EQ(listing.status, 0) << listing.out;
+    std::istringstream lines(listing.out);
     int asked = 0;
     for (std::string kind, name; lines >> kind >> name;) {
         const std::size_t version = name.find("@GLIBC");

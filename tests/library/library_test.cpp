@@ -59,13 +59,13 @@ TEST_P(ModuleSource, CompilesWithoutAWarning)
 {
     const std::string compiler = GetParam();
     for (const char *options : {"-O0", "-Os -DNDEBUG", "-O2", "-O3 -DNDEBUG"}) {
-        const Outcome compiled =
-            run(compiler + " -std=c++20 " + options +
-                " -Wall -Wextra -Wpedantic -Wconversion -Wshadow -Werror -fPIC -fno-exceptions"
-                " -fno-rtti -I" +
-                quoted(kSource + "/vorlane") + " -c -o /dev/null " +
-                quoted(kSource + "/src/quillmark.cpp"));
-        EXPECT_EQ(compiled.status, 0) << compiler << " " << options << "\n" << compiled.output;
+        const Ended compiled = run_shell(
+            compiler + " -std=c++20 " + options +
+            " -Wall -Wextra -Wpedantic -Wconversion -Wshadow -Werror -fPIC -fno-exceptions"
+            " -fno-rtti -I" +
+            quoted(kSource + "/vorlane") + " -c -o /dev/null " +
+            quoted(kSource + "/src/quillmark.cpp"));
+        EXPECT_EQ(compiled.status, 0) << compiler << " " << options << "\n" << compiled.out;
     }
 }
 
@@ -96,7 +96,7 @@ TEST(ModuleSource, IncludesHeadersOfTheCLibraryAlone)
 
 TEST(PublicHeader, IsUsableByItselfFromC11AndCpp)
 {
-    const Directory directory;
+    const TemporaryDirectory directory;
     const std::string text = "#include \"quillmark.h\"\n"
                              "int use(void);\n"
                              "int use(void)\n"
@@ -116,10 +116,10 @@ TEST(PublicHeader, IsUsableByItselfFromC11AndCpp)
                                                           {"g++ -std=c++11", "use.cpp"},
                                                           {"clang++ -std=c++20", "use.cpp"}};
     for (const auto &[compiler, name] : ways) {
-        const Outcome compiled = run(
+        const Ended compiled = run_shell(
             std::string(compiler) + " -Wall -Wextra -Wpedantic -Werror -I" +
             quoted(kSource + "/src") + " -c -o /dev/null " + quoted(directory.write(name, text)));
-        EXPECT_EQ(compiled.status, 0) << compiler << "\n" << compiled.output;
+        EXPECT_EQ(compiled.status, 0) << compiler << "\n" << compiled.out;
     }
 }
 
@@ -128,14 +128,15 @@ TEST(PublicHeader, IsUsableByItselfFromC11AndCpp)
 TEST(Quoted, IsOneWordOfTheShell)
 {
     const std::string text = "a  b'c''\"$HOME;*\\";
-    EXPECT_EQ(run("printf '<%s>' " + quoted(text) + " " + quoted("")).output, "<" + text + "><>");
+    EXPECT_EQ(run_shell("printf '<%s>' " + quoted(text) + " " + quoted("")).out,
+              "<" + text + "><>");
 }
 
 // --- a Mini-XML that is named ---------------------------------------------
 
 // What comes of it, with single blanks.
-Outcome configure_with(const Directory &directory, const std::string &header_directory,
-                       const std::string &library)
+Ended configure_with(const TemporaryDirectory &directory, const std::string &header_directory,
+                     const std::string &library)
 {
     directory.write("CMakeLists.txt", "cmake_minimum_required(VERSION 3.25)\n"
                                       "project(version NONE)\n"
@@ -143,15 +144,16 @@ Outcome configure_with(const Directory &directory, const std::string &header_dir
                                           kSource +
                                           "/cmake/MiniXml.cmake\")\n"
                                           "message(\"is ${MINIXML_LIBRARY}\")\n");
-    Outcome outcome = run("cd " + quoted(directory.path()) + " && rm -rf build && cmake -B build" +
-                          " -DMINIXML_INCLUDE_DIR=" + quoted(header_directory) +
-                          " -DMINIXML_LIBRARY=" + quoted(library));
-    outcome.output = std::regex_replace(outcome.output, std::regex("\\s+"), " ");
+    Ended outcome =
+        run_shell("cd " + quoted(directory.path()) + " && rm -rf build && cmake -B build" +
+                  " -DMINIXML_INCLUDE_DIR=" + quoted(header_directory) +
+                  " -DMINIXML_LIBRARY=" + quoted(library));
+    outcome.out = std::regex_replace(outcome.out, std::regex("\\s+"), " ");
     return outcome;
 }
 
-Outcome configure_with_version(const Directory &directory, const std::string &major,
-                               const std::string &minor)
+Ended configure_with_version(const TemporaryDirectory &directory, const std::string &major,
+                             const std::string &minor)
 {
     directory.write("mxml.h", "#  define MXML_MAJOR_VERSION " + major +
                                   "\n#  define MXML_MINOR_VERSION " + minor + "\n");
@@ -160,35 +162,34 @@ Outcome configure_with_version(const Directory &directory, const std::string &ma
 
 TEST(NamedMiniXml, MayStandInARelativePath)
 {
-    const Directory directory;
+    const TemporaryDirectory directory;
     directory.write("here/mxml.h", "#define MXML_MAJOR_VERSION 3\n#define MXML_MINOR_VERSION 2\n");
     directory.write("here/libmxml.so", "");
 
-    const Outcome outcome = configure_with(directory, "here", "here/libmxml.so");
-    EXPECT_EQ(outcome.status, 0) << outcome.output;
-    EXPECT_THAT(outcome.output, HasSubstr("is " + directory.path() + "/here/libmxml.so "));
+    const Ended outcome = configure_with(directory, "here", "here/libmxml.so");
+    EXPECT_EQ(outcome.status, 0) << outcome.out;
+    EXPECT_THAT(outcome.out, HasSubstr("is " + directory.path("here/libmxml.so") + " "));
 }
 
 TEST(NamedMiniXml, IsRefusedWhereItIsNotThere)
 {
-    const Directory directory;
+    const TemporaryDirectory directory;
     const std::string place = directory.path();
     directory.write("mxml.h", "#define MXML_MAJOR_VERSION 3\n#define MXML_MINOR_VERSION 2\n");
 
     for (const std::string &library : {place + "/absent.so", place}) {
-        const Outcome outcome = configure_with(directory, place, library);
+        const Ended outcome = configure_with(directory, place, library);
         EXPECT_NE(outcome.status, 0);
-        EXPECT_THAT(outcome.output, HasSubstr("MINIXML_LIBRARY names no file: " + library + " "));
+        EXPECT_THAT(outcome.out, HasSubstr("MINIXML_LIBRARY names no file: " + library + " "));
     }
-    const Outcome outcome = configure_with(directory, place + "/absent", place + "/mxml.h");
+    const Ended outcome = configure_with(directory, place + "/absent", place + "/mxml.h");
     EXPECT_NE(outcome.status, 0);
-    EXPECT_THAT(outcome.output,
-                HasSubstr("MINIXML_INCLUDE_DIR has no mxml.h: " + place + "/absent "));
+    EXPECT_THAT(outcome.out, HasSubstr("MINIXML_INCLUDE_DIR has no mxml.h: " + place + "/absent "));
 }
 
 TEST(MiniXmlVersion, From2Point7To3IsTaken)
 {
-    const Directory directory;
+    const TemporaryDirectory directory;
     for (const auto &[major, minor] : {std::pair("2", "7"), {"2", "12"}, {"3", "0"}, {"3", "3"}}) {
         EXPECT_EQ(configure_with_version(directory, major, minor).status, 0)
             << major << "." << minor;
@@ -197,11 +198,11 @@ TEST(MiniXmlVersion, From2Point7To3IsTaken)
 
 TEST(MiniXmlVersion, AnyOtherIsRefusedWithTheReason)
 {
-    const Directory directory;
+    const TemporaryDirectory directory;
     for (const auto &[major, minor] : {std::pair("2", "6"), {"4", "0"}}) {
-        const Outcome outcome = configure_with_version(directory, major, minor);
+        const Ended outcome = configure_with_version(directory, major, minor);
         EXPECT_NE(outcome.status, 0);
-        EXPECT_THAT(outcome.output,
+        EXPECT_THAT(outcome.out,
                     HasSubstr(std::string("is Mini-XML ") + major + "." + minor +
                               ", but Quillmark uses the interface of 2.7 to 3.x: install "
                               "libmxml-dev, or set MINIXML_INCLUDE_DIR and MINIXML_LIBRARY"));

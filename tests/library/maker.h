@@ -27,21 +27,21 @@ inline constexpr char kLog[] = "#include \"vr_log.h\"\n"
                                "int vr_log_printf(int p, const char *t, const char *f, ...)\n"
                                "{ (void)p; (void)t; (void)f; return 0; }\n";
 
-inline void make_library(const Directory &directory, const std::string &name,
+inline void make_library(const TemporaryDirectory &directory, const std::string &name,
                          const std::string &text)
 {
     const std::string source = directory.write(name + ".c", text);
     const std::string file = "lib" + name + ".so";
-    const Outcome made =
-        run("cc -shared -fPIC -I" + quoted(kSource + "/vorlane") + " -Wl,-soname," + file + " -o " +
-            quoted(directory.path() + "/" + file) + " " + quoted(source));
-    ASSERT_EQ(made.status, 0) << made.output;
+    const Ended made =
+        run_shell("cc -shared -fPIC -I" + quoted(kSource + "/vorlane") + " -Wl,-soname," + file +
+                  " -o " + quoted(directory.path("") + file) + " " + quoted(source));
+    ASSERT_EQ(made.status, 0) << made.out;
 }
 
 // libmaker.so and libmakerlog.so in the directory, as a list of CMake's.
-inline std::string make_makers_libraries(const Directory &directory)
+inline std::string make_makers_libraries(const TemporaryDirectory &directory)
 {
     make_library(directory, "maker", kMaker);
     make_library(directory, "makerlog", kLog);
-    return directory.path() + "/libmaker.so;" + directory.path() + "/libmakerlog.so";
+    return directory.path("libmaker.so;") + directory.path("libmakerlog.so");
 }

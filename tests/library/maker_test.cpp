@@ -22,8 +22,8 @@ using ::testing::UnorderedElementsAre;
 
 void expect_success(const std::string &command)
 {
-    const Outcome outcome = run(command);
-    ASSERT_EQ(outcome.status, 0) << command << "\n" << outcome.output;
+    const Ended outcome = run_shell(command);
+    ASSERT_EQ(outcome.status, 0) << command << "\n" << outcome.out;
 }
 
 // Builds the library with the maker's ones, and installs it in prefix.
@@ -37,7 +37,7 @@ void build_and_install(const std::string &place, const std::string &options)
 
 TEST(MakersLibraries, AreLinkedAndThoseForLinuxAreNotBuilt)
 {
-    const Directory directory;
+    const TemporaryDirectory directory;
     const std::string libraries = make_makers_libraries(directory);
     const std::string place = directory.path();
     const std::string build = place + "/build";
@@ -46,10 +46,10 @@ TEST(MakersLibraries, AreLinkedAndThoseForLinuxAreNotBuilt)
     EXPECT_THAT(
         needs_of(build + "/libquillmark.so"),
         UnorderedElementsAre("libmxml.so.1]", "libmaker.so]", "libmakerlog.so]", "libc.so.6]"));
-    EXPECT_THAT(run("find " + quoted(build) + " -name '*vorlane*'").output, IsEmpty());
+    EXPECT_THAT(run_shell("find " + quoted(build) + " -name '*vorlane*'").out, IsEmpty());
 
     EXPECT_THAT(
-        run("find " + quoted(place + "/prefix") + " -name 'lib*' -type f -printf '%f '").output,
+        run_shell("find " + quoted(place + "/prefix") + " -name 'lib*' -type f -printf '%f '").out,
         MatchesRegex("libquillmark\\.so\\.[0-9.]+ "));
     EXPECT_THAT(entries_of(place + "/prefix/lib/libquillmark.so", "RUNPATH"), IsEmpty());
 
@@ -58,15 +58,15 @@ TEST(MakersLibraries, AreLinkedAndThoseForLinuxAreNotBuilt)
     expect_success("cc " + quoted(kSource + "/tests/install/consumer/ping.c") + " -o " +
                    quoted(place + "/ping") + " -I " + quoted(prefix + "/include") + " -L " +
                    quoted(prefix + "/lib") + " -lquillmark -Wl,-rpath-link," + quoted(place));
-    EXPECT_EQ(
-        run("LD_LIBRARY_PATH=" + quoted(prefix + "/lib:" + place) + " " + quoted(place + "/ping"))
-            .output,
-        "Ping Success!\n");
+    EXPECT_EQ(run_shell("LD_LIBRARY_PATH=" + quoted(prefix + "/lib:" + place) + " " +
+                        quoted(place + "/ping"))
+                  .out,
+              "Ping Success!\n");
 }
 
 TEST(MakersLibraries, OfArchivesNothingIsExported)
 {
-    const Directory directory;
+    const TemporaryDirectory directory;
     const std::string place = directory.path();
     make_makers_libraries(directory);
     for (const char *name : {"maker", "makerlog"}) {
@@ -87,37 +87,37 @@ TEST(MakersLibraries, OfArchivesNothingIsExported)
 
 TEST(MakersHeaders, AreInstalledWhereTheyAreNamed)
 {
-    const Directory directory;
+    const TemporaryDirectory directory;
     const std::string place = directory.path();
     expect_success("mkdir " + quoted(place + "/own") + " && cp " + quoted(kSource + "/vorlane") +
                    "/*.h " + quoted(place + "/own") + " && echo '/* mine */' >>" +
                    quoted(place + "/own/vr_log.h"));
     build_and_install(place, "-DVORLANE_INCLUDE_DIR=" + quoted(place + "/own"));
 
-    EXPECT_THAT(run("cat " + quoted(place + "/prefix/include/vorlane/vr_log.h")).output,
+    EXPECT_THAT(run_shell("cat " + quoted(place + "/prefix/include/vorlane/vr_log.h")).out,
                 HasSubstr("/* mine */"));
 }
 
 // What the configuration says of them, in one line.
-std::string said_of(const Directory &directory, const std::string &options)
+std::string said_of(const TemporaryDirectory &directory, const std::string &options)
 {
     directory.write("CMakeLists.txt", "cmake_minimum_required(VERSION 3.25)\n"
                                       "project(makers NONE)\n"
                                       "include(\"" +
                                           kSource + "/cmake/Vorlane.cmake\")\n");
-    const Outcome outcome = run("cmake -S " + quoted(directory.path()) + " -B " +
-                                quoted(directory.path() + "/build") + " " + options);
+    const Ended outcome = run_shell("cmake -S " + quoted(directory.path()) + " -B " +
+                                    quoted(directory.path("build")) + " " + options);
     EXPECT_NE(outcome.status, 0) << options;
-    return std::regex_replace(outcome.output, std::regex("\\s+"), " ");
+    return std::regex_replace(outcome.out, std::regex("\\s+"), " ");
 }
 
 TEST(MakersLibraries, WhatIsNoFileIsNamed)
 {
-    const Directory directory;
+    const TemporaryDirectory directory;
     const std::string there = directory.write("libone.so", "");
     const std::string headers = " -DVORLANE_INCLUDE_DIR=" + quoted(kSource + "/vorlane");
 
-    for (const std::string &other : {std::string("/absent/libtwo.so"), directory.path()}) {
+    for (const std::string &other : {std::string("/absent/libtwo.so"), directory.path().string()}) {
         EXPECT_THAT(
             said_of(directory, "-DVORLANE_LIBRARIES=" + quoted(there + ";" + other) + headers),
             HasSubstr("VORLANE_LIBRARIES names no file by its whole path: " + other +
@@ -127,7 +127,7 @@ TEST(MakersLibraries, WhatIsNoFileIsNamed)
 
 TEST(MakersLibraries, DirectoryWithoutTheirHeadersIsNamed)
 {
-    const Directory directory;
+    const TemporaryDirectory directory;
     const std::string place = directory.path();
     for (const char *header : {"mxml_whitespace.h", "sockwrap.h", "sysparm.h"}) {
         directory.write(header, "");
@@ -139,7 +139,7 @@ TEST(MakersLibraries, DirectoryWithoutTheirHeadersIsNamed)
 
 TEST(MakersLibraries, TestsAreRefusedWithThem)
 {
-    const Directory directory;
+    const TemporaryDirectory directory;
     const std::string there = directory.write("libone.so", "");
 
     EXPECT_THAT(

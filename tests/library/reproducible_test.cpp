@@ -7,8 +7,6 @@
 #include <gtest/gtest.h>
 
 #include <filesystem>
-#include <fstream>
-#include <iterator>
 #include <set>
 #include <string>
 
@@ -33,17 +31,11 @@ void build(const fs::path &place, const std::string &surroundings, const std::st
 {
     copy_sources(place);
     const std::string build = place / "build";
-    const Outcome built = run(surroundings + " && cmake -S " + quoted(place) + " -B " +
-                              quoted(build) + " -DQUILLMARK_BUILD_TOOLS=OFF " + options +
-                              " && cmake --build " + quoted(build) + " --target quillmark vorlane");
-    ASSERT_EQ(built.status, 0) << built.output;
-}
-
-// Of the file, behind the symbolic links that may lead to it.
-std::string bytes_of(const fs::path &file)
-{
-    std::ifstream stream(file, std::ios::binary);
-    return {std::istreambuf_iterator<char>(stream), {}};
+    const Ended built =
+        run_shell(surroundings + " && cmake -S " + quoted(place) + " -B " + quoted(build) +
+                  " -DQUILLMARK_BUILD_TOOLS=OFF " + options + " && cmake --build " + quoted(build) +
+                  " --target quillmark vorlane");
+    ASSERT_EQ(built.status, 0) << built.out;
 }
 
 class Reproducible : public ::testing::TestWithParam<const char *>
@@ -52,7 +44,7 @@ class Reproducible : public ::testing::TestWithParam<const char *>
 
 TEST_P(Reproducible, LibrariesOfTwoFoldersHaveTheSameBytes)
 {
-    const Directory directory;
+    const TemporaryDirectory directory;
     const fs::path one = fs::path(directory.path()) / "a";
     const fs::path other = fs::path(directory.path()) / "another place" / "some levels" / "deeper";
     const std::string type = std::string("-DCMAKE_BUILD_TYPE=") + GetParam();
@@ -61,10 +53,10 @@ TEST_P(Reproducible, LibrariesOfTwoFoldersHaveTheSameBytes)
     build(other, "umask 077 && export TZ=Asia/Tokyo LC_ALL=C.UTF-8 && sleep 1", type);
 
     for (const char *library : {"libquillmark.so", "libvorlane.so"}) {
-        const std::string bytes = bytes_of(one / "build" / library);
+        const std::string bytes = support::read_file(one / "build" / library);
         EXPECT_GT(bytes.size(), 10'000U) << library;
-        EXPECT_TRUE(bytes == bytes_of(other / "build" / library)) << library;
-        EXPECT_EQ(bytes.find(directory.path()), std::string::npos) << library;
+        EXPECT_TRUE(bytes == support::read_file(other / "build" / library)) << library;
+        EXPECT_EQ(bytes.find(directory.path().string()), std::string::npos) << library;
     }
 }
 

@@ -1,80 +1,21 @@
 // SPDX-FileCopyrightText: 2026 The Quillmark authors
 // SPDX-License-Identifier: Apache-2.0
 
-#include "report_files.h"
+#include "reports.h"
 
 #include <expat.h>
+#include <gmock/gmock.h>
 #include <gtest/gtest.h>
 #include <nlohmann/json.hpp>
 
 #include <algorithm>
-#include <array>
-#include <cstdio>
-#include <cstdlib>
-#include <filesystem>
-#include <fstream>
 #include <iterator>
 #include <memory>
-#include <stdexcept>
-#include <sys/wait.h>
+#include <ostream>
+#include <utility>
 
-namespace report_files
+namespace support
 {
-
-// --- files -------------------------------------------------------------------
-
-Directory::Directory() : path_(::testing::TempDir() + "fptest-reports-XXXXXX")
-{
-    if (mkdtemp(path_.data()) == nullptr) {
-        throw std::runtime_error("no temporary directory: " + path_);
-    }
-}
-
-Directory::~Directory()
-{
-    std::error_code ignored;
-    std::filesystem::remove_all(path_, ignored);
-}
-
-std::string Directory::path(const std::string &name) const
-{
-    return path_ + "/" + name;
-}
-
-std::vector<std::string> Directory::names() const
-{
-    std::vector<std::string> names;
-    for (const auto &entry : std::filesystem::directory_iterator(path_)) {
-        names.push_back(entry.path().filename());
-    }
-    std::sort(names.begin(), names.end());
-    return names;
-}
-
-std::string read_file(const std::string &path)
-{
-    std::ifstream file(path, std::ios::binary);
-    EXPECT_TRUE(file.is_open()) << path;
-    return {std::istreambuf_iterator<char>(file), {}};
-}
-
-void write_file(const std::string &path, const std::string &text)
-{
-    std::ofstream file(path, std::ios::binary);
-    file << text;
-    ASSERT_TRUE(file.flush().good()) << path;
-}
-
-std::vector<std::string> lines_of(const std::string &text)
-{
-    std::vector<std::string> lines;
-    for (std::size_t begin = 0; begin < text.size();) {
-        const std::size_t end = std::min(text.find('\n', begin), text.size() - 1);
-        lines.push_back(text.substr(begin, end + 1 - begin));
-        begin = end + 1;
-    }
-    return lines;
-}
 
 // --- XML ---------------------------------------------------------------------
 
@@ -163,6 +104,7 @@ std::string verdict_of(const Element &test)
 
 std::vector<nlohmann::json> events_of(const std::string &text)
 {
+    EXPECT_TRUE(text.empty() || text.ends_with('\n')) << text;
     std::vector<nlohmann::json> events;
     for (const std::string &line : lines_of(text)) {
         events.push_back(nlohmann::json::parse(line, nullptr, false));
@@ -178,12 +120,21 @@ std::vector<nlohmann::json> events_of(const std::string &text, const std::string
     return events;
 }
 
-std::vector<std::string> outcomes(const std::string &text)
+Lines outcomes(const std::string &text)
 {
-    std::vector<std::string> all;
+    Lines all;
     for (const nlohmann::json &end : events_of(text, "end")) {
         all.push_back(end.at("item").get<std::string>() + ": " +
                       end.at("outcome").get<std::string>());
+    }
+    return all;
+}
+
+Lines reasons(const std::string &text)
+{
+    Lines all;
+    for (const nlohmann::json &end : events_of(text, "end")) {
+        all.push_back(end.at("reason").is_null() ? "" : end.at("reason").get<std::string>());
     }
     return all;
 }
@@ -220,8 +171,9 @@ PointText parse_point(const std::string &text)
 class TapParser
 {
   public:
-    explicit TapParser(std::vector<std::string> lines) : lines_(std::move(lines))
+    explicit TapParser(const std::string &text) : lines_(lines_of(text))
     {
+        EXPECT_THAT(text, ::testing::EndsWith("\n"));
     }
 
     Tap parse()
@@ -259,8 +211,7 @@ class TapParser
             return std::nullopt;
         }
         const std::string &line = lines_[at_++];
-        EXPECT_EQ(line.back(), '\n') << line;
-        return line.substr(start.size(), line.size() - 1 - start.size());
+        return line.substr(start.size());
     }
 
     void wrong()
@@ -352,7 +303,7 @@ class TapParser
         }
     }
 
-    std::vector<std::string> lines_;
+    Lines lines_;
     std::size_t at_ = 0;
 };
 
@@ -360,24 +311,73 @@ class TapParser
 
 Tap parse_tap(const std::string &text)
 {
-    return TapParser(lines_of(text)).parse();
+    return TapParser(text).parse();
 }
 
-Finished prove(const std::string &path)
+Ended prove(const std::string &path)
 {
-    const std::string command = "/usr/bin/prove --exec cat '" + path + "' 2>&1";
-    std::FILE *const pipe = popen(command.c_str(), "r");
-    if (pipe == nullptr) {
-        throw std::runtime_error("prove cannot be started");
-    }
-    Finished finished;
-    std::array<char, 4096> buffer{};
-    while (const std::size_t got = std::fread(buffer.data(), 1, buffer.size(), pipe)) {
-        finished.output.append(buffer.data(), got);
-    }
-    const int status = pclose(pipe);
-    finished.status = WIFEXITED(status) ? WEXITSTATUS(status) : 128 + WTERMSIG(status);
-    return finished;
+    return run({.arguments = {"/usr/bin/prove", "--exec", "cat", path}, .is_one_stream = true});
 }
 
-} // namespace report_files
+// --- counts --------------------------------------------------------------------
+
+void PrintTo(const Tally &tally, std::ostream *stream)
+{
+    *stream << tally.passed << " passed, " << tally.failed << " failed, " << tally.not_run
+            << " not run";
+}
+
+Tally tally_of_json(const std::string &text)
+{
+    Tally tally;
+    for (const nlohmann::json &end : events_of(text, "end")) {
+        const std::string outcome = end.at("outcome");
+        ++(outcome == "passed"    ? tally.passed
+           : outcome == "not run" ? tally.not_run
+                                  : tally.failed);
+    }
+    const auto finish = events_of(text, "finish");
+    EXPECT_EQ(finish.size(), 1U);
+    if (!finish.empty()) {
+        EXPECT_EQ(finish[0].at("passed"), tally.passed);
+        EXPECT_EQ(finish[0].at("failed"), tally.failed);
+        EXPECT_EQ(finish[0].at("not_run"), tally.not_run);
+    }
+    return tally;
+}
+
+Tally tally_of_junit(const std::string &text)
+{
+    Tally tally;
+    const Element top = parse_xml(text);
+    for (const Element &suite : top.all("testsuite")) {
+        for (const Element &test : suite.all("testcase")) {
+            const std::string verdict = verdict_of(test);
+            ++(verdict == "passed"                            ? tally.passed
+               : verdict == "not run" || verdict == "skipped" ? tally.not_run
+                                                              : tally.failed);
+        }
+    }
+    const auto number = [&](const char *name) { return std::stoul(top.attributes.at(name)); };
+    EXPECT_EQ(number("tests"), tally.passed + tally.failed + tally.not_run);
+    EXPECT_EQ(number("failures") + number("errors") + number("skipped"),
+              tally.failed + tally.not_run);
+    return tally;
+}
+
+Tally tally_of_tap(const std::string &text)
+{
+    Tally tally;
+    const Tap tap = parse_tap(text);
+    EXPECT_EQ(tap.planned, tap.points.size());
+    for (const Point &suite : tap.points) {
+        EXPECT_EQ(suite.planned, suite.inside.size());
+        EXPECT_EQ(suite.ok, std::ranges::all_of(suite.inside, &Point::ok));
+        for (const Point &point : suite.inside) {
+            ++(point.skipped ? tally.not_run : point.ok ? tally.passed : tally.failed);
+        }
+    }
+    return tally;
+}
+
+} // namespace support

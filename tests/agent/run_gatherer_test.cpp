@@ -1,0 +1,202 @@
+// SPDX-FileCopyrightText: 2026 The Quillmark authors
+// SPDX-License-Identifier: Apache-2.0
+
+// Runs of the gatherer, and of the vendors' programs.
+#include "network.h"
+#include "run_test.h"
+
+#include <algorithm>
+#include <csignal>
+#include <map>
+#include <sys/types.h>
+
+using namespace fptest_runner;
+using device::Lines;
+using device::processes_named;
+using device::set_vendor;
+using support::eventually;
+using support::read_file;
+using ::testing::EndsWith;
+using ::testing::SizeIs;
+using ::testing::StartsWith;
+
+namespace
+{
+
+constexpr char kProbe[] = "/system/bin/SensorProbe";
+
+// Something goes on in the gatherer's place, and connects nowhere.
+const Items kGathererThatNeverComes = {{"SensorProbe", "--help; exec sleep 30"},
+                                       {"Other", kPasses}};
+
+class RunGatherer : public Run
+{
+  protected:
+    static bool module_waits_for_gatherer()
+    {
+        const Lines all = device::listeners();
+        return std::ranges::find(all, "00000000:8888") != all.end();
+    }
+    static void signal_gatherer(int number)
+    {
+        for (const device::Process &process : processes_named(kProbe)) {
+            kill(process.pid, number);
+        }
+    }
+};
+
+TEST_F(RunGatherer, WaitsForItsReport)
+{
+    Ended ended = run_group({{"SensorProbe", "--group G --seconds 1"}});
+    EXPECT_EQ(ended.status, 0) << ended.err;
+    EXPECT_THAT(ended.out, HasSubstr("gathering 1, 64 samples\n"));
+    EXPECT_GE(end_of(0).at("seconds"), 1.0);
+    ASSERT_THAT(processes_named(kProbe), SizeIs(1));
+    const pid_t gatherer = processes_named(kProbe)[0].pid;
+
+    ended = run({"P/G/SensorProbe"});
+    EXPECT_EQ(ended.status, 0) << ended.err;
+    EXPECT_THAT(ended.out, HasSubstr("gathering 2, 64 samples\n"));
+    ASSERT_THAT(processes_named(kProbe), SizeIs(1));
+    EXPECT_EQ(processes_named(kProbe)[0].pid, gatherer);
+}
+
+TEST_F(RunGatherer, RunsTheNextItemOfAGroupWhileItGathers)
+{
+    FptestProcess fptest(with_group(
+        {{"SensorProbe", "--group G --seconds 1"}, {"Item", notes("x")}}, {"--as-group"}));
+    EXPECT_TRUE(wait_for_file("order"));
+    EXPECT_EQ(read_file("/data/vorlane/readings.txt"), "");
+    const Ended ended = fptest.wait();
+    EXPECT_EQ(ended.status, 0) << ended.err;
+    EXPECT_THAT(outcomes(), ElementsAre("SensorProbe: passed", "Item: passed"));
+    EXPECT_THAT(ended.out, HasSubstr("gathering 1, 64 samples\n"));
+}
+
+TEST_F(RunGatherer, GetsItToGatherInEveryRound)
+{
+    const Ended ended = run_group({{"SensorProbe", "--group G --seconds 0.1"}}, {"--repeat", "3"});
+    EXPECT_EQ(ended.status, 0) << ended.err;
+    for (const std::string gathering : {"1", "2", "3"}) {
+        EXPECT_THAT(ended.out, HasSubstr("gathering " + gathering + ", 64 samples\n"));
+    }
+}
+
+TEST_F(RunGatherer, GoesOnWhereItNeverConnects)
+{
+    for (const std::string way : {"--quiet", "--as-group"}) {
+        SCOPED_TRACE(way);
+        EXPECT_EQ(run_group(kGathererThatNeverComes, {way, "--timeout", "1"}).status, 1);
+        EXPECT_THAT(outcomes(), ElementsAre("SensorProbe: timed out", "Other: passed"));
+        EXPECT_THAT(reasons(), ElementsAre(StartsWith("stopped after 1."), ""));
+    }
+}
+
+TEST_F(RunGatherer, GoesOnWhereARunningOneHangs)
+{
+    EXPECT_EQ(run_group({{"SensorProbe", "--group G --seconds 0.1"}, {"Other", kPasses}}).status,
+              0);
+    signal_gatherer(SIGSTOP);
+    EXPECT_EQ(run({"--timeout", "1", "P/G"}).status, 1);
+    EXPECT_THAT(outcomes(), ElementsAre("SensorProbe: timed out", "Other: passed"));
+    signal_gatherer(SIGCONT);
+}
+
+TEST_F(RunGatherer, TakesNoStepOfItForItsEnd)
+{
+    // one of the test's own that is running already
+    support::Process gatherer(
+        {.arguments = {kProbe, "gather", "report", "G", "50", "0", "half", "note", work("half"),
+                       "await", work("go"), "report", "G", "100", "1", "whole"},
+         .program = "/system/bin/Item"});
+    EXPECT_TRUE(eventually([] { return !processes_named(kProbe).empty(); }));
+    FptestProcess fptest(with_group({{"SensorProbe", ""}, {"Item", "note /tmp/scene/next"}}));
+    ASSERT_TRUE(wait_for_events("progress", 1));
+    EXPECT_THAT(events("end"), IsEmpty());
+    file("go", "");
+    EXPECT_EQ(fptest.wait().status, 1);
+    EXPECT_THAT(outcomes(), ElementsAre("SensorProbe: failed", "Item: no result"));
+    EXPECT_EQ(description(0), "whole");
+    gatherer.wait(); // a stop would take what is left of it for an item
+}
+
+TEST_F(RunGatherer, WaitsOnlySoLongForItsReport)
+{
+    // it reports for a group that there is not
+    const Ended ended = run_group({{"SensorProbe", "--group H --seconds 0"}});
+    EXPECT_EQ(ended.status, 1);
+    EXPECT_LT(ended.seconds, 25);
+    EXPECT_THAT(outcomes(), ElementsAre("SensorProbe: no result"));
+    EXPECT_THAT(reasons().at(0), StartsWith("no result was reported within "));
+}
+
+TEST_F(RunGatherer, IsInterruptedWhileItWaitsForIt)
+{
+    FptestProcess fptest(with_group(kGathererThatNeverComes));
+    EXPECT_TRUE(eventually([] { return module_waits_for_gatherer(); }, 30));
+    fptest.signal(SIGINT);
+    const Ended ended = fptest.wait();
+    EXPECT_EQ(ended.status, 130);
+    EXPECT_LT(ended.seconds, 15);
+    EXPECT_THAT(outcomes(), ElementsAre("SensorProbe: stopped", "Other: not run"));
+}
+
+TEST_F(RunGatherer, LetsItsPortGoWhenItIsKilled)
+{
+    FptestProcess fptest(with_group(kGathererThatNeverComes));
+    ASSERT_TRUE(eventually([] { return module_waits_for_gatherer(); }, 30));
+    fptest.signal(SIGKILL);
+    EXPECT_TRUE(eventually([] { return !module_waits_for_gatherer(); }, 20));
+    EXPECT_TRUE(eventually([] { return processes_named(FPTEST_PROGRAM).empty(); }, 20));
+}
+
+// --- vendors -------------------------------------------------------------------------
+
+TEST_F(Run, RunsTheVendorsPrograms)
+{
+    const std::string path = plan(group_of({{"Item", notes("a")}, {"Other", "report G 100 0 b"}}));
+    const std::map<std::string, std::string> suffixes = {{"1", "_ca"}, {"2", "_ca_qsee"}};
+    for (const auto &[vendor, suffix] : suffixes) {
+        SCOPED_TRACE(vendor);
+        set_vendor(vendor);
+        support::write_file(device::kLogFile, "");
+        const Ended ended = run({"--plan", path, "P/G"});
+        EXPECT_EQ(ended.status, 0) << ended.err;
+        EXPECT_THAT(lines_of(ended.out).at(0), EndsWith(": 2 items, vendor " + vendor));
+        EXPECT_THAT(programs_run(),
+                    ElementsAre("/system/bin/Item" + suffix + " " + notes("a"),
+                                "/system/bin/Other" + suffix + " report G 100 0 b"));
+        EXPECT_THAT(outcomes(), ElementsAre("Item: passed", "Other: passed"));
+        EXPECT_EQ(events("run").at(0).at("vendor"), std::stoi(vendor));
+        EXPECT_THAT(run_fptest({"run", "--list", "P/G/Other"}).out,
+                    "P/G/Other  /system/bin/Other" + suffix + " report G 100 0 b\n");
+    }
+}
+
+TEST_F(Run, StopsTheVendorsPrograms)
+{
+    set_vendor("2");
+    EXPECT_EQ(run_group({{"Item", kSleeps}, {"Other", kPasses}}, {"--timeout", "1"}).status, 1);
+    EXPECT_THAT(outcomes(), ElementsAre("Item: timed out", "Other: passed"));
+    EXPECT_EQ(read_file(work("signal")), "SIGTERM\n");
+}
+
+TEST_F(RunGatherer, IsTriggeredWhereItIsTheFirstVendors)
+{
+    set_vendor("1");
+    const Ended ended = run_group({{"SensorProbe", "--group G --seconds 0.1"}});
+    EXPECT_EQ(ended.status, 0) << ended.err;
+    EXPECT_THAT(processes_named("/system/bin/SensorProbe_ca"), SizeIs(1));
+    EXPECT_THAT(ended.out, HasSubstr("gathering 1, 64 samples\n"));
+}
+
+TEST_F(RunGatherer, IsAnyOtherItemWhereItIsTheSecondVendors)
+{
+    set_vendor("2");
+    const device::Socket taken = device::listen_on(device::kTriggerPort);
+    const Ended ended = run_group({{"SensorProbe", "--group G --seconds 0.1"}});
+    EXPECT_EQ(ended.status, 0) << ended.err;
+    EXPECT_THAT(running_items(), IsEmpty());
+}
+
+} // namespace

@@ -1,0 +1,320 @@
+// SPDX-FileCopyrightText: 2026 The Quillmark authors
+// SPDX-License-Identifier: Apache-2.0
+
+// What fptest refuses to run, and what it says then.
+#include "network.h"
+#include "run_test.h"
+
+#include <filesystem>
+
+using namespace fptest_runner;
+using device::kPlanFile;
+using device::plan_of;
+using device::set_vendor;
+using support::read_file;
+using support::write_file;
+using ::testing::EndsWith;
+using ::testing::StartsWith;
+
+namespace fs = std::filesystem;
+
+namespace
+{
+
+const std::string kTwoGroups =
+    plan_of({{"Bringup", {{"Item", "note /tmp/scene/order"}, {"Other", ""}}},
+             {"Endurance", {{"Third", ""}}}});
+
+class Refusal : public Run
+{
+  protected:
+    // Runs it and expects that exit status, that line, and that nothing was started.
+    static void expect(int status, const std::string &line, const Start &start)
+    {
+        const Ended ended = run_fptest(start);
+        EXPECT_EQ(ended.status, status);
+        EXPECT_EQ(ended.err, line + "\n");
+        EXPECT_THAT(programs_run(), IsEmpty());
+        EXPECT_FALSE(is_there("order"));
+    }
+
+    static void expect(int status, const std::string &line, Lines arguments)
+    {
+        SCOPED_TRACE(::testing::PrintToString(arguments));
+        arguments.insert(arguments.begin(), "run");
+        expect(status, line, Start{.arguments = arguments});
+    }
+};
+
+// --- paths -----------------------------------------------------------------------------
+
+TEST_F(Refusal, OfAnUnknownNameNamesTheNearestAndThoseThereAre)
+{
+    write_file(kPlanFile, kTwoGroups);
+    const std::string path = plan(kTwoGroups);
+    expect(2,
+           "fptest: no group 'Brngup' in /data/vorlane/src1.xml; did you mean 'Bringup'? The "
+           "groups are Bringup and Endurance",
+           {"P/Brngup"});
+    expect(2,
+           "fptest: no group 'xyz' in /data/vorlane/src1.xml; the groups are Bringup and Endurance",
+           {"P/Bringup", "P/xyz"});
+    expect(2,
+           "fptest: no item 'Itm' in group 'Bringup' of /tmp/scene/plan.xml; did you mean 'Item'? "
+           "The items of the group are Item and Other",
+           {"--plan", path, "P/Bringup/Itm"});
+    // the library would find it in the group after it
+    expect(2,
+           "fptest: no item 'Third' in group 'Bringup' of /tmp/scene/plan.xml; the items of the "
+           "group are Item and Other",
+           {"--plan", path, "P/Bringup/Third"});
+}
+
+TEST_F(Refusal, OfAPathThatIsNone)
+{
+    write_file(kPlanFile, kTwoGroups);
+    for (const std::string path : {"Bringup", "/Bringup/", "/"}) {
+        expect(2,
+               "fptest: '" + path +
+                   "' names no group: a path is root/group or root/group/item; "
+                   "the groups are Bringup and Endurance",
+               {path});
+    }
+    expect(2,
+           "fptest: 'P/Bringup/Item/x' has too many parts: a path is root/group or "
+           "root/group/item",
+           {"P/Bringup/Item/x"});
+    expect(2,
+           "fptest: no PATH given: say what to run, as root/group or root/group/item; the groups "
+           "are Bringup and Endurance",
+           Lines{});
+    expect(2,
+           "fptest: 'P/Bring:up' has a ':', a tab or a line feed, at which the library would cut "
+           "it: name it without",
+           {"P/Bring:up"});
+}
+
+// --- plans -----------------------------------------------------------------------------
+
+TEST_F(Refusal, OfAPlanWithErrorsSaysWhichAndForceRunsIt)
+{
+    const std::string path = plan(kShifted);
+    const Ended ended = run_fptest({"run", "--plan", path, "P/G"});
+    EXPECT_EQ(ended.status, 2);
+    EXPECT_EQ(ended.out, "");
+    EXPECT_THAT(ended.err, StartsWith(path + ":1:"));
+    EXPECT_THAT(ended.err, HasSubstr(": error: "));
+    EXPECT_THAT(ended.err, EndsWith("\nfptest: nothing was run, because the plan has errors; fix "
+                                    "them, or run it as it is with --force\n"));
+    const std::string findings = ended.err.substr(0, ended.err.rfind("fptest: "));
+    EXPECT_THAT(run_fptest({"check", path}).out, StartsWith(findings));
+    EXPECT_FALSE(fs::exists(kPlanFile));
+    EXPECT_FALSE(is_there("order"));
+
+    EXPECT_EQ(run_fptest({"run", "--force", "--plan", path, "P/G"}).status, 1);
+    EXPECT_EQ(read_file(work("order")), "Item\nOther\nThird\n");
+}
+
+TEST_F(Refusal, OfAStoredPlanWithErrorsSaysWhich)
+{
+    write_file(kPlanFile, kShifted);
+    const Ended ended = run_fptest({"run", "P/G"});
+    EXPECT_EQ(ended.status, 2);
+    EXPECT_THAT(ended.err, StartsWith("/data/vorlane/src1.xml:1:"));
+    EXPECT_FALSE(is_there("order"));
+}
+
+TEST_F(Refusal, OfAPlanThatDoesNotLoadEvenWithForce)
+{
+    const Ended ended =
+        run_fptest({"run", "--force", "--plan",
+                    plan("<P><CmdGroup name='G'><Cmd name/></CmdGroup></P>"), "P/G"});
+    EXPECT_EQ(ended.status, 2);
+    EXPECT_THAT(lines_of(ended.err).back(),
+                StartsWith("fptest: /tmp/scene/plan.xml: the library cannot load this plan: "));
+    EXPECT_FALSE(fs::exists(kPlanFile));
+}
+
+TEST_F(Refusal, WithoutAPlan)
+{
+    expect(3, "fptest: no plan is stored in /data/vorlane/src1.xml: give one with --plan FILE",
+           {"P/G"});
+    expect(2, "fptest: /tmp/scene/none.xml: No such file or directory",
+           {"--plan", work("none.xml"), "P/G"});
+}
+
+TEST_F(Refusal, WhereADirectoryIsInThePlansPlace)
+{
+    fs::create_directories(std::string(kPlanFile) + "/full");
+    expect(3,
+           "fptest: /data/vorlane/src1.xml cannot be read: Is a directory; give a plan with "
+           "--plan FILE",
+           {"P/G"});
+    const std::string text = group_of({{"Item", "note /tmp/scene/order"}});
+    expect(3,
+           "fptest: the plan was not stored: 0 of " + std::to_string(text.size()) +
+               " bytes are in /data/vorlane/src1.xml; make room and store it again",
+           {"--plan", plan(text), "P/G"});
+}
+
+// --- devices ---------------------------------------------------------------------------
+
+TEST_F(Refusal, WhereThePlansDirectoryIsNotWritable)
+{
+    fs::permissions("/data/vorlane", fs::perms::owner_read | fs::perms::owner_exec);
+    Start start;
+    start.prepare = as_plain_user;
+    start.arguments = {"run", "--plan", plan(kTwoGroups), "P/Bringup"};
+    expect(3,
+           "fptest: /data/vorlane is not writable: Permission denied; make it, or run this as "
+           "another user",
+           start);
+    EXPECT_FALSE(fs::exists(kPlanFile));
+}
+
+TEST_F(Refusal, OutsideOfADevice)
+{
+    if (is_in_place()) {
+        GTEST_SKIP() << "in place, /system/bin cannot be hidden from one program";
+    }
+    Start start;
+    start.prepare = without_device;
+    start.arguments = {"run", "--plan", plan(kTwoGroups), "P/Bringup"};
+    expect(3,
+           "fptest: this machine is no device: there is no /system/bin/sh; on a desk, run it as: "
+           "device/run -- fptest ...",
+           start);
+}
+
+TEST_F(Refusal, WhereTheGatherersPortIsTaken)
+{
+    const device::Socket taken = device::listen_on(device::kTriggerPort);
+    const std::string path =
+        plan(group_of({{"Item", "note /tmp/scene/order"}, {"SensorProbe", "--group G"}}));
+    const std::string line = "fptest: port 34952 is not available: Address already in use; the "
+                             "gatherer's run would never "
+                             "end: stop what listens there (netstat -ltnp names it)";
+    expect(3, line, {"--plan", path, "P/G"});
+    expect(3, line, {"--plan", path, "P/G/SensorProbe"});
+    expect(3, line, {"--force", "--plan", path, "P/G/SensorProbe"});
+    // nobody else needs it
+    EXPECT_EQ(run_fptest({"run", "--plan", path, "P/G/Item"}).status, 1);
+    EXPECT_TRUE(is_there("order"));
+}
+
+TEST_F(Refusal, WhereProgramsAreMissing)
+{
+    const std::string advice = " on this device: install what is missing (device/run --bin DIR "
+                               "adds programs), or run the rest with --force";
+    const std::string path = plan(group_of(
+        {{"Item", "note /tmp/scene/order"}, {"Nobody", ""}, {"Third", ""}, {"Nothing", ""}}));
+    expect(3, "fptest: no program /system/bin/Nobody and /system/bin/Nothing" + advice,
+           {"--plan", path, "P/G"});
+    expect(3, "fptest: no program /system/bin/Nobody" + advice,
+           {"--plan", path, "P/G/Item", "P/G/Nobody", "P/G/Nobody"});
+    set_vendor("1"); // there are Item_ca and Other_ca alone
+    expect(3,
+           "fptest: no program /system/bin/Nobody_ca, /system/bin/Third_ca and "
+           "/system/bin/Nothing_ca" +
+               advice,
+           {"--plan", path, "P/G"});
+}
+
+TEST_F(Run, RunsTheRestWhereProgramsAreMissingByForce)
+{
+    EXPECT_EQ(run_group({{"Nobody", ""}, {"Item", kPasses}}, {"--force"}).status, 1);
+    EXPECT_THAT(outcomes(), ElementsAre("Nobody: no result", "Item: passed"));
+    EXPECT_THAT(reasons(), ElementsAre("there is no program /system/bin/Nobody", ""));
+}
+
+TEST_F(Refusal, OfAVendorThatRunsNothing)
+{
+    for (const std::string vendor : {"7", "-1"}) {
+        set_vendor(vendor);
+        expect(3,
+               "fptest: the vendor selector is " + vendor +
+                   ", and the library runs nothing then: set device/SysParam/Quillmark/vendor to "
+                   "0, 1 or 2 in /etc/vorlane/sysparms/vr_common_cfg.xml",
+               {"--plan", plan(kTwoGroups), "P/Bringup"});
+        EXPECT_FALSE(fs::exists(kPlanFile));
+    }
+}
+
+TEST_F(Refusal, WhereAReportCannotBeWritten)
+{
+    const std::string path = plan(kTwoGroups);
+    for (const std::string option : {"--junit", "--json"}) {
+        expect(3, "fptest: /tmp/nowhere/file: No such file or directory; nothing was run",
+               {option, "/tmp/nowhere/file", "--plan", path, "P/Bringup"});
+        expect(3, "fptest: /tmp: Is a directory; nothing was run",
+               {option, "/tmp", "--plan", path, "P/Bringup"});
+    }
+    expect(3,
+           "fptest: --log /tmp/nowhere/log cannot be written: No such file or directory; name "
+           "another file",
+           {"--log", "/tmp/nowhere/log", "--plan", path, "P/Bringup"});
+    expect(3,
+           "fptest: --log /dev/full cannot be written: No space left on device; name another file",
+           {"--log", "/dev/full", "--plan", path, "P/Bringup"});
+}
+
+TEST_F(Refusal, OfASecondRunAtTheSameTime)
+{
+    FptestProcess first(with_group({{"Item", "await /tmp/scene/go report G 100 0 x"}}));
+    ASSERT_TRUE(support::eventually([] { return running_items() == Lines{"Item"}; }, 30));
+    const std::string stored = read_file(kPlanFile);
+    const Ended second = run_fptest({"run", "--plan", plan(kTwoGroups), "P/Bringup"});
+    EXPECT_EQ(second.status, 3);
+    EXPECT_EQ(second.err, "fptest: another fptest is running a plan on this device: wait for its "
+                          "end, or stop it\n");
+    EXPECT_EQ(read_file(kPlanFile), stored);
+    EXPECT_FALSE(is_there("order"));
+    file("go", "");
+    EXPECT_EQ(first.wait().status, 0);
+    EXPECT_EQ(run_fptest({"run", "P/G"}).status, 0);
+}
+
+class FullDisk : public Refusal
+{
+  protected:
+    void SetUp() override
+    {
+        Refusal::SetUp();
+        if (is_in_place()) {
+            GTEST_SKIP() << "in place, the disk is the container's own and is not to be filled";
+        }
+    }
+};
+
+TEST_F(FullDisk, StoresNoPlan)
+{
+    fill_disk();
+    expect(3,
+           "fptest: the disk of /data/vorlane is full: make room for " +
+               std::to_string(kTwoGroups.size()) + " bytes; the stored plan is as it was",
+           {"--plan", plan(kTwoGroups), "P/Bringup"});
+    EXPECT_FALSE(fs::exists(kPlanFile));
+}
+
+TEST_F(FullDisk, LeavesTheStoredPlanAsItWas)
+{
+    std::string reported = group_of({{"Item", notes("new")}});
+    reported.insert(reported.find("/>"), " progress=\"100\" result=\"0\" description=\"old\"");
+    write_file(kPlanFile, reported);
+    fill_disk();
+    expect(3,
+           "fptest: /data/vorlane/src1.xml cannot be written: No space left on device; the old "
+           "plan is still there",
+           {"P/G"});
+    EXPECT_EQ(read_file(kPlanFile), reported);
+}
+
+TEST_F(FullDisk, StoresAPlanInTheRoomOfTheOldOne)
+{
+    write_file(kPlanFile, kTwoGroups);
+    fill_disk();
+    EXPECT_EQ(run_group(kThreeThatNote).status, 0);
+    EXPECT_THAT(outcomes(), ElementsAre("Item: passed", "Other: passed", "Third: passed"));
+}
+
+} // namespace

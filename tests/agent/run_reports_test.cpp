@@ -1,0 +1,277 @@
+// SPDX-FileCopyrightText: 2026 The Quillmark authors
+// SPDX-License-Identifier: Apache-2.0
+
+// Runs with reports: that all of them tell the same, of whatever items report and
+// print.
+#include "run_test.h"
+
+#include <fcntl.h>
+#include <filesystem>
+#include <sys/stat.h>
+#include <unistd.h>
+
+using namespace fptest_runner;
+using device::kPlanFile;
+using device::Lines;
+using device::plan_of;
+using device::processes_named;
+using support::Element;
+using support::eventually;
+using support::parse_tap;
+using support::parse_xml;
+using support::read_file;
+using support::Tally;
+using support::tally_of_json;
+using support::tally_of_junit;
+using support::tally_of_tap;
+using support::Tap;
+using ::testing::EndsWith;
+using ::testing::StartsWith;
+
+namespace fs = std::filesystem;
+
+namespace
+{
+
+// --- the reports ---------------------------------------------------------------------
+
+TEST_F(Run, TellsTheSameCountsInEveryReport)
+{
+    // one of each kind of end
+    const std::string text = plan_of(
+        {{"A #1", {{"Item", "report 'A #1' 100 0 fine"}, {"Other", "report 'A #1' 100 1 bad"}}},
+         {"B",
+          {{"Third", "say nothing"}, {"Stubborn", "sleep 60"}, {"Fourth", "report B 100 0 x"}}}});
+    const Ended ended = run({"--tap", "--junit", work("junit"), "--timeout", "1", "--plan",
+                             plan(text), "P/A #1", "P/B"});
+    EXPECT_EQ(ended.status, 1);
+    EXPECT_EQ(ended.err, "");
+    EXPECT_EQ(tally_of_json(json()), (Tally{2, 3, 0}));
+    EXPECT_EQ(tally_of_junit(junit()), (Tally{2, 3, 0}));
+    EXPECT_EQ(tally_of_tap(ended.out), (Tally{2, 3, 0}));
+    const Tap tap = parse_tap(ended.out);
+    EXPECT_EQ(tap.version, "14");
+    EXPECT_EQ(tap.points.at(0).name, "A #1");
+    EXPECT_EQ(tap.points.at(1).name, "B");
+    EXPECT_EQ(tap.points.at(1).inside.at(1).name, "Stubborn");
+    EXPECT_FALSE(tap.bail_out);
+    EXPECT_EQ(events("finish").at(0).at("finished"), true);
+    for (const Element &suite : parse_xml(junit()).all("testsuite")) {
+        EXPECT_EQ(suite.properties()["finished"], "true");
+    }
+}
+
+TEST_F(Run, WritesJsonToStandardOutputInPlaceOfTheView)
+{
+    const Ended ended =
+        run_fptest({"run", "--json", "-", "--plan", plan(group_of(kThreeThatNote)), "P/G"});
+    EXPECT_EQ(ended.status, 0);
+    EXPECT_EQ(tally_of_json(ended.out), (Tally{3, 0, 0}));
+}
+
+TEST_F(Run, IsATestForProve)
+{
+    support::write_file(kPlanFile, plan_of({{"G", {{"Item", kPasses}}},
+                                            {"Bad", {{"Other", "report Bad 100 1 x"}}}}));
+    Lines arguments = {"/usr/bin/prove", "--exec", "/system/bin/fptest run --tap", "P/G"};
+    Ended ended = run_program(arguments);
+    EXPECT_EQ(ended.status, 0) << ended.out;
+    EXPECT_THAT(ended.out, HasSubstr("All tests successful."));
+    EXPECT_THAT(ended.out, HasSubstr("Result: PASS"));
+    arguments.emplace_back("P/Bad");
+    ended = run_program(arguments);
+    EXPECT_EQ(ended.status, 1) << ended.out;
+    EXPECT_THAT(ended.out, HasSubstr("Failed test:  1"));
+    EXPECT_THAT(ended.out, HasSubstr("Files=2, Tests=2"));
+    EXPECT_THAT(ended.out, HasSubstr("Result: FAIL"));
+}
+
+struct Hostile {
+    std::string name;
+    std::string bytes;
+    std::string shown; // what must be in every report
+};
+
+const std::vector<Hostile> kHostile = {
+    {"ControlBytes",
+     "a\x01"
+     "b\x1b[2Jc\x7f",
+     "a␁b␛[2Jc␡"},
+    {"InvalidUtf8", "a\xff\xc3(\xed\xa0\x80z", ""},
+    {"EndOfCdata", "]]>", "]]>"},
+    {"TenThousandCharacters", std::string(10000, 'x'), std::string(10000, 'x')},
+    {"Markup", "<a b='c'>&amp;\"</a>", "<a b='c'>&amp;\"</a>"},
+    {"Tap", "# SKIP \\ x # TODO", "# SKIP \\ x # TODO"},
+    {"LinesOfTap", "one\nok 1 - faked\n1..7\nBail out!", "one\nok 1 - faked\n1..7\nBail out!"},
+};
+
+class HostileDescription : public Run, public ::testing::WithParamInterface<Hostile>
+{
+};
+
+TEST_P(HostileDescription, IsTheSameInEveryReport)
+{
+    const auto &[name, bytes, shown] = GetParam();
+    file("description", bytes);
+    const Ended ended = run_group({{"Item", "report-file G 100 1 /tmp/scene/description say '#' "
+                                            "complain-file /tmp/scene/description"}},
+                                  {"--tap", "--junit", work("junit")});
+    EXPECT_EQ(ended.status, 1);
+    EXPECT_EQ(ended.err, "");
+    EXPECT_EQ(tally_of_json(json()), (Tally{0, 1, 0}));
+    EXPECT_EQ(tally_of_junit(junit()), (Tally{0, 1, 0}));
+    EXPECT_EQ(tally_of_tap(ended.out), (Tally{0, 1, 0}));
+
+    const std::string in_json = description(0);
+    const Element test = parse_xml(junit()).children.at(0).all("testcase").at(0);
+    EXPECT_EQ(test.properties()["description"], in_json);
+    EXPECT_EQ(parse_tap(ended.out).points.at(0).inside.at(0).diagnosis.at("description"), in_json);
+    if (shown.empty()) {
+        EXPECT_THAT(in_json, StartsWith("a�"));
+        EXPECT_THAT(in_json, EndsWith("z"));
+    } else {
+        EXPECT_EQ(in_json, shown);
+    }
+    EXPECT_EQ(test.all("system-out").at(0).text, "#\n" + in_json + "\n");
+    EXPECT_EQ(output(0), "#\n" + in_json + "\n");
+}
+
+INSTANTIATE_TEST_SUITE_P(, HostileDescription, ::testing::ValuesIn(kHostile),
+                         [](const auto &hostile) { return hostile.param.name; });
+
+// --- what items print ------------------------------------------------------------------
+
+TEST_F(Run, KeepsWhatItemsPrintForTheReports)
+{
+    const Ended ended =
+        run_group({{"Item", "say out complain err report G 100 0 fine"}, {"Other", kPasses}},
+                  {"--junit", work("junit")});
+    EXPECT_EQ(ended.status, 0);
+    EXPECT_EQ(ended.err, "");
+    EXPECT_EQ(without_times(ended.out), work("plan.xml") + ": 2 items, vendor 0\n"
+                                                           "G/Item: passed, result 0, T s: fine\n"
+                                                           "G/Other: passed, result 0, T s: fine\n"
+                                                           "2 passed, 0 failed, T s\n");
+    EXPECT_EQ(output(0), "out\nerr\n");
+    EXPECT_EQ(output(1), "");
+    const auto tests = parse_xml(junit()).children.at(0).all("testcase");
+    EXPECT_EQ(tests.at(0).all("system-out").at(0).text, "out\nerr\n");
+    EXPECT_THAT(tests.at(1).all("system-out"), IsEmpty());
+}
+
+TEST_F(Run, KeepsApartWhatItemsPrintThoughItComesLate)
+{
+    FptestProcess fptest(with_group(
+        {{"Item", "say one note /tmp/scene/begun await /tmp/scene/go report G 100 0 x complain 1"},
+         {"Other", "say two report G 100 0 x"},
+         {"Third", "say three report G 100 0 x"},
+         {"Fourth", "say four note /tmp/scene/last await /tmp/scene/end report G 100 0 x"}},
+        {"--as-group"}));
+    ASSERT_TRUE(wait_for_file("begun"));
+    fptest.signal(SIGSTOP);
+    file("go", "");
+    ASSERT_TRUE(eventually([] { return running_items().empty(); }, 30));
+    fptest.signal(SIGCONT);
+    ASSERT_TRUE(wait_for_file("last"));
+    file("end", "");
+    EXPECT_EQ(fptest.wait().status, 0);
+    EXPECT_EQ(output(0), "one\n1\n");
+    EXPECT_EQ(output(1), "two\n");
+    EXPECT_EQ(output(2), "three\n");
+    EXPECT_EQ(output(3), "four\n");
+}
+
+TEST_F(Run, KeepsTheEndOfALongOutput)
+{
+    const Ended ended = run_group(
+        {{"Item", "flood 1000000 say 'the last line' report G 100 1 x"}, {"Other", "say short"}});
+    EXPECT_EQ(ended.status, 1);
+    EXPECT_THAT(output(0), EndsWith("\nthe last line\n"));
+    EXPECT_GE(output(0).size(), 10000U);
+    EXPECT_LE(output(0).size(), 65536U);
+    EXPECT_EQ(output(1), "short\n");
+}
+
+// The memory that a process holds in a file without a name, in bytes.
+long long memory_behind(const std::string &descriptor)
+{
+    struct stat status {
+    };
+    EXPECT_EQ(stat(descriptor.c_str(), &status), 0) << descriptor;
+    return status.st_blocks * 512LL;
+}
+
+TEST_F(Run, HoldsNoMoreOfAnOutputThanItTells)
+{
+    FptestProcess fptest(with_group(
+        {{"Item", "flood 60000000 say end note /tmp/scene/printed await /tmp/scene/go"}}));
+    ASSERT_TRUE(wait_for_file("printed"));
+    const std::string held = "/proc/" + std::to_string(fptest.module()) + "/fd/1";
+    EXPECT_TRUE(eventually([&] { return memory_behind(held) < 1000000; })) << memory_behind(held);
+    const std::string highest = device::status_field(fptest.pid(), "VmHWM");
+    EXPECT_LT(std::stol(highest), 50000) << highest;
+    file("go", "");
+    EXPECT_EQ(fptest.wait().status, 1);
+    EXPECT_THAT(output(0), EndsWith("end\n"));
+}
+
+TEST_F(Run, StartsItemsAsAnyProgramIsStarted)
+{
+    FptestProcess fptest(
+        with_group({{"Item", "note /tmp/scene/begun await /tmp/scene/go report G 100 0 x"}},
+                   {"--junit", work("junit")}));
+    ASSERT_TRUE(wait_for_file("begun"));
+    const pid_t item = processes_named("/system/bin/Item").at(0).pid;
+    EXPECT_EQ(std::stoull(device::status_field(item, "SigBlk"), nullptr, 16), 0U);
+    // the C library's own after the usual ones are the caller's
+    EXPECT_EQ(std::stoull(device::status_field(item, "SigIgn"), nullptr, 16) & 0x7fffffffU, 0U);
+    EXPECT_NE(getpgid(item), getpgid(fptest.pid())) << "Ctrl-C would reach it";
+    // of those that the library leaves open, and of nothing else
+    for (const auto &entry : fs::directory_iterator("/proc/" + std::to_string(item) + "/fd")) {
+        const std::string name = entry.path().filename();
+        const std::string target = fs::read_symlink(entry.path());
+        if (name == "0") {
+            EXPECT_EQ(target, "/dev/null");
+        } else if (name == "1" || name == "2") {
+            EXPECT_EQ(target, "/memfd:fptest-output (deleted)");
+        } else {
+            EXPECT_TRUE(target == kPlanFile || target == device::kLogFile ||
+                        target == std::string(kPlanFile) + " (deleted)")
+                << target;
+        }
+    }
+    file("go", "");
+    EXPECT_EQ(fptest.wait().status, 0);
+}
+
+// --- reports that cannot be written ----------------------------------------------------
+
+TEST_F(Run, RunsNothingWhereItsTapCannotBeWritten)
+{
+    Start start;
+    start.arguments = {"run", "--tap", "--plan", plan(group_of({{"Item", kPasses}})), "P/G"};
+    start.output = "/dev/full";
+    const Ended ended = run_fptest(start);
+    EXPECT_EQ(ended.status, 3);
+    EXPECT_EQ(ended.err, "fptest: the TAP output: No space left on device; nothing was run\n");
+}
+
+TEST_F(Run, GoesOnWithoutAReportThatCannotBeWrittenAnyMore)
+{
+    const std::string fifo = work("json");
+    ASSERT_EQ(mkfifo(fifo.c_str(), 0600), 0);
+    Descriptor reader(open(fifo.c_str(), O_RDONLY | O_NONBLOCK | O_CLOEXEC));
+    FptestProcess fptest(
+        with_group({{"Item", "note /tmp/scene/begun await /tmp/scene/go report G 100 0 x"},
+                    {"Other", kPasses}}));
+    ASSERT_TRUE(wait_for_file("begun"))
+        << fptest.out() << fptest.err() << read_file(device::kLogFile);
+    reader = Descriptor(-1);
+    file("go", "");
+    const Ended ended = fptest.wait();
+    EXPECT_EQ(ended.status, 3);
+    EXPECT_EQ(ended.err, "fptest: /tmp/scene/json: Broken pipe; the run went on without it\n");
+    EXPECT_THAT(ended.out, HasSubstr("\n2 passed, 0 failed, "));
+}
+
+} // namespace
