@@ -3,7 +3,7 @@
 
 #include "doubles.h"
 
-#include "module.h"
+#include "internals.h"
 #include "mxml_whitespace.h"
 #include "sockwrap.h"
 #include "sysparm.h"
@@ -126,7 +126,7 @@ Run::Run()
 
 Run::~Run()
 {
-    module::reset();
+    internals::reset();
     for (const int descriptor : state().descriptors) {
         ::close(descriptor);
     }

@@ -5,7 +5,7 @@
 // "VENDOR\0", then commands, each ended by a zero byte.
 #include "doubles.h"
 #include "input.h"
-#include "module.h"
+#include "internals.h"
 #include "quillmark.h"
 #include "runs.h"
 
@@ -37,8 +37,8 @@ template <std::size_t N> std::string_view bytes(const char (&array)[N])
 void check_fields(const std::vector<std::string> &fields, const Block &command)
 {
     fpTest_TestMsg_t message;
-    module::TestMsgInit(&message);
-    module::ParseCmdLine(command.data(), &message);
+    internals::TestMsgInit(&message);
+    internals::ParseCmdLine(command.data(), &message);
 
     const auto field = [&](std::size_t at) { return at < fields.size() ? fields[at] : ""; };
     require(bytes(message.testMsgHead) == filled(field(0), 32), "the head is not the first field");
@@ -101,7 +101,7 @@ class Entry
         require(!with_reply_ || reply.all() == expected_reply, "the reply is another one");
         require(doubles::plan() == expected_plan, "the stored plan is another one");
         require(doubles::started() == expected, "something else is started");
-        require(module::ping_mask() == (pinged_ ? 1 : 0), "the ping is counted otherwise");
+        require(internals::ping_mask == (pinged_ ? 1 : 0), "the ping is counted otherwise");
         require(doubles::left_open() == stored_, "descriptors: not one for each stored plan");
     }
 

@@ -6,7 +6,7 @@
 // report, and its progress. An empty group or item stands for the first one.
 #include "doubles.h"
 #include "input.h"
-#include "module.h"
+#include "internals.h"
 #include "plan.h"
 #include "quillmark.h"
 
@@ -55,7 +55,7 @@ void check_layout(const Plan &plan)
         const std::size_t depth = plan.contents[at].depth;
         const std::string tabs(std::min<std::size_t>(depth > 0 ? depth - 1 : 0, 8), '\t');
         const bool declaration = plan.contents[at].element.starts_with("?xml");
-        const char *text = module::whitespace_cb(plan.nodes[at], MXML_WS_BEFORE_OPEN);
+        const char *text = internals::whitespace_cb(plan.nodes[at], MXML_WS_BEFORE_OPEN);
         require(declaration ? text == nullptr : text != nullptr && text == tabs,
                 "a node is indented otherwise");
     }
@@ -67,8 +67,8 @@ void check_plain_group(const Plan &plan, std::size_t group, const char *name)
     for (std::size_t at = 0; at < items.size(); ++at) {
         const auto index = static_cast<int>(at);
         const std::string &item = *plan.contents[items[at]].attribute("name");
-        require(module::get_node_index(name, item.c_str(), 3) == index &&
-                    module::get_node_byIndex(g_TestCmdTree, name, index) == plan.nodes[items[at]],
+        require(internals::get_node_index(name, item.c_str(), 3) == index &&
+                    internals::get_node_byIndex(g_TestCmdTree, name, index) == plan.nodes[items[at]],
                 "index and name do not find the same item");
     }
 }
@@ -78,16 +78,16 @@ void check_lookups(const Plan &plan, const std::string &name,
 {
     const auto group = plan.group(name);
     const auto count = group ? static_cast<int>(plan.children(*group).size()) : -1;
-    require(module::get_node_length(name.c_str(), 2) == count, "the group's length is another");
+    require(internals::get_node_length(name.c_str(), 2) == count, "the group's length is another");
     for (const std::string &item : item_names) {
         const auto place = group ? plan.item(*group, item) : std::nullopt;
-        require(module::get_node_index(name.c_str(), item.c_str(), 3) ==
+        require(internals::get_node_index(name.c_str(), item.c_str(), 3) ==
                     (place ? static_cast<int>(plan.positions[*place]) : -1),
                 "the item's index is another");
     }
     for (const int index : {-1, 0, 1, count - 1, count, count + 1}) {
         const auto place = group ? plan.item_by_index(*group, index) : std::nullopt;
-        require(module::get_node_byIndex(g_TestCmdTree, name.c_str(), index) ==
+        require(internals::get_node_byIndex(g_TestCmdTree, name.c_str(), index) ==
                     (place ? plan.nodes[*place] : nullptr),
                 "the item at the index is another");
     }
@@ -143,9 +143,9 @@ Report report_from(const Plan &plan, const std::array<std::string, 5> &input)
 // As another process finds the file.
 bool is_loaded_as(const std::vector<Content> &contents)
 {
-    mxml_node_t *tree = module::load_configs_file(kPath);
+    mxml_node_t *tree = internals::load_configs_file(kPath);
     const bool same = tree != nullptr && Plan(tree).contents == contents;
-    module::reset();
+    internals::reset();
     return same;
 }
 
@@ -181,12 +181,12 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t *data, std::size_t size
     const auto input = texts<5>(data, size);
     doubles::write_plan(input[0]);
 
-    mxml_node_t *tree = module::load_configs_file(kPath);
+    mxml_node_t *tree = internals::load_configs_file(kPath);
     require(tree == g_TestCmdTree, "the loaded plan is not the one in use");
     require(doubles::left_open() == 0, "loading leaves a descriptor open");
     if (tree == nullptr) {
-        require(module::get_node_length("", 2) == -1, "a group of no plan has a length");
-        require(module::get_node_index("", "", 3) == -1, "an item of no plan has an index");
+        require(internals::get_node_length("", 2) == -1, "a group of no plan has a length");
+        require(internals::get_node_index("", "", 3) == -1, "an item of no plan has an index");
         return 0;
     }
     const Plan plan(tree);
@@ -209,7 +209,7 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t *data, std::size_t size
         report.expect_in(contents[*item]);
     } else {
         require(doubles::plan() == input[0], "a report of no item changes the file");
-        module::save_XmlFile(tree);
+        internals::save_XmlFile(tree);
     }
     require(g_TestCmdTree == tree && Plan(tree).contents == contents, "the report is another");
     require(doubles::left_open() == 0, "saving leaves a descriptor open");

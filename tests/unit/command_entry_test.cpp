@@ -19,7 +19,7 @@ using platform::plan_steps;
 namespace
 {
 
-class CommandEntry : public ModuleTest
+class CommandEntry : public LibraryTest
 {
   protected:
     static constexpr std::size_t kAfter = 8; // bytes that nobody may touch
@@ -45,7 +45,7 @@ class CommandEntry : public ModuleTest
     // A whole buffer after ExtractString with that length.
     static std::string extracted(std::string buffer, int length)
     {
-        module::ExtractString(buffer.data(), length);
+        internals::ExtractString(buffer.data(), length);
         return buffer;
     }
     static std::string zeros(std::size_t count)
@@ -122,7 +122,7 @@ class CommandEntry : public ModuleTest
     static void cache_plan(const std::string &text)
     {
         platform::write_plan(text);
-        ASSERT_GE(module::get_node_length("g", 2), 0);
+        ASSERT_GE(internals::get_node_length("g", 2), 0);
         ASSERT_NE(g_TestCmdTree, nullptr);
         events();
     }
@@ -217,7 +217,7 @@ TEST_F(CommandEntry, MessageHasThreeFieldsOfTheirSizesInOrder)
     static_assert(sizeof(fpTest_TestMsg_t) == 32 + 2049 + 1024);
 
     fpTest_TestMsg_t message = full_message();
-    module::TestMsgInit(&message);
+    internals::TestMsgInit(&message);
     EXPECT_EQ(head(message), zeros(32));
     EXPECT_EQ(name(message), zeros(2049));
     EXPECT_EQ(args(message), zeros(1024));
@@ -227,7 +227,7 @@ TEST_F(CommandEntry, MessageHasThreeFieldsOfTheirSizesInOrder)
 TEST_F(CommandEntry, FieldsAreSplitLoggedAndZeroFilled)
 {
     fpTest_TestMsg_t message = full_message();
-    module::ParseCmdLine("head::the name::the args", &message);
+    internals::ParseCmdLine("head::the name::the args", &message);
 
     EXPECT_EQ(head(message), field("head", 32));
     EXPECT_EQ(name(message), field("the name", 2049));
@@ -240,7 +240,7 @@ TEST_F(CommandEntry, AnyRunOfColonsSeparatesTwoFields)
     for (const char *command :
          {"h:n:a", "h::n::a", "h::::n:::a", ":h:n:a", "::h::n::a", "h::n::a:", ":::h:n::::a::"}) {
         fpTest_TestMsg_t message = full_message();
-        module::ParseCmdLine(command, &message);
+        internals::ParseCmdLine(command, &message);
         EXPECT_EQ(head(message), field("h", 32)) << command;
         EXPECT_EQ(name(message), field("n", 2049)) << command;
         EXPECT_EQ(args(message), field("a", 1024)) << command;
@@ -251,7 +251,7 @@ TEST_F(CommandEntry, AnyRunOfColonsSeparatesTwoFields)
 TEST_F(CommandEntry, NothingButColonsSeparates)
 {
     fpTest_TestMsg_t message = full_message();
-    module::ParseCmdLine(" h;\t/ : n,\n. : a|", &message);
+    internals::ParseCmdLine(" h;\t/ : n,\n. : a|", &message);
 
     EXPECT_EQ(head(message), field(" h;\t/ ", 32));
     EXPECT_EQ(name(message), field(" n,\n. ", 2049));
@@ -259,14 +259,14 @@ TEST_F(CommandEntry, NothingButColonsSeparates)
     EXPECT_EQ(events(), parsed(" h;\t/ ", " n,\n. ", " a|"));
 
     const std::string text = every_character_but(":");
-    module::ParseCmdLine((text + ":" + text + ":" + text).c_str(), &message);
+    internals::ParseCmdLine((text + ":" + text + ":" + text).c_str(), &message);
     EXPECT_EQ(events(), parsed(text, text, text));
 }
 
 TEST_F(CommandEntry, FourthAndLaterFieldsAreIgnored)
 {
     fpTest_TestMsg_t message = full_message();
-    module::ParseCmdLine("h::n::a::fourth::fifth", &message);
+    internals::ParseCmdLine("h::n::a::fourth::fifth", &message);
 
     EXPECT_EQ(head(message), field("h", 32));
     EXPECT_EQ(name(message), field("n", 2049));
@@ -277,15 +277,15 @@ TEST_F(CommandEntry, FourthAndLaterFieldsAreIgnored)
 TEST_F(CommandEntry, MissingFieldsStayEmpty)
 {
     fpTest_TestMsg_t message;
-    module::TestMsgInit(&message);
-    module::ParseCmdLine("h", &message);
+    internals::TestMsgInit(&message);
+    internals::ParseCmdLine("h", &message);
     EXPECT_EQ(head(message), field("h", 32));
     EXPECT_EQ(name(message), zeros(2049));
     EXPECT_EQ(args(message), zeros(1024));
     EXPECT_EQ(events(), parsed("h"));
 
-    module::TestMsgInit(&message);
-    module::ParseCmdLine("h::n", &message);
+    internals::TestMsgInit(&message);
+    internals::ParseCmdLine("h::n", &message);
     EXPECT_EQ(name(message), field("n", 2049));
     EXPECT_EQ(args(message), zeros(1024));
     EXPECT_EQ(events(), parsed("h", "n"));
@@ -306,7 +306,7 @@ TEST_F(CommandEntry, CommandThatCannotBeCopiedDoesNothing)
     plan_steps("strdup", {gives(0, ENOMEM)});
     EXPECT_EQ(reply_to("pingtest", 8), untouched(8));
     EXPECT_THAT(events(), IsEmpty());
-    EXPECT_EQ(module::ping_mask(), 0);
+    EXPECT_EQ(internals::ping_mask, 0);
 }
 
 TEST_F(CommandEntry, FieldsAreCutToTheirBoundsAndLoggedWhole)
@@ -320,7 +320,7 @@ TEST_F(CommandEntry, FieldsAreCutToTheirBoundsAndLoggedWhole)
         const std::string second(sizes.name, 'n');
         const std::string third(sizes.args, 'a');
         fpTest_TestMsg_t message = full_message();
-        module::ParseCmdLine((first + "::" + second + "::" + third).c_str(), &message);
+        internals::ParseCmdLine((first + "::" + second + "::" + third).c_str(), &message);
 
         EXPECT_EQ(head(message), field(first.substr(0, 31), 32));
         EXPECT_EQ(name(message), field(second.substr(0, 2048), 2049));
@@ -345,7 +345,7 @@ TEST_F(CommandEntry, FirstPingIsAnswered)
 {
     EXPECT_EQ(reply_to("pingtest", 64), filled("Ping Success!", 64));
 
-    EXPECT_EQ(module::ping_mask(), 1);
+    EXPECT_EQ(internals::ping_mask, 1);
     EXPECT_EQ(events(), joined({parsed("pingtest"), {kPing}}));
     EXPECT_THAT(left_open(), IsEmpty());
 }
@@ -357,7 +357,7 @@ TEST_F(CommandEntry, LaterPingsAreNotAnswered)
     for (int again = 0; again < 3; ++again) {
         EXPECT_EQ(reply_to("pingtest", 64), untouched(64));
         EXPECT_EQ(events(), parsed("pingtest"));
-        EXPECT_EQ(module::ping_mask(), 1);
+        EXPECT_EQ(internals::ping_mask, 1);
     }
 }
 
@@ -365,7 +365,7 @@ TEST_F(CommandEntry, FirstPingWithoutAReplyBufferStillUsesUpThePing)
 {
     EXPECT_EQ(FPTEST_RunTestCmd("pingtest", nullptr, 64), 0);
     EXPECT_EQ(events(), joined({parsed("pingtest"), {kPing}}));
-    EXPECT_EQ(module::ping_mask(), 1);
+    EXPECT_EQ(internals::ping_mask, 1);
 
     EXPECT_EQ(reply_to("pingtest", 64), untouched(64));
     EXPECT_EQ(events(), parsed("pingtest"));
@@ -375,7 +375,7 @@ TEST_F(CommandEntry, PingReplyIsCutToTheBufferAndZeroFilled)
 {
     const std::string text = "Ping Success!";
     for (const int length : {1, 2, 5, 12, 13, 14, 15, 100}) {
-        module::reset();
+        internals::reset();
         const auto kept = std::min(text.size(), static_cast<std::size_t>(length) - 1);
         EXPECT_EQ(reply_to("pingtest", length), filled(text.substr(0, kept), length)) << length;
     }
@@ -407,14 +407,14 @@ TEST_F(CommandEntry, OtherCommandsNeitherUseUpThePingNorNeedIt)
     reply_to("XMLFile::<P/>", 16);
     reply_to("XMLNodePath::r", 16);
     reply_to("unknown", 16);
-    EXPECT_EQ(module::ping_mask(), 0);
+    EXPECT_EQ(internals::ping_mask, 0);
     EXPECT_EQ(reply_to("pingtest", 16), filled("Ping Success!", 16));
     events();
 
     reply_to("XMLFile::<Q/>", 16);
     EXPECT_EQ(platform::plan_text(), "<Q/>");
     EXPECT_EQ(reply_to("XMLNodePath::r", 16), filled("", 16));
-    EXPECT_EQ(module::ping_mask(), 1);
+    EXPECT_EQ(internals::ping_mask, 1);
 }
 
 // --- unknown heads -------------------------------------------------------
@@ -431,7 +431,7 @@ TEST_F(CommandEntry, UnknownHeadDoesNothing)
         EXPECT_EQ(reply_to(text + "::name::args", 16), untouched(16)) << text;
         EXPECT_EQ(events(), parsed(text, "name", "args"));
     }
-    EXPECT_EQ(module::ping_mask(), 0);
+    EXPECT_EQ(internals::ping_mask, 0);
     EXPECT_EQ(g_TestCmdTree, tree);
     EXPECT_EQ(platform::plan_text(), kOnePlan);
 }
@@ -559,9 +559,9 @@ TEST_F(CommandEntry, StoringDeletesTheCachedTreeOnceBetweenOpenAndWrite)
 TEST_F(CommandEntry, LookupAfterAStoreSeesTheNewPlan)
 {
     cache_plan(kOnePlan);
-    EXPECT_EQ(module::get_node_length("g", 2), 1);
+    EXPECT_EQ(internals::get_node_length("g", 2), 1);
     run_quietly(std::string("XMLFile::") + kOtherPlan);
-    EXPECT_EQ(module::get_node_length("g", 2), 0);
+    EXPECT_EQ(internals::get_node_length("g", 2), 0);
 }
 
 TEST_F(CommandEntry, StoringTakesDescriptorZero)
@@ -591,7 +591,7 @@ TEST_F(CommandEntry, StoringThatCannotOpenLosesTheFileAndKeepsTheCache)
     EXPECT_FALSE(platform::plan_exists());
     EXPECT_EQ(deletion.count, 0);
     ASSERT_EQ(g_TestCmdTree, tree);
-    EXPECT_EQ(module::get_node_index("g", "a", 3), 0);
+    EXPECT_EQ(internals::get_node_index("g", "a", 3), 0);
     EXPECT_THAT(left_open(), IsEmpty());
     run_quietly("XMLFile::<P/>");
     EXPECT_EQ(g_TestCmdTree, nullptr);
@@ -649,13 +649,13 @@ TEST_F(CommandEntry, FailedRemovalIsIgnoredAndTheFileIsNotTruncated)
 TEST_F(CommandEntry, StoringReportsItsFailuresToItsCaller)
 {
     plan_steps("open", {gives(-1, EACCES)});
-    EXPECT_EQ(module::saveRecvFile("/data/vorlane/other.xml", "<P/>", 4), -1);
+    EXPECT_EQ(internals::saveRecvFile("/data/vorlane/other.xml", "<P/>", 4), -1);
     EXPECT_EQ(events(),
               (Lines{"remove(/data/vorlane/other.xml) = -1",
                      "open(/data/vorlane/other.xml, O_RDWR|O_CREAT, 0666) = -1", kOpenFailed}));
 
     plan_steps("write", {gives(-1, EIO)});
-    EXPECT_EQ(module::saveRecvFile("/data/vorlane/other.xml", "<P/>", 2), -1);
+    EXPECT_EQ(internals::saveRecvFile("/data/vorlane/other.xml", "<P/>", 2), -1);
     EXPECT_EQ(events(), (Lines{"remove(/data/vorlane/other.xml) = -1",
                                "open(/data/vorlane/other.xml, O_RDWR|O_CREAT, 0666) = plan#1",
                                "write(plan#1, \"<P\", 2) = -1", kWriteFailed}));

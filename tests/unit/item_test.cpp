@@ -37,21 +37,21 @@ std::string item(const std::string &name, const std::string &args = "-t 5")
     return "<Cmd name=\"" + name + "\" args=\"" + args + "\"/>";
 }
 
-class Item : public ModuleTest
+class Item : public LibraryTest
 {
   protected:
     // Loads a plan whose group "g" has those children.
     static void load(const std::string &children)
     {
-        module::reset();
+        internals::reset();
         platform::write_plan("<?xml version=\"1.0\"?><P><CmdGroup name=\"g\">" + children +
                              "</CmdGroup></P>");
-        ASSERT_NE(module::load_configs_file("/data/vorlane/src1.xml"), nullptr);
+        ASSERT_NE(internals::load_configs_file("/data/vorlane/src1.xml"), nullptr);
         events();
     }
     static Lines run(int index = 0)
     {
-        module::SingleItemExecute(g_TestCmdTree, "g", index);
+        internals::SingleItemExecute(g_TestCmdTree, "g", index);
         return events();
     }
     static Lines run_item(const std::string &name, const std::string &args = "-t 5")
@@ -72,7 +72,7 @@ class Item : public ModuleTest
     {
         load(item(name, args));
         plan_steps("vfork", {gives(0)});
-        platform::run_child([] { module::SingleItemExecute(g_TestCmdTree, "g", 0); });
+        platform::run_child([] { internals::SingleItemExecute(g_TestCmdTree, "g", 0); });
         return events();
     }
 
@@ -173,11 +173,11 @@ class Item : public ModuleTest
     // All 65 bytes of the name of the item last started.
     static std::string command_name()
     {
-        return {module::command_name(), module::command_name_size};
+        return {internals::command_name, sizeof internals::command_name};
     }
     static std::string padded(std::string name)
     {
-        name.resize(module::command_name_size);
+        name.resize(sizeof internals::command_name);
         return name;
     }
 };
@@ -187,7 +187,7 @@ class Item : public ModuleTest
 TEST_F(Item, NullTreeStillReadsAndPrintsTheVendor)
 {
     set_vendor("2");
-    module::SingleItemExecute(nullptr, "g", 0);
+    internals::SingleItemExecute(nullptr, "g", 0);
 
     EXPECT_THAT(events(),
                 ElementsAreArray(joined({begun("2"),
@@ -195,7 +195,7 @@ TEST_F(Item, NullTreeStillReadsAndPrintsTheVendor)
                                           "get_node_byIndex| get_node_byIndex[]:load config file "
                                           "failed\n"},
                                          no_item()})));
-    EXPECT_EQ(module::vendor(), 2);
+    EXPECT_EQ(internals::vendor, 2);
     EXPECT_EQ(command_name(), padded(""));
 }
 
@@ -232,7 +232,7 @@ TEST_F(Item, VendorIsTheDecimalNumberThatTheTextBeginsWith)
         load("");
 
         EXPECT_THAT(run(), ElementsAreArray(not_found(std::to_string(number))));
-        EXPECT_EQ(module::vendor(), number);
+        EXPECT_EQ(internals::vendor, number);
     }
 }
 
@@ -256,7 +256,7 @@ TEST_F(Item, VendorBeyondThirtyTwoBitsIsCutWhereLongHoldsIt)
 
         const int expected = cut ? number : clamped;
         EXPECT_THAT(run(), ElementsAreArray(not_found(std::to_string(expected))));
-        EXPECT_EQ(module::vendor(), expected);
+        EXPECT_EQ(internals::vendor, expected);
     }
     if (cut) {
         EXPECT_THAT(run_item_under("4294967297", "x"),
@@ -269,11 +269,11 @@ TEST_F(Item, MissingVendorCountsAsZero)
     load(item("x"));
     set_vendor("1");
     run();
-    EXPECT_EQ(module::vendor(), 1);
+    EXPECT_EQ(internals::vendor, 1);
 
     platform::reset();
     EXPECT_THAT(run(), ElementsAreArray(ordinary_run("x", "/system/bin/x -t 5")));
-    EXPECT_EQ(module::vendor(), 0);
+    EXPECT_EQ(internals::vendor, 0);
 }
 
 TEST_F(Item, VendorIsReadAfreshForEveryItem)
@@ -290,7 +290,7 @@ TEST_F(Item, VendorIsReadAfreshForEveryItem)
 TEST_F(Item, UnknownGroupStartsNothing)
 {
     load(item("x"));
-    module::SingleItemExecute(g_TestCmdTree, "h", 0);
+    internals::SingleItemExecute(g_TestCmdTree, "h", 0);
 
     EXPECT_THAT(events(),
                 ElementsAreArray(joined({begun(),
@@ -323,7 +323,7 @@ TEST_F(Item, NodeWithoutANameStartsNothingAndKeepsTheLastItem)
                          "<Cmd/></CmdGroup></P>");
     mxmlDelete(g_TestCmdTree);
     g_TestCmdTree = nullptr;
-    ASSERT_NE(module::load_configs_file("/data/vorlane/src1.xml"), nullptr);
+    ASSERT_NE(internals::load_configs_file("/data/vorlane/src1.xml"), nullptr);
     events();
     EXPECT_THAT(run(1), ElementsAreArray(nameless("(null)", "(null)")));
     EXPECT_THAT(run(2), ElementsAreArray(nameless("(null)", "(null)")));
@@ -398,8 +398,8 @@ TEST_F(Item, NameIsRecordedBetweenItsLineAndThePresenceCheck)
     load(item("before") + item("x"));
     run(0);
     Lines seen;
-    platform::on_log([&seen](const std::string &) { seen.push_back(module::command_name()); });
-    platform::on_system([&seen](const std::string &) { seen.push_back(module::command_name()); });
+    platform::on_log([&seen](const std::string &) { seen.push_back(internals::command_name); });
+    platform::on_system([&seen](const std::string &) { seen.push_back(internals::command_name); });
     run(1);
     // enter, the lookup's three, the name; the query's two, the command, its run, leave
     EXPECT_THAT(seen, ElementsAre("before", "before", "before", "before", "before", "x", "x", "x",
@@ -452,7 +452,7 @@ TEST_F(Item, NameIsCutAtItsBufferAndTheSuffixStaysWithinIt)
 TEST_F(Item, PresenceIsOneWhenTheQueryPrintsALine)
 {
     plan_output({kRunning + "root 4712 /system/bin/SensorProbe_ca\n"});
-    EXPECT_EQ(module::ResourceReduce(), 1);
+    EXPECT_EQ(internals::ResourceReduce(), 1);
     EXPECT_THAT(events(), ElementsAreArray(present(kRunning)));
     EXPECT_THAT(left_open(), IsEmpty());
 }
@@ -463,14 +463,14 @@ TEST_F(Item, PresenceIsOneWhateverTheLineSays)
         SCOPED_TRACE(line);
         platform::reset();
         plan_output({line});
-        EXPECT_EQ(module::ResourceReduce(), 1);
+        EXPECT_EQ(internals::ResourceReduce(), 1);
         EXPECT_THAT(events(), ElementsAreArray(present(line)));
     }
 }
 
 TEST_F(Item, PresenceIsZeroWhenTheQueryPrintsNothing)
 {
-    EXPECT_EQ(module::ResourceReduce(), 0);
+    EXPECT_EQ(internals::ResourceReduce(), 0);
     EXPECT_THAT(events(), ElementsAreArray(absent()));
     EXPECT_THAT(left_open(), IsEmpty());
 }
@@ -478,7 +478,7 @@ TEST_F(Item, PresenceIsZeroWhenTheQueryPrintsNothing)
 TEST_F(Item, PresenceIsMinusOneWhenTheQueryCannotBeStarted)
 {
     plan_steps("popen", {gives(0, EMFILE)});
-    EXPECT_EQ(module::ResourceReduce(), -1);
+    EXPECT_EQ(internals::ResourceReduce(), -1);
     EXPECT_THAT(events(), ElementsAreArray(unanswered()));
 }
 
@@ -489,7 +489,7 @@ TEST_F(Item, PresenceLineIsReadUpToOneHundredTwentyEightCharacters)
         platform::reset();
         const std::string line = std::string(length, 'p') + "\n";
         plan_output({line});
-        EXPECT_EQ(module::ResourceReduce(), 1);
+        EXPECT_EQ(internals::ResourceReduce(), 1);
         EXPECT_THAT(events(), ElementsAreArray(present(line.substr(0, 128))));
     }
 }
@@ -498,8 +498,8 @@ TEST_F(Item, StatusOfTheQueryIsIgnored)
 {
     plan_steps("pclose", {gives(-1, ECHILD), gives(256)});
     plan_output({kRunning, ""});
-    EXPECT_EQ(module::ResourceReduce(), 1);
-    EXPECT_EQ(module::ResourceReduce(), 0);
+    EXPECT_EQ(internals::ResourceReduce(), 1);
+    EXPECT_EQ(internals::ResourceReduce(), 0);
 }
 
 // --- ordinary items --------------------------------------------------------

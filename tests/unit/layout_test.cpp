@@ -9,7 +9,7 @@
 namespace
 {
 
-class LayoutTest : public ModuleTest
+class LayoutTest : public LibraryTest
 {
 };
 
@@ -21,10 +21,10 @@ TEST_F(LayoutTest, TextIsLaidOutAsAnElementInItsPlace)
     mxml_node_t *text = mxmlNewText(group, 0, "?xml");
     ASSERT_EQ(mxmlGetElement(text), nullptr);
 
-    EXPECT_STREQ(module::whitespace_cb(text, MXML_WS_BEFORE_OPEN), "\t");
-    EXPECT_STREQ(module::whitespace_cb(text, MXML_WS_AFTER_OPEN), "\n");
-    EXPECT_EQ(module::whitespace_cb(text, MXML_WS_BEFORE_CLOSE), nullptr);
-    EXPECT_STREQ(module::whitespace_cb(text, MXML_WS_AFTER_CLOSE), "\n");
+    EXPECT_STREQ(internals::whitespace_cb(text, MXML_WS_BEFORE_OPEN), "\t");
+    EXPECT_STREQ(internals::whitespace_cb(text, MXML_WS_AFTER_OPEN), "\n");
+    EXPECT_EQ(internals::whitespace_cb(text, MXML_WS_BEFORE_CLOSE), nullptr);
+    EXPECT_STREQ(internals::whitespace_cb(text, MXML_WS_AFTER_CLOSE), "\n");
 }
 
 } // namespace

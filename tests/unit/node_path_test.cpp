@@ -17,7 +17,7 @@ using sequences::load;
 namespace
 {
 
-class NodePath : public ModuleTest
+class NodePath : public LibraryTest
 {
   protected:
     // --- what the events of a command are made of ---
@@ -130,7 +130,7 @@ class NodePath : public ModuleTest
     static Lines run(const std::string &path)
     {
         std::string given = path;
-        module::ItemsTest(given.data(), nullptr);
+        internals::ItemsTest(given.data(), nullptr);
         return events();
     }
 
@@ -139,7 +139,7 @@ class NodePath : public ModuleTest
     {
         std::string given = path;
         last = std::string(65, 'x');
-        const int level = module::get_node_level(given.c_str(), last.data(), 64);
+        const int level = internals::get_node_level(given.c_str(), last.data(), 64);
         EXPECT_EQ(given, path);
         EXPECT_EQ(last.back(), 'x');
         last.pop_back();
@@ -217,7 +217,7 @@ TEST_F(NodePath, PathWithoutASlashStandsForItselfUntilItsLastComponentIsCopied)
     std::string last(65, 'x');
     Lines seen;
     platform::on_log([&](const std::string & /*event*/) { seen.push_back(last); });
-    module::get_node_level(path.c_str(), last.data(), 64);
+    internals::get_node_level(path.c_str(), last.data(), 64);
 
     const std::string cut = filled(path.substr(0, 63), 64) + "x";
     EXPECT_THAT(seen, ElementsAre(cut, cut));
@@ -268,7 +268,7 @@ TEST_F(NodePath, ComponentsAreSplitInPlaceLoggedAndZeroFilled)
     std::string path = "//r r/g g///i i/x/y";
     std::string group(65, 'x');
     std::string item(65, 'x');
-    module::get_node_name(path.data(), group.data(), 64, item.data(), 64);
+    internals::get_node_name(path.data(), group.data(), 64, item.data(), 64);
 
     EXPECT_EQ(group, filled("g g", 64) + "x");
     EXPECT_EQ(item, filled("i i", 64) + "x");
@@ -282,12 +282,12 @@ TEST_F(NodePath, NothingButSlashesSeparates)
     const std::string name = every_character_but("/");
     std::string path = name + "/" + name + "/" + name;
     std::string last(64, 'x');
-    EXPECT_EQ(module::get_node_level(path.c_str(), last.data(), 64), 3);
+    EXPECT_EQ(internals::get_node_level(path.c_str(), last.data(), 64), 3);
     events();
 
     std::string group(64, 'x');
     std::string item(64, 'x');
-    module::get_node_name(path.data(), group.data(), 64, item.data(), 64);
+    internals::get_node_name(path.data(), group.data(), 64, item.data(), 64);
     EXPECT_EQ(events(), split(name, name, name));
 }
 
@@ -306,7 +306,7 @@ TEST_F(NodePath, MissingComponentLeavesItsBufferAsItWas)
         std::string path = text;
         std::string group = filled("old group", 64);
         std::string item = filled("old item", 64);
-        module::get_node_name(path.data(), group.data(), 64, item.data(), 64);
+        internals::get_node_name(path.data(), group.data(), 64, item.data(), 64);
         EXPECT_EQ(group, filled(expected, 64)) << text;
         EXPECT_EQ(item, filled("old item", 64)) << text;
         EXPECT_EQ(events(), lines) << text;
@@ -321,7 +321,7 @@ TEST_F(NodePath, GroupAndItemNamesAreCutTo63CharactersAndLoggedWhole)
         std::string path = "r/" + group_name + "/" + item_name;
         std::string group(65, 'x');
         std::string item(65, 'x');
-        module::get_node_name(path.data(), group.data(), 64, item.data(), 64);
+        internals::get_node_name(path.data(), group.data(), 64, item.data(), 64);
 
         EXPECT_EQ(group, filled(group_name.substr(0, 63), 64) + "x");
         EXPECT_EQ(item, filled(item_name.substr(0, 63), 64) + "x");
@@ -338,14 +338,14 @@ TEST_F(NodePath, GroupRunsEveryItemInDocumentOrder)
 
     EXPECT_EQ(events(), joined({parsed("P/g"), levelled("P/g", 2, "g"), split("P", "g"),
                                 asked_length(load(), "node length = 3!"), group_g_ran()}));
-    EXPECT_STREQ(module::command_name(), "c");
+    EXPECT_STREQ(internals::command_name, "c");
     EXPECT_THAT(left_open(), IsEmpty());
 }
 
 TEST_F(NodePath, SlashesAroundAndBetweenTheComponentsDoNotMatter)
 {
     for (const char *path : {"P/g/", "P//g", "/P/g", "///P///g///"}) {
-        module::reset();
+        internals::reset();
         platform::reset();
         platform::write_plan(kPlan);
         EXPECT_EQ(run(path), joined({levelled(path, 2, "g"), split("P", "g"),
@@ -358,7 +358,7 @@ TEST_F(NodePath, AnyRootIsAccepted)
     const std::string long_root(500, 'r');
     for (const std::string &root :
          {std::string("Q"), std::string("g"), std::string(" "), long_root}) {
-        module::reset();
+        internals::reset();
         platform::reset();
         platform::write_plan(kPlan);
         const std::string path = root + "/g";
@@ -460,7 +460,7 @@ TEST_F(NodePath, ItemIsRunAlone)
 
     EXPECT_EQ(events(), joined({parsed("P/g/b"), levelled("P/g/b", 3, "b"), split("P", "g", "b"),
                                 asked_index(load()), ran("b", "2 3")}));
-    EXPECT_STREQ(module::command_name(), "b");
+    EXPECT_STREQ(internals::command_name, "b");
 }
 
 TEST_F(NodePath, FirstAndLastItemAreRunByTheirNames)
@@ -500,7 +500,7 @@ TEST_F(NodePath, ItemThatThePlanLacksStillGetsARunThatFails)
     platform::write_plan(kPlan);
     EXPECT_EQ(run("P/g/x"), joined({levelled("P/g/x", 3, "x"), split("P", "g", "x"),
                                     asked_index(load(), kNotFound), run_failed(past_the_end())}));
-    EXPECT_STREQ(module::command_name(), "");
+    EXPECT_STREQ(internals::command_name, "");
 }
 
 TEST_F(NodePath, ItemOfAGroupThatThePlanLacksStillGetsARunThatFails)
@@ -593,7 +593,7 @@ TEST_F(NodePath, ResultBufferStaysAsItIs)
     for (const char *path : {"P", "P/g", "P/g/a", "P/x", "P/g/x", "/"}) {
         std::string given = path;
         std::string result(1025, 'x');
-        module::ItemsTest(given.data(), result.data());
+        internals::ItemsTest(given.data(), result.data());
         EXPECT_EQ(result, std::string(1025, 'x')) << path;
     }
 }

@@ -21,7 +21,7 @@ using platform::write_plan;
 namespace
 {
 
-class PlanStore : public ModuleTest
+class PlanStore : public LibraryTest
 {
   protected:
     static constexpr char kPath[] = "/data/vorlane/src1.xml";
@@ -85,9 +85,9 @@ class PlanStore : public ModuleTest
     // The tree of a plan, loaded anew; its events are forgotten.
     static mxml_node_t *load(const std::string &text)
     {
-        module::reset();
+        internals::reset();
         write_plan(text);
-        mxml_node_t *tree = module::load_configs_file(kPath);
+        mxml_node_t *tree = internals::load_configs_file(kPath);
         EXPECT_NE(tree, nullptr) << text;
         events();
         return tree;
@@ -95,24 +95,24 @@ class PlanStore : public ModuleTest
     // The bytes that the file has after a plan was loaded and saved.
     static std::string saved(const std::string &text)
     {
-        module::save_XmlFile(load(text));
+        internals::save_XmlFile(load(text));
         events();
         return plan_text();
     }
     static int index_of(const char *group, const char *item)
     {
-        return module::get_node_index(group, item, 3);
+        return internals::get_node_index(group, item, 3);
     }
     static int length_of(const char *group)
     {
-        return module::get_node_length(group, 2);
+        return internals::get_node_length(group, 2);
     }
     // The name of the item at a position, as the lookup hands it out. Forgets
     // what happened before.
     static std::string item_at(const char *group, int index)
     {
         events();
-        mxml_node_t *node = module::get_node_byIndex(g_TestCmdTree, group, index);
+        mxml_node_t *node = internals::get_node_byIndex(g_TestCmdTree, group, index);
         const Lines seen = events();
         if (node == nullptr) {
             EXPECT_EQ(seen, item_lines("(null)"));
@@ -199,7 +199,7 @@ TEST_F(PlanStore, NothingIsLoadedAtFirst)
 TEST_F(PlanStore, LoadingOpensParsesAndCloses)
 {
     write_plan(kPlan);
-    mxml_node_t *tree = module::load_configs_file(kPath);
+    mxml_node_t *tree = internals::load_configs_file(kPath);
 
     EXPECT_EQ(events(), sequences::load());
     EXPECT_THAT(left_open(), IsEmpty());
@@ -216,8 +216,8 @@ TEST_F(PlanStore, CachedTreeIsReturnedWithoutALookAtTheFile)
 {
     mxml_node_t *tree = load(kPlan);
     write_plan("<P/>");
-    EXPECT_EQ(module::load_configs_file(kPath), tree);
-    EXPECT_EQ(module::load_configs_file("/data/vorlane/other.xml"), tree);
+    EXPECT_EQ(internals::load_configs_file(kPath), tree);
+    EXPECT_EQ(internals::load_configs_file("/data/vorlane/other.xml"), tree);
     EXPECT_THAT(events(), IsEmpty());
 }
 
@@ -234,19 +234,19 @@ TEST_F(PlanStore, PlanChangedOnDiskIsNotSeenWhileATreeIsCached)
 TEST_F(PlanStore, MissingFileIsLoggedAndLookedForAgain)
 {
     for (int attempt = 0; attempt < 3; ++attempt) {
-        EXPECT_EQ(module::load_configs_file(kPath), nullptr);
+        EXPECT_EQ(internals::load_configs_file(kPath), nullptr);
         EXPECT_EQ(events(), not_opened());
         EXPECT_EQ(g_TestCmdTree, nullptr);
     }
     write_plan(kPlan);
-    EXPECT_NE(module::load_configs_file(kPath), nullptr);
+    EXPECT_NE(internals::load_configs_file(kPath), nullptr);
     EXPECT_EQ(events(), sequences::load());
 }
 
 TEST_F(PlanStore, FileThatCannotBeOpenedIsLoggedWithItsPathAndItsError)
 {
     plan_steps("open", {gives(-1, EACCES)});
-    EXPECT_EQ(module::load_configs_file("/data/vorlane/other.xml"), nullptr);
+    EXPECT_EQ(internals::load_configs_file("/data/vorlane/other.xml"), nullptr);
     EXPECT_EQ(events(),
               (Lines{"mxmlSetLoneWhitespaceOff(1)", "open(/data/vorlane/other.xml, O_RDONLY) = -1",
                      "load_configs_file| Open /data/vorlane/other.xml file failed(13),"
@@ -258,13 +258,13 @@ TEST_F(PlanStore, LoadingTakesDescriptorZeroForAFailureAndLeavesItOpen)
     write_plan(kPlan);
     platform::free_descriptor_zero();
     errno = EPERM;
-    EXPECT_EQ(module::load_configs_file(kPath), nullptr);
+    EXPECT_EQ(internals::load_configs_file(kPath), nullptr);
 
     EXPECT_EQ(events(), not_opened("plan#1", "(1),Operation not permitted"));
     EXPECT_EQ(g_TestCmdTree, nullptr);
     EXPECT_THAT(left_open(), ElementsAre("plan#1"));
 
-    EXPECT_NE(module::load_configs_file(kPath), nullptr); // 0 is taken now
+    EXPECT_NE(internals::load_configs_file(kPath), nullptr); // 0 is taken now
     EXPECT_EQ(events(), sequences::load("plan#2"));
     EXPECT_THAT(left_open(), ElementsAre("plan#1"));
 }
@@ -273,7 +273,7 @@ TEST_F(PlanStore, LoadingTakesDescriptorOneForASuccess)
 {
     write_plan(kPlan);
     const mxml_node_t *tree = nullptr;
-    with_descriptor_one_free([&] { tree = module::load_configs_file(kPath); });
+    with_descriptor_one_free([&] { tree = internals::load_configs_file(kPath); });
     EXPECT_EQ(events(), sequences::load());
     EXPECT_NE(tree, nullptr);
 }
@@ -284,7 +284,7 @@ TEST_F(PlanStore, PlanThatDoesNotParseLeavesTheCacheEmptyWithoutALine)
                              "<P><Cmd name/></P>", "\n<P/>"}) {
         platform::reset();
         write_plan(text);
-        EXPECT_EQ(module::load_configs_file(kPath), nullptr) << text;
+        EXPECT_EQ(internals::load_configs_file(kPath), nullptr) << text;
         EXPECT_EQ(events(), sequences::load()) << text;
         EXPECT_EQ(g_TestCmdTree, nullptr);
         EXPECT_THAT(left_open(), IsEmpty());
@@ -307,7 +307,7 @@ TEST_F(PlanStore, WordOfAnyOneVisibleCharacterIsANode)
         }
     }
     write_plan("<P><CmdGroup name='g'>" + words + " </CmdGroup></P>");
-    EXPECT_EQ(module::get_node_length("g", 2), count);
+    EXPECT_EQ(internals::get_node_length("g", 2), count);
 }
 
 // A tree in which Mini-XML has left out what it had no memory for. The library
@@ -321,12 +321,12 @@ TEST_F(PlanStore, PlanThatIsNotWholeIsAsOneThatDoesNotParse)
         platform::on_load([place](mxml_node_t *tree) {
             mxmlAdd(tree, place, MXML_ADD_TO_PARENT, mxmlNewCustom(nullptr, nullptr, nullptr));
         });
-        EXPECT_EQ(module::load_configs_file(kPath), nullptr);
+        EXPECT_EQ(internals::load_configs_file(kPath), nullptr);
         EXPECT_EQ(events(), sequences::load());
         EXPECT_EQ(g_TestCmdTree, nullptr);
     }
     platform::on_load(nullptr);
-    EXPECT_NE(module::load_configs_file(kPath), nullptr);
+    EXPECT_NE(internals::load_configs_file(kPath), nullptr);
 }
 
 TEST_F(PlanStore, PlanThatDoesNotParseFailsTheLookupsAndIsTriedAgain)
@@ -348,12 +348,12 @@ TEST_F(PlanStore, LookupsWithoutAFileFailUntilOneIsStored)
     EXPECT_EQ(events(), index_lines(not_opened(), kCouldNotLoad));
     EXPECT_EQ(length_of("g"), -1);
     EXPECT_EQ(events(), length_failure(not_opened(), kCouldNotLoad));
-    EXPECT_EQ(module::get_node_byIndex(g_TestCmdTree, "g", 0), nullptr);
+    EXPECT_EQ(internals::get_node_byIndex(g_TestCmdTree, "g", 0), nullptr);
     EXPECT_EQ(events(), item_failure(kCouldNotLoad));
     EXPECT_EQ(g_TestCmdTree, nullptr);
 
     run_quietly(std::string("XMLFile::") + kPlan);
-    EXPECT_EQ(module::get_node_byIndex(g_TestCmdTree, "g", 0), nullptr);
+    EXPECT_EQ(internals::get_node_byIndex(g_TestCmdTree, "g", 0), nullptr);
     EXPECT_EQ(events(), item_failure(kCouldNotLoad)); // loads nothing itself
     EXPECT_EQ(index_of("g", "b"), 1);
     EXPECT_EQ(events(),
@@ -460,11 +460,11 @@ TEST_F(PlanStore, LaidOutPlanCountsLikeABareOne)
 TEST_F(PlanStore, PositionIsTheNumberOfEarlierSiblings)
 {
     mxml_node_t *tree = load("<P><A/><!-- c -->word<B/></P>");
-    EXPECT_EQ(module::node_position(tree), 0);
+    EXPECT_EQ(internals::node_position(tree), 0);
     int position = 0;
     for (mxml_node_t *child = mxmlGetFirstChild(tree); child != nullptr;
          child = mxmlGetNextSibling(child)) {
-        EXPECT_EQ(module::node_position(child), position++);
+        EXPECT_EQ(internals::node_position(child), position++);
     }
     EXPECT_EQ(position, 4);
     EXPECT_THAT(events(), IsEmpty());
@@ -485,7 +485,7 @@ TEST_F(PlanStore, IndexDoesNotDependOnTheLevel)
 {
     load(kPlan);
     for (const int level : {3, 0, -1, 2}) {
-        EXPECT_EQ(module::get_node_index("g", "b", level), 1);
+        EXPECT_EQ(internals::get_node_index("g", "b", level), 1);
         EXPECT_EQ(events(), index_lines({}));
     }
 }
@@ -551,7 +551,7 @@ TEST_F(PlanStore, OnlyCmdGroupElementsAreGroups)
     EXPECT_EQ(index_of("g", "a"), -1);
     EXPECT_EQ(length_of("g"), -1);
     events();
-    EXPECT_EQ(module::get_node_byIndex(g_TestCmdTree, "g", 0), nullptr);
+    EXPECT_EQ(internals::get_node_byIndex(g_TestCmdTree, "g", 0), nullptr);
     EXPECT_EQ(events(), item_failure(kGroupNotFound));
 }
 
@@ -615,7 +615,7 @@ TEST_F(PlanStore, TopNodeItselfIsNoGroup)
     EXPECT_EQ(length_of("g"), -1);
     EXPECT_EQ(index_of("g", "a"), -1);
     events();
-    EXPECT_EQ(module::get_node_byIndex(g_TestCmdTree, "g", 0), nullptr);
+    EXPECT_EQ(internals::get_node_byIndex(g_TestCmdTree, "g", 0), nullptr);
     EXPECT_EQ(events(), item_failure(kGroupNotFound));
 
     load("<?xml version=\"1.0\"?><CmdGroup name='g'><Cmd name='a'/></CmdGroup>");
@@ -632,7 +632,7 @@ TEST_F(PlanStore, ItemsAreFoundByTheirIndexes)
     EXPECT_EQ(item_at("g", 2), "c");
     EXPECT_EQ(item_at("h", 0), "d");
     EXPECT_EQ(item_at("h", 1), "b");
-    mxml_node_t *node = module::get_node_byIndex(g_TestCmdTree, "h", 1);
+    mxml_node_t *node = internals::get_node_byIndex(g_TestCmdTree, "h", 1);
     EXPECT_STREQ(mxmlElementGetAttr(node, "args"), "5");
 }
 
@@ -663,7 +663,7 @@ TEST_F(PlanStore, NodesBetweenTheItemsAreSteppedOnAndHandedOut)
     EXPECT_EQ(item_at("g", 3), "o");
     EXPECT_EQ(item_at("g", 4), "nameless");
     EXPECT_EQ(item_at("g", 5), "nothing");
-    EXPECT_EQ(mxmlGetType(module::get_node_byIndex(g_TestCmdTree, "g", 2)), MXML_TEXT);
+    EXPECT_EQ(mxmlGetType(internals::get_node_byIndex(g_TestCmdTree, "g", 2)), MXML_TEXT);
 }
 
 TEST_F(PlanStore, FirstItemIsTheFirstCmdEvenWithoutAName)
@@ -693,7 +693,7 @@ TEST_F(PlanStore, GroupWithNoItemAfterItYieldsNothing)
 TEST_F(PlanStore, ItemByIndexOfAMissingGroupFails)
 {
     load(kPlan);
-    EXPECT_EQ(module::get_node_byIndex(g_TestCmdTree, "x", 0), nullptr);
+    EXPECT_EQ(internals::get_node_byIndex(g_TestCmdTree, "x", 0), nullptr);
     EXPECT_EQ(events(), item_failure(kGroupNotFound));
 }
 
@@ -704,7 +704,7 @@ TEST_F(PlanStore, ItemByIndexUsesTheTreeThatItIsGiven)
         mxmlLoadString(nullptr, "<P><CmdGroup name='g'><Cmd name='other'/></CmdGroup></P>",
                        nullptr),
         &mxmlDelete);
-    mxml_node_t *node = module::get_node_byIndex(other.get(), "g", 0);
+    mxml_node_t *node = internals::get_node_byIndex(other.get(), "g", 0);
     EXPECT_EQ(events(), item_lines("other"));
     EXPECT_STREQ(mxmlElementGetAttr(node, "name"), "other");
 }
@@ -712,7 +712,7 @@ TEST_F(PlanStore, ItemByIndexUsesTheTreeThatItIsGiven)
 TEST_F(PlanStore, ItemByIndexWithoutATreeFailsEvenIfOneIsCached)
 {
     load(kPlan);
-    EXPECT_EQ(module::get_node_byIndex(nullptr, "g", 0), nullptr);
+    EXPECT_EQ(internals::get_node_byIndex(nullptr, "g", 0), nullptr);
     EXPECT_EQ(events(), item_failure(kCouldNotLoad));
 }
 
@@ -755,7 +755,7 @@ TEST_F(PlanStore, LengthLogsTheLevelThatItIsGiven)
 {
     load(kPlan);
     for (const int level : {2, 0, -7, 41}) {
-        EXPECT_EQ(module::get_node_length("g", level), 3);
+        EXPECT_EQ(internals::get_node_length("g", level), 3);
         EXPECT_THAT(events(),
                     ElementsAre("get_node_length| Enter node length calculate!\n",
                                 "get_node_length| input level = " + std::to_string(level) + "\n",
@@ -771,7 +771,7 @@ TEST_F(PlanStore, OpeningTagsAreIndentedByTheirAncestorsButOne)
     const std::size_t tabs[] = {0, 0, 1, 2, 3, 4, 5, 6, 7, 8, 8, 8, 8};
     for (const std::size_t expected : tabs) {
         ASSERT_NE(node, nullptr);
-        EXPECT_EQ(module::whitespace_cb(node, MXML_WS_BEFORE_OPEN), std::string(expected, '\t'));
+        EXPECT_EQ(internals::whitespace_cb(node, MXML_WS_BEFORE_OPEN), std::string(expected, '\t'));
         node = mxmlGetFirstChild(node);
     }
     EXPECT_EQ(node, nullptr);
@@ -780,9 +780,9 @@ TEST_F(PlanStore, OpeningTagsAreIndentedByTheirAncestorsButOne)
 TEST_F(PlanStore, IndentationsAreTailsOfOneText)
 {
     mxml_node_t *node = load(nested(10));
-    const char *top = module::whitespace_cb(node, MXML_WS_BEFORE_OPEN);
+    const char *top = internals::whitespace_cb(node, MXML_WS_BEFORE_OPEN);
     for (; node != nullptr; node = mxmlGetFirstChild(node)) {
-        const char *text = module::whitespace_cb(node, MXML_WS_BEFORE_OPEN);
+        const char *text = internals::whitespace_cb(node, MXML_WS_BEFORE_OPEN);
         EXPECT_EQ(text + std::strlen(text), top);
     }
 }
@@ -790,11 +790,11 @@ TEST_F(PlanStore, IndentationsAreTailsOfOneText)
 TEST_F(PlanStore, TagsAreFollowedByLineFeedsAndClosingTagsNotIndented)
 {
     for (mxml_node_t *node = load(nested(10)); node != nullptr; node = mxmlGetFirstChild(node)) {
-        EXPECT_STREQ(module::whitespace_cb(node, MXML_WS_AFTER_OPEN), "\n");
-        EXPECT_STREQ(module::whitespace_cb(node, MXML_WS_AFTER_CLOSE), "\n");
-        EXPECT_EQ(module::whitespace_cb(node, MXML_WS_BEFORE_CLOSE), nullptr);
+        EXPECT_STREQ(internals::whitespace_cb(node, MXML_WS_AFTER_OPEN), "\n");
+        EXPECT_STREQ(internals::whitespace_cb(node, MXML_WS_AFTER_CLOSE), "\n");
+        EXPECT_EQ(internals::whitespace_cb(node, MXML_WS_BEFORE_CLOSE), nullptr);
         for (const int other : {-1, 4, 5, 100}) {
-            EXPECT_EQ(module::whitespace_cb(node, other), nullptr);
+            EXPECT_EQ(internals::whitespace_cb(node, other), nullptr);
         }
     }
 }
@@ -804,11 +804,11 @@ TEST_F(PlanStore, DeclarationsAreFollowedByALineFeedAndNothingElse)
     for (const char *name : {"?xml version=\"1.0\"?", "?xml", "?xml-stylesheet?", "?xmlx"}) {
         const std::unique_ptr<mxml_node_t, decltype(&mxmlDelete)> node(
             mxmlNewElement(nullptr, name), &mxmlDelete);
-        EXPECT_EQ(module::whitespace_cb(node.get(), MXML_WS_BEFORE_OPEN), nullptr) << name;
-        EXPECT_STREQ(module::whitespace_cb(node.get(), MXML_WS_AFTER_OPEN), "\n");
-        EXPECT_EQ(module::whitespace_cb(node.get(), MXML_WS_BEFORE_CLOSE), nullptr);
-        EXPECT_EQ(module::whitespace_cb(node.get(), MXML_WS_AFTER_CLOSE), nullptr);
-        EXPECT_EQ(module::whitespace_cb(node.get(), 4), nullptr);
+        EXPECT_EQ(internals::whitespace_cb(node.get(), MXML_WS_BEFORE_OPEN), nullptr) << name;
+        EXPECT_STREQ(internals::whitespace_cb(node.get(), MXML_WS_AFTER_OPEN), "\n");
+        EXPECT_EQ(internals::whitespace_cb(node.get(), MXML_WS_BEFORE_CLOSE), nullptr);
+        EXPECT_EQ(internals::whitespace_cb(node.get(), MXML_WS_AFTER_CLOSE), nullptr);
+        EXPECT_EQ(internals::whitespace_cb(node.get(), 4), nullptr);
     }
 }
 
@@ -817,10 +817,10 @@ TEST_F(PlanStore, OtherNamesAreNoDeclarations)
     for (const char *name : {"?xm", "?XML", "xml", "?php", "!-- ?xml --", "?", ""}) {
         const std::unique_ptr<mxml_node_t, decltype(&mxmlDelete)> node(
             mxmlNewElement(nullptr, name), &mxmlDelete);
-        EXPECT_STREQ(module::whitespace_cb(node.get(), MXML_WS_BEFORE_OPEN), "") << name;
-        EXPECT_STREQ(module::whitespace_cb(node.get(), MXML_WS_AFTER_OPEN), "\n");
-        EXPECT_EQ(module::whitespace_cb(node.get(), MXML_WS_BEFORE_CLOSE), nullptr);
-        EXPECT_STREQ(module::whitespace_cb(node.get(), MXML_WS_AFTER_CLOSE), "\n");
+        EXPECT_STREQ(internals::whitespace_cb(node.get(), MXML_WS_BEFORE_OPEN), "") << name;
+        EXPECT_STREQ(internals::whitespace_cb(node.get(), MXML_WS_AFTER_OPEN), "\n");
+        EXPECT_EQ(internals::whitespace_cb(node.get(), MXML_WS_BEFORE_CLOSE), nullptr);
+        EXPECT_STREQ(internals::whitespace_cb(node.get(), MXML_WS_AFTER_CLOSE), "\n");
     }
 }
 
@@ -830,7 +830,7 @@ TEST_F(PlanStore, SavingReplacesTheFileAndCloses)
 {
     mxml_node_t *tree = load(kPlan);
     write_plan(std::string(5000, 'x'));
-    module::save_XmlFile(tree);
+    internals::save_XmlFile(tree);
 
     EXPECT_EQ(events(), saved_lines("plan#2"));
     EXPECT_EQ(plan_text(), kPlan);
@@ -842,7 +842,7 @@ TEST_F(PlanStore, SavingCreatesAFileThatIsGone)
 {
     mxml_node_t *tree = load(kPlan);
     platform::reset();
-    module::save_XmlFile(tree);
+    internals::save_XmlFile(tree);
     EXPECT_EQ(events(), saved_lines("plan#1"));
     EXPECT_EQ(plan_text(), kPlan);
 }
@@ -852,7 +852,7 @@ TEST_F(PlanStore, SavingWritesTheTreeThatItIsGiven)
     load(kPlan);
     const std::unique_ptr<mxml_node_t, decltype(&mxmlDelete)> other(
         mxmlLoadString(nullptr, "<P><A/></P>", nullptr), &mxmlDelete);
-    module::save_XmlFile(other.get());
+    internals::save_XmlFile(other.get());
     EXPECT_EQ(plan_text(), "<P>\n<A />\n</P>\n");
 }
 
@@ -941,9 +941,9 @@ TEST_F(PlanStore, LongAttributeListIsWrappedAtTheLibrarysOwnMargin)
 TEST_F(PlanStore, ChangesInTheTreeAreSaved)
 {
     mxml_node_t *tree = load(kPlan);
-    mxmlElementSetAttr(module::get_node_byIndex(tree, "g", 1), "progress", "50");
-    module::save_XmlFile(tree);
-    EXPECT_EQ(module::load_configs_file(kPath), tree);
+    mxmlElementSetAttr(internals::get_node_byIndex(tree, "g", 1), "progress", "50");
+    internals::save_XmlFile(tree);
+    EXPECT_EQ(internals::load_configs_file(kPath), tree);
 
     std::string expected = kPlan;
     const std::string item = "<Cmd name=\"b\" args=\"2\" ";
@@ -991,15 +991,15 @@ TEST_F(PlanStore, EveryTagOfASavedPlanEndsItsLine)
 TEST_F(PlanStore, FileThatCannotBeOpenedForSavingStaysAndTheTreeKeepsItsChanges)
 {
     mxml_node_t *tree = load(kPlan);
-    mxmlElementSetAttr(module::get_node_byIndex(tree, "g", 1), "progress", "50");
+    mxmlElementSetAttr(internals::get_node_byIndex(tree, "g", 1), "progress", "50");
     events();
     plan_steps("open", {gives(-1, EROFS)});
-    module::save_XmlFile(tree);
+    internals::save_XmlFile(tree);
 
     EXPECT_EQ(events(), not_saved("-1", "(30),Read-only file system"));
     EXPECT_EQ(plan_text(), kPlan);
     EXPECT_EQ(g_TestCmdTree, tree);
-    EXPECT_STREQ(mxmlElementGetAttr(module::get_node_byIndex(tree, "g", 1), "progress"), "50");
+    EXPECT_STREQ(mxmlElementGetAttr(internals::get_node_byIndex(tree, "g", 1), "progress"), "50");
 }
 
 TEST_F(PlanStore, SavingTakesDescriptorZeroForAFailureAndLeavesItOpen)
@@ -1007,7 +1007,7 @@ TEST_F(PlanStore, SavingTakesDescriptorZeroForAFailureAndLeavesItOpen)
     mxml_node_t *tree = load(kPlan);
     const std::string before = shape(tree);
     platform::free_descriptor_zero();
-    module::save_XmlFile(tree);
+    internals::save_XmlFile(tree);
 
     const Lines seen = events();
     ASSERT_EQ(seen.size(), 3U);
@@ -1022,7 +1022,7 @@ TEST_F(PlanStore, SavingTakesDescriptorZeroForAFailureAndLeavesItOpen)
     EXPECT_EQ(shape(tree), before);
 
     plan_steps("open", {gives(0, EIO)});
-    module::save_XmlFile(tree);
+    internals::save_XmlFile(tree);
     EXPECT_EQ(events(), not_saved("plan#2", "(5),Input/output error"));
 }
 
@@ -1030,7 +1030,7 @@ TEST_F(PlanStore, SavingTakesDescriptorOneForASuccess)
 {
     mxml_node_t *tree = load(kPlan);
     write_plan("");
-    with_descriptor_one_free([&] { module::save_XmlFile(tree); });
+    with_descriptor_one_free([&] { internals::save_XmlFile(tree); });
     EXPECT_EQ(events(), saved_lines("plan#2"));
     EXPECT_EQ(plan_text(), kPlan);
 }

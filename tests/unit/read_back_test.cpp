@@ -52,7 +52,7 @@ class FreedOutput
     int kept_ = -1;
 };
 
-class ReadBack : public ModuleTest
+class ReadBack : public LibraryTest
 {
   protected:
     // Bytes of every kind, none like its neighbour or the guard.
@@ -299,7 +299,7 @@ TEST_F(ReadBack, OffsetIsLoggedAsAnInt)
 TEST_F(ReadBack, FileIsReadNotThePlanInMemory)
 {
     write_plan("<P><CmdGroup name=\"g\"><Cmd name=\"a\"/></CmdGroup></P>");
-    ASSERT_NE(module::load_configs_file("/data/vorlane/src1.xml"), nullptr);
+    ASSERT_NE(internals::load_configs_file("/data/vorlane/src1.xml"), nullptr);
     const mxml_node_t *tree = g_TestCmdTree;
     write_plan("not a plan: \t\r\n <");
 

@@ -24,7 +24,7 @@ namespace
 
 const std::string kReason = "(" + std::to_string(EACCES) + "),Permission denied";
 
-class Report : public ModuleTest
+class Report : public LibraryTest
 {
   protected:
     // A plan as the library saves it: items "a" and "b" in the group "first", "b"
@@ -59,7 +59,7 @@ class Report : public ModuleTest
     static void load_plan(const std::string &text = plan())
     {
         write_plan(text);
-        ASSERT_NE(module::load_configs_file("/data/vorlane/src1.xml"), nullptr);
+        ASSERT_NE(internals::load_configs_file("/data/vorlane/src1.xml"), nullptr);
         events();
     }
     static const char *attribute(const char *group, const char *name, const char *attribute_name)
@@ -137,7 +137,7 @@ class Report : public ModuleTest
         // nor has anything changed that the next report would save
         report(1, 0, "x");
         EXPECT_EQ(plan_text(), plan(" progress=\"1\" result=\"0\" description=\"x\""));
-        module::reset();
+        internals::reset();
         load_plan();
     }
 };
@@ -288,8 +288,8 @@ TEST_F(Report, DescriptionIsKeptUnchangedWhateverItsLengthAndCharacters)
         EXPECT_THAT(events(), Contains(told(0, 1, 0, description)[1]));
 
         // and is still the same for who loads the file
-        module::reset();
-        ASSERT_NE(module::load_configs_file("/data/vorlane/src1.xml"), nullptr);
+        internals::reset();
+        ASSERT_NE(internals::load_configs_file("/data/vorlane/src1.xml"), nullptr);
         EXPECT_EQ(attribute("first", "a", "description"), description);
     }
 }

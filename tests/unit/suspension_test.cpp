@@ -22,7 +22,7 @@ namespace
 constexpr char kHeader[] = "USER     PID   PPID  VSIZE  RSS     WCHAN    PC         NAME\n";
 constexpr char kProcess[] = "root     4711  1     123456 789     ffffffff 00000000 S item\n";
 
-class Suspension : public ModuleTest
+class Suspension : public LibraryTest
 {
   protected:
     // Makes the item with that name the one last started.
@@ -273,11 +273,11 @@ TEST_F(Suspension, EachCallLeavesOneMoreListingOpen)
 TEST_F(Suspension, NameOfTheItemStaysForTheNextCall)
 {
     start_item("item");
-    const std::string before(module::command_name(), module::command_name_size);
+    const std::string before(internals::command_name, sizeof internals::command_name);
     platform::plan_output({std::string(kHeader) + kProcess});
     FPTEST_SuspendItemExecute();
 
-    EXPECT_EQ(std::string(module::command_name(), module::command_name_size), before);
+    EXPECT_EQ(std::string(internals::command_name, sizeof internals::command_name), before);
     FPTEST_SuspendItemExecute();
     EXPECT_THAT(events(), ::testing::Contains("popen(ps item, r) = stream#2"));
 }

@@ -20,12 +20,12 @@ using sequences::trigger;
 namespace
 {
 
-class Trigger : public ModuleTest
+class Trigger : public LibraryTest
 {
   protected:
     static Lines run()
     {
-        module::Sock_Init1();
+        internals::Sock_Init1();
         return events();
     }
     // What follows the accept when the write fails.

@@ -4,7 +4,7 @@
 // What every unit test starts from.
 #pragma once
 
-#include "module.h"
+#include "internals.h"
 #include "platform.h"
 #include "quillmark.h"
 
@@ -40,17 +40,17 @@ inline std::string every_character_but(const std::string &these)
 }
 
 // The library as at load time, on a platform without a test plan.
-class ModuleTest : public ::testing::Test
+class LibraryTest : public ::testing::Test
 {
   protected:
     void SetUp() override
     {
-        module::reset();
+        internals::reset();
         platform::reset();
     }
     void TearDown() override
     {
-        module::reset();
+        internals::reset();
         platform::reset();
     }
 

@@ -21,27 +21,27 @@ namespace
 constexpr int kExited127 = 127 << 8;
 constexpr int kKilledBy9 = 9;
 
-class Launcher : public ModuleTest
+class Launcher : public LibraryTest
 {
   protected:
     // What the child does with a command when the shell cannot be started.
     static Lines child(const std::string &command)
     {
         plan_steps("vfork", {gives(0)});
-        platform::run_child([&command] { module::mysystem(command.c_str()); });
+        platform::run_child([&command] { internals::mysystem(command.c_str()); });
         return events();
     }
 };
 
 TEST_F(Launcher, NullCommandYieldsOneAndTouchesNothing)
 {
-    EXPECT_EQ(module::mysystem(nullptr), 1);
+    EXPECT_EQ(internals::mysystem(nullptr), 1);
     EXPECT_THAT(events(), IsEmpty());
 }
 
 TEST_F(Launcher, ParentLooksOnceWithoutWaitingAndRestoresSignals)
 {
-    module::mysystem("sleep 1000");
+    internals::mysystem("sleep 1000");
     EXPECT_THAT(events(), ElementsAreArray(launch()));
     EXPECT_THAT(platform::left_open(), IsEmpty());
 }
@@ -49,7 +49,7 @@ TEST_F(Launcher, ParentLooksOnceWithoutWaitingAndRestoresSignals)
 TEST_F(Launcher, ChildStillRunningYieldsZero)
 {
     platform::set_wait_status(kExited127); // of a child that has not ended: not stored
-    EXPECT_EQ(module::mysystem("sleep 1000"), 0);
+    EXPECT_EQ(internals::mysystem("sleep 1000"), 0);
 }
 
 TEST_F(Launcher, ChildAlreadyEndedYieldsItsRawStatus)
@@ -60,7 +60,7 @@ TEST_F(Launcher, ChildAlreadyEndedYieldsItsRawStatus)
         plan_steps("waitpid", {gives(100)});
         platform::set_wait_status(status);
 
-        EXPECT_EQ(module::mysystem("true"), status);
+        EXPECT_EQ(internals::mysystem("true"), status);
         EXPECT_THAT(events(), ElementsAreArray(launch(100)));
     }
 }
@@ -72,7 +72,7 @@ TEST_F(Launcher, FailedLookIsNotRepeatedAndYieldsMinusOneWithSignalsRestored)
         platform::reset();
         plan_steps("waitpid", {gives(-1, error)});
 
-        EXPECT_EQ(module::mysystem("true"), -1);
+        EXPECT_EQ(internals::mysystem("true"), -1);
         EXPECT_THAT(events(), ElementsAreArray(launch(-1)));
     }
 }
@@ -81,7 +81,7 @@ TEST_F(Launcher, FailedForkRestoresTheMaskAloneAndYieldsMinusOne)
 {
     plan_steps("vfork", {gives(-1, EAGAIN)});
 
-    EXPECT_EQ(module::mysystem("true"), -1);
+    EXPECT_EQ(internals::mysystem("true"), -1);
     EXPECT_THAT(events(), ElementsAreArray(failed_launch()));
 }
 
@@ -89,7 +89,7 @@ TEST_F(Launcher, BlockThatFailsStartsNothingAndYieldsMinusOne)
 {
     plan_steps("sigprocmask", {gives(-1, EINVAL)});
 
-    EXPECT_EQ(module::mysystem("true"), -1);
+    EXPECT_EQ(internals::mysystem("true"), -1);
     EXPECT_THAT(events(), ElementsAreArray(sequences::blocked_signals()));
 }
 
@@ -114,7 +114,7 @@ TEST_F(Launcher, EmptyCommandStillStartsAShell)
     EXPECT_THAT(child(""), ElementsAreArray(launched("")));
 
     platform::reset();
-    module::mysystem("");
+    internals::mysystem("");
     EXPECT_THAT(events(), ElementsAreArray(launch()));
 }
 
@@ -122,8 +122,8 @@ TEST_F(Launcher, NextLaunchStartsAnew)
 {
     plan_steps("waitpid", {gives(100), gives(0)});
     platform::set_wait_status(kExited127);
-    EXPECT_EQ(module::mysystem("first"), kExited127);
-    EXPECT_EQ(module::mysystem("second"), 0);
+    EXPECT_EQ(internals::mysystem("first"), kExited127);
+    EXPECT_EQ(internals::mysystem("second"), 0);
 
     EXPECT_THAT(events(), ElementsAreArray(joined({launch(100), launch()})));
     EXPECT_THAT(child("third"), ElementsAreArray(launched("third")));
@@ -132,7 +132,7 @@ TEST_F(Launcher, NextLaunchStartsAnew)
 TEST_F(Launcher, LooksAtTheChildThatItStarted)
 {
     plan_steps("vfork", {gives(77)});
-    module::mysystem("true");
+    internals::mysystem("true");
     EXPECT_THAT(events(), ::testing::Contains("waitpid(77, WNOHANG) = 0").Times(1));
 }
 
