@@ -4,7 +4,6 @@
 // The suspension: the item last started is looked up in the process list and
 // killed.
 #include "sequences.h"
-#include "unit_test.h"
 
 #include <cerrno>
 
@@ -44,7 +43,7 @@ class Suspension : public LibraryTest
     }
     static Lines listed(const std::string &name, const std::string &process)
     {
-        return joined({popened(name), {line_read(kHeader), line_read(process)}});
+        return popened(name) + line_read(kHeader) + line_read(process);
     }
     static Lines found(const std::string &pid)
     {
@@ -64,16 +63,14 @@ class Suspension : public LibraryTest
                               const std::string &killed)
     {
         platform::reset();
-        EXPECT_THAT(child(kHeader + process),
-                    ElementsAreArray(
-                        joined({listed("", process), found(pid), launched("kill 9 " + killed)})));
+        EXPECT_EQ(child(kHeader + process),
+                  listed("", process) + found(pid) + launched("kill 9 " + killed));
     }
     // For a process line that names none.
     static void expect_killed_null(const std::string &process)
     {
         platform::reset();
-        EXPECT_THAT(child(kHeader + process),
-                    ElementsAreArray(joined({listed("", process), launched("kill 9 (null)")})));
+        EXPECT_EQ(child(kHeader + process), listed("", process) + launched("kill 9 (null)"));
     }
     // The name that reaches the process listing.
     static std::string listed_name(const std::string &item)
@@ -93,25 +90,22 @@ TEST_F(Suspension, FirstListedProcessOfTheItemIsKilledInTheBackground)
     platform::plan_output({std::string(kHeader) + kProcess});
 
     EXPECT_EQ(FPTEST_SuspendItemExecute(), 0);
-    EXPECT_THAT(events(),
-                ElementsAreArray(joined({listed("item", kProcess), found("4711"), launch()})));
+    EXPECT_EQ(events(), listed("item", kProcess) + found("4711") + launch());
     EXPECT_THAT(left_open(), ElementsAre("stream#1"));
 }
 
 TEST_F(Suspension, KillCommandNamesNineAndTheProcess)
 {
     start_item("item");
-    EXPECT_THAT(child(std::string(kHeader) + kProcess),
-                ElementsAreArray(
-                    joined({listed("item", kProcess), found("4711"), launched("kill 9 4711")})));
+    EXPECT_EQ(child(std::string(kHeader) + kProcess),
+              listed("item", kProcess) + found("4711") + launched("kill 9 4711"));
 }
 
 TEST_F(Suspension, OnlyTheFirstOfSeveralProcessesIsReadAndKilled)
 {
     start_item("item");
-    EXPECT_THAT(child(std::string(kHeader) + kProcess + "root 4712 1 item\nroot 4713 1 item\n"),
-                ElementsAreArray(
-                    joined({listed("item", kProcess), found("4711"), launched("kill 9 4711")})));
+    EXPECT_EQ(child(std::string(kHeader) + kProcess + "root 4712 1 item\nroot 4713 1 item\n"),
+              listed("item", kProcess) + found("4711") + launched("kill 9 4711"));
 }
 
 TEST_F(Suspension, BeforeAnyItemTheFirstProcessOfAllIsTheOne)
@@ -165,10 +159,8 @@ TEST_F(Suspension, EmptyListingIsAFailureAndStaysOpen)
     start_item("item");
 
     EXPECT_EQ(FPTEST_SuspendItemExecute(), -1);
-    EXPECT_THAT(events(), ElementsAreArray(joined(
-                              {popened("item"),
-                               {"fgets(stream#1, 513) = null",
-                                "FPTEST_SuspendItemExecute| target process not exist!\n"}})));
+    EXPECT_EQ(events(), popened("item") + "fgets(stream#1, 513) = null" +
+                            "FPTEST_SuspendItemExecute| target process not exist!\n");
     EXPECT_THAT(left_open(), ElementsAre("stream#1"));
 }
 
@@ -178,10 +170,9 @@ TEST_F(Suspension, ListingOfAHeaderAloneIsAFailureAndStaysOpen)
     platform::plan_output({kHeader});
 
     EXPECT_EQ(FPTEST_SuspendItemExecute(), -1);
-    EXPECT_THAT(events(), ElementsAreArray(joined(
-                              {popened("item"),
-                               {line_read(kHeader), "fgets(stream#1, 513) = null",
-                                "FPTEST_SuspendItemExecute| target process not exist!\n"}})));
+    EXPECT_EQ(events(),
+              (popened("item") + Lines{line_read(kHeader), "fgets(stream#1, 513) = null",
+                                       "FPTEST_SuspendItemExecute| target process not exist!\n"}));
     EXPECT_THAT(left_open(), ElementsAre("stream#1"));
 }
 
@@ -215,7 +206,7 @@ TEST_F(Suspension, ProcessLineWithoutASecondColumnIsNoFailure)
 {
     platform::plan_output({std::string(kHeader) + "root\n"});
     EXPECT_EQ(FPTEST_SuspendItemExecute(), 0);
-    EXPECT_THAT(events(), ElementsAreArray(joined({listed("", "root\n"), launch()})));
+    EXPECT_EQ(events(), listed("", "root\n") + launch());
     EXPECT_THAT(left_open(), ElementsAre("stream#1"));
 }
 
@@ -232,20 +223,16 @@ TEST_F(Suspension, LineOfTheListingIsReadUpToFiveHundredTwelveCharacters)
     // the header just fits; the process line is cut within its id
     const std::string header = std::string(511, 'H') + "\n";
     const std::string cut = std::string(508, 'u') + " 123";
-    EXPECT_THAT(child(header + cut + "45 1 item\n"),
-                ElementsAreArray(joined({popened(""),
-                                         {line_read(header), line_read(cut)},
-                                         found("123"),
-                                         launched("kill 9 123")})));
+    EXPECT_EQ(child(header + cut + "45 1 item\n"), popened("") + line_read(header) +
+                                                       line_read(cut) + found("123") +
+                                                       launched("kill 9 123"));
 
     // what a header has beyond that is taken for the process line
     platform::reset();
     const std::string longer(512, 'H');
-    EXPECT_THAT(child(longer + " root 42 1\nroot 43 1 item\n"),
-                ElementsAreArray(joined({popened(""),
-                                         {line_read(longer), line_read(" root 42 1\n")},
-                                         found("42"),
-                                         launched("kill 9 42")})));
+    EXPECT_EQ(child(longer + " root 42 1\nroot 43 1 item\n"),
+              popened("") + line_read(longer) + line_read(" root 42 1\n") + found("42") +
+                  launched("kill 9 42"));
 }
 
 TEST_F(Suspension, FailedKillIsNoFailure)
@@ -253,8 +240,7 @@ TEST_F(Suspension, FailedKillIsNoFailure)
     platform::plan_output({std::string(kHeader) + kProcess, std::string(kHeader) + kProcess});
     plan_steps("vfork", {gives(-1, EAGAIN)});
     EXPECT_EQ(FPTEST_SuspendItemExecute(), 0);
-    EXPECT_THAT(events(),
-                ElementsAreArray(joined({listed("", kProcess), found("4711"), failed_launch()})));
+    EXPECT_EQ(events(), listed("", kProcess) + found("4711") + failed_launch());
 
     plan_steps("waitpid", {gives(-1, ECHILD)});
     EXPECT_EQ(FPTEST_SuspendItemExecute(), 0);
