@@ -187,6 +187,7 @@ const Case kCases[] = {
     {"PathOfATabIsTheRootAlone", "a(y)", "\ta", ""},
     {"EmptyGroupNameRunsNothing", "(x) <CmdGroup name=''> y </CmdGroup>", "", ""},
     {"GroupNameOfASlashRunsNothing", "<CmdGroup name=''> y </CmdGroup>", "/", ""},
+    {"NothingBeforeASlashIsNoName", "x(y) A(x)", "/x", "y"},
     {"BlanksInNamesStand", "<CmdGroup name=' a group '> x </CmdGroup>", " a group ", "x"},
     {"BlanksInNamesAreNotTrimmed", "<CmdGroup name=' a group '> x </CmdGroup>", "a group", ""},
     // what an item's path runs
