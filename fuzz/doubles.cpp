@@ -399,6 +399,11 @@ void mxmlSetLoneWhitespaceOff(int /*off*/)
 {
 }
 
+// The agent's plan would note the reasons, in blocks that are not Mini-XML's.
+void qm_mxmlSetErrorCallback(mxml_error_cb_t /*callback*/)
+{
+}
+
 // Mini-XML 3.3 forgets nodes of some documents: of some that it refuses, and text
 // after the root element. A first load shows which; those, and only those, are
 // freed here, for the rest of a plan is the library's to free.

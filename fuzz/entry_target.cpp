@@ -10,6 +10,7 @@
 #include "runs.h"
 
 #include <algorithm>
+#include <optional>
 #include <string>
 #include <vector>
 
@@ -83,7 +84,7 @@ class Entry
 
         std::string expected_reply(room_, kFill);
         auto expected_plan = plan_before;
-        std::vector<std::string> expected;
+        std::optional<std::vector<std::string>> expected = std::vector<std::string>();
         const std::string head = fields.empty() ? "" : fields[0];
         const std::string name = fields.size() > 1 ? fields[1] : "";
         if (!pinged_ && head.starts_with("pingtest")) {
@@ -95,12 +96,13 @@ class Entry
             require(g_TestCmdTree == nullptr, "the old plan stays in use");
         } else if (head.starts_with("XMLNodePath")) {
             const std::string line = name.substr(0, name.find_first_of("\t\n"));
-            expected = expected_starts(g_TestCmdTree, line.substr(0, 2047), vendor_, false);
+            expected =
+                expected_starts(plan_before.value_or(""), line.substr(0, 2047), vendor_, false);
             expected_reply.assign(room_, '\0');
         }
         require(!with_reply_ || reply.all() == expected_reply, "the reply is another one");
         require(doubles::plan() == expected_plan, "the stored plan is another one");
-        require(doubles::started() == expected, "something else is started");
+        require(!expected || doubles::started() == *expected, "something else is started");
         require(internals::ping_mask == (pinged_ ? 1 : 0), "the ping is counted otherwise");
         require(doubles::left_open() == stored_, "descriptors: not one for each stored plan");
     }

@@ -70,12 +70,14 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t *data, std::size_t size
     check_level(path);
     check_names(path);
 
-    const Block walked(path);
+    const std::string plain = path.substr(0, path.find_first_of(":\t\n"));
+    const Block walked(plain);
     const Block result(1025, '\0');
     internals::ItemsTest(walked.data(), result.data());
     require(result.all() == std::string(1025, '\0'), "the result is written");
-    require(doubles::started() == expected_starts(g_TestCmdTree, path, vendor, !query.empty()),
-            "something else is started");
+    const auto expected =
+        expected_starts(document.empty() ? kPlan : document, plain, vendor, !query.empty());
+    require(!expected || doubles::started() == *expected, "something else is started");
     require(doubles::left_open() == 0, "the run leaves something open");
     return 0;
 }
