@@ -40,39 +40,25 @@ TEST_F(Launcher, NullCommandYieldsOneAndTouchesNothing)
 
 TEST_F(Launcher, ParentLooksOnceWithoutWaitingAndRestoresSignals)
 {
-    internals::mysystem("sleep 1000");
-    EXPECT_EQ(events(), launch());
-    EXPECT_THAT(platform::left_open(), IsEmpty());
-}
-
-TEST_F(Launcher, ChildStillRunningYieldsZero)
-{
-    platform::set_wait_status(kExited127); // of a child that has not ended: not stored
-    EXPECT_EQ(internals::mysystem("sleep 1000"), 0);
-}
-
-TEST_F(Launcher, ChildAlreadyEndedYieldsItsRawStatus)
-{
-    for (const int status : {0, kExited127, kKilledBy9, 1 << 8}) {
-        SCOPED_TRACE(status);
+    struct Case {
+        platform::Step look;
+        int waited, status, result;
+    };
+    for (const auto &[look, waited, status, result] : std::initializer_list<Case>{
+             {gives(0), 0, kExited127, 0}, // of a child that has not ended: not stored
+             {gives(100), 100, 0, 0},
+             {gives(100), 100, kExited127, kExited127},
+             {gives(100), 100, kKilledBy9, kKilledBy9},
+             {gives(100), 100, 1 << 8, 1 << 8},
+             {gives(-1, ECHILD), -1, 0, -1},
+             {gives(-1, EINTR), -1, 0, -1},
+         }) {
         platform::reset();
-        plan_steps("waitpid", {gives(100)});
+        plan_steps("waitpid", {look});
         platform::set_wait_status(status);
-
-        EXPECT_EQ(internals::mysystem("true"), status);
-        EXPECT_EQ(events(), launch(100));
-    }
-}
-
-TEST_F(Launcher, FailedLookIsNotRepeatedAndYieldsMinusOneWithSignalsRestored)
-{
-    for (const int error : {ECHILD, EINTR}) {
-        SCOPED_TRACE(error);
-        platform::reset();
-        plan_steps("waitpid", {gives(-1, error)});
-
-        EXPECT_EQ(internals::mysystem("true"), -1);
-        EXPECT_EQ(events(), launch(-1));
+        EXPECT_EQ(internals::mysystem("sleep 1000"), result);
+        EXPECT_EQ(events(), launch(waited));
+        EXPECT_THAT(platform::left_open(), IsEmpty());
     }
 }
 
@@ -92,28 +78,14 @@ TEST_F(Launcher, BlockThatFailsStartsNothingAndYieldsMinusOne)
     EXPECT_EQ(events(), sequences::blocked_signals());
 }
 
-TEST_F(Launcher, ChildRestoresTheMaskRunsTheShellAndExitsWhenThatFails)
+TEST_F(Launcher, ChildRestoresTheMaskRunsTheShellUnchangedAndExitsWhenThatFails)
 {
-    EXPECT_EQ(child("/system/bin/SensorProbe -t 5"), launched("/system/bin/SensorProbe -t 5"));
-}
-
-TEST_F(Launcher, CommandReachesTheShellUnchanged)
-{
-    const std::string quoted = "  a 'b c' \"$d\" | e > f; g\n\th % %s \\ ";
-    EXPECT_EQ(child(quoted), launched(quoted));
-
-    platform::reset();
-    const std::string lengthy(20000, 'c');
-    EXPECT_EQ(child(lengthy), launched(lengthy));
-}
-
-TEST_F(Launcher, EmptyCommandStillStartsAShell)
-{
-    EXPECT_EQ(child(""), launched(""));
-
-    platform::reset();
-    internals::mysystem("");
-    EXPECT_EQ(events(), launch());
+    for (const std::string &command :
+         {std::string("/system/bin/SensorProbe -t 5"), std::string(20000, 'c'), std::string(),
+          std::string("  a 'b c' \"$d\" | e > f; g\n\th % %s \\ ")}) {
+        platform::reset();
+        EXPECT_EQ(child(command), launched(command));
+    }
 }
 
 TEST_F(Launcher, NextLaunchStartsAnew)
