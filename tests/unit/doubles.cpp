@@ -162,7 +162,7 @@ std::string formatted(const char *format, va_list arguments)
 {
     char *text = nullptr;
     const int length = vasprintf(&text, format, arguments);
-    const std::string whole(text, static_cast<std::size_t>(length));
+    std::string whole(text, static_cast<std::size_t>(length));
     std::free(text);
     return whole;
 }
