@@ -9,6 +9,7 @@
 #include <cerrno>
 #include <climits>
 #include <optional>
+#include <ostream>
 
 using namespace sequences;
 using platform::events;
@@ -59,6 +60,11 @@ struct Run {
     Starts starts = Starts::Program;
     std::string kept = name; // after the cut
 };
+
+void PrintTo(const Run &run, std::ostream *out)
+{
+    *out << run.what;
+}
 
 class ItemRun : public Item, public ::testing::WithParamInterface<Run>
 {

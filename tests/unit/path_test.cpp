@@ -8,6 +8,7 @@
 
 #include <algorithm>
 #include <optional>
+#include <ostream>
 #include <random>
 #include <sstream>
 #include <string_view>

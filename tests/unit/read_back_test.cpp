@@ -9,6 +9,7 @@
 #include <climits>
 #include <csignal>
 #include <cstdio>
+#include <ostream>
 #include <unistd.h>
 
 using platform::events;
@@ -124,6 +125,11 @@ struct Reading {
     std::vector<platform::Step> steps; // of read
     std::vector<int> results;          // before the end; -1 is a failure
 };
+
+void PrintTo(const Reading &reading, std::ostream *out)
+{
+    *out << reading.what;
+}
 
 class ReadBackOf : public ReadBack, public ::testing::WithParamInterface<Reading>
 {
