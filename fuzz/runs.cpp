@@ -3,10 +3,9 @@
 
 #include "runs.h"
 
-#include "plan.h"
+#include "plan/plan.h"
 
 #include <cstdlib>
-#include <optional>
 
 namespace
 {
@@ -19,30 +18,23 @@ int vendor_number(std::string_view vendor)
     return static_cast<int>(std::strtol(std::string(vendor.substr(0, 63)).c_str(), nullptr, 10));
 }
 
-void expect_item(const Content &node, int vendor, bool gatherer_runs, Lines &lines)
+void expect_item(const fptest::Plan::Element &item, int vendor, bool gatherer_runs, Lines &lines)
 {
-    const std::string *name = node.attribute("name");
-    if (name == nullptr || name->empty()) {
-        return;
-    }
     lines.emplace_back("popen ps | grep /system/bin/SensorProbe");
-    if (vendor < 0 || vendor > 2) {
+    const auto suffix = fptest::vendor_suffix(vendor);
+    if (!suffix) {
         return;
     }
-    const std::string cut = name->substr(0, 1023);
-    const std::string program = cut.substr(0, cut.find_first_of("\t\n"));
-    if (vendor < 2 && program == "SensorProbe") {
-        if (!gatherer_runs) {
-            lines.emplace_back("launch");
-        }
-        lines.emplace_back("trigger");
+    if (!fptest::is_gatherer(*item.name, vendor)) {
+        lines.push_back(
+            "system " +
+            fptest::command_line(*item.name, item.args, *suffix).substr(0, fptest::kCommandLimit));
         return;
     }
-    const char *const suffixes[] = {"", "_ca", "_ca_qsee"};
-    const std::string *arguments = node.attribute("args");
-    const std::string command = "/system/bin/" + (program + suffixes[vendor]).substr(0, 1024) +
-                                " " + (arguments != nullptr ? *arguments : "(null)");
-    lines.push_back("system " + command.substr(0, 1024));
+    if (!gatherer_runs) {
+        lines.emplace_back("launch");
+    }
+    lines.emplace_back("trigger");
 }
 
 } // namespace
@@ -65,34 +57,32 @@ std::vector<std::string> components(std::string_view text, char separator)
     return found;
 }
 
-std::vector<std::string> expected_starts(mxml_node_t *tree, std::string_view path,
-                                         std::string_view vendor, bool gatherer_runs)
+std::optional<std::vector<std::string>> expected_starts(const std::string &plan,
+                                                        std::string_view path,
+                                                        std::string_view vendor, bool gatherer_runs)
 {
-    Lines lines;
     const Lines names = components(path, '/');
     if (path.find('/') == std::string_view::npos || names.size() == 1) {
-        return lines;
+        return Lines();
     }
     const int number = vendor_number(vendor);
-    const auto plan = tree != nullptr ? std::optional<Plan>(tree) : std::nullopt;
-    const auto group =
-        plan ? plan->group(names.empty() ? "" : names[1].substr(0, 63)) : std::nullopt;
-    const auto run = [&](int index) {
-        lines.push_back("print vendor = " + std::to_string(number) + "\n");
-        const auto node = group ? plan->item_by_index(*group, index) : std::nullopt;
-        if (node) {
-            expect_item(plan->contents[*node], number, gatherer_runs, lines);
-        }
-    };
-    if (names.size() == 2) {
-        const auto count = group ? static_cast<int>(plan->children(*group).size()) : 0;
-        for (int index = 0; index < count; ++index) {
-            run(index);
-        }
-        return lines;
+    const auto loaded = fptest::Plan::load(plan);
+    if (names.empty() && loaded && loaded->find_group("") != nullptr) {
+        return std::nullopt;
     }
-    const auto item =
-        group ? plan->item(*group, names.empty() ? "" : names[2].substr(0, 63)) : std::nullopt;
-    run(item ? static_cast<int>(plan->positions[*item]) : -1);
+    std::vector<std::optional<fptest::Plan::Element>> runs;
+    if (loaded && !names.empty()) { // whatever the root, and far from the path's limit
+        runs = loaded->run_by(names[1].substr(0, fptest::kNameLimit) +
+                              (names.size() > 2 ? "/" + names[2] : "").substr(0, 100));
+    } else if (names.size() != 2) {
+        runs.emplace_back();
+    }
+    Lines lines;
+    for (const auto &item : runs) {
+        lines.push_back("print vendor = " + std::to_string(number) + "\n");
+        if (item) {
+            expect_item(*item, number, gatherer_runs, lines);
+        }
+    }
     return lines;
 }

@@ -6,8 +6,9 @@
 // report, and its progress. An empty group or item stands for the first one.
 #include "doubles.h"
 #include "input.h"
-#include "module.h"
-#include "plan.h"
+#include "internals.h"
+#include "nodes.h"
+#include "plan/plan.h"
 #include "quillmark.h"
 
 #include <algorithm>
@@ -28,7 +29,7 @@ namespace
 constexpr char kPath[] = "/data/vorlane/src1.xml";
 constexpr std::size_t kMostNames = 6; // of each kind: enough to meet, and quick
 
-std::vector<std::string> names_of(const Plan &plan, std::string_view element)
+std::vector<std::string> names_of(const Nodes &plan, std::string_view element)
 {
     std::vector<std::string> names;
     for (const Content &content : plan.contents) {
@@ -40,7 +41,7 @@ std::vector<std::string> names_of(const Plan &plan, std::string_view element)
     return names;
 }
 
-void check_no_lone_white_space(const Plan &plan)
+void check_no_lone_white_space(const Nodes &plan)
 {
     for (const Content &content : plan.contents) {
         require(content.type != MXML_TEXT ||
@@ -49,50 +50,67 @@ void check_no_lone_white_space(const Plan &plan)
     }
 }
 
-void check_layout(const Plan &plan)
+void check_layout(const Nodes &plan)
 {
     for (std::size_t at = 0; at < plan.nodes.size(); ++at) {
         const std::size_t depth = plan.contents[at].depth;
         const std::string tabs(std::min<std::size_t>(depth > 0 ? depth - 1 : 0, 8), '\t');
         const bool declaration = plan.contents[at].element.starts_with("?xml");
-        const char *text = module::whitespace_cb(plan.nodes[at], MXML_WS_BEFORE_OPEN);
+        const char *text = internals::whitespace_cb(plan.nodes[at], MXML_WS_BEFORE_OPEN);
         require(declaration ? text == nullptr : text != nullptr && text == tabs,
                 "a node is indented otherwise");
     }
 }
 
-void check_plain_group(const Plan &plan, std::size_t group, const char *name)
+// An element's place among all, as Plan numbers it; nothing where it is not run.
+std::optional<std::size_t> number_of(const Nodes &plan, const mxml_node_t *node)
 {
-    const auto items = plan.children(group);
-    for (std::size_t at = 0; at < items.size(); ++at) {
-        const auto index = static_cast<int>(at);
-        const std::string &item = *plan.contents[items[at]].attribute("name");
-        require(module::get_node_index(name, item.c_str(), 3) == index &&
-                    module::get_node_byIndex(g_TestCmdTree, name, index) == plan.nodes[items[at]],
-                "index and name do not find the same item");
+    std::size_t number = 0;
+    for (std::size_t at = 0; at < plan.nodes.size(); ++at) {
+        if (plan.nodes[at] == node) {
+            const std::string *name = plan.contents[at].attribute("name");
+            return name != nullptr && !name->empty() ? std::optional(number) : std::nullopt;
+        }
+        number += plan.contents[at].type == MXML_ELEMENT ? 1 : 0;
     }
+    return std::nullopt;
 }
 
-void check_lookups(const Plan &plan, const std::string &name,
-                   const std::vector<std::string> &item_names)
+// Whether a node path can name it.
+bool is_addressable(const std::string &name)
 {
-    const auto group = plan.group(name);
-    const auto count = group ? static_cast<int>(plan.children(*group).size()) : -1;
-    require(module::get_node_length(name.c_str(), 2) == count, "the group's length is another");
-    for (const std::string &item : item_names) {
-        const auto place = group ? plan.item(*group, item) : std::nullopt;
-        require(module::get_node_index(name.c_str(), item.c_str(), 3) ==
-                    (place ? static_cast<int>(plan.positions[*place]) : -1),
-                "the item's index is another");
+    return !name.empty() && name.size() <= fptest::kNameLimit &&
+           name.find_first_of("/:\t\n") == std::string::npos;
+}
+
+void check_run(const Nodes &plan, const std::string &group, int index,
+               const std::optional<fptest::Plan::Element> &told)
+{
+    mxml_node_t *node = internals::get_node_byIndex(g_TestCmdTree, group.c_str(), index);
+    require(number_of(plan, node) == (told ? std::optional(told->number) : std::nullopt),
+            "the item at the index is another");
+}
+
+void check_lookups(const Nodes &plan, const fptest::Plan &told, const std::string &group,
+                   const std::vector<std::string> &items)
+{
+    const int length = internals::get_node_length(group.c_str(), 2);
+    require((length >= 0) == plan.group(group).has_value(), "a group is found, or is not");
+    if (!is_addressable(group)) {
+        return;
     }
-    for (const int index : {-1, 0, 1, count - 1, count, count + 1}) {
-        const auto place = group ? plan.item_by_index(*group, index) : std::nullopt;
-        require(module::get_node_byIndex(g_TestCmdTree, name.c_str(), index) ==
-                    (place ? plan.nodes[*place] : nullptr),
-                "the item at the index is another");
+    const auto runs = told.run_by(group);
+    require(length <= 0 ? runs.empty() : static_cast<std::size_t>(length) == runs.size(),
+            "the group's length is another");
+    check_run(plan, group, -1, std::nullopt);
+    for (std::size_t at = 0; at < runs.size(); ++at) {
+        check_run(plan, group, static_cast<int>(at), runs[at]);
     }
-    if (group && plan.is_plain(*group)) {
-        check_plain_group(plan, *group, name.c_str());
+    for (const std::string &item : items) {
+        if (is_addressable(item)) {
+            check_run(plan, group, internals::get_node_index(group.c_str(), item.c_str(), 3),
+                      told.run_by(group, item));
+        }
     }
 }
 
@@ -120,7 +138,7 @@ struct Report {
     }
 };
 
-Report report_from(const Plan &plan, const std::array<std::string, 5> &input)
+Report report_from(const Nodes &plan, const std::array<std::string, 5> &input)
 {
     const auto first = [](const std::string &given, const std::vector<std::string> &names) {
         return given.empty() && !names.empty() ? names.front() : given;
@@ -143,9 +161,9 @@ Report report_from(const Plan &plan, const std::array<std::string, 5> &input)
 // As another process finds the file.
 bool is_loaded_as(const std::vector<Content> &contents)
 {
-    mxml_node_t *tree = module::load_configs_file(kPath);
-    const bool same = tree != nullptr && Plan(tree).contents == contents;
-    module::reset();
+    mxml_node_t *tree = internals::load_configs_file(kPath);
+    const bool same = tree != nullptr && Nodes(tree).contents == contents;
+    internals::reset();
     return same;
 }
 
@@ -181,23 +199,25 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t *data, std::size_t size
     const auto input = texts<5>(data, size);
     doubles::write_plan(input[0]);
 
-    mxml_node_t *tree = module::load_configs_file(kPath);
+    mxml_node_t *tree = internals::load_configs_file(kPath);
     require(tree == g_TestCmdTree, "the loaded plan is not the one in use");
     require(doubles::left_open() == 0, "loading leaves a descriptor open");
     if (tree == nullptr) {
-        require(module::get_node_length("", 2) == -1, "a group of no plan has a length");
-        require(module::get_node_index("", "", 3) == -1, "an item of no plan has an index");
+        require(internals::get_node_length("", 2) == -1, "a group of no plan has a length");
+        require(internals::get_node_index("", "", 3) == -1, "an item of no plan has an index");
         return 0;
     }
-    const Plan plan(tree);
+    const Nodes plan(tree);
     check_no_lone_white_space(plan);
     check_layout(plan);
     auto groups = names_of(plan, "CmdGroup");
     auto items = names_of(plan, "Cmd");
     groups.push_back(input[1]);
     items.push_back(input[2]);
+    const auto told = fptest::Plan::load(input[0]);
+    require(told.has_value(), "the agent does not load what the library does");
     for (const std::string &group : groups) {
-        check_lookups(plan, group, items);
+        check_lookups(plan, *told, group, items);
     }
 
     const Report report = report_from(plan, input);
@@ -209,9 +229,9 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t *data, std::size_t size
         report.expect_in(contents[*item]);
     } else {
         require(doubles::plan() == input[0], "a report of no item changes the file");
-        module::save_XmlFile(tree);
+        internals::save_XmlFile(tree);
     }
-    require(g_TestCmdTree == tree && Plan(tree).contents == contents, "the report is another");
+    require(g_TestCmdTree == tree && Nodes(tree).contents == contents, "the report is another");
     require(doubles::left_open() == 0, "saving leaves a descriptor open");
     check_file(contents);
     return 0;

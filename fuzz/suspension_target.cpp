@@ -4,7 +4,7 @@
 // The process-list parser of the suspension. Input: "NAME\0" and what ps prints.
 #include "doubles.h"
 #include "input.h"
-#include "module.h"
+#include "internals.h"
 #include "quillmark.h"
 #include "runs.h"
 
@@ -50,8 +50,8 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t *data, std::size_t size
     const doubles::Run run;
     const auto [name, listing] = texts<2>(data, size);
     // the library's own array, which only the run of an item fills
-    const std::string item = name.substr(0, module::command_name_size - 1);
-    item.copy(const_cast<char *>(module::command_name()), item.size());
+    const std::string item = name.substr(0, sizeof internals::command_name - 1);
+    item.copy(internals::command_name, item.size());
     doubles::set_listing(listing);
 
     const auto kill = expected_kill(listing);
@@ -68,6 +68,6 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t *data, std::size_t size
     }
     doubles::run_as_child([] { FPTEST_SuspendItemExecute(); });
     require(doubles::started() == expected, "another process is killed");
-    require(module::command_name() == item, "the item's name is changed");
+    require(internals::command_name == item, "the item's name is changed");
     return 0;
 }

@@ -147,7 +147,7 @@ struct State {
 State state_now()
 {
     return {platform::plan_exists() ? std::optional(platform::plan_text()) : std::nullopt,
-            g_TestCmdTree != nullptr, module::command_name()};
+            g_TestCmdTree != nullptr, internals::command_name};
 }
 
 struct Shown {
@@ -265,7 +265,7 @@ const std::array<std::vector<Shown>, 2> &reference()
                     one.push_back(play(step, none));
                 }
             }
-            module::reset();
+            internals::reset();
         }).join();
         platform::reset();
         return played;
@@ -585,11 +585,11 @@ TEST(Faults, EachCallOfThePlatformFailsOnce)
 
 TEST(Faults, AMaskThatCannotBePutBackInTheChildDoesNotKeepItFromTheShell)
 {
-    module::reset();
+    internals::reset();
     platform::reset();
     platform::plan_steps("vfork", {gives(0)});
     platform::plan_steps("sigprocmask", {platform::pass(), gives(-1, EINVAL)});
-    platform::run_child([] { module::mysystem("a command"); });
+    platform::run_child([] { internals::mysystem("a command"); });
     EXPECT_THAT(platform::events(), ElementsAreArray(sequences::launched("a command")));
 }
 

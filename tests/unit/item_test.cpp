@@ -4,23 +4,20 @@
 // The run of one item: the vendor, the item's name, the presence of a gatherer,
 // and what is started how.
 #include "sequences.h"
-#include "unit_test.h"
 
 #include <algorithm>
 #include <cerrno>
 #include <climits>
+#include <optional>
+#include <ostream>
 
+using namespace sequences;
 using platform::events;
 using platform::gives;
 using platform::left_open;
 using platform::plan_output;
 using platform::plan_steps;
 using platform::set_vendor;
-using sequences::failed_accept;
-using sequences::failed_launch;
-using sequences::launch;
-using sequences::launched;
-using sequences::trigger;
 using ::testing::Contains;
 using ::testing::Not;
 using ::testing::StartsWith;
@@ -30,731 +27,233 @@ namespace
 
 // What the presence query prints while a gatherer runs.
 const std::string kRunning = "root     4711  1     123456 789   0 0 S /system/bin/SensorProbe\n";
+const std::string kGatherer = "SensorProbe";
 
-// The one item of most tests.
-std::string item(const std::string &name, const std::string &args = "-t 5")
-{
-    return "<Cmd name=\"" + name + "\" args=\"" + args + "\"/>";
-}
-
-class Item : public ModuleTest
+class Item : public LibraryTest
 {
   protected:
-    // Loads a plan whose group "g" has those children.
-    static void load(const std::string &children)
-    {
-        module::reset();
-        platform::write_plan("<?xml version=\"1.0\"?><P><CmdGroup name=\"g\">" + children +
-                             "</CmdGroup></P>");
-        ASSERT_NE(module::load_configs_file("/data/vorlane/src1.xml"), nullptr);
-        events();
-    }
     static Lines run(int index = 0)
     {
-        module::SingleItemExecute(g_TestCmdTree, "g", index);
+        internals::SingleItemExecute(g_TestCmdTree, "g", index);
         return events();
     }
-    static Lines run_item(const std::string &name, const std::string &args = "-t 5")
-    {
-        load(item(name, args));
-        return run();
-    }
-    // The same from a clean platform, under a vendor.
-    static Lines run_item_under(const std::string &vendor, const std::string &name,
-                                const std::string &args = "-t 5")
+    // From a clean platform.
+    static Lines run_item(const std::string &vendor, const std::string &name)
     {
         platform::reset();
         set_vendor(vendor);
-        return run_item(name, args);
-    }
-    // What the launcher's child does for an item.
-    static Lines run_child(const std::string &name, const std::string &args = "-t 5")
-    {
-        load(item(name, args));
-        plan_steps("vfork", {gives(0)});
-        platform::run_child([] { module::SingleItemExecute(g_TestCmdTree, "g", 0); });
-        return events();
-    }
-
-    // The events of a run, piece by piece: up to the vendor line,
-    static Lines begun(const std::string &vendor = "0")
-    {
-        return {"SingleItemExecute| enter... !\n",
-                "get_node_value(/etc/vorlane/sysparms/vr_common_cfg.xml, "
-                "device/SysParam/Quillmark/vendor, 64)",
-                "stdout: vendor = " + vendor + "\n"};
-    }
-    // the lookup of the item,
-    static Lines looked_up(const std::string &name)
-    {
-        return {"get_node_byIndex| enter...\n",
-                "get_node_byIndex| curernt leaf node name = " + name + "\n",
-                "get_node_byIndex| leave...\n"};
-    }
-    static Lines read(const std::string &name, const std::string &args = "-t 5")
-    {
-        return {"SingleItemExecute| mxmlElementGetAttr name=" + name + "- args=" + args + "\n"};
-    }
-    // the presence check,
-    static Lines asked()
-    {
-        return {"ResourceReduce| \ncbuf=ps | grep /system/bin/SensorProbe\n"};
-    }
-    static Lines absent()
-    {
-        return joined({asked(),
-                       {"popen(ps | grep /system/bin/SensorProbe, r) = stream#1",
-                        "fgets(stream#1, 129) = null",
-                        "ResourceReduce| target process not exist!\n", "pclose(stream#1)"}});
-    }
-    static Lines present(const std::string &line)
-    {
-        return joined({asked(),
-                       {"popen(ps | grep /system/bin/SensorProbe, r) = stream#1",
-                        "fgets(stream#1, 129) = \"" + line + "\"",
-                        "ResourceReduce| \ntbuf=" + line + "\n", "pclose(stream#1)"}});
-    }
-    static Lines unanswered()
-    {
-        return joined({asked(),
-                       {"popen(ps | grep /system/bin/SensorProbe, r) = null",
-                        "ResourceReduce| popen error!\n"}});
-    }
-    // and the start.
-    static Lines suffixed(const std::string &name)
-    {
-        return {"SingleItemExecute| tLine:" + name + "\n"};
-    }
-    static Lines command(const std::string &command)
-    {
-        return {"SingleItemExecute| tpCmd:" + command + "\n"};
-    }
-    static Lines ordinary(const std::string &line)
-    {
-        return joined({command(line), {"system(" + line + ")"}, left()});
-    }
-    static Lines row(int result)
-    {
-        return {"SingleItemExecute| \nrow=" + std::to_string(result) + "\n"};
-    }
-    static Lines left()
-    {
-        return {"SingleItemExecute| leave... !\n"};
-    }
-
-    // The whole run of an ordinary item while no gatherer runs.
-    static Lines ordinary_run(const std::string &name, const std::string &line)
-    {
-        return joined({begun(), looked_up(name), read(name), absent(), ordinary(line)});
-    }
-    static Lines suffixed_run(const std::string &vendor, const std::string &name,
-                              const std::string &program)
-    {
-        return joined({begun(vendor), looked_up(name), read(name), absent(), suffixed(program),
-                       ordinary("/system/bin/" + program + " -t 5")});
-    }
-    // A run that ends at a lookup that found nothing, or nothing with a name.
-    static Lines not_found(const std::string &vendor = "0")
-    {
-        return joined({begun(vendor), looked_up("(null)"), no_item()});
-    }
-    static Lines no_item()
-    {
-        return {"SingleItemExecute| get node by Index fail!\n"};
-    }
-    static Lines nameless(const std::string &name, const std::string &args)
-    {
-        return joined({begun(),
-                       looked_up(name),
-                       read(name, args),
-                       {"SingleItemExecute| current node is null !\n"}});
-    }
-
-    // All 65 bytes of the name of the item last started.
-    static std::string command_name()
-    {
-        return {module::command_name(), module::command_name_size};
-    }
-    static std::string padded(std::string name)
-    {
-        name.resize(module::command_name_size);
-        return name;
+        load_plan(plan_of(cmd(name)));
+        return run();
     }
 };
 
-// --- the vendor ------------------------------------------------------------
+// --- what is started -------------------------------------------------------
 
-TEST_F(Item, NullTreeStillReadsAndPrintsTheVendor)
+enum class Starts { Program, Gatherer, Trigger };
+
+struct Run {
+    const char *what;
+    std::string vendor = "0";
+    std::string name = "x";
+    std::optional<std::string> args = "-t 5";
+    std::optional<std::string> query = ""; // what it prints, if it can be started
+    Starts starts = Starts::Program;
+    std::string kept = name; // after the cut
+};
+
+void PrintTo(const Run &run, std::ostream *out)
 {
-    set_vendor("2");
-    module::SingleItemExecute(nullptr, "g", 0);
-
-    EXPECT_THAT(events(),
-                ElementsAreArray(joined({begun("2"),
-                                         {"get_node_byIndex| enter...\n",
-                                          "get_node_byIndex| get_node_byIndex[]:load config file "
-                                          "failed\n"},
-                                         no_item()})));
-    EXPECT_EQ(module::vendor(), 2);
-    EXPECT_EQ(command_name(), padded(""));
+    *out << run.what;
 }
 
-TEST_F(Item, VendorIsTheDecimalNumberThatTheTextBeginsWith)
+class ItemRun : public Item, public ::testing::WithParamInterface<Run>
 {
-    const std::pair<std::string, int> cases[] = {
-        {"0", 0},
-        {"1", 1},
-        {"2", 2},
-        {"3", 3},
-        {"-1", -1},
-        {"+2", 2},
-        {" 1", 1},
-        {"\t\n 1", 1},
-        {"1abc", 1},
-        {"1 2", 1},
-        {"1.9", 1},
-        {"01", 1},
-        {"010", 10},
-        {"0x1", 0},
-        {"", 0},
-        {"abc", 0},
-        {"a1", 0},
-        {"- 1", 0},
-        {"2147483647", INT_MAX},
-        {"-2147483648", INT_MIN},
-        {std::string(63, '0') + "1", 1},  // 64 characters
-        {std::string(63, '0') + "12", 1}, // 65, of which 64 are read
-    };
-    for (const auto &[text, number] : cases) {
-        SCOPED_TRACE(text);
+  protected:
+    static constexpr int kProgramRoom = 1024;
+
+    static void prepare()
+    {
         platform::reset();
-        set_vendor(text);
-        load("");
-
-        EXPECT_THAT(run(), ElementsAreArray(not_found(std::to_string(number))));
-        EXPECT_EQ(module::vendor(), number);
-    }
-}
-
-// The text is read as a long: 32-bit devices meet its end before the cut.
-TEST_F(Item, VendorBeyondThirtyTwoBitsIsCutWhereLongHoldsIt)
-{
-    struct Case {
-        const char *text;
-        int cut;
-        int clamped;
-    };
-    const bool cut = sizeof(long) == 8;
-    for (const auto &[text, number, clamped] :
-         {Case{"2147483648", INT_MIN, INT_MAX}, Case{"-2147483649", INT_MAX, INT_MIN},
-          Case{"4294967295", -1, INT_MAX}, Case{"4294967296", 0, INT_MAX},
-          Case{"-4294967295", 1, INT_MIN}, Case{"99999999999999999999", -1, INT_MAX}}) {
-        SCOPED_TRACE(text);
-        platform::reset();
-        set_vendor(text);
-        load("");
-
-        const int expected = cut ? number : clamped;
-        EXPECT_THAT(run(), ElementsAreArray(not_found(std::to_string(expected))));
-        EXPECT_EQ(module::vendor(), expected);
-    }
-    if (cut) {
-        EXPECT_THAT(run_item_under("4294967297", "x"),
-                    ElementsAreArray(suffixed_run("1", "x", "x_ca")));
-    }
-}
-
-TEST_F(Item, MissingVendorCountsAsZero)
-{
-    load(item("x"));
-    set_vendor("1");
-    run();
-    EXPECT_EQ(module::vendor(), 1);
-
-    platform::reset();
-    EXPECT_THAT(run(), ElementsAreArray(ordinary_run("x", "/system/bin/x -t 5")));
-    EXPECT_EQ(module::vendor(), 0);
-}
-
-TEST_F(Item, VendorIsReadAfreshForEveryItem)
-{
-    load(item("a") + item("b"));
-    set_vendor("1");
-    EXPECT_THAT(run(0), Contains("system(/system/bin/a_ca -t 5)"));
-    set_vendor("2");
-    EXPECT_THAT(run(1), Contains("system(/system/bin/b_ca_qsee -t 5)"));
-}
-
-// --- the lookup ------------------------------------------------------------
-
-TEST_F(Item, UnknownGroupStartsNothing)
-{
-    load(item("x"));
-    module::SingleItemExecute(g_TestCmdTree, "h", 0);
-
-    EXPECT_THAT(events(),
-                ElementsAreArray(joined({begun(),
-                                         {"get_node_byIndex| enter...\n",
-                                          "get_node_byIndex| get_node_byIndex[]: Find Element "
-                                          "\"registers\" failed\n"},
-                                         no_item()})));
-}
-
-TEST_F(Item, IndexOutsideTheGroupStartsNothing)
-{
-    load(item("a") + item("b"));
-    for (const int index : {2, 3, INT_MAX, -1, -2, INT_MIN}) {
-        SCOPED_TRACE(index);
-        EXPECT_THAT(run(index), ElementsAreArray(not_found()));
-    }
-    EXPECT_EQ(command_name(), padded(""));
-    EXPECT_THAT(run(1), ElementsAreArray(ordinary_run("b", "/system/bin/b -t 5")));
-}
-
-TEST_F(Item, NodeWithoutANameStartsNothingAndKeepsTheLastItem)
-{
-    run_item("before");
-    const std::string before = command_name();
-    EXPECT_EQ(before, padded("before"));
-
-    // the lookup begins at the first item, so that one comes first
-    platform::write_plan("<?xml version=\"1.0\"?><P><CmdGroup name=\"g\"><Cmd name=\"a\"/>"
-                         "<!-- note -->words<Cmd args=\"-t 5\"/><Cmd name=\"\" args=\"-t 5\"/>"
-                         "<Cmd/></CmdGroup></P>");
-    mxmlDelete(g_TestCmdTree);
-    g_TestCmdTree = nullptr;
-    ASSERT_NE(module::load_configs_file("/data/vorlane/src1.xml"), nullptr);
-    events();
-    EXPECT_THAT(run(1), ElementsAreArray(nameless("(null)", "(null)")));
-    EXPECT_THAT(run(2), ElementsAreArray(nameless("(null)", "(null)")));
-    EXPECT_THAT(run(3), ElementsAreArray(nameless("(null)", "-t 5")));
-    EXPECT_THAT(run(4), ElementsAreArray(nameless("", "-t 5")));
-    EXPECT_THAT(run(5), ElementsAreArray(nameless("(null)", "(null)")));
-    EXPECT_THAT(run(6), ElementsAreArray(not_found()));
-    EXPECT_EQ(command_name(), before);
-    EXPECT_THAT(left_open(), IsEmpty());
-}
-
-TEST_F(Item, ElementOfAnotherNameRunsLikeAnItem)
-{
-    load(item("a") + "<Step name=\"x\" args=\"-t 5\"/>");
-    EXPECT_THAT(run(1), ElementsAreArray(ordinary_run("x", "/system/bin/x -t 5")));
-}
-
-// --- the name --------------------------------------------------------------
-
-TEST_F(Item, NameIsCutAtItsFirstTabOrLineFeed)
-{
-    for (const std::string name : {"ab\tcd", "ab\ncd", "ab\t", "ab\n\tcd"}) {
-        SCOPED_TRACE(name);
-        platform::reset();
-        EXPECT_THAT(run_item(name), ElementsAreArray(ordinary_run(name, "/system/bin/ab -t 5")));
-        EXPECT_EQ(command_name(), padded("ab"));
-    }
-}
-
-TEST_F(Item, NameThatTheCutLeavesEmptyStillRuns)
-{
-    load(item("before") + item("\tab"));
-    run(0);
-    platform::reset();
-    EXPECT_THAT(run(1), ElementsAreArray(ordinary_run("\tab", "/system/bin/ -t 5")));
-    EXPECT_EQ(command_name(), padded(""));
-}
-
-TEST_F(Item, BlanksInANameStay)
-{
-    EXPECT_THAT(run_item(" a b "),
-                ElementsAreArray(ordinary_run(" a b ", "/system/bin/ a b  -t 5")));
-    EXPECT_EQ(command_name(), padded(" a b "));
-}
-
-TEST_F(Item, LastItemsNameHoldsSixtyFourCharactersWhileTheWholeNameRuns)
-{
-    std::string name;
-    for (int at = 0; at < 100; ++at) {
-        name += static_cast<char>('a' + at % 26);
-    }
-    for (const std::size_t length : {1U, 63U, 64U, 65U, 100U}) {
-        SCOPED_TRACE(length);
-        platform::reset();
-        const std::string whole = name.substr(0, length);
-        EXPECT_THAT(run_item(whole),
-                    ElementsAreArray(ordinary_run(whole, "/system/bin/" + whole + " -t 5")));
-        EXPECT_EQ(command_name(), padded(name.substr(0, std::min<std::size_t>(length, 64))));
-    }
-}
-
-TEST_F(Item, ShorterNameLeavesNothingOfALongerOne)
-{
-    load(item(std::string(64, 'n')) + item("m"));
-    run(0);
-    run(1);
-    EXPECT_EQ(command_name(), padded("m"));
-}
-
-TEST_F(Item, NameIsRecordedBetweenItsLineAndThePresenceCheck)
-{
-    load(item("before") + item("x"));
-    run(0);
-    Lines seen;
-    platform::on_log([&seen](const std::string &) { seen.push_back(module::command_name()); });
-    platform::on_system([&seen](const std::string &) { seen.push_back(module::command_name()); });
-    run(1);
-    // enter, the lookup's three, the name; the query's two, the command, its run, leave
-    EXPECT_THAT(seen, ElementsAre("before", "before", "before", "before", "before", "x", "x", "x",
-                                  "x", "x"));
-}
-
-TEST_F(Item, NameIsRecordedWithoutTheVendorsSuffix)
-{
-    run_item_under("1", "x");
-    EXPECT_EQ(command_name(), padded("x"));
-    run_item_under("2", "yz");
-    EXPECT_EQ(command_name(), padded("yz"));
-    run_item_under("1", "SensorProbe");
-    EXPECT_EQ(command_name(), padded("SensorProbe"));
-}
-
-TEST_F(Item, NameThatLeavesRoomForTheSuffixRunsWhole)
-{
-    for (const auto &[vendor, length] : {std::pair{"1", 1021U}, std::pair{"2", 1016U}}) {
-        SCOPED_TRACE(vendor);
-        const std::string name(length, 'n');
-        const std::string whole = name + (vendor[0] == '1' ? "_ca" : "_ca_qsee");
-        EXPECT_THAT(run_item_under(vendor, name),
-                    ElementsAreArray(joined({begun(vendor), looked_up(name), read(name), absent(),
-                                             suffixed(whole),
-                                             ordinary(("/system/bin/" + whole).substr(0, 1024))})));
-    }
-}
-
-TEST_F(Item, NameIsCutAtItsBufferAndTheSuffixStaysWithinIt)
-{
-    for (const std::string vendor : {"1", "2"}) {
-        for (const std::size_t length : {1017U, 1022U, 1023U, 1024U, 1025U, 2000U}) {
-            SCOPED_TRACE(length);
-            const auto seen = run_item_under(vendor, std::string(length, 'n'));
-            const std::string start = "SingleItemExecute| tLine:";
-            const auto line = std::find_if(seen.begin(), seen.end(), [&start](const auto &event) {
-                return event.starts_with(start);
-            });
-            ASSERT_NE(line, seen.end());
-            const std::string name = line->substr(start.size(), line->size() - start.size() - 1);
-            EXPECT_EQ(name.find_first_not_of('n'), std::min<std::size_t>(length, 1023));
-            EXPECT_LE(name.size(), 1024U);
+        set_vendor(GetParam().vendor);
+        const std::string name = "<Cmd name=\"" + GetParam().name + "\"";
+        load_plan(
+            plan_of(name + (GetParam().args ? " args=\"" + *GetParam().args + "\"/>" : "/>")));
+        if (GetParam().query) {
+            plan_output({*GetParam().query});
+        } else {
+            plan_steps("popen", {gives(0, EMFILE)});
         }
     }
-}
+    // The program, and the command line as far as it goes.
+    static std::string program()
+    {
+        const char *const suffixes[] = {"", "_ca", "_ca_qsee"};
+        return (GetParam().kept + suffixes[GetParam().vendor[0] - '0']).substr(0, kProgramRoom);
+    }
+    static std::string line()
+    {
+        return ("/system/bin/" + program() + " " + GetParam().args.value_or("(null)"))
+            .substr(0, 1024);
+    }
+    static Lines up_to_the_query()
+    {
+        const Lines suffixed{"SingleItemExecute| tLine:" + program() + "\n"};
+        return found(GetParam().name, GetParam().args.value_or("(null)"), GetParam().vendor) +
+               queried(GetParam().query) + (GetParam().vendor != "0" ? suffixed : Lines());
+    }
+    static Lines gatherer_found()
+    {
+        const bool runs = GetParam().query && !GetParam().query->empty();
+        return command(line()) + ("SingleItemExecute| \nrow=" +
+                                  std::to_string(GetParam().query ? int{runs} : -1) + "\n");
+    }
+};
 
-// --- the presence check ----------------------------------------------------
-
-TEST_F(Item, PresenceIsOneWhenTheQueryPrintsALine)
+TEST_P(ItemRun, IsLoggedAndStarted)
 {
-    plan_output({kRunning + "root 4712 /system/bin/SensorProbe_ca\n"});
-    EXPECT_EQ(module::ResourceReduce(), 1);
-    EXPECT_THAT(events(), ElementsAreArray(present(kRunning)));
-    EXPECT_THAT(left_open(), IsEmpty());
-}
+    prepare();
+    const Lines seen = run();
+    switch (GetParam().starts) {
+    case Starts::Program:
+        EXPECT_EQ(seen, up_to_the_query() + executed(line()));
+        break;
+    case Starts::Gatherer:
+        EXPECT_EQ(seen, up_to_the_query() + gatherer_found() + launch() + trigger() + left());
+        break;
+    case Starts::Trigger: // which says nothing of its leaving
+        EXPECT_EQ(seen, up_to_the_query() + gatherer_found() + trigger());
+        break;
+    }
+    EXPECT_EQ(command_name(), recorded(GetParam().kept.substr(0, 64)));
+    EXPECT_THAT(
+        left_open(),
+        ElementsAreArray(GetParam().starts == Starts::Program ? Lines() : Lines{"connection#1"}));
 
-TEST_F(Item, PresenceIsOneWhateverTheLineSays)
-{
-    for (const std::string line : {"\n", " ", "grep: error\n"}) {
-        SCOPED_TRACE(line);
-        platform::reset();
-        plan_output({line});
-        EXPECT_EQ(module::ResourceReduce(), 1);
-        EXPECT_THAT(events(), ElementsAreArray(present(line)));
+    if (GetParam().starts == Starts::Gatherer) { // the launcher's child tells the command
+        prepare();
+        plan_steps("vfork", {gives(0)});
+        platform::run_child([] { run(); });
+        EXPECT_EQ(events(), up_to_the_query() + gatherer_found() + launched(line()));
     }
 }
 
-TEST_F(Item, PresenceIsZeroWhenTheQueryPrintsNothing)
+std::string letters(std::size_t count)
 {
-    EXPECT_EQ(module::ResourceReduce(), 0);
-    EXPECT_THAT(events(), ElementsAreArray(absent()));
-    EXPECT_THAT(left_open(), IsEmpty());
-}
-
-TEST_F(Item, PresenceIsMinusOneWhenTheQueryCannotBeStarted)
-{
-    plan_steps("popen", {gives(0, EMFILE)});
-    EXPECT_EQ(module::ResourceReduce(), -1);
-    EXPECT_THAT(events(), ElementsAreArray(unanswered()));
-}
-
-TEST_F(Item, PresenceLineIsReadUpToOneHundredTwentyEightCharacters)
-{
-    for (const std::size_t length : {127U, 128U, 129U, 500U}) {
-        SCOPED_TRACE(length);
-        platform::reset();
-        const std::string line = std::string(length, 'p') + "\n";
-        plan_output({line});
-        EXPECT_EQ(module::ResourceReduce(), 1);
-        EXPECT_THAT(events(), ElementsAreArray(present(line.substr(0, 128))));
+    std::string text;
+    for (std::size_t at = 0; at < count; ++at) {
+        text += static_cast<char>('a' + at % 26);
     }
+    return text;
 }
 
-TEST_F(Item, StatusOfTheQueryIsIgnored)
+std::vector<Run> runs()
 {
-    plan_steps("pclose", {gives(-1, ECHILD), gives(256)});
-    plan_output({kRunning, ""});
-    EXPECT_EQ(module::ResourceReduce(), 1);
-    EXPECT_EQ(module::ResourceReduce(), 0);
+    constexpr auto kGathers = Starts::Gatherer;
+    constexpr auto kTriggers = Starts::Trigger;
+    std::vector<Run> all = {
+        {.what = "OrdinaryItem"},
+        {.what = "OrdinaryItemWhileAGathererRuns", .query = kRunning},
+        {.what = "OrdinaryItemWhoseQueryFails", .query = std::nullopt},
+        {.what = "EmptyArgumentsLeaveABlank", .args = ""},
+        {.what = "MissingArgumentsAreANullText", .args = std::nullopt},
+        {.what = "ArgumentsAreTakenUnchanged", .args = "  -a 'b c'\t%s | d ; $e  "},
+        {.what = "NameIsCutAtATab", .name = "ab\tcd", .kept = "ab"},
+        {.what = "NameIsCutAtALineFeed", .name = "ab\ncd", .kept = "ab"},
+        {.what = "NameIsCutAtALastTab", .name = "ab\t", .kept = "ab"},
+        {.what = "NameIsCutAtTheFirstOfBoth", .name = "ab\n\tcd", .kept = "ab"},
+        {.what = "NameThatTheCutLeavesEmptyRuns", .name = "\tab", .kept = ""},
+        {.what = "BlanksInANameStay", .name = " a b "},
+        {.what = "VendorOneAppendsItsSuffix", .vendor = "1"},
+        {.what = "VendorTwoAppendsItsSuffix", .vendor = "2"},
+        {.what = "VendorTwoHasNoGatherer", .vendor = "2", .name = kGatherer},
+        {.what = "VendorTwoHasNoGathererEvenWhileOneRuns",
+         .vendor = "2",
+         .name = kGatherer,
+         .query = kRunning},
+        {.what = "Gatherer", .name = kGatherer, .starts = kGathers},
+        {.what = "VendorOnesGatherer", .vendor = "1", .name = kGatherer, .starts = kGathers},
+        {.what = "GathererWhoseQueryFails",
+         .name = kGatherer,
+         .query = std::nullopt,
+         .starts = kGathers},
+        {.what = "GathererWithEmptyArguments", .name = kGatherer, .args = "", .starts = kGathers},
+        {.what = "GathererWithoutArguments",
+         .name = kGatherer,
+         .args = std::nullopt,
+         .starts = kGathers},
+        {.what = "RunningGatherer", .name = kGatherer, .query = kRunning, .starts = kTriggers},
+        {.what = "VendorOnesRunningGatherer",
+         .vendor = "1",
+         .name = kGatherer,
+         .query = kRunning,
+         .starts = kTriggers},
+        {.what = "GathererWhoseNameIsCut",
+         .name = kGatherer + "\tx",
+         .query = kRunning,
+         .starts = kTriggers,
+         .kept = kGatherer},
+    };
+    for (const char *name :
+         {"SensorProbe_ca", "SensorProbe_qsee", "SensorProbe_ca_qsee", "SensorProb", "SensorProbes",
+          "sensorprobe", "SENSORPROBE", "SensorProbe ", " SensorProbe", "xSensorProbe"}) {
+        for (const char *vendor : {"0", "1", "2"}) {
+            all.push_back({.what = "GathererIsComparedExactly", .vendor = vendor, .name = name});
+        }
+    }
+    for (const std::size_t length :
+         {1U, 63U, 64U, 65U, 100U, 1016U, 1017U, 1021U, 1022U, 1023U, 1024U, 1025U, 2000U}) {
+        for (const char *vendor : {"0", "1", "2"}) {
+            all.push_back({.what = "LongNameAndItsSuffix",
+                           .vendor = vendor,
+                           .name = letters(length),
+                           .kept = letters(std::min<std::size_t>(length, 1023))});
+        }
+    }
+    for (const std::size_t length : {1023U, 1024U, 1025U, 3000U}) {
+        for (const std::string &name : {std::string("x"), kGatherer}) {
+            const std::size_t rest = length - std::string("/system/bin/ ").size() - name.size();
+            all.push_back({.what = "LineHoldsOneThousandTwentyFourCharacters",
+                           .name = name,
+                           .args = std::string(rest, 'a'),
+                           .starts = name == kGatherer ? kGathers : Starts::Program});
+        }
+    }
+    return all;
 }
 
-// --- ordinary items --------------------------------------------------------
-
-TEST_F(Item, OrdinaryItemRunsThroughTheBlockingCall)
-{
-    EXPECT_THAT(run_item("x"), ElementsAreArray(ordinary_run("x", "/system/bin/x -t 5")));
-    EXPECT_THAT(left_open(), IsEmpty());
-}
-
-TEST_F(Item, OrdinaryItemRunsWhateverThePresenceCheckSays)
-{
-    plan_output({kRunning});
-    EXPECT_THAT(run_item("x"),
-                ElementsAreArray(joined({begun(), looked_up("x"), read("x"), present(kRunning),
-                                         ordinary("/system/bin/x -t 5")})));
-
-    platform::reset();
-    plan_steps("popen", {gives(0, EMFILE)});
-    EXPECT_THAT(run_item("x"),
-                ElementsAreArray(joined({begun(), looked_up("x"), read("x"), unanswered(),
-                                         ordinary("/system/bin/x -t 5")})));
-}
+INSTANTIATE_TEST_SUITE_P(Every, ItemRun, ::testing::ValuesIn(runs()), [](const auto &run) {
+    return run.param.what + std::to_string(run.index);
+});
 
 TEST_F(Item, StatusOfTheProgramIsIgnored)
 {
     for (const int status : {-1, 256, 127 << 8, 9}) {
-        SCOPED_TRACE(status);
-        platform::reset();
         plan_steps("system", {gives(status)});
-        EXPECT_THAT(run_item("x"), ElementsAreArray(ordinary_run("x", "/system/bin/x -t 5")));
+        EXPECT_EQ(run_item("0", "x"), ran("x")) << status;
     }
-}
-
-TEST_F(Item, EmptyArgumentsLeaveOneBlankAfterTheProgram)
-{
-    EXPECT_THAT(run_item("x", ""),
-                ElementsAreArray(joined({begun(), looked_up("x"), read("x", ""), absent(),
-                                         ordinary("/system/bin/x ")})));
-}
-
-TEST_F(Item, MissingArgumentsAreANullText)
-{
-    load("<Cmd name=\"x\"/>");
-    EXPECT_THAT(run(), ElementsAreArray(joined({begun(), looked_up("x"), read("x", "(null)"),
-                                                absent(), ordinary("/system/bin/x (null)")})));
-}
-
-TEST_F(Item, ArgumentsAreTakenUnchanged)
-{
-    const std::string args = "  -a 'b c'\t%s | d ; $e  ";
-    EXPECT_THAT(run_item("x", args),
-                ElementsAreArray(joined({begun(), looked_up("x"), read("x", args), absent(),
-                                         ordinary("/system/bin/x " + args)})));
-}
-
-TEST_F(Item, CommandLineIsCutAtOneThousandTwentyFourCharacters)
-{
-    const std::string program = "/system/bin/x ";
-    for (const std::size_t length : {1023U, 1024U, 1025U, 3000U}) {
-        SCOPED_TRACE(length);
-        platform::reset();
-        const std::string args(length - program.size(), 'a');
-        EXPECT_THAT(run_item("x", args),
-                    ElementsAreArray(joined({begun(), looked_up("x"), read("x", args), absent(),
-                                             ordinary((program + args).substr(0, 1024))})));
-    }
-}
-
-TEST_F(Item, GathererIsComparedExactly)
-{
-    for (const std::string name :
-         {"SensorProbe_ca", "SensorProbe_qsee", "SensorProbe_ca_qsee", "SensorProb", "SensorProbes",
-          "sensorprobe", "SENSORPROBE", "SensorProbe ", " SensorProbe", "xSensorProbe"}) {
-        SCOPED_TRACE(name);
-        platform::reset();
-        EXPECT_THAT(run_item(name),
-                    ElementsAreArray(ordinary_run(name, "/system/bin/" + name + " -t 5")));
-    }
-}
-
-TEST_F(Item, VendorOneAppendsItsSuffix)
-{
-    for (const std::string name :
-         {"x", "SensorProbe_ca", "SensorProb", "SensorProbes", "sensorprobe", "SensorProbe_qsee"}) {
-        SCOPED_TRACE(name);
-        EXPECT_THAT(run_item_under("1", name),
-                    ElementsAreArray(suffixed_run("1", name, name + "_ca")));
-    }
-}
-
-TEST_F(Item, VendorTwoAppendsItsSuffixAndHasNoGatherer)
-{
-    for (const std::string name : {"x", "SensorProbe", "SensorProbe_qsee", "SensorProbe_ca"}) {
-        SCOPED_TRACE(name);
-        EXPECT_THAT(run_item_under("2", name),
-                    ElementsAreArray(suffixed_run("2", name, name + "_ca_qsee")));
-    }
-}
-
-TEST_F(Item, VendorTwoHasNoGathererEvenWhileOneRuns)
-{
-    set_vendor("2");
-    plan_output({kRunning});
-    EXPECT_THAT(run_item("SensorProbe"),
-                ElementsAreArray(joined({begun("2"), looked_up("SensorProbe"), read("SensorProbe"),
-                                         present(kRunning), suffixed("SensorProbe_ca_qsee"),
-                                         ordinary("/system/bin/SensorProbe_ca_qsee -t 5")})));
-}
-
-TEST_F(Item, AnyOtherVendorStartsNothingAfterThePresenceCheck)
-{
-    for (const std::string vendor : {"3", "-1", "-2", "10", "2147483647", "-2147483648"}) {
-        for (const std::string name : {"x", "SensorProbe"}) {
-            SCOPED_TRACE(vendor + name);
-            EXPECT_THAT(run_item_under(vendor, name),
-                        ElementsAreArray(joined(
-                            {begun(vendor),
-                             looked_up(name),
-                             read(name),
-                             absent(),
-                             {"SingleItemExecute| More than one vendor, Setting error!\n"}})));
-            EXPECT_EQ(command_name(), padded(name));
-        }
-    }
-}
-
-// --- the gatherer ----------------------------------------------------------
-
-TEST_F(Item, GathererIsStartedInTheBackgroundAndThenTriggered)
-{
-    EXPECT_THAT(run_item("SensorProbe"),
-                ElementsAreArray(joined({begun(), looked_up("SensorProbe"), read("SensorProbe"),
-                                         absent(), command("/system/bin/SensorProbe -t 5"), row(0),
-                                         launch(), trigger(), left()})));
-    EXPECT_EQ(command_name(), padded("SensorProbe"));
-    EXPECT_THAT(left_open(), ElementsAre("connection#1"));
-}
-
-TEST_F(Item, GatherersCommandReachesTheShell)
-{
-    EXPECT_THAT(run_child("SensorProbe"),
-                ElementsAreArray(joined({begun(), looked_up("SensorProbe"), read("SensorProbe"),
-                                         absent(), command("/system/bin/SensorProbe -t 5"), row(0),
-                                         launched("/system/bin/SensorProbe -t 5")})));
-
-    platform::reset();
-    set_vendor("1");
-    EXPECT_THAT(run_child("SensorProbe"),
-                ElementsAreArray(
-                    joined({begun("1"), looked_up("SensorProbe"), read("SensorProbe"), absent(),
-                            suffixed("SensorProbe_ca"), command("/system/bin/SensorProbe_ca -t 5"),
-                            row(0), launched("/system/bin/SensorProbe_ca -t 5")})));
-}
-
-TEST_F(Item, VendorOneStartsItsOwnGatherer)
-{
-    EXPECT_THAT(run_item_under("1", "SensorProbe"),
-                ElementsAreArray(
-                    joined({begun("1"), looked_up("SensorProbe"), read("SensorProbe"), absent(),
-                            suffixed("SensorProbe_ca"), command("/system/bin/SensorProbe_ca -t 5"),
-                            row(0), launch(), trigger(), left()})));
-}
-
-TEST_F(Item, RunningGathererIsOnlyTriggeredWithNoLeaveLine)
-{
-    plan_output({kRunning});
-    EXPECT_THAT(run_item("SensorProbe"),
-                ElementsAreArray(joined({begun(), looked_up("SensorProbe"), read("SensorProbe"),
-                                         present(kRunning), command("/system/bin/SensorProbe -t 5"),
-                                         row(1), trigger()})));
-    EXPECT_THAT(left_open(), ElementsAre("connection#1"));
-
-    platform::reset();
-    set_vendor("1");
-    plan_output({kRunning});
-    EXPECT_THAT(
-        run_item("SensorProbe"),
-        ElementsAreArray(joined({begun("1"), looked_up("SensorProbe"), read("SensorProbe"),
-                                 present(kRunning), suffixed("SensorProbe_ca"),
-                                 command("/system/bin/SensorProbe_ca -t 5"), row(1), trigger()})));
-}
-
-TEST_F(Item, GathererIsStartedWhenThePresenceQueryFails)
-{
-    plan_steps("popen", {gives(0, EMFILE)});
-    EXPECT_THAT(run_item("SensorProbe"),
-                ElementsAreArray(joined({begun(), looked_up("SensorProbe"), read("SensorProbe"),
-                                         unanswered(), command("/system/bin/SensorProbe -t 5"),
-                                         row(-1), launch(), trigger(), left()})));
 }
 
 TEST_F(Item, GathererIsTriggeredThoughItsLaunchFailed)
 {
+    load_plan(plan_of(cmd(kGatherer)));
     plan_steps("vfork", {gives(-1, EAGAIN)});
-    EXPECT_THAT(run_item("SensorProbe"),
-                ElementsAreArray(joined({begun(), looked_up("SensorProbe"), read("SensorProbe"),
-                                         absent(), command("/system/bin/SensorProbe -t 5"), row(0),
-                                         failed_launch(), trigger(), left()})));
+    EXPECT_EQ(run(), found(kGatherer) + queried() + command("/system/bin/SensorProbe -t 5") +
+                         "SingleItemExecute| \nrow=0\n" + failed_launch() + trigger() + left());
 }
 
 TEST_F(Item, RunEndsAsUsualWhenTheTriggerFails)
 {
+    load_plan(plan_of(cmd(kGatherer)));
     plan_steps("Accept", {gives(-1, EMFILE)});
-    EXPECT_THAT(
-        run_item("SensorProbe"),
-        ElementsAreArray(joined({begun(), looked_up("SensorProbe"), read("SensorProbe"), absent(),
-                                 command("/system/bin/SensorProbe -t 5"), row(0), launch(),
-                                 failed_accept(std::to_string(EMFILE)), left()})));
+    EXPECT_EQ(run(), found(kGatherer) + queried() + command("/system/bin/SensorProbe -t 5") +
+                         "SingleItemExecute| \nrow=0\n" + launch() + listener() +
+                         accept_failed(EMFILE) + left());
     EXPECT_THAT(left_open(), ElementsAre("listener#1"));
-}
-
-TEST_F(Item, GathererWhoseNameIsCutIsTheGatherer)
-{
-    plan_output({kRunning});
-    EXPECT_THAT(
-        run_item("SensorProbe\tx"),
-        ElementsAreArray(
-            joined({begun(), looked_up("SensorProbe\tx"), read("SensorProbe\tx"), present(kRunning),
-                    command("/system/bin/SensorProbe -t 5"), row(1), trigger()})));
-}
-
-TEST_F(Item, GatherersArgumentsMayBeEmptyOrMissing)
-{
-    EXPECT_THAT(run_child("SensorProbe", ""),
-                ElementsAreArray(joined({begun(), looked_up("SensorProbe"), read("SensorProbe", ""),
-                                         absent(), command("/system/bin/SensorProbe "), row(0),
-                                         launched("/system/bin/SensorProbe ")})));
-
-    platform::reset();
-    load("<Cmd name=\"SensorProbe\"/>");
-    EXPECT_THAT(run(), ElementsAreArray(
-                           joined({begun(), looked_up("SensorProbe"), read("SensorProbe", "(null)"),
-                                   absent(), command("/system/bin/SensorProbe (null)"), row(0),
-                                   launch(), trigger(), left()})));
-}
-
-TEST_F(Item, GatherersCommandLineIsCutAtOneThousandTwentyFourCharacters)
-{
-    const std::string program = "/system/bin/SensorProbe ";
-    for (const std::size_t length : {1023U, 1024U, 1025U, 3000U}) {
-        SCOPED_TRACE(length);
-        platform::reset();
-        const std::string args(length - program.size(), 'a');
-        const std::string cut = (program + args).substr(0, 1024);
-        EXPECT_THAT(
-            run_child("SensorProbe", args),
-            ElementsAreArray(joined({begun(), looked_up("SensorProbe"), read("SensorProbe", args),
-                                     absent(), command(cut), row(0), launched(cut)})));
-    }
 }
 
 TEST_F(Item, GroupStartsTheGathererOnceAndTriggersItTwice)
 {
-    load(item("SensorProbe") + item("SensorProbe", "-x"));
+    load_plan(plan_of(cmd(kGatherer) + cmd(kGatherer, "-x")));
     plan_output({"", kRunning});
     EXPECT_THAT(run(0), Contains("vfork() = 100").Times(1));
     const auto second = run(1);
@@ -765,7 +264,7 @@ TEST_F(Item, GroupStartsTheGathererOnceAndTriggersItTwice)
 
 TEST_F(Item, RunChangesNothingInThePlan)
 {
-    load(item("x") + "<Cmd name=\"ab\tcd\"/>");
+    load_plan(plan_of(cmd("x") + "<Cmd name=\"ab\tcd\"/>"));
     const auto first = run(0);
     run(1);
     EXPECT_EQ(run(0).size(), first.size());
@@ -773,6 +272,176 @@ TEST_F(Item, RunChangesNothingInThePlan)
                                                     "ab\tcd", MXML_DESCEND),
                                     "name"),
                  "ab\tcd");
+}
+
+// --- the vendor ------------------------------------------------------------
+
+TEST_F(Item, VendorIsTheDecimalNumberThatTheTextBeginsWith)
+{
+    struct Case {
+        std::string text;
+        int number;
+        int clamped = number; // where a long has 32 bits, as it is read as one
+    };
+    for (const auto &[text, number, clamped] : std::initializer_list<Case>{
+             {"0", 0},
+             {"1", 1},
+             {"2", 2},
+             {"3", 3},
+             {"-1", -1},
+             {"+2", 2},
+             {" 1", 1},
+             {"\t\n 1", 1},
+             {"1abc", 1},
+             {"1 2", 1},
+             {"1.9", 1},
+             {"01", 1},
+             {"010", 10},
+             {"0x1", 0},
+             {"", 0},
+             {"abc", 0},
+             {"a1", 0},
+             {"- 1", 0},
+             {"2147483647", INT_MAX},
+             {"-2147483648", INT_MIN},
+             {std::string(63, '0') + "1", 1},  // 64 characters
+             {std::string(63, '0') + "12", 1}, // 65, of which 64 are read
+             {"2147483648", INT_MIN, INT_MAX},
+             {"-2147483649", INT_MAX, INT_MIN},
+             {"4294967295", -1, INT_MAX},
+             {"4294967296", 0, INT_MAX},
+             {"4294967297", 1, INT_MAX},
+             {"-4294967295", 1, INT_MIN},
+             {"99999999999999999999", -1, INT_MAX},
+         }) {
+        platform::reset();
+        set_vendor(text);
+        load_plan(plan_of(""));
+
+        const int expected = sizeof(long) == 8 ? number : clamped;
+        EXPECT_EQ(run(), found_nothing(asked_item("(null)"), std::to_string(expected))) << text;
+        EXPECT_EQ(internals::vendor, expected) << text;
+    }
+}
+
+TEST_F(Item, VendorIsReadAfreshForEveryItemAndZeroWhereThereIsNone)
+{
+    load_plan(plan_of(cmd("a") + cmd("b")));
+    set_vendor("1");
+    EXPECT_THAT(run(0), Contains("system(/system/bin/a_ca -t 5)"));
+    set_vendor("2");
+    EXPECT_THAT(run(1), Contains("system(/system/bin/b_ca_qsee -t 5)"));
+    platform::reset();
+    EXPECT_EQ(run(1), ran("b"));
+    EXPECT_EQ(internals::vendor, 0);
+}
+
+TEST_F(Item, AnyOtherVendorStartsNothingAfterThePresenceCheck)
+{
+    for (const std::string vendor : {"3", "-1", "-2", "10", "2147483647", "-2147483648"}) {
+        for (const std::string &name : {std::string("x"), kGatherer}) {
+            EXPECT_EQ(run_item(vendor, name),
+                      found(name, "-t 5", vendor) + queried() +
+                          "SingleItemExecute| More than one vendor, Setting error!\n");
+            EXPECT_EQ(command_name(), recorded(name));
+        }
+    }
+}
+
+// --- the lookup ------------------------------------------------------------
+
+TEST_F(Item, LookupThatFailsStartsNothingAfterTheVendorIsRead)
+{
+    set_vendor("2");
+    internals::SingleItemExecute(nullptr, "g", 0);
+    EXPECT_EQ(events(), found_nothing(no_item(kNoPlan), "2"));
+    EXPECT_EQ(internals::vendor, 2);
+
+    load_plan(plan_of(cmd("a") + cmd("b")));
+    internals::SingleItemExecute(g_TestCmdTree, "h", 0);
+    EXPECT_EQ(events(), found_nothing(no_item(kNoGroup), "2"));
+    for (const int index : {2, 3, INT_MAX, -1, -2, INT_MIN}) {
+        EXPECT_EQ(run(index), found_nothing(asked_item("(null)"), "2")) << index;
+    }
+    EXPECT_EQ(command_name(), recorded(""));
+}
+
+TEST_F(Item, NodeWithoutANameStartsNothingAndKeepsTheLastItem)
+{
+    // the lookup begins at the first item, so that one comes first
+    load_plan(
+        plan_of(cmd("before") + "<!-- note -->words<Cmd args=\"-t 5\"/>" + cmd("") + "<Cmd/>"));
+    run(0);
+    EXPECT_EQ(run(1), nameless());
+    EXPECT_EQ(run(2), nameless());
+    EXPECT_EQ(run(3), nameless("(null)", "-t 5"));
+    EXPECT_EQ(run(4), nameless("", "-t 5"));
+    EXPECT_EQ(run(5), nameless());
+    EXPECT_EQ(run(6), found_nothing());
+    EXPECT_EQ(command_name(), recorded("before"));
+    EXPECT_THAT(left_open(), IsEmpty());
+}
+
+// --- the name --------------------------------------------------------------
+
+TEST_F(Item, ShorterNameLeavesNothingOfALongerOne)
+{
+    load_plan(plan_of(cmd(std::string(64, 'n')) + cmd("m")));
+    run(0);
+    run(1);
+    EXPECT_EQ(command_name(), recorded("m"));
+}
+
+TEST_F(Item, NameIsRecordedBetweenItsLineAndThePresenceCheck)
+{
+    load_plan(plan_of(cmd("before") + cmd("x")));
+    run(0);
+    Lines seen;
+    platform::on_log([&seen](const std::string &) { seen.push_back(internals::command_name); });
+    platform::on_system([&seen](const std::string &) { seen.push_back(internals::command_name); });
+    run(1);
+    // enter, the lookup's three, the name; the query's two, the command, its run, leave
+    EXPECT_THAT(seen, ElementsAre("before", "before", "before", "before", "before", "x", "x", "x",
+                                  "x", "x"));
+}
+
+// --- the presence check ----------------------------------------------------
+
+TEST_F(Item, PresenceIsToldByTheFirstLineThatTheQueryPrints)
+{
+    const std::string longest(128, 'p');
+    for (const auto &[output, line, present] :
+         std::initializer_list<std::tuple<std::string, std::string, int>>{
+             {"", "", 0},
+             {kRunning + "root 4712 /system/bin/SensorProbe_ca\n", kRunning, 1},
+             {"\n", "\n", 1},
+             {" ", " ", 1},
+             {"grep: error\n", "grep: error\n", 1},
+             {longest.substr(1) + "\n", longest.substr(1) + "\n", 1},
+             {longest + "\n", longest, 1},
+             {longest + "p\n", longest, 1},
+             {longest + longest + "\n", longest, 1}}) {
+        platform::reset();
+        plan_output({output});
+        EXPECT_EQ(internals::ResourceReduce(), present) << output;
+        EXPECT_EQ(events(), queried(line)) << output;
+        EXPECT_THAT(left_open(), IsEmpty());
+    }
+}
+
+TEST_F(Item, PresenceIsMinusOneWhenTheQueryCannotBeStarted)
+{
+    plan_steps("popen", {gives(0, EMFILE)});
+    EXPECT_EQ(internals::ResourceReduce(), -1);
+    EXPECT_EQ(events(), queried(std::nullopt));
+}
+
+TEST_F(Item, StatusOfTheQueryIsIgnored)
+{
+    plan_steps("pclose", {gives(-1, ECHILD), gives(256)});
+    plan_output({kRunning, ""});
+    EXPECT_EQ(internals::ResourceReduce(), 1);
+    EXPECT_EQ(internals::ResourceReduce(), 0);
 }
 
 } // namespace

@@ -4,10 +4,12 @@
 // The read-back: the plan's file, byte by byte, in the caller's buffer.
 #include "unit_test.h"
 
+#include <algorithm>
 #include <cerrno>
 #include <climits>
 #include <csignal>
 #include <cstdio>
+#include <ostream>
 #include <unistd.h>
 
 using platform::events;
@@ -30,29 +32,7 @@ namespace
 constexpr char kGuard = '\x7e';
 constexpr std::size_t kAfter = 64;
 
-// Standard output's descriptor is free meanwhile.
-class FreedOutput
-{
-  public:
-    FreedOutput()
-    {
-        std::fflush(stdout);
-        kept_ = dup(STDOUT_FILENO);
-        close(STDOUT_FILENO);
-    }
-    ~FreedOutput()
-    {
-        dup2(kept_, STDOUT_FILENO);
-        close(kept_);
-    }
-    FreedOutput(const FreedOutput &) = delete;
-    FreedOutput &operator=(const FreedOutput &) = delete;
-
-  private:
-    int kept_ = -1;
-};
-
-class ReadBack : public ModuleTest
+class ReadBack : public LibraryTest
 {
   protected:
     // Bytes of every kind, none like its neighbour or the guard.
@@ -73,28 +53,24 @@ class ReadBack : public ModuleTest
         return buffer;
     }
     // The same, where only so many bytes came.
-    static std::string filled(int capacity, const std::string &text)
+    static std::string received(int capacity, const std::string &text)
     {
         return text +
                std::string(static_cast<std::size_t>(capacity) + kAfter - text.size(), kGuard);
     }
 
-    static Lines line(const std::string &text)
+    static std::string line(const std::string &text)
     {
-        return {"FPTEST_ExtractResultMsg| " + text};
+        return "FPTEST_ExtractResultMsg| " + text;
     }
     // From the call to the last offset, for a file of that size.
     static Lines begun(std::size_t size)
     {
         const std::string end = std::to_string(size);
-        return joined({line("enter... !\n"),
-                       {"open(/data/vorlane/src1.xml, O_RDONLY) = plan#1"},
-                       {"lseek(plan#1, 0, SEEK_CUR) = 0"},
-                       line("offset = 0"),
-                       {"lseek(plan#1, 0, SEEK_END) = " + end},
-                       line("offset = " + end),
-                       {"lseek(plan#1, 0, SEEK_SET) = 0"},
-                       line("offset = 0")});
+        return Lines{line("enter... !\n")} + "open(/data/vorlane/src1.xml, O_RDONLY) = plan#1" +
+               "lseek(plan#1, 0, SEEK_CUR) = 0" + line("offset = 0") +
+               ("lseek(plan#1, 0, SEEK_END) = " + end) + line("offset = " + end) +
+               "lseek(plan#1, 0, SEEK_SET) = 0" + line("offset = 0");
     }
     static Lines read_call(int asked, int result)
     {
@@ -102,26 +78,24 @@ class ReadBack : public ModuleTest
     }
     static Lines piece(int asked, int got)
     {
-        return joined({read_call(asked, got),
-                       line("read file unfinish, continue... n = " + std::to_string(got) + " \n")});
+        return read_call(asked, got) +
+               line("read file unfinish, continue... n = " + std::to_string(got) + " \n");
     }
     static Lines failure(int asked)
     {
-        return joined({read_call(asked, -1), line("FPTEST_ExtractResultMsg[]:read file failed\n")});
+        return read_call(asked, -1) + line("FPTEST_ExtractResultMsg[]:read file failed\n");
     }
     static Lines ended(int asked, int total)
     {
-        return joined({read_call(asked, 0),
-                       line("reach the end of file\n"),
-                       line("read byte count = " + std::to_string(total) + "\n"),
-                       {"close(plan#1)"},
-                       line("leave...\n")});
+        return read_call(asked, 0) + line("reach the end of file\n") +
+               line("read byte count = " + std::to_string(total) + "\n") + "close(plan#1)" +
+               line("leave...\n");
     }
     static Lines not_opened(const std::string &descriptor)
     {
-        return joined({line("enter... !\n"),
-                       {"open(/data/vorlane/src1.xml, O_RDONLY) = " + descriptor},
-                       line("Open /data/vorlane/src1.xml file failed!\n")});
+        return Lines{line("enter... !\n")} +
+               ("open(/data/vorlane/src1.xml, O_RDONLY) = " + descriptor) +
+               line("Open /data/vorlane/src1.xml file failed!\n");
     }
 };
 
@@ -144,141 +118,88 @@ class ReadBackAssertion : public ReadBack
     }
 };
 
-TEST_F(ReadBack, FileShorterThanTheBufferIsReadWholeWithNothingAfterIt)
-{
-    write_plan(bytes(300));
-    EXPECT_EQ(read_back(1000), filled(1000, bytes(300)));
+struct Reading {
+    const char *what;
+    std::size_t size; // of the file
+    int capacity;
+    std::vector<platform::Step> steps; // of read
+    std::vector<int> results;          // before the end; -1 is a failure
+};
 
-    EXPECT_THAT(events(),
-                ElementsAreArray(joined({begun(300), piece(1000, 300), ended(700, 300)})));
-    EXPECT_THAT(left_open(), IsEmpty());
+void PrintTo(const Reading &reading, std::ostream *out)
+{
+    *out << reading.what;
 }
 
-TEST_F(ReadBack, EmptyFileLeavesTheBufferUntouched)
+class ReadBackOf : public ReadBack, public ::testing::WithParamInterface<Reading>
 {
-    write_plan("");
-    EXPECT_EQ(read_back(100), filled(100, ""));
-    EXPECT_THAT(events(), ElementsAreArray(joined({begun(0), ended(100, 0)})));
-    EXPECT_THAT(left_open(), IsEmpty());
-}
+};
 
-TEST_F(ReadBack, NoCapacityReadsNothing)
+TEST_P(ReadBackOf, FillsTheBufferPieceByPiece)
 {
-    write_plan(bytes(300));
-    EXPECT_EQ(read_back(0), filled(0, ""));
-    EXPECT_THAT(events(), ElementsAreArray(joined({begun(300), ended(0, 0)})));
-}
+    const auto &[what, size, capacity, steps, results] = GetParam();
+    write_plan(bytes(size));
+    plan_steps("read", steps);
+    const std::size_t kept = std::min(size, static_cast<std::size_t>(capacity));
+    EXPECT_EQ(read_back(capacity), received(capacity, bytes(kept)));
 
-TEST_F(ReadBack, FileOfTheBuffersSizeFillsItWithNoZeroAfter)
-{
-    write_plan(bytes(300));
-    EXPECT_EQ(read_back(300), filled(300, bytes(300)));
-    EXPECT_THAT(events(), ElementsAreArray(joined({begun(300), piece(300, 300), ended(0, 300)})));
-}
-
-TEST_F(ReadBack, FileOneByteShorterOrLongerThanTheBuffer)
-{
-    write_plan(bytes(300));
-    EXPECT_EQ(read_back(301), filled(301, bytes(300)));
-    EXPECT_THAT(events(), ElementsAreArray(joined({begun(300), piece(301, 300), ended(1, 300)})));
-
-    platform::reset();
-    write_plan(bytes(300));
-    EXPECT_EQ(read_back(299), filled(299, bytes(299)));
-    EXPECT_THAT(events(), ElementsAreArray(joined({begun(300), piece(299, 299), ended(0, 299)})));
-}
-
-TEST_F(ReadBack, LongerFileIsCutAtTheBuffersSizeAndOnlyTheOffsetTells)
-{
-    write_plan(bytes(600));
-    EXPECT_EQ(read_back(500), filled(500, bytes(500)));
-    EXPECT_THAT(events(), ElementsAreArray(joined({begun(600), piece(500, 500), ended(0, 500)})));
-}
-
-TEST_F(ReadBack, LargeFileIsReadWhole)
-{
-    write_plan(bytes(200000));
-    EXPECT_EQ(read_back(300000), filled(300000, bytes(200000)));
-    EXPECT_THAT(events(), ElementsAreArray(joined(
-                              {begun(200000), piece(300000, 200000), ended(100000, 200000)})));
-}
-
-TEST_F(ReadBack, EachPieceLandsAfterTheLastAndIsLogged)
-{
-    write_plan(bytes(300));
-    plan_steps("read", {limit(1), limit(150), limit(100)});
-    EXPECT_EQ(read_back(400), filled(400, bytes(300)));
-
-    EXPECT_THAT(events(),
-                ElementsAreArray(joined({begun(300), piece(400, 1), piece(399, 150),
-                                         piece(249, 100), piece(149, 49), ended(100, 300)})));
-}
-
-TEST_F(ReadBack, PiecesFillTheBufferUpToItsSize)
-{
-    write_plan(bytes(300));
-    plan_steps("read", {limit(60), limit(39)});
-    EXPECT_EQ(read_back(100), filled(100, bytes(100)));
-
-    EXPECT_THAT(events(), ElementsAreArray(joined({begun(300), piece(100, 60), piece(40, 39),
-                                                   piece(1, 1), ended(0, 100)})));
-}
-
-TEST_F(ReadBack, FailedReadIsLoggedAndTriedAgainWhateverTheError)
-{
-    write_plan(bytes(300));
-    plan_steps("read", {gives(-1, EINTR), gives(-1, EIO), gives(-1, EBADF)});
-    EXPECT_EQ(read_back(400), filled(400, bytes(300)));
-
-    EXPECT_THAT(events(),
-                ElementsAreArray(joined({begun(300), failure(400), failure(400), failure(400),
-                                         piece(400, 300), ended(100, 300)})));
-    EXPECT_THAT(left_open(), IsEmpty());
-}
-
-TEST_F(ReadBack, FailedReadBetweenPiecesIsTriedAgainAtTheSamePlace)
-{
-    write_plan(bytes(300));
-    plan_steps("read", {limit(100), gives(-1, EIO), gives(-1, EIO), pass(), gives(-1, EIO)});
-    EXPECT_EQ(read_back(400), filled(400, bytes(300)));
-
-    EXPECT_THAT(events(),
-                ElementsAreArray(joined({begun(300), piece(400, 100), failure(300), failure(300),
-                                         piece(300, 200), failure(100), ended(100, 300)})));
-}
-
-TEST_F(ReadBack, LastingReadErrorIsTriedAgainWithoutALimit)
-{
-    constexpr int kFailures = 20000;
-    write_plan("x");
-    plan_steps("read", std::vector(kFailures, gives(-1, EIO)));
-    EXPECT_EQ(read_back(10), filled(10, "x"));
-
-    auto expected = begun(1);
-    for (int count = 0; count < kFailures; ++count) {
-        const auto again = failure(10);
-        expected.insert(expected.end(), again.begin(), again.end());
+    Lines expected = begun(size);
+    int room = capacity;
+    for (const int result : results) {
+        for (const std::string &line : result < 0 ? failure(room) : piece(room, result)) {
+            expected.push_back(line);
+        }
+        room -= std::max(result, 0);
     }
-    EXPECT_EQ(events(), joined({expected, piece(10, 1), ended(9, 1)}));
+    EXPECT_EQ(events(), expected + ended(room, static_cast<int>(kept)));
+    EXPECT_THAT(left_open(), IsEmpty());
 }
+
+std::vector<Reading> readings()
+{
+    const auto error = gives(-1, EIO);
+    std::vector<int> lasting(20000, -1);
+    lasting.push_back(1);
+    return {
+        {"FileShorterThanTheBuffer", 300, 1000, {}, {300}},
+        {"EmptyFile", 0, 100, {}, {}},
+        {"NoCapacity", 300, 0, {}, {}},
+        {"FileOfTheBuffersSize", 300, 300, {}, {300}},
+        {"FileOneByteShorter", 300, 301, {}, {300}},
+        {"FileOneByteLonger", 300, 299, {}, {299}},
+        {"LongerFileIsCut", 600, 500, {}, {500}},
+        {"LargeFile", 200000, 300000, {}, {200000}},
+        {"Pieces", 300, 400, {limit(1), limit(150), limit(100)}, {1, 150, 100, 49}},
+        {"PiecesUpToTheBuffersSize", 300, 100, {limit(60), limit(39)}, {60, 39, 1}},
+        {"FailuresOfEveryKindAreTriedAgain",
+         300,
+         400,
+         {gives(-1, EINTR), error, gives(-1, EBADF)},
+         {-1, -1, -1, 300}},
+        {"FailuresBetweenPieces",
+         300,
+         400,
+         {limit(100), error, error, pass(), error},
+         {100, -1, -1, 200, -1}},
+        {"LastingFailure", 1, 10, std::vector(20000, error), lasting},
+    };
+}
+
+INSTANTIATE_TEST_SUITE_P(Every, ReadBackOf, ::testing::ValuesIn(readings()),
+                         [](const auto &one) { return std::string(one.param.what); });
 
 TEST_F(ReadBack, OffsetsAreOnlyLogged)
 {
     write_plan(bytes(300));
     plan_steps("lseek", {gives(-1, ESPIPE), gives(7), gives(12)});
-    EXPECT_EQ(read_back(400), filled(400, bytes(300)));
+    EXPECT_EQ(read_back(400), received(400, bytes(300)));
 
-    EXPECT_THAT(events(),
-                ElementsAreArray(joined({line("enter... !\n"),
-                                         {"open(/data/vorlane/src1.xml, O_RDONLY) = plan#1"},
-                                         {"lseek(plan#1, 0, SEEK_CUR) = -1"},
-                                         line("offset = -1"),
-                                         {"lseek(plan#1, 0, SEEK_END) = 7"},
-                                         line("offset = 7"),
-                                         {"lseek(plan#1, 0, SEEK_SET) = 12"},
-                                         line("offset = 12"),
-                                         piece(400, 300),
-                                         ended(100, 300)})));
+    EXPECT_EQ(events(),
+              (Lines{line("enter... !\n")} + "open(/data/vorlane/src1.xml, O_RDONLY) = plan#1" +
+               "lseek(plan#1, 0, SEEK_CUR) = -1" + line("offset = -1") +
+               "lseek(plan#1, 0, SEEK_END) = 7" + line("offset = 7") +
+               "lseek(plan#1, 0, SEEK_SET) = 12" + line("offset = 12") + piece(400, 300) +
+               ended(100, 300)));
 }
 
 TEST_F(ReadBack, OffsetIsLoggedAsAnInt)
@@ -299,25 +220,25 @@ TEST_F(ReadBack, OffsetIsLoggedAsAnInt)
 TEST_F(ReadBack, FileIsReadNotThePlanInMemory)
 {
     write_plan("<P><CmdGroup name=\"g\"><Cmd name=\"a\"/></CmdGroup></P>");
-    ASSERT_NE(module::load_configs_file("/data/vorlane/src1.xml"), nullptr);
+    ASSERT_NE(internals::load_configs_file(kPath), nullptr);
     const mxml_node_t *tree = g_TestCmdTree;
     write_plan("not a plan: \t\r\n <");
 
-    EXPECT_EQ(read_back(100), filled(100, "not a plan: \t\r\n <"));
+    EXPECT_EQ(read_back(100), received(100, "not a plan: \t\r\n <"));
     EXPECT_EQ(g_TestCmdTree, tree);
 }
 
 TEST_F(ReadBack, FileThatDoesNotParseIsReadAndNotLoaded)
 {
     write_plan("<P><");
-    EXPECT_EQ(read_back(100), filled(100, "<P><"));
+    EXPECT_EQ(read_back(100), received(100, "<P><"));
     EXPECT_EQ(g_TestCmdTree, nullptr);
 }
 
 TEST_F(ReadBack, MissingFileLeavesTheBufferUntouchedWithNoLeaveLine)
 {
-    EXPECT_EQ(read_back(100), filled(100, ""));
-    EXPECT_THAT(events(), ElementsAreArray(not_opened("-1")));
+    EXPECT_EQ(read_back(100), received(100, ""));
+    EXPECT_EQ(events(), not_opened("-1"));
     EXPECT_FALSE(platform::plan_exists());
 }
 
@@ -325,8 +246,8 @@ TEST_F(ReadBack, DescriptorZeroIsAFailureAndStaysOpen)
 {
     write_plan(bytes(300));
     platform::free_descriptor_zero();
-    EXPECT_EQ(read_back(100), filled(100, ""));
-    EXPECT_THAT(events(), ElementsAreArray(not_opened("plan#1")));
+    EXPECT_EQ(read_back(100), received(100, ""));
+    EXPECT_EQ(events(), not_opened("plan#1"));
     EXPECT_THAT(left_open(), ElementsAre("plan#1"));
 }
 
@@ -338,8 +259,8 @@ TEST_F(ReadBack, DescriptorOneIsASuccess)
         const FreedOutput freed;
         got = read_back(400);
     }
-    EXPECT_EQ(got, filled(400, bytes(300)));
-    EXPECT_THAT(events(), ElementsAreArray(joined({begun(300), piece(400, 300), ended(100, 300)})));
+    EXPECT_EQ(got, received(400, bytes(300)));
+    EXPECT_EQ(events(), begun(300) + piece(400, 300) + ended(100, 300));
     EXPECT_THAT(left_open(), IsEmpty());
 }
 
@@ -365,7 +286,7 @@ TEST_F(ReadBack, NegativeCapacityReadsAnEmptyFileAsAnyOther)
         FPTEST_ExtractResultMsg(buffer.data(), capacity);
 
         EXPECT_EQ(buffer, std::string(kAfter, kGuard));
-        auto lines = joined({begun(0), ended(0, 0)});
+        auto lines = begun(0) + ended(0, 0);
         std::erase_if(lines, [](const auto &event) { return event.starts_with("read("); });
         auto seen = events();
         EXPECT_EQ(std::erase_if(seen, [](const auto &event) { return event.starts_with("read("); }),

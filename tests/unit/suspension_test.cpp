@@ -4,8 +4,8 @@
 // The suspension: the item last started is looked up in the process list and
 // killed.
 #include "sequences.h"
-#include "unit_test.h"
 
+#include <algorithm>
 #include <cerrno>
 
 using platform::events;
@@ -22,14 +22,13 @@ namespace
 constexpr char kHeader[] = "USER     PID   PPID  VSIZE  RSS     WCHAN    PC         NAME\n";
 constexpr char kProcess[] = "root     4711  1     123456 789     ffffffff 00000000 S item\n";
 
-class Suspension : public ModuleTest
+class Suspension : public LibraryTest
 {
   protected:
     // Makes the item with that name the one last started.
     static void start_item(const std::string &name)
     {
-        platform::write_plan("<?xml version=\"1.0\"?><P><CmdGroup name=\"g\"><Cmd name=\"" + name +
-                             "\"/></CmdGroup></P>");
+        platform::write_plan(plan_of(cmd(name)));
         plan_steps("popen", {gives(0)}); // no presence query: the next stream is the first
         run_quietly("XMLNodePath::P/g");
     }
@@ -44,7 +43,7 @@ class Suspension : public ModuleTest
     }
     static Lines listed(const std::string &name, const std::string &process)
     {
-        return joined({popened(name), {line_read(kHeader), line_read(process)}});
+        return popened(name) + line_read(kHeader) + line_read(process);
     }
     static Lines found(const std::string &pid)
     {
@@ -58,22 +57,6 @@ class Suspension : public ModuleTest
         plan_steps("vfork", {gives(0)});
         platform::run_child([] { FPTEST_SuspendItemExecute(); });
         return events();
-    }
-    // For a process line that names a process id, and the command's part of it.
-    static void expect_killed(const std::string &process, const std::string &pid,
-                              const std::string &killed)
-    {
-        platform::reset();
-        EXPECT_THAT(child(kHeader + process),
-                    ElementsAreArray(
-                        joined({listed("", process), found(pid), launched("kill 9 " + killed)})));
-    }
-    // For a process line that names none.
-    static void expect_killed_null(const std::string &process)
-    {
-        platform::reset();
-        EXPECT_THAT(child(kHeader + process),
-                    ElementsAreArray(joined({listed("", process), launched("kill 9 (null)")})));
     }
     // The name that reaches the process listing.
     static std::string listed_name(const std::string &item)
@@ -93,49 +76,24 @@ TEST_F(Suspension, FirstListedProcessOfTheItemIsKilledInTheBackground)
     platform::plan_output({std::string(kHeader) + kProcess});
 
     EXPECT_EQ(FPTEST_SuspendItemExecute(), 0);
-    EXPECT_THAT(events(),
-                ElementsAreArray(joined({listed("item", kProcess), found("4711"), launch()})));
+    EXPECT_EQ(events(), listed("item", kProcess) + found("4711") + launch());
     EXPECT_THAT(left_open(), ElementsAre("stream#1"));
 }
 
-TEST_F(Suspension, KillCommandNamesNineAndTheProcess)
+TEST_F(Suspension, KillCommandNamesNineAndTheFirstProcessAlone)
 {
     start_item("item");
-    EXPECT_THAT(child(std::string(kHeader) + kProcess),
-                ElementsAreArray(
-                    joined({listed("item", kProcess), found("4711"), launched("kill 9 4711")})));
+    EXPECT_EQ(child(std::string(kHeader) + kProcess + "root 4712 1 item\nroot 4713 1 item\n"),
+              listed("item", kProcess) + found("4711") + launched("kill 9 4711"));
 }
 
-TEST_F(Suspension, OnlyTheFirstOfSeveralProcessesIsReadAndKilled)
+TEST_F(Suspension, NameIsListedByItsFirstTwentyEightCharacters)
 {
-    start_item("item");
-    EXPECT_THAT(child(std::string(kHeader) + kProcess + "root 4712 1 item\nroot 4713 1 item\n"),
-                ElementsAreArray(
-                    joined({listed("item", kProcess), found("4711"), launched("kill 9 4711")})));
-}
-
-TEST_F(Suspension, BeforeAnyItemTheFirstProcessOfAllIsTheOne)
-{
-    expect_killed("root 1 0 /init\n", "1", "1");
-}
-
-TEST_F(Suspension, NameOfUpToTwentyEightCharactersIsListedWhole)
-{
-    EXPECT_EQ(listed_name("a"), "a");
-    for (const std::size_t length : {27U, 28U}) {
-        SCOPED_TRACE(length);
+    const std::string name = "abcdefghijklmnopqrstuvwxyz01" + std::string(72, 'n');
+    for (const std::size_t length : {1U, 27U, 28U, 29U, 64U, 100U}) {
         SetUp();
-        EXPECT_EQ(listed_name(std::string(length, 'n')), std::string(length, 'n'));
-    }
-}
-
-TEST_F(Suspension, LongerNameIsListedByItsFirstTwentyEightCharacters)
-{
-    const std::string name = "abcdefghijklmnopqrstuvwxyz01";
-    for (const std::size_t more : {1U, 36U, 72U}) {
-        SCOPED_TRACE(more);
-        SetUp();
-        EXPECT_EQ(listed_name(name + std::string(more, 'n')), name);
+        EXPECT_EQ(listed_name(name.substr(0, length)),
+                  name.substr(0, std::min<std::size_t>(length, 28)));
     }
 }
 
@@ -160,71 +118,58 @@ TEST_F(Suspension, ListingThatCannotBeStartedIsAFailure)
     EXPECT_THAT(left_open(), IsEmpty());
 }
 
-TEST_F(Suspension, EmptyListingIsAFailureAndStaysOpen)
+TEST_F(Suspension, ListingWithoutAProcessIsAFailureAndStaysOpen)
 {
-    start_item("item");
+    for (const std::string header : {"", kHeader}) {
+        SetUp();
+        start_item("item");
+        platform::plan_output({header});
 
-    EXPECT_EQ(FPTEST_SuspendItemExecute(), -1);
-    EXPECT_THAT(events(), ElementsAreArray(joined(
-                              {popened("item"),
-                               {"fgets(stream#1, 513) = null",
-                                "FPTEST_SuspendItemExecute| target process not exist!\n"}})));
-    EXPECT_THAT(left_open(), ElementsAre("stream#1"));
+        EXPECT_EQ(FPTEST_SuspendItemExecute(), -1);
+        EXPECT_EQ(events(), popened("item") +
+                                (header.empty() ? Lines() : Lines{line_read(header)}) +
+                                "fgets(stream#1, 513) = null" +
+                                "FPTEST_SuspendItemExecute| target process not exist!\n");
+        EXPECT_THAT(left_open(), ElementsAre("stream#1"));
+    }
 }
 
-TEST_F(Suspension, ListingOfAHeaderAloneIsAFailureAndStaysOpen)
+TEST_F(Suspension, SecondColumnBetweenBlanksIsTheProcessAndNullWhereThereIsNone)
 {
-    start_item("item");
-    platform::plan_output({kHeader});
-
-    EXPECT_EQ(FPTEST_SuspendItemExecute(), -1);
-    EXPECT_THAT(events(), ElementsAreArray(joined(
-                              {popened("item"),
-                               {line_read(kHeader), "fgets(stream#1, 513) = null",
-                                "FPTEST_SuspendItemExecute| target process not exist!\n"}})));
-    EXPECT_THAT(left_open(), ElementsAre("stream#1"));
-}
-
-TEST_F(Suspension, ColumnsAreSeparatedByAnyNumberOfBlanks)
-{
-    expect_killed("root 42 1 item\n", "42", "42");
-    expect_killed("   root      42      1 item\n", "42", "42");
-    expect_killed("root 42", "42", "42");
-}
-
-TEST_F(Suspension, NothingButABlankSeparatesColumns)
-{
-    expect_killed("ro\tot 42\t1 item\n", "42\t1", "42\t1");
-    expect_killed("root 42\n", "42\n", "42\n");
-    expect_killed("root,1;2:3 word item\n", "word", "word");
     const std::string text = every_character_but(" \n");
-    expect_killed(text + " " + text, text, text.substr(0, 24));
-}
-
-TEST_F(Suspension, ProcessLineWithoutASecondColumnKillsNull)
-{
-    expect_killed_null("     ");
-    expect_killed_null("     \n");
-    expect_killed_null("\n");
-    expect_killed_null("root");
-    expect_killed_null("root\n");
-    expect_killed_null("   root   ");
+    const std::string digits = "123456789012345678901234"; // what the command holds
+    for (const auto &[process, pid] : std::initializer_list<std::pair<std::string, std::string>>{
+             {"root 1 0 /init\n", "1"},
+             {"root 42 1 item\n", "42"},
+             {"   root      42      1 item\n", "42"},
+             {"root 42", "42"},
+             {"ro\tot 42\t1 item\n", "42\t1"},
+             {"root 42\n", "42\n"},
+             {"root,1;2:3 word item\n", "word"},
+             {text + " " + text, text},
+             {"u " + digits.substr(1) + " x\n", digits.substr(1)},
+             {"u " + digits + " x\n", digits},
+             {"u " + digits + "5 x\n", digits + "5"},
+             {"     ", ""},
+             {"     \n", ""},
+             {"\n", ""},
+             {"root", ""},
+             {"root\n", ""},
+             {"   root   ", ""},
+         }) {
+        SetUp();
+        EXPECT_EQ(child(kHeader + process),
+                  listed("", process) + (pid.empty() ? Lines() : found(pid)) +
+                      launched("kill 9 " + (pid.empty() ? "(null)" : pid.substr(0, 24))));
+    }
 }
 
 TEST_F(Suspension, ProcessLineWithoutASecondColumnIsNoFailure)
 {
     platform::plan_output({std::string(kHeader) + "root\n"});
     EXPECT_EQ(FPTEST_SuspendItemExecute(), 0);
-    EXPECT_THAT(events(), ElementsAreArray(joined({listed("", "root\n"), launch()})));
+    EXPECT_EQ(events(), listed("", "root\n") + launch());
     EXPECT_THAT(left_open(), ElementsAre("stream#1"));
-}
-
-TEST_F(Suspension, KillCommandHoldsTwentyFourCharactersOfTheId)
-{
-    const std::string digits = "123456789012345678901234";
-    expect_killed("u " + digits.substr(1) + " x\n", digits.substr(1), digits.substr(1));
-    expect_killed("u " + digits + " x\n", digits, digits);
-    expect_killed("u " + digits + "5 x\n", digits + "5", digits);
 }
 
 TEST_F(Suspension, LineOfTheListingIsReadUpToFiveHundredTwelveCharacters)
@@ -232,20 +177,16 @@ TEST_F(Suspension, LineOfTheListingIsReadUpToFiveHundredTwelveCharacters)
     // the header just fits; the process line is cut within its id
     const std::string header = std::string(511, 'H') + "\n";
     const std::string cut = std::string(508, 'u') + " 123";
-    EXPECT_THAT(child(header + cut + "45 1 item\n"),
-                ElementsAreArray(joined({popened(""),
-                                         {line_read(header), line_read(cut)},
-                                         found("123"),
-                                         launched("kill 9 123")})));
+    EXPECT_EQ(child(header + cut + "45 1 item\n"), popened("") + line_read(header) +
+                                                       line_read(cut) + found("123") +
+                                                       launched("kill 9 123"));
 
     // what a header has beyond that is taken for the process line
     platform::reset();
     const std::string longer(512, 'H');
-    EXPECT_THAT(child(longer + " root 42 1\nroot 43 1 item\n"),
-                ElementsAreArray(joined({popened(""),
-                                         {line_read(longer), line_read(" root 42 1\n")},
-                                         found("42"),
-                                         launched("kill 9 42")})));
+    EXPECT_EQ(child(longer + " root 42 1\nroot 43 1 item\n"),
+              popened("") + line_read(longer) + line_read(" root 42 1\n") + found("42") +
+                  launched("kill 9 42"));
 }
 
 TEST_F(Suspension, FailedKillIsNoFailure)
@@ -253,8 +194,7 @@ TEST_F(Suspension, FailedKillIsNoFailure)
     platform::plan_output({std::string(kHeader) + kProcess, std::string(kHeader) + kProcess});
     plan_steps("vfork", {gives(-1, EAGAIN)});
     EXPECT_EQ(FPTEST_SuspendItemExecute(), 0);
-    EXPECT_THAT(events(),
-                ElementsAreArray(joined({listed("", kProcess), found("4711"), failed_launch()})));
+    EXPECT_EQ(events(), listed("", kProcess) + found("4711") + failed_launch());
 
     plan_steps("waitpid", {gives(-1, ECHILD)});
     EXPECT_EQ(FPTEST_SuspendItemExecute(), 0);
@@ -273,11 +213,11 @@ TEST_F(Suspension, EachCallLeavesOneMoreListingOpen)
 TEST_F(Suspension, NameOfTheItemStaysForTheNextCall)
 {
     start_item("item");
-    const std::string before(module::command_name(), module::command_name_size);
+    const std::string before = command_name();
     platform::plan_output({std::string(kHeader) + kProcess});
     FPTEST_SuspendItemExecute();
 
-    EXPECT_EQ(std::string(module::command_name(), module::command_name_size), before);
+    EXPECT_EQ(command_name(), before);
     FPTEST_SuspendItemExecute();
     EXPECT_THAT(events(), ::testing::Contains("popen(ps item, r) = stream#2"));
 }

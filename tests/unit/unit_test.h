@@ -4,15 +4,18 @@
 // What every unit test starts from.
 #pragma once
 
-#include "module.h"
+#include "internals.h"
 #include "platform.h"
 #include "quillmark.h"
 
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
 
+#include <cstddef>
+#include <cstdio>
 #include <initializer_list>
 #include <string>
+#include <unistd.h>
 #include <vector>
 
 using Lines = std::vector<std::string>;
@@ -24,6 +27,14 @@ inline Lines joined(std::initializer_list<Lines> parts)
         all.insert(all.end(), part.begin(), part.end());
     }
     return all;
+}
+inline Lines operator+(const Lines &first, const Lines &then)
+{
+    return joined({first, then});
+}
+inline Lines operator+(const Lines &first, const std::string &then)
+{
+    return joined({first, {then}});
 }
 
 // Every character that a string can hold, except those.
@@ -39,19 +50,69 @@ inline std::string every_character_but(const std::string &these)
     return text;
 }
 
+// What an array of that size holds: the text, then zeros.
+inline std::string filled(std::string text, std::size_t size)
+{
+    text.resize(size, '\0');
+    return text;
+}
+
+// The tree in one line: elements with their attributes and children, texts.
+inline std::string shape(mxml_node_t *node)
+{
+    if (mxmlGetType(node) == MXML_TEXT) {
+        return std::string("'") + mxmlGetText(node, nullptr) + "'";
+    }
+    std::string text = mxmlGetElement(node);
+    for (int at = 0; at < mxmlElementGetAttrCount(node); ++at) {
+        const char *name = nullptr;
+        const char *value = mxmlElementGetAttrByIndex(node, at, &name);
+        text += std::string(" ") + name + "=" + (value != nullptr ? value : "(none)");
+    }
+    std::string children;
+    for (mxml_node_t *child = mxmlGetFirstChild(node); child != nullptr;
+         child = mxmlGetNextSibling(child)) {
+        children += (children.empty() ? "" : ", ") + shape(child);
+    }
+    return children.empty() ? text : text + "{" + children + "}";
+}
+
+// Standard output's descriptor is free meanwhile: nothing may be printed.
+class FreedOutput
+{
+  public:
+    FreedOutput()
+    {
+        std::fflush(stdout);
+        kept_ = dup(STDOUT_FILENO);
+        close(STDOUT_FILENO);
+    }
+    ~FreedOutput()
+    {
+        dup2(kept_, STDOUT_FILENO);
+        close(kept_);
+    }
+    FreedOutput(const FreedOutput &) = delete;
+    FreedOutput &operator=(const FreedOutput &) = delete;
+
+  private:
+    int kept_ = -1;
+};
+
 // The library as at load time, on a platform without a test plan.
-class ModuleTest : public ::testing::Test
+class LibraryTest : public ::testing::Test
 {
   protected:
+    static constexpr char kPath[] = "/data/vorlane/src1.xml";
+
     void SetUp() override
     {
-        module::reset();
+        internals::reset();
         platform::reset();
     }
     void TearDown() override
     {
-        module::reset();
-        platform::reset();
+        SetUp();
     }
 
     // Runs a command for its effects alone, and forgets its events.
@@ -61,7 +122,51 @@ class ModuleTest : public ::testing::Test
         platform::events();
     }
 
-    static constexpr char kDeclaration[] = "<?xml version=\"1.0\"?>\n";
+    // The tree of a plan, loaded anew; its events are forgotten.
+    static mxml_node_t *load_plan(const std::string &text)
+    {
+        internals::reset();
+        platform::write_plan(text);
+        mxml_node_t *tree = internals::load_configs_file(kPath);
+        EXPECT_NE(tree, nullptr) << text;
+        platform::events();
+        return tree;
+    }
+    // A plan as the library saves it.
+    static constexpr char kLaidOut[] = "<?xml version=\"1.0\"?>\n"
+                                       "<P>\n"
+                                       "\t<CmdGroup name=\"g\">\n"
+                                       "\t\t<Cmd name=\"a\" args=\"1\" />\n"
+                                       "\t\t<Cmd name=\"b\" args=\"2\" />\n"
+                                       "\t\t<Cmd name=\"c\" args=\"3\" />\n"
+                                       "</CmdGroup>\n"
+                                       "\t<CmdGroup name=\"empty\" />\n"
+                                       "\t<CmdGroup name=\"h\">\n"
+                                       "\t\t<Cmd name=\"d\" args=\"4\" />\n"
+                                       "\t\t<Cmd name=\"b\" args=\"5\" />\n"
+                                       "\t\t<Cmd name=\"e\" args=\"6\" />\n"
+                                       "</CmdGroup>\n"
+                                       "</P>\n";
+
+    // A plan with a group "g" of those children.
+    static std::string plan_of(const std::string &children)
+    {
+        return "<?xml version=\"1.0\"?><P><CmdGroup name=\"g\">" + children + "</CmdGroup></P>";
+    }
+    static std::string cmd(const std::string &name, const std::string &args = "-t 5")
+    {
+        return "<Cmd name=\"" + name + "\" args=\"" + args + "\"/>";
+    }
+
+    // All bytes of the name of the item last started.
+    static std::string command_name()
+    {
+        return {internals::command_name, sizeof internals::command_name};
+    }
+    static std::string recorded(const std::string &name)
+    {
+        return filled(name, sizeof internals::command_name);
+    }
 };
 
 // For lists of lines: reads as the list itself does.
