@@ -66,14 +66,14 @@ std::optional<std::vector<std::string>> expected_starts(const std::string &plan,
         return Lines();
     }
     const int number = vendor_number(vendor);
-    const auto loaded = fptest::Plan::load(plan);
+    const auto loaded = fptest::Plan::load_as_library(plan);
     if (names.empty() && loaded && loaded->find_group("") != nullptr) {
         return std::nullopt;
     }
     std::vector<std::optional<fptest::Plan::Element>> runs;
     if (loaded && !names.empty()) { // whatever the root, and far from the path's limit
-        runs = loaded->run_by(names[1].substr(0, fptest::kNameLimit) +
-                              (names.size() > 2 ? "/" + names[2] : "").substr(0, 100));
+        runs = loaded->resolve(names[1].substr(0, fptest::kNameLimit) +
+                               (names.size() > 2 ? "/" + names[2] : "").substr(0, 100));
     } else if (names.size() != 2) {
         runs.emplace_back();
     }

@@ -99,7 +99,7 @@ void check_lookups(const Nodes &plan, const fptest::Plan &told, const std::strin
     if (!is_addressable(group)) {
         return;
     }
-    const auto runs = told.run_by(group);
+    const auto runs = told.resolve(group);
     require(length <= 0 ? runs.empty() : static_cast<std::size_t>(length) == runs.size(),
             "the group's length is another");
     check_run(plan, group, -1, std::nullopt);
@@ -109,7 +109,7 @@ void check_lookups(const Nodes &plan, const fptest::Plan &told, const std::strin
     for (const std::string &item : items) {
         if (is_addressable(item)) {
             check_run(plan, group, internals::get_node_index(group.c_str(), item.c_str(), 3),
-                      told.run_by(group, item));
+                      told.resolve(group, item));
         }
     }
 }
@@ -214,7 +214,7 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t *data, std::size_t size
     auto items = names_of(plan, "Cmd");
     groups.push_back(input[1]);
     items.push_back(input[2]);
-    const auto told = fptest::Plan::load(input[0]);
+    const auto told = fptest::Plan::load_as_library(input[0]);
     require(told.has_value(), "the agent does not load what the library does");
     for (const std::string &group : groups) {
         check_lookups(plan, *told, group, items);

@@ -11,17 +11,17 @@
 namespace fptest
 {
 
-std::vector<Finding> check(const std::string &text, PlanUse use)
+std::vector<Finding> check(const std::string &text, PlanSource use)
 {
     Findings findings;
     if (text.starts_with("\xFF\xFE") || text.starts_with("\xFE\xFF")) {
         findings.error(0, "the plan is UTF-16: save it as UTF-8");
         return findings.take();
     }
-    if (use == PlanUse::to_send) {
+    if (use == PlanSource::to_send) {
         check_size(text, findings);
     }
-    const std::string stored = use == PlanUse::to_send ? stored_part(text) : text;
+    const std::string stored = use == PlanSource::to_send ? as_stored(text) : text;
     if (const std::optional<Plan> plan = check_form(text, stored, findings)) {
         check_plan(text, *plan, findings);
     }

@@ -20,13 +20,13 @@ struct Finding {
     std::string text;
 };
 
-enum class PlanUse {
+enum class PlanSource {
     to_send, // it is stored by a command: what the command cuts off matters
     stored,  // it stands in its place already
 };
 
 // The findings in a plan's text, in its order.
-std::vector<Finding> check(const std::string &text, PlanUse use);
+std::vector<Finding> check(const std::string &text, PlanSource use);
 
 bool has_errors(const std::vector<Finding> &findings);
 

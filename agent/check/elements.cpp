@@ -21,7 +21,7 @@ constexpr std::size_t kShownPath = 80; // columns
 
 std::string path_of(const std::string &group)
 {
-    return "'" + cut(one_line("root/" + group), kShownPath) + "'";
+    return "'" + ellipsize(one_line("root/" + group), kShownPath) + "'";
 }
 
 std::string path_of(const std::string &group, const std::string &item)
@@ -54,7 +54,7 @@ std::string path_damage(std::string_view name)
             damages.emplace_back(damage);
         }
     }
-    return listing(damages);
+    return join_and(damages);
 }
 
 bool is_addressable(std::string_view name)

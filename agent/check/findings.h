@@ -44,7 +44,7 @@ class Findings
 inline std::string in_quotes(std::string_view text)
 {
     constexpr std::size_t kShown = 63; // columns
-    return "'" + cut(one_line(text), kShown) + "'";
+    return "'" + ellipsize(one_line(text), kShown) + "'";
 }
 
 } // namespace fptest

@@ -46,7 +46,7 @@ std::string open_at(const std::vector<Tag> &tags, std::size_t offset)
             open.pop_back();
         }
     }
-    return open.empty() ? "" : cut(one_line(*open.back()), kShownName);
+    return open.empty() ? "" : ellipsize(one_line(*open.back()), kShownName);
 }
 
 // Loads the text, after saying what of its form is wrong.
@@ -72,7 +72,7 @@ class FormChecker
         report_encoding();
         const bool endless = report_endless_comments();
         std::string why;
-        std::optional<Plan> plan = Plan::load(repaired_, &why);
+        std::optional<Plan> plan = Plan::load_as_library(repaired_, &why);
         if (!plan && !endless) {
             report_refusal(why);
         }
@@ -116,7 +116,7 @@ class FormChecker
                 findings_.error(attribute->begin,
                                 "attribute " + in_quotes(attribute->name) +
                                     " has no value: the library would not load the plan; write " +
-                                    cut(one_line(attribute->name), kShownName) +
+                                    ellipsize(one_line(attribute->name), kShownName) +
                                     "=\"\" or leave it out");
             }
         }
@@ -128,16 +128,16 @@ class FormChecker
         if (flaw.error == XML_ERROR_ABORTED) {
             findings_.error(offset,
                             std::string("an entity is declared here: the library would not ") +
-                                (Plan::load(stored_) ? "know it" : "load the plan") +
+                                (Plan::load_as_library(stored_) ? "know it" : "load the plan") +
                                 "; write its text where it is used");
             return;
         }
-        findings_.error(offset, "not well-formed, " + reason(flaw.error, offset) +
-                                    ": the library would " +
-                                    (Plan::load(stored_) ? "load it all the same, and run what it "
-                                                           "took from it"
-                                                         : "not load it") +
-                                    advice(flaw.error, offset));
+        findings_.error(
+            offset, "not well-formed, " + reason(flaw.error, offset) + ": the library would " +
+                        (Plan::load_as_library(stored_) ? "load it all the same, and run what it "
+                                                          "took from it"
+                                                        : "not load it") +
+                        advice(flaw.error, offset));
     }
 
     // Where a person looks for it: the parser names the tag for an entity in it,
@@ -278,7 +278,8 @@ class FormChecker
             return;
         }
         findings_.error(undefined_entity(0), "well-formed, but the library would not load it: " +
-                                                 cut(one_line(why), kShownWhy) + "; fix that");
+                                                 ellipsize(one_line(why), kShownWhy) +
+                                                 "; fix that");
     }
 
     // What stands beside the root element, where Mini-XML takes that for a

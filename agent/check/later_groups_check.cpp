@@ -91,7 +91,7 @@ class LaterGroupsCheck
         for (const Item *item : entry.items) {
             const Group *earlier = earlier_group(*item->name);
             const auto run =
-                earlier != nullptr ? plan_.run_by(*earlier->name, *item->name) : std::nullopt;
+                earlier != nullptr ? plan_.resolve(*earlier->name, *item->name) : std::nullopt;
             if (!run || run->number == item->number) {
                 continue;
             }

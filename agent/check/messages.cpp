@@ -30,7 +30,7 @@ std::string_view end_of(std::string_view text, std::size_t width)
         while (next > 0 && continues(text[next])) {
             --next;
         }
-        const std::size_t taken = columns(text.substr(next, begin - next));
+        const std::size_t taken = display_width(text.substr(next, begin - next));
         if (taken > width) {
             break;
         }
@@ -89,14 +89,15 @@ std::string Messages::of(const Finding &finding)
     constexpr std::size_t kAfter = 40; // columns kept after a place far to the right
     const Position place = positions_.of(finding.offset);
     auto [before, after] = source_line(text_, place.begin);
-    if (columns(before) + columns(after) > kWidth && columns(before) > kWidth - kAfter) {
-        after = cut(after, kAfter);
-        before = "..." + std::string(end_of(before, kWidth - 3 - columns(after)));
+    if (display_width(before) + display_width(after) > kWidth &&
+        display_width(before) > kWidth - kAfter) {
+        after = ellipsize(after, kAfter);
+        before = "..." + std::string(end_of(before, kWidth - 3 - display_width(after)));
     }
     return file_ + ":" + std::to_string(place.line) + ":" + std::to_string(place.column) +
            (finding.severity == Finding::Severity::error ? ": error: " : ": warning: ") +
-           finding.text + "\n" + cut(before + after, kWidth) + "\n" +
-           std::string(columns(before), ' ') + "^\n";
+           finding.text + "\n" + ellipsize(before + after, kWidth) + "\n" +
+           std::string(display_width(before), ' ') + "^\n";
 }
 
 void print(std::FILE *stream, const std::string &file, std::string_view text,

@@ -68,7 +68,7 @@ std::string kind_of(mxml_node_t *node)
            : tag.starts_with("![CDATA[") ? "CDATA"
            : tag.starts_with("!")        ? "a declaration"
            : tag.starts_with("?")        ? "an instruction"
-                                         : "<" + cut(one_line(tag), kShownName) + ">";
+                                         : "<" + ellipsize(one_line(tag), kShownName) + ">";
 }
 
 class PlanChecker
@@ -209,10 +209,10 @@ class PlanChecker
             findings_.error(place, "group " + in_quotes(name) +
                                        " cannot be addressed: a node path " + damage + ", and " +
                                        path_of(name) + " would run " +
-                                       names_of(plan_.run_by(name)) + "; rename it");
+                                       names_of(plan_.resolve(name)) + "; rename it");
         } else if (name.size() > kNameLimit) {
             findings_.error(place, "group " + in_quotes(name) + too_long(name) +
-                                       names_of(plan_.run_by(name)) + "; shorten it");
+                                       names_of(plan_.resolve(name)) + "; shorten it");
         } else if (mxml_node_t *const first = plan_.find_group(name); first != group.node) {
             findings_.error(place, "a second group " + in_quotes(name) + ": " + path_of(name) +
                                        " finds the one in " + places_.line_of(plan_.number(first)) +
@@ -284,7 +284,7 @@ class PlanChecker
 
     [[nodiscard]] std::string run_of(const Group &group, const std::string &name) const
     {
-        return names_of({plan_.run_by(*group.name, name)});
+        return names_of({plan_.resolve(*group.name, name)});
     }
 
     // --- programs ---
@@ -358,7 +358,7 @@ class PlanChecker
         if (!excesses.empty()) {
             findings_.error(places_.of(item.number, "args"),
                             "the command line of item " + in_quotes(*item.name) + " is cut to " +
-                                std::to_string(kCommandLimit) + " bytes, by " + listing(excesses) +
+                                std::to_string(kCommandLimit) + " bytes, by " + join_and(excesses) +
                                 "; shorten its " + (item.args->empty() ? "name" : "args"));
         }
     }
@@ -371,7 +371,7 @@ class PlanChecker
                            kind_of(mxmlGetParent(item.node)) + ": ";
         const std::string name = item.name.value_or("");
         if (group.found && is_addressable(name)) {
-            const auto run = plan_.run_by(*group.name, name);
+            const auto run = plan_.resolve(*group.name, name);
             text += run && run->number == item.number
                         ? path_of(*group.name, name) + " finds it by chance"
                         : path_of(*group.name, name) + " would run " + names_of({run});
@@ -392,7 +392,7 @@ class PlanChecker
         if (group.others.empty()) {
             return;
         }
-        const Resolution run = plan_.run_by(*group.name);
+        const Resolution run = plan_.resolve(*group.name);
         const bool said = report_run_others(group, run) || !group.nested.empty();
         const std::vector<std::string> effects = shifts_of(group, run);
         const std::string cause = kinds_of(group.others) + " in group " + in_quotes(*group.name);
@@ -437,7 +437,7 @@ class PlanChecker
             effects.resize(kShownEffects);
             effects.push_back("so on for " + std::to_string(count - kShownEffects) + " more");
         }
-        return listing(effects);
+        return join_and(effects);
     }
 
     static std::string kinds_of(const std::vector<mxml_node_t *> &others)
@@ -454,7 +454,7 @@ class PlanChecker
             }
             kinds.push_back(kind);
         }
-        return listing(kinds);
+        return join_and(kinds);
     }
 
     [[nodiscard]] std::size_t place_of_others(const Group &group) const
@@ -482,7 +482,7 @@ class PlanChecker
             if (!is_addressable(name) || !seen.insert(name).second) {
                 continue;
             }
-            const auto found = plan_.run_by(*group.name, name);
+            const auto found = plan_.resolve(*group.name, name);
             if (!found || found->number != item.number) {
                 effects.push_back(path_of(*group.name, name) + " would run " + names_of({found}));
             }

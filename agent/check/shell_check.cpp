@@ -27,7 +27,7 @@ std::string shell_characters(std::string_view name)
             found.push_back(taken == ' ' ? "a blank" : std::string("'") + taken + "'");
         }
     }
-    return listing(found);
+    return join_and(found);
 }
 
 // Whether the shell may read more in it than words.

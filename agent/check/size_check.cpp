@@ -20,7 +20,7 @@ class SizeChecker
 {
   public:
     SizeChecker(const std::string &text, Findings &findings)
-        : stored_(stored_part(text)), command_(text.substr(0, text.find('\0'))), findings_(findings)
+        : stored_(as_stored(text)), command_(text.substr(0, text.find('\0'))), findings_(findings)
     {
         const std::size_t begin = std::min(command_.find_first_not_of(':'), command_.size());
         colon_ = command_.find(':', begin);
@@ -40,7 +40,7 @@ class SizeChecker
         if (zero_ && colon_ == kNone && command_.size() <= kPlanLimit) {
             findings_.error(command_.size(),
                             "a command takes a plan up to its first zero byte, so " +
-                                amount(stored_.size(), "byte") + " would be stored" + fate("them") +
+                                plural(stored_.size(), "byte") + " would be stored" + fate("them") +
                                 "; save it as UTF-8");
         }
     }
@@ -48,8 +48,9 @@ class SizeChecker
   private:
     [[nodiscard]] std::string fate(const std::string &what) const
     {
-        return std::string(", and the library would ") +
-               (Plan::load(stored_) ? "load " + what + " without the rest" : "not load " + what);
+        return std::string(", and the library would ") + (Plan::load_as_library(stored_)
+                                                              ? "load " + what + " without the rest"
+                                                              : "not load " + what);
     }
 
     // Whether a character reference may stand there: not in comments and the like.
@@ -73,7 +74,7 @@ class SizeChecker
         std::string text = "a command takes a plan up to its first ':', ";
         if (colon_ < kPlanLimit) {
             text += "so " + std::to_string(stored_.size()) + " of " +
-                    amount(command_.size(), "byte") + " would be stored" + fate("them");
+                    plural(command_.size(), "byte") + " would be stored" + fate("them");
         } else {
             text +=
                 "which is after the " + std::to_string(kPlanLimit) + " bytes that it takes anyway";

@@ -23,28 +23,28 @@ constexpr char kCheckExamples[] = "Examples:\n"
 
 struct CheckOptions {
     std::vector<std::string> files;
-    PlanUse use = PlanUse::to_send;
+    PlanSource use = PlanSource::to_send;
 };
 
 // What it holds is known of a plan that loads.
-std::string size_of(const std::string &text, PlanUse use)
+std::string size_of(const std::string &text, PlanSource use)
 {
-    std::string size = use == PlanUse::stored ? amount(text.size(), "byte")
-                                              : std::to_string(text.size()) + " of " +
-                                                    std::to_string(kPlanLimit) + " bytes";
-    if (const auto plan = Plan::load(text)) {
+    std::string size = use == PlanSource::stored ? plural(text.size(), "byte")
+                                                 : std::to_string(text.size()) + " of " +
+                                                       std::to_string(kPlanLimit) + " bytes";
+    if (const auto plan = Plan::load_as_library(text)) {
         std::size_t items = 0;
         const auto groups = plan->groups();
         for (const Plan::Group &group : groups) {
             items += group.items.size();
         }
-        size = amount(groups.size(), "group") + ", " + amount(items, "item") + ", " + size;
+        size = plural(groups.size(), "group") + ", " + plural(items, "item") + ", " + size;
     }
     return size;
 }
 
 // False where the plan has errors.
-bool check_file(const std::string &file, const std::string &text, PlanUse use)
+bool check_file(const std::string &file, const std::string &text, PlanSource use)
 {
     const std::string name = file == "-" ? "<stdin>" : one_line(file);
     const auto findings = check(text, use);
@@ -52,8 +52,8 @@ bool check_file(const std::string &file, const std::string &text, PlanUse use)
     const auto errors = static_cast<std::size_t>(
         std::ranges::count(findings, Finding::Severity::error, &Finding::severity));
     const std::size_t warnings = findings.size() - errors;
-    std::printf("%s: %s, %s (%s)\n", name.c_str(), amount(errors, "error").c_str(),
-                amount(warnings, "warning").c_str(), size_of(text, use).c_str());
+    std::printf("%s: %s, %s (%s)\n", name.c_str(), plural(errors, "error").c_str(),
+                plural(warnings, "warning").c_str(), size_of(text, use).c_str());
     return errors == 0;
 }
 
@@ -93,7 +93,7 @@ void add_check(CLI::App &app, Action &chosen)
         ->check(not_empty())
         ->required();
     const auto set_use = [options](const std::string &use) {
-        options->use = use == "file" ? PlanUse::stored : PlanUse::to_send;
+        options->use = use == "file" ? PlanSource::stored : PlanSource::to_send;
     };
     command
         .add_option_function<std::string>("--for", set_use,

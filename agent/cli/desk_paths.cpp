@@ -70,7 +70,7 @@ void look_after_reports(const std::vector<std::pair<std::string, std::string>> &
         std::fprintf(stderr,
                      "fptest: %s %s with the virtual device when it ends; device/run --out DIR "
                      "gives a working directory that stays\n",
-                     listing(lost).c_str(), lost.size() == 1 ? "goes" : "go");
+                     join_and(lost).c_str(), lost.size() == 1 ? "goes" : "go");
     }
 }
 

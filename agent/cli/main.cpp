@@ -93,7 +93,7 @@ class CommandLine
         throw fptest::Failure(Exit::usage,
                               "there is no command '" + fptest::one_line(word) + "'" +
                                   (near.empty() ? "; the" : "; did you mean '" + near + "'? The") +
-                                  " commands are " + fptest::listing(names));
+                                  " commands are " + fptest::join_and(names));
     }
 
     CLI::App app_{"Runs test plans of a fingerprint-sensor stack through the Quillmark library.",

@@ -102,7 +102,7 @@ void settle_outputs(RunOptions &options)
     const auto reports = reports_on_standard_output(options);
     if (reports.size() > 1) {
         throw Failure(Exit::usage,
-                      listing(reports) + " each want standard output: give all but one a file");
+                      join_and(reports) + " each want standard output: give all but one a file");
     }
     if (!reports.empty()) {
         require_standard_output(reports.front());

@@ -59,7 +59,7 @@ std::string read_stored()
 Plan load_stored(const std::string &text)
 {
     std::string why;
-    auto plan = Plan::load(text, &why);
+    auto plan = Plan::load_as_library(text, &why);
     if (!plan) {
         throw Failure(Exit::environment, std::string(kStoredPlan) + " does not load (" +
                                              one_line(why) + "): store the plan again");
@@ -78,7 +78,7 @@ Plan load_stored(const std::string &text)
     throw Failure(Exit::usage,
                   where + " has no " + what + " '" + one_line(name) + "'" +
                       (near.empty() ? "; it" : "; did you mean '" + one_line(near) + "'? It") +
-                      (shown.empty() ? " has none at all" : " has " + listing(shown)));
+                      (shown.empty() ? " has none at all" : " has " + join_and(shown)));
 }
 
 // The item's number in the plan. Only its own group is looked at: the library
@@ -115,7 +115,7 @@ Exit report(const ReportOptions &options)
     const Plan plan = load_stored(text);
     const std::size_t number = find_item(plan, options);
     // Mini-XML would not load such a plan again
-    const std::string description = clean(options.description);
+    const std::string description = sanitize_utf8(options.description);
     if (description != options.description) {
         std::fputs("fptest: bytes of the description that no plan can hold are replaced\n", stderr);
     }
@@ -123,7 +123,7 @@ Exit report(const ReportOptions &options)
     FPTEST_SetTransation(options.group.c_str(), options.item.c_str(), options.progress,
                          options.result, description.c_str());
 
-    const auto written = Plan::load(read_stored());
+    const auto written = Plan::load_as_library(read_stored());
     ItemReport wanted;
     wanted.progress = std::to_string(options.progress);
     wanted.result = std::to_string(options.result);

@@ -43,7 +43,7 @@ struct Source {
     std::string name; // of the file, for people
     std::string text;
     Plan plan;
-    PlanUse use;
+    PlanSource use;
 };
 
 // --- the plan -----------------------------------------------------------------
@@ -66,10 +66,10 @@ std::string read_plan(const std::string &file)
 }
 
 // A plan that a command cannot hold is put into its place as a file.
-PlanUse use_of(const RunOptions &options, const std::string &text)
+PlanSource use_of(const RunOptions &options, const std::string &text)
 {
     const bool is_sent = !options.plan.empty() && (options.as_sent || text.size() <= kPlanLimit);
-    return is_sent ? PlanUse::to_send : PlanUse::stored;
+    return is_sent ? PlanSource::to_send : PlanSource::stored;
 }
 
 // --as-sent is what keeps a long plan from being placed.
@@ -90,7 +90,7 @@ Source open_plan(const RunOptions &options)
                              : options.plan == "-" ? std::string("<stdin>")
                                                    : options.plan;
     const std::string text = read_plan(options.plan);
-    const PlanUse use = use_of(options, text);
+    const PlanSource use = use_of(options, text);
     auto findings = check(text, use);
     if (options.as_sent) {
         advise_to_place(findings);
@@ -103,10 +103,10 @@ Source open_plan(const RunOptions &options)
     if (!findings.empty() && !options.quiet) {
         std::fprintf(stderr, "fptest: the plan has %s: see fptest check %s%s\n",
                      has_errors(findings) ? "errors" : "warnings",
-                     use == PlanUse::stored ? "--for file " : "", one_line(name).c_str());
+                     use == PlanSource::stored ? "--for file " : "", one_line(name).c_str());
     }
     std::string why;
-    auto plan = Plan::load(use == PlanUse::to_send ? stored_part(text) : text, &why);
+    auto plan = Plan::load_as_library(use == PlanSource::to_send ? as_stored(text) : text, &why);
     if (!plan) {
         throw Failure(Exit::usage,
                       one_line(name) + ": the library cannot load this plan: " + one_line(why));
@@ -137,7 +137,7 @@ void require_programs(const Work &work, int vendor, bool force)
         }
     }
     if (!missing.empty() && !force) {
-        throw Failure(Exit::environment, "no program " + listing(missing) +
+        throw Failure(Exit::environment, "no program " + join_and(missing) +
                                              " on this device: install what is missing "
                                              "(device/run --bin DIR adds programs), or run the "
                                              "rest with --force");
@@ -148,9 +148,9 @@ void require_programs(const Work &work, int vendor, bool force)
     }
 }
 
-void store(Host &host, const std::string &text)
+void store(LibraryProcess &host, const std::string &text)
 {
-    const std::string stored = stored_part(text);
+    const std::string stored = as_stored(text);
     require_room(stored.size());
     send_and_wait(host, "XMLFile::" + text);
     require_stored(host.read_back(), stored);
@@ -227,7 +227,7 @@ Exit run(RunOptions options)
     require_writable_reports(options);
     choose_log(options.log);
     Signals signals;
-    std::optional<Host> host(std::in_place);
+    std::optional<LibraryProcess> host(std::in_place);
     const int vendor = ask_vendor(*host);
     if (options.list) {
         list_items(paths.empty() ? all_paths(source.plan) : paths, source.plan,
@@ -240,7 +240,7 @@ Exit run(RunOptions options)
         throw Failure(Exit::usage, "there is nothing to run: the groups named have no items");
     }
     require_programs(work, vendor, options.force);
-    if (source.use == PlanUse::to_send) {
+    if (source.use == PlanSource::to_send) {
         store(*host, source.text);
     } else if (!options.plan.empty()) {
         place(source, options.quiet);

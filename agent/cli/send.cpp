@@ -75,7 +75,7 @@ std::optional<std::string> plan_of(std::string_view command)
     if (!head.starts_with("XMLFile")) {
         return std::nullopt;
     }
-    return stored_part(
+    return as_stored(
         command.substr(static_cast<std::size_t>(head.data() + head.size() - command.data())));
 }
 
@@ -86,7 +86,7 @@ std::vector<std::string> items_of(const std::string &command)
     if (!head_of(command).starts_with("XMLNodePath")) {
         return names;
     }
-    if (const auto plan = Plan::load(read_stored_plan().value_or(""))) {
+    if (const auto plan = Plan::load_as_library(read_stored_plan().value_or(""))) {
         for (const Plan::Group &group : plan->groups()) {
             for (const Plan::Element &item : group.items) {
                 names.push_back(item.name.value_or(""));
@@ -113,14 +113,14 @@ class Sender
                 plan = Descriptor(-1); // it is loaded before the first item is told
                 host_.pass_output(stderr, event->output);
             }
-            if (event && event->kind == Host::Event::Kind::item) {
+            if (event && event->kind == LibraryProcess::Event::Kind::item) {
                 std::fprintf(stderr, "vendor = %d\n", event->value);
             }
             host_.pass_output(stderr);
-            if (event && event->kind == Host::Event::Kind::gone) {
+            if (event && event->kind == LibraryProcess::Event::Kind::gone) {
                 throw Failure(Exit::environment, gone_text(*event));
             }
-            if (event && event->kind == Host::Event::Kind::returned) {
+            if (event && event->kind == LibraryProcess::Event::Kind::returned) {
                 return interrupted_ ? std::nullopt : std::optional(event->text);
             }
             interrupted_ = interrupted_ || signals_.take() != 0;
@@ -132,7 +132,7 @@ class Sender
 
   private:
     Signals signals_;
-    Host host_;
+    LibraryProcess host_;
     bool interrupted_ = false;
 };
 

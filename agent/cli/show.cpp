@@ -52,7 +52,8 @@ void print(const std::vector<Row> &rows)
 {
     for (const std::string &line : aligned(rows, {false, false, true, true, false})) {
         const bool is_cut = isatty(STDOUT_FILENO) != 0;
-        std::printf("%s\n", is_cut ? cut(line, terminal_width(stdout)).c_str() : line.c_str());
+        std::printf("%s\n",
+                    is_cut ? ellipsize(line, terminal_width(stdout)).c_str() : line.c_str());
     }
 }
 
@@ -75,7 +76,7 @@ Exit show(const std::string &file)
 {
     require_standard_output("fptest show");
     const std::string name = file.empty() ? kStoredPlan : file == "-" ? "<stdin>" : one_line(file);
-    const auto plan = Plan::read(read_shown(file));
+    const auto plan = Plan::parse_annotated(read_shown(file));
     if (!plan) {
         throw Failure(Exit::usage,
                       name + " is no whole test plan: fptest check says what is wrong");

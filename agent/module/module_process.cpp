@@ -50,9 +50,9 @@ int make_output()
 }
 
 // "NANOSECONDS OUTPUT TEXT"
-Host::Event with_moment(Host::Event::Kind kind, const std::string &text)
+LibraryProcess::Event with_moment(LibraryProcess::Event::Kind kind, const std::string &text)
 {
-    Host::Event event{};
+    LibraryProcess::Event event{};
     event.kind = kind;
     char *end = nullptr;
     const std::chrono::nanoseconds time(std::strtoll(text.c_str(), &end, 10));
@@ -64,14 +64,14 @@ Host::Event with_moment(Host::Event::Kind kind, const std::string &text)
 
 } // namespace
 
-Host::Host() : output_(make_output())
+LibraryProcess::LibraryProcess() : output_(make_output())
 {
     // what outlives the library's process comes to this one, and can be found
     prctl(PR_SET_CHILD_SUBREAPER, 1);
     start();
 }
 
-void Host::start()
+void LibraryProcess::start()
 {
     std::array<int, 2> control{};
     if (socketpair(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0, control.data()) != 0) {
@@ -91,7 +91,7 @@ void Host::start()
     }
 }
 
-Host::~Host()
+LibraryProcess::~LibraryProcess()
 {
     leave_output();
     shutdown(control_.get(), SHUT_RDWR);
@@ -102,7 +102,7 @@ Host::~Host()
     }
 }
 
-void Host::command(const std::string &text, const std::vector<std::string> &items)
+void LibraryProcess::command(const std::string &text, const std::vector<std::string> &items)
 {
     std::string message = text.c_str(); // commands are zero-terminated
     for (const std::string &item : items) {
@@ -111,28 +111,28 @@ void Host::command(const std::string &text, const std::vector<std::string> &item
     send_message(control_.get(), {MessageKind::command, message});
 }
 
-void Host::stop(const std::string &item)
+void LibraryProcess::stop(const std::string &item)
 {
     send_message(control_.get(), {MessageKind::stop, item});
 }
 
-void Host::hold_at_ends()
+void LibraryProcess::hold_at_ends()
 {
     holds_ = true;
     send_message(control_.get(), {MessageKind::hold, ""});
 }
 
-void Host::go_on()
+void LibraryProcess::go_on()
 {
     send_message(control_.get(), {MessageKind::go_on, ""});
 }
 
-ModuleProcesses Host::processes() const
+ChildProcesses LibraryProcess::processes() const
 {
     return {leader_, pid_ > 0 ? pid_ : getpid()};
 }
 
-void Host::restart()
+void LibraryProcess::restart()
 {
     if (pid_ < 0) {
         start();
@@ -142,7 +142,7 @@ void Host::restart()
     }
 }
 
-void Host::kill_module() const
+void LibraryProcess::kill_module() const
 {
     if (pid_ > 0) {
         kill(pid_, SIGKILL);
@@ -150,7 +150,7 @@ void Host::kill_module() const
 }
 
 // The library first, or it would start another item meanwhile.
-void Host::suspend()
+void LibraryProcess::suspend()
 {
     if (pid_ > 0) {
         kill(pid_, SIGSTOP);
@@ -158,7 +158,7 @@ void Host::suspend()
     processes().signal_all(SIGSTOP);
 }
 
-void Host::resume()
+void LibraryProcess::resume()
 {
     processes().signal_all(SIGCONT);
     if (pid_ > 0) {
@@ -166,7 +166,7 @@ void Host::resume()
     }
 }
 
-std::string Host::read_back()
+std::string LibraryProcess::read_back()
 {
     has_plan_ = false;
     send_message(control_.get(), {MessageKind::read_back, ""});
@@ -176,14 +176,15 @@ std::string Host::read_back()
     return std::move(plan_);
 }
 
-bool Host::has_news(std::chrono::milliseconds longest, int other) const
+bool LibraryProcess::has_news(std::chrono::milliseconds longest, int other) const
 {
     std::array<pollfd, 2> polled{pollfd{control_.get(), POLLIN, 0}, pollfd{other, POLLIN, 0}};
     poll(polled.data(), polled.size(), static_cast<int>(longest.count()));
     return polled[0].revents != 0;
 }
 
-std::optional<Host::Event> Host::wait(std::chrono::milliseconds longest, int other)
+std::optional<LibraryProcess::Event> LibraryProcess::wait(std::chrono::milliseconds longest,
+                                                          int other)
 {
     if (events_.empty() && pid_ > 0 && has_news(longest, other)) {
         read_control();
@@ -196,7 +197,7 @@ std::optional<Host::Event> Host::wait(std::chrono::milliseconds longest, int oth
     return event;
 }
 
-void Host::read_control()
+void LibraryProcess::read_control()
 {
     Message message;
     if (!receive_message(control_.get(), message)) {
@@ -231,7 +232,7 @@ void Host::read_control()
     events_.push_back(std::move(event));
 }
 
-void Host::lose()
+void LibraryProcess::lose()
 {
     int status = 0;
     while (waitpid(pid_, &status, 0) < 0 && errno == EINTR) {
@@ -248,7 +249,7 @@ void Host::lose()
     events_.push_back(std::move(event));
 }
 
-off_t Host::output_size() const
+off_t LibraryProcess::output_size() const
 {
     struct stat status {
     };
@@ -257,7 +258,7 @@ off_t Host::output_size() const
 
 // A gatherer that stays keeps it for what it prints: that must neither fail from the
 // first byte on nor fill the memory.
-void Host::leave_output()
+void LibraryProcess::leave_output()
 {
     const off_t size = output_size();
     fcntl(output_.get(), F_SETFL, 0);
@@ -268,7 +269,7 @@ void Host::leave_output()
 
 // An item that opens /dev/stderr anew ("> /dev/stderr") truncates it: what has been
 // taken, and is zeros since, is something else then.
-void Host::note_truncation(off_t end)
+void LibraryProcess::note_truncation(off_t end)
 {
     std::array<char, 4096> bytes{};
     const off_t data = taken_ > 0 ? lseek(output_.get(), 0, SEEK_DATA) : -1;
@@ -281,7 +282,7 @@ void Host::note_truncation(off_t end)
     }
 }
 
-std::string Host::take_output()
+std::string LibraryProcess::take_output()
 {
     const off_t size = output_size();
     return has_events() ? "" : take_output(size);
@@ -289,12 +290,12 @@ std::string Host::take_output()
 
 // What has been printed after an event that is still to come is not what was
 // printed before it.
-bool Host::has_events() const
+bool LibraryProcess::has_events() const
 {
     return !events_.empty() || has_news(std::chrono::milliseconds(0), -1);
 }
 
-void Host::pass_output(std::FILE *stream)
+void LibraryProcess::pass_output(std::FILE *stream)
 {
     const off_t size = output_size();
     if (!has_events()) {
@@ -302,7 +303,7 @@ void Host::pass_output(std::FILE *stream)
     }
 }
 
-void Host::pass_output(std::FILE *stream, off_t end)
+void LibraryProcess::pass_output(std::FILE *stream, off_t end)
 {
     note_truncation(end);
     while (taken_ < end) {
@@ -311,7 +312,7 @@ void Host::pass_output(std::FILE *stream, off_t end)
     }
 }
 
-std::string Host::take_output(off_t end)
+std::string LibraryProcess::take_output(off_t end)
 {
     note_truncation(end);
     if (end <= taken_) {

@@ -22,7 +22,7 @@
 namespace fptest
 {
 
-class Host
+class LibraryProcess
 {
   public:
     struct Event {
@@ -45,11 +45,11 @@ class Host
     // Throws std::system_error where the process cannot be made.
     // What the library and its items print is kept for take_output(); input they get
     // none.
-    Host();
+    LibraryProcess();
     // Ends the process. An item that it still runs is stopped.
-    ~Host();
-    Host(const Host &) = delete;
-    Host &operator=(const Host &) = delete;
+    ~LibraryProcess();
+    LibraryProcess(const LibraryProcess &) = delete;
+    LibraryProcess &operator=(const LibraryProcess &) = delete;
 
     // Starts a command that runs items of these names. The one before must have
     // returned.
@@ -66,7 +66,7 @@ class Host
     void go_on();
 
     // What runs for the library; also what a library's process that has ended left.
-    ModuleProcesses processes() const;
+    ChildProcesses processes() const;
 
     // Takes another process for the library in place of one that has ended.
     void restart();

@@ -153,24 +153,24 @@ void require_trigger_port()
     }
 }
 
-std::string gone_text(const Host::Event &event)
+std::string gone_text(const LibraryProcess::Event &event)
 {
     return "the library's process ended " + event.text + "; --log FILE keeps what it says";
 }
 
-int send_and_wait(Host &host, const std::string &command)
+int send_and_wait(LibraryProcess &host, const std::string &command)
 {
     int vendor = 0;
     host.command(command);
     for (;;) {
         const auto event = host.wait(std::chrono::seconds(1));
-        if (event && event->kind == Host::Event::Kind::item) {
+        if (event && event->kind == LibraryProcess::Event::Kind::item) {
             vendor = event->value;
         }
-        if (event && event->kind == Host::Event::Kind::returned) {
+        if (event && event->kind == LibraryProcess::Event::Kind::returned) {
             return vendor;
         }
-        if (event && event->kind == Host::Event::Kind::gone) {
+        if (event && event->kind == LibraryProcess::Event::Kind::gone) {
             throw Failure(Exit::environment, gone_text(*event));
         }
     }
@@ -186,7 +186,7 @@ void require_no_leftovers(const std::vector<std::string> &programs)
     }
 }
 
-int ask_vendor(Host &host)
+int ask_vendor(LibraryProcess &host)
 {
     // a path that leads nowhere: the selector is read and told before that shows
     const int vendor = send_and_wait(host, "XMLNodePath::-/fptest asks for the vendor/-");

@@ -44,14 +44,14 @@ Descriptor lock_device();
 void require_trigger_port();
 
 // The vendor that the library reads; nothing is run to learn it.
-int ask_vendor(Host &host);
+int ask_vendor(LibraryProcess &host);
 
 // Sends a command that runs nothing, and waits for its end. Gives the vendor that
 // the library read for it; 0 where it read none.
-int send_and_wait(Host &host, const std::string &command);
+int send_and_wait(LibraryProcess &host, const std::string &command);
 
 // Says that the library's process has ended, and what to do.
-std::string gone_text(const Host::Event &event);
+std::string gone_text(const LibraryProcess::Event &event);
 
 // That no program of an item is still running from an earlier run: it would report
 // into this one.

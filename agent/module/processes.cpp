@@ -177,7 +177,7 @@ process_of_any(const std::vector<std::string> &programs)
     return std::nullopt;
 }
 
-std::vector<Leftover> ModuleProcesses::of_items(const std::vector<Leftover> &left_out) const
+std::vector<Leftover> ChildProcesses::of_items(const std::vector<Leftover> &left_out) const
 {
     std::vector<Leftover> all;
     const Processes processes = read_processes();
@@ -191,7 +191,7 @@ std::vector<Leftover> ModuleProcesses::of_items(const std::vector<Leftover> &lef
     return all;
 }
 
-void ModuleProcesses::signal_all(int signal) const
+void ChildProcesses::signal_all(int signal) const
 {
     const Processes processes = read_processes();
     for (const auto &[pid, process] : processes) {
@@ -211,12 +211,12 @@ bool signal_each(const std::vector<Leftover> &processes, int signal)
     return found;
 }
 
-bool ModuleProcesses::has_gatherer() const
+bool ChildProcesses::has_gatherer() const
 {
     return !of_gatherer().empty();
 }
 
-std::vector<Leftover> ModuleProcesses::of_gatherer() const
+std::vector<Leftover> ChildProcesses::of_gatherer() const
 {
     std::vector<Leftover> all;
     const Processes processes = read_processes();

@@ -31,12 +31,12 @@ std::optional<std::pair<std::string, pid_t>>
 process_of_any(const std::vector<std::string> &programs);
 
 // What a library's process has started and what came of that.
-class ModuleProcesses
+class ChildProcesses
 {
   public:
     // The library's process, which leads its own process group, and the one that
     // inherits what it leaves behind when it dies; they may be the same.
-    ModuleProcesses(pid_t module, pid_t ancestor) : module_(module), ancestor_(ancestor)
+    ChildProcesses(pid_t module, pid_t ancestor) : module_(module), ancestor_(ancestor)
     {
     }
 

@@ -179,7 +179,7 @@ class Server
     static int stop(const std::vector<std::string> &items)
     {
         if (!runs_below(getpid(), items)) {
-            return Host::kNothingToStop;
+            return LibraryProcess::kNothingToStop;
         }
         const Descriptor output(fcntl(STDERR_FILENO, F_DUPFD_CLOEXEC, 0));
         const Descriptor null(open("/dev/null", O_WRONLY | O_CLOEXEC));
@@ -197,7 +197,7 @@ class Server
     static void end_items()
     {
         using namespace std::chrono_literals;
-        const ModuleProcesses processes(getpid(), getpid());
+        const ChildProcesses processes(getpid(), getpid());
         const auto limit = std::chrono::steady_clock::now() + kGrace;
         processes.signal_all(SIGCONT); // the run may have been suspended
         while (signal_each(processes.of_items(),

@@ -30,8 +30,9 @@ std::optional<std::string> read_stored_plan()
 std::string whole_stored_plan()
 {
     std::string text;
-    made_of_stored_plan(
-        text, [](const std::string &plan) { return Plan::read(plan) || Plan::load(plan); });
+    made_of_stored_plan(text, [](const std::string &plan) {
+        return Plan::parse_annotated(plan) || Plan::load_as_library(plan);
+    });
     return text;
 }
 

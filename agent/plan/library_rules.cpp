@@ -27,7 +27,7 @@ std::string program_name(std::string_view name)
 
 } // namespace
 
-std::string stored_part(std::string_view text)
+std::string as_stored(std::string_view text)
 {
     text.remove_prefix(std::min(text.find_first_not_of(':'), text.size()));
     return up_to_any(text, std::string_view(":\0", 2)).substr(0, kPlanLimit);

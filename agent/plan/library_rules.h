@@ -23,7 +23,7 @@ inline constexpr unsigned short kTriggerPort = 34952;
 
 // What an "XMLFile" command stores of this text: it ends at the first ':' (those
 // at its very start are passed over) or zero byte, and holds 2048 bytes at most.
-std::string stored_part(std::string_view text);
+std::string as_stored(std::string_view text);
 
 // "", "_ca" or "_ca_qsee"; nothing for a vendor that runs no item.
 std::optional<std::string> vendor_suffix(int vendor);

@@ -193,7 +193,7 @@ bool belongs(const Tag &tag, mxml_node_t *node)
 
 // --- plans ----------------------------------------------------------------------
 
-std::optional<Plan> Plan::load(const std::string &text, std::string *why)
+std::optional<Plan> Plan::load_as_library(const std::string &text, std::string *why)
 {
     const Descriptor file = descriptor_of(text);
     const LibraryErrors errors;
@@ -270,18 +270,18 @@ std::string as_loaded(const std::string &value)
     mxmlElementSetAttr(node.get(), "name", value.c_str());
     const std::unique_ptr<char, decltype(&std::free)> saved(
         mxmlSaveAllocString(node.get(), MXML_NO_CALLBACK), &std::free);
-    const auto plan = saved ? Plan::load(saved.get()) : std::nullopt;
+    const auto plan = saved ? Plan::load_as_library(saved.get()) : std::nullopt;
     return plan ? attribute(plan->top(), "name").value_or("") : value;
 }
 
-std::optional<Plan> Plan::read(std::string_view text)
+std::optional<Plan> Plan::parse_annotated(std::string_view text)
 {
-    const std::string cleaned = clean(text);
+    const std::string cleaned = sanitize_utf8(text);
     const std::vector<Tag> tags = scan(cleaned);
     if (!is_whole(tags)) {
         return std::nullopt;
     }
-    std::optional<Plan> plan = load(with_empty_values(cleaned, tags));
+    std::optional<Plan> plan = load_as_library(with_empty_values(cleaned, tags));
     if (!plan) {
         return std::nullopt;
     }
@@ -372,7 +372,7 @@ mxml_node_t *Plan::after(mxml_node_t *group, const Numbers &items) const
     return found != items.end() ? elements_[*found] : nullptr;
 }
 
-std::vector<std::optional<Plan::Element>> Plan::run_by(const std::string &group) const
+std::vector<std::optional<Plan::Element>> Plan::resolve(const std::string &group) const
 {
     const std::vector<std::string> path = components(group);
     if (path.size() > 2) {
@@ -381,7 +381,7 @@ std::vector<std::optional<Plan::Element>> Plan::run_by(const std::string &group)
     return path.size() == 2 ? run_group(path[1]) : std::vector<std::optional<Element>>();
 }
 
-std::optional<Plan::Element> Plan::run_by(const std::string &group, const std::string &item) const
+std::optional<Plan::Element> Plan::resolve(const std::string &group, const std::string &item) const
 {
     const std::vector<std::string> path = components(group + "/" + item);
     return path.size() > 2 ? run_item(path[1], path[2]) : std::nullopt;

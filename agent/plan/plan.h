@@ -35,12 +35,12 @@ class Plan
 
     // Nothing where Mini-XML does not load it; why then says what it has
     // against it, in Mini-XML's words.
-    static std::optional<Plan> load(const std::string &text, std::string *why = nullptr);
+    static std::optional<Plan> load_as_library(const std::string &text, std::string *why = nullptr);
 
-    // As load(), but for reading results: control characters and bytes that are
+    // As load_as_library(), but for reading results: control characters and bytes that are
     // no UTF-8 are made visible first, and attributes may lack their value.
     // Nothing where the text is not whole, as while it is being written.
-    static std::optional<Plan> read(std::string_view text);
+    static std::optional<Plan> parse_annotated(std::string_view text);
 
     struct Group {
         std::string name;
@@ -56,10 +56,10 @@ class Plan
     // What the library runs for root/group: an entry for each of its calls,
     // nothing where a call would find nothing to run. The path is taken as the
     // library takes it: a '/' in the name makes one of an item.
-    std::vector<std::optional<Element>> run_by(const std::string &group) const;
+    std::vector<std::optional<Element>> resolve(const std::string &group) const;
 
     // What the library runs for root/group/item, nothing where that is nothing.
-    std::optional<Element> run_by(const std::string &group, const std::string &item) const;
+    std::optional<Element> resolve(const std::string &group, const std::string &item) const;
 
     // Every element of the document in order, comments and the like included.
     const std::vector<mxml_node_t *> &elements() const;

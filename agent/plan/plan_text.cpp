@@ -49,7 +49,7 @@ class AttributeEraser
 // The tags of the text's elements; nothing where it is not whole.
 std::optional<std::vector<Tag>> whole_tags(const std::string &text)
 {
-    const std::optional<Plan> plan = Plan::read(text);
+    const std::optional<Plan> plan = Plan::parse_annotated(text);
     return plan ? std::optional(element_tags(*plan, text)) : std::nullopt;
 }
 
@@ -83,10 +83,10 @@ std::optional<std::string> without_reports(const std::string &text,
 
 std::optional<std::string> made_loadable(const std::string &text)
 {
-    if (Plan::load(text) || !Plan::read(text)) {
+    if (Plan::load_as_library(text) || !Plan::parse_annotated(text)) {
         return std::nullopt;
     }
-    const std::string cleaned = clean(text);
+    const std::string cleaned = sanitize_utf8(text);
     return with_empty_values(cleaned, scan(cleaned));
 }
 

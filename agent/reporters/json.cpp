@@ -28,12 +28,12 @@ constexpr int kFormat = 2; // one more whenever a reader would have to be change
 
 Json text_or_null(const std::optional<std::string> &text)
 {
-    return text ? Json(clean(*text)) : Json();
+    return text ? Json(sanitize_utf8(*text)) : Json();
 }
 
 Json words_or_null(const std::string &words)
 {
-    return words.empty() ? Json() : Json(clean(words));
+    return words.empty() ? Json() : Json(sanitize_utf8(words));
 }
 
 // In milliseconds: the digits after them are noise.
@@ -66,7 +66,7 @@ void add_end(Json &json, const ItemRun &item)
     json["signal"] = item.signal != 0 ? Json(name_of_signal(item.signal)) : Json();
     Json left = Json::array();
     for (const Leftover &one : item.left_running) {
-        left.push_back({{"name", clean(one.name)}, {"pid", one.process}});
+        left.push_back({{"name", sanitize_utf8(one.name)}, {"pid", one.process}});
     }
     json["left_running"] = std::move(left);
 }
@@ -76,8 +76,8 @@ Json summary_of(const Run &run)
     Json items = Json::array();
     for (const Summary &one : run.summary) {
         const Times &times = one.times;
-        Json json = {{"group", clean(one.group)},
-                     {"item", clean(one.name)},
+        Json json = {{"group", sanitize_utf8(one.group)},
+                     {"item", sanitize_utf8(one.name)},
                      {"run", times.count()},
                      {"passed", one.passed}};
         const bool is_run = times.count() > 0;
@@ -108,14 +108,15 @@ class JsonReport : public Listener
             first_of_.push_back(ended_.size());
             ended_.resize(ended_.size() + suite.items.size(), false);
             for (const ItemRun &item : suite.items) {
-                items.push_back({{"group", clean(item.group)}, {"item", clean(item.name)}});
+                items.push_back(
+                    {{"group", sanitize_utf8(item.group)}, {"item", sanitize_utf8(item.name)}});
             }
         }
         Json json = event("run");
         json["format"] = kFormat;
         json["program"] = "fptest";
         json["version"] = FPTEST_VERSION;
-        json["plan"] = clean(run.plan);
+        json["plan"] = sanitize_utf8(run.plan);
         json["vendor"] = run.vendor;
         json["rounds"] = run.rounds ? Json(*run.rounds) : Json();
         json["time_limit"] = seconds_or_null(run.time_limit);
@@ -152,7 +153,7 @@ class JsonReport : public Listener
         json["start"] = start_of(item);
         json["seconds"] = seconds_or_null(item.seconds);
         add_end(json, item);
-        json["output"] = clean(item.output);
+        json["output"] = sanitize_utf8(item.output);
         write(json);
     }
 
@@ -189,7 +190,7 @@ class JsonReport : public Listener
         json["rounds"] = run.round;
         json["passed"] = counts.passed;
         json["failed"] = counts.failed;
-        json["not_run"] = counts.to_go;
+        json["not_run"] = counts.not_run;
         json["seconds"] = seconds_or_null(run.seconds);
         json["summary"] = summary_of(run);
         write(json);
@@ -218,8 +219,8 @@ class JsonReport : public Listener
         const auto rounds_before = static_cast<std::size_t>(run.round) - 1;
         return {{"event", name},
                 {"index", rounds_before * ended_.size() + first_of_[place.suite] + place.item},
-                {"group", clean(item.group)},
-                {"item", clean(item.name)},
+                {"group", sanitize_utf8(item.group)},
+                {"item", sanitize_utf8(item.name)},
                 {"round", run.round}};
     }
 

@@ -33,7 +33,7 @@ std::string escaped(std::string_view text)
         {"\xEF\xBF\xBE", "\uFFFD"},
         {"\xEF\xBF\xBF", "\uFFFD"},
     };
-    return replaced(clean(text), kEscapes);
+    return replaced(sanitize_utf8(text), kEscapes);
 }
 
 // A reader makes blanks of the tabs and line feeds in attributes.
@@ -91,7 +91,7 @@ void add(Tests &tests, const Run &run, const Suite &suite)
         case Outcome::failed:
             ++tests.failures;
             break;
-        case Outcome::silent:
+        case Outcome::no_result:
         case Outcome::timed_out:
         case Outcome::stopped:
             ++tests.errors;

@@ -56,7 +56,7 @@ class Line
 
     void add(const std::string &text, Colour colour = Colour::none)
     {
-        const std::string shown = cut(text, room());
+        const std::string shown = ellipsize(text, room());
         if (coloured_ && colour != Colour::none && !shown.empty()) {
             static constexpr const char *codes[] = {"", "31", "32", "33", "36"};
             text_ +=
@@ -64,7 +64,7 @@ class Line
         } else {
             text_ += shown;
         }
-        width_ += columns(shown);
+        width_ += display_width(shown);
     }
 
     const std::string &text() const
@@ -95,7 +95,7 @@ class LiveView : public Listener
     {
         for (const Suite &suite : run.suites) {
             for (const ItemRun &item : suite.items) {
-                name_width_ = std::max(name_width_, columns(one_line(item.name)));
+                name_width_ = std::max(name_width_, display_width(one_line(item.name)));
             }
         }
         name_width_ = std::min<std::size_t>(name_width_, 28);
@@ -136,7 +136,7 @@ class LiveView : public Listener
         const std::string more = remark(item);
         said += (said.empty() || more.empty() ? "" : ": ") + more;
         Line line = item_line(item);
-        const bool has_room = columns(said) <= line.room();
+        const bool has_room = display_width(said) <= line.room();
         line.add(has_room ? said : "");
         keep(line);
         if (!has_room) {
@@ -220,10 +220,12 @@ class LiveView : public Listener
         Line line = new_line();
         const std::size_t width = line.room();
         const std::size_t bar = width >= 95 ? 16 : width >= 60 ? 8 : 0;
-        line.add("  " + fit(one_line(item.name), std::min(name_width_, width / 3)) + " ");
+        line.add("  " + pad_or_ellipsize(one_line(item.name), std::min(name_width_, width / 3)) +
+                 " ");
         add_progress(line, item.report, bar);
         line.add(right(duration(item.seconds.value_or(item.running)), 6) + "  ");
-        line.add(fit(runs ? (item.stopping ? "stopping" : "running") : word(item.outcome), 9),
+        line.add(pad_or_ellipsize(
+                     runs ? (item.stopping ? "stopping" : "running") : word(item.outcome), 9),
                  runs ? Colour::cyan : colour_of(item.outcome));
         line.add(" " + right(result_of(item.report), 2) + "  ");
         return line;
@@ -245,7 +247,7 @@ class LiveView : public Listener
 
     static std::string right(const std::string &text, std::size_t width)
     {
-        const std::size_t taken = columns(text);
+        const std::size_t taken = display_width(text);
         return (taken < width ? std::string(width - taken, ' ') : "") + text;
     }
 

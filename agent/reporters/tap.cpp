@@ -49,8 +49,8 @@ std::string quoted(std::string_view text)
     // Perl's reader of YAML takes a longer one for broken
     constexpr std::size_t kLongest = 60000;
     constexpr std::size_t kKept = 10000;
-    const std::string whole = '"' + replaced(clean(text), kEscapes) + '"';
-    return whole.size() <= kLongest ? whole : quoted(cut(clean(text), kKept));
+    const std::string whole = '"' + replaced(sanitize_utf8(text), kEscapes) + '"';
+    return whole.size() <= kLongest ? whole : quoted(ellipsize(sanitize_utf8(text), kKept));
 }
 
 std::string plan_line(std::size_t points)
@@ -123,7 +123,7 @@ std::string suite_point(const Run &run, const Suite &suite, std::size_t number)
     std::string text = point(counts.failed == 0, number, title(run, suite));
     if (suite.items.empty()) {
         text += " # SKIP nothing to run";
-    } else if (counts.to_go == suite.items.size()) {
+    } else if (counts.not_run == suite.items.size()) {
         text += skipped(run, suite.items.front());
     }
     return text + "\n";
@@ -187,8 +187,8 @@ class TapReport : public Listener
             text += comment(line);
         }
         text += comment(std::to_string(counts.passed) + " passed, " +
-                        std::to_string(counts.failed) + " failed, " + std::to_string(counts.to_go) +
-                        " not run in " + duration(run.seconds));
+                        std::to_string(counts.failed) + " failed, " +
+                        std::to_string(counts.not_run) + " not run in " + duration(run.seconds));
         if (!run.finished) {
             text += "Bail out!  " +
                     one_line(run.why_unfinished.empty() ? "the run did not finish"

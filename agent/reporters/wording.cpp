@@ -37,7 +37,7 @@ std::string time_limit(double seconds)
 std::string rounds(const Run &run)
 {
     std::string text =
-        run.rounds ? amount(static_cast<std::size_t>(*run.rounds), "round") : "rounds";
+        run.rounds ? plural(static_cast<std::size_t>(*run.rounds), "round") : "rounds";
     if (run.rounds && !has_fixed_rounds(run)) {
         text = "at most " + text;
     }
@@ -58,7 +58,7 @@ std::string heading(const Run &run)
     for (const Suite &suite : run.suites) {
         items += suite.items.size();
     }
-    return one_line(run.plan) + ": " + amount(items, "item") + ", vendor " +
+    return one_line(run.plan) + ": " + plural(items, "item") + ", vendor " +
            std::to_string(run.vendor) + (has_rounds(run) ? ", " + rounds(run) : "");
 }
 
@@ -68,10 +68,10 @@ std::string total(const Run &run)
     std::string text =
         std::to_string(counts.passed) + " passed, " + std::to_string(counts.failed) + " failed";
     const bool has_ended = run.finished || !run.why_unfinished.empty();
-    if (has_ended && (counts.to_go > 0 || !run.finished)) {
-        text += ", " + std::to_string(counts.to_go) + " not run";
+    if (has_ended && (counts.not_run > 0 || !run.finished)) {
+        text += ", " + std::to_string(counts.not_run) + " not run";
     } else if (!has_ended && has_fixed_rounds(run)) {
-        text += ", " + std::to_string(counts.to_go) + " to go";
+        text += ", " + std::to_string(counts.not_run) + " to go";
     } else if (!has_ended) {
         text += ", round " + std::to_string(run.round);
     }
@@ -110,8 +110,8 @@ std::string reported_result(const ItemReport &report)
 
 std::string remark(const ItemRun &item)
 {
-    const bool explained = item.outcome == Outcome::silent || item.outcome == Outcome::timed_out ||
-                           item.outcome == Outcome::stopped;
+    const bool explained = item.outcome == Outcome::no_result ||
+                           item.outcome == Outcome::timed_out || item.outcome == Outcome::stopped;
     std::string text = one_line(item.report.description.value_or(""));
     if (text.empty() && item.signal != 0 && !explained) {
         return {}; // how it ended is said already
@@ -142,13 +142,13 @@ std::vector<std::string> last_lines(std::string_view output)
         if (line.ends_with('\r')) {
             line.remove_suffix(1);
         }
-        lines.push_back(cut(one_line(line), kOutputColumns));
+        lines.push_back(ellipsize(one_line(line), kOutputColumns));
         at = end + 1;
     }
     if (lines.size() > kOutputLines) {
         const std::size_t left_out = lines.size() - kOutputLines;
         lines.erase(lines.begin(), lines.end() - kOutputLines);
-        lines.insert(lines.begin(), "(" + amount(left_out, "line") + " before)");
+        lines.insert(lines.begin(), "(" + plural(left_out, "line") + " before)");
     }
     return lines;
 }

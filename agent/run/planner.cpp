@@ -60,7 +60,7 @@ std::string instead(const std::string &name, const std::vector<std::string> &nam
         shown.push_back(one_line(one));
     }
     return (near.empty() ? "; the " : "; did you mean " + quoted(near) + "? The ") + what +
-           " are " + listing(shown);
+           " are " + join_and(shown);
 }
 
 Path parts_of(const std::string &text, const Plan &plan)
@@ -127,7 +127,7 @@ bool is_addressable(const Plan &plan, const std::string &group,
         if (!item || !item->name || item->name->find_first_of("/:\t\n") != std::string::npos) {
             return false;
         }
-        const auto found = plan.run_by(group, *item->name);
+        const auto found = plan.resolve(group, *item->name);
         return found && found->number == item->number;
     });
 }
@@ -142,10 +142,10 @@ class WorkPlanner
     void add(const Path &path)
     {
         if (!path.item.empty()) {
-            add_job(path.text, path.group, {plan_.run_by(path.group, path.item)});
+            add_job(path.text, path.group, {plan_.resolve(path.group, path.item)});
             return;
         }
-        const auto items = plan_.run_by(path.group);
+        const auto items = plan_.resolve(path.group);
         if (as_group_ || !is_addressable(plan_, path.group, items)) {
             add_job(path.text, path.group, items);
             return;
@@ -239,8 +239,8 @@ void list_items(const std::vector<Path> &paths, const Plan &plan, const std::str
     std::vector<std::pair<std::string, std::string>> lines;
     std::size_t width = 0;
     for (const Path &path : paths) {
-        const auto items = path.item.empty() ? plan.run_by(path.group)
-                                             : std::vector{plan.run_by(path.group, path.item)};
+        const auto items = path.item.empty() ? plan.resolve(path.group)
+                                             : std::vector{plan.resolve(path.group, path.item)};
         for (const auto &item : items) {
             if (!runs_something(item)) {
                 continue;
@@ -248,11 +248,11 @@ void list_items(const std::vector<Path> &paths, const Plan &plan, const std::str
             lines.emplace_back(
                 one_line(path.root + "/" + path.group + "/" + *item->name),
                 one_line(command_line(*item->name, item->args, suffix).substr(0, kCommandLimit)));
-            width = std::max(width, columns(lines.back().first));
+            width = std::max(width, display_width(lines.back().first));
         }
     }
     for (const auto &[path, command] : lines) {
-        std::printf("%s  %s\n", fit(path, width).c_str(), command.c_str());
+        std::printf("%s  %s\n", pad_or_ellipsize(path, width).c_str(), command.c_str());
     }
 }
 

@@ -22,13 +22,13 @@ Counts count(const std::vector<ItemRun> &items)
     for (const ItemRun &item : items) {
         switch (item.outcome) {
         case Outcome::not_run:
-            ++counts.to_go;
+            ++counts.not_run;
             break;
         case Outcome::passed:
             ++counts.passed;
             break;
         case Outcome::failed:
-        case Outcome::silent:
+        case Outcome::no_result:
         case Outcome::timed_out:
         case Outcome::stopped:
             ++counts.failed;
@@ -46,7 +46,7 @@ Counts count(const Run &run)
         sum += count(suite.items);
         items += suite.items.size();
     }
-    sum.to_go += rounds_to_come(run) * items;
+    sum.not_run += rounds_to_come(run) * items;
     return sum;
 }
 
@@ -93,7 +93,7 @@ const char *word(Outcome outcome)
         return "passed";
     case Outcome::failed:
         return "failed";
-    case Outcome::silent:
+    case Outcome::no_result:
         return "no result";
     case Outcome::timed_out:
         return "timed out";

@@ -22,7 +22,7 @@ enum class Outcome {
     not_run,   // and nothing was started of it
     passed,    // it reported the code that means so
     failed,    // it reported another one
-    silent,    // it ended and has reported no result
+    no_result, // it ended and has reported no result
     timed_out, // it was stopped because it took too long
     stopped,   // it was stopped because the run was
 };
@@ -55,18 +55,18 @@ struct Suite {
 
 struct Counts {
     std::size_t passed = 0;
-    std::size_t failed = 0; // failed, silent, timed out and stopped
-    std::size_t to_go = 0;  // not run
+    std::size_t failed = 0;  // failed, silent, timed out and stopped
+    std::size_t not_run = 0; // not run
 
     std::size_t all() const
     {
-        return passed + failed + to_go;
+        return passed + failed + not_run;
     }
     Counts &operator+=(const Counts &more)
     {
         passed += more.passed;
         failed += more.failed;
-        to_go += more.to_go;
+        not_run += more.not_run;
         return *this;
     }
 };

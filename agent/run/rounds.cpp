@@ -52,7 +52,7 @@ void clear_reports(Job &job)
     std::string text;
     const auto cleared = made_of_stored_plan(
         text, [&](const std::string &plan) { return without_reports(plan, numbers, mark); });
-    if (!cleared && Plan::load(text)) {
+    if (!cleared && Plan::load_as_library(text)) {
         return; // a forced one that is not well-formed: nobody has reported in it
     }
     if (!cleared) {
@@ -174,7 +174,7 @@ std::string failures(const std::vector<Listener *> &listeners)
             all.push_back(std::move(failure));
         }
     }
-    return listing(all);
+    return join_and(all);
 }
 
 // For who has interrupted the run, unless that is nobody any more.
@@ -250,8 +250,8 @@ void begin(Run &run, const std::vector<Listener *> &listeners, Signals &signals)
 
 } // namespace
 
-Exit run_rounds(const std::vector<Listener *> &listeners, const Runner::Limits &limits, Host &host,
-                Signals &signals, Run &run, const Work &work)
+Exit run_rounds(const std::vector<Listener *> &listeners, const Runner::Limits &limits,
+                LibraryProcess &host, Signals &signals, Run &run, const Work &work)
 {
     run.suites = work.suites;
     run.start = std::chrono::system_clock::now();

@@ -16,7 +16,7 @@ namespace fptest
 
 // How fptest is to end. Throws a Failure where the run, or one of its reports, could
 // not be carried through.
-Exit run_rounds(const std::vector<Listener *> &listeners, const Runner::Limits &limits, Host &host,
-                Signals &signals, Run &run, const Work &work);
+Exit run_rounds(const std::vector<Listener *> &listeners, const Runner::Limits &limits,
+                LibraryProcess &host, Signals &signals, Run &run, const Work &work);
 
 } // namespace fptest

@@ -24,12 +24,6 @@ using namespace std::chrono_literals;
 using Seconds = std::chrono::duration<double>;
 
 constexpr auto kTurn = 25ms;
-// The gatherer's command returns when the gatherer has been told; its report
-// comes in its own time.
-constexpr Seconds kGathering = 10s;
-// A gatherer that is being started may not be there yet.
-constexpr auto kBeforeMissed = 500ms;
-constexpr auto kBetweenLooks = 250ms;
 constexpr std::size_t kOutputKept = std::size_t{64} * 1024;
 
 void append_output(std::string &output, const std::string &text)
@@ -47,17 +41,6 @@ std::string reported(const ItemReport &report)
                : "reported the result " + report.result.value_or("");
 }
 
-// As it reads once the plan has been made loadable.
-ItemReport as_made_loadable(ItemReport report)
-{
-    if (report.result_without_value) {
-        report.result_without_value = false;
-        report.result = "";
-    }
-    report.description = report.description.value_or("");
-    return report;
-}
-
 // What the item died by; 0 where it ended by itself. A shell that has not become the
 // item, as for quotes in its arguments, says so by its own exit status.
 int signal_of(int status)
@@ -69,38 +52,12 @@ int signal_of(int status)
     return name_of_signal(signal).starts_with("SIG") ? signal : 0;
 }
 
-// Whether that element is the item still, and not one of another plan.
-bool is_item(const Plan &plan, std::size_t number, const std::string &name)
-{
-    if (number >= plan.elements().size()) {
-        return false;
-    }
-    const char *found = mxmlElementGetAttr(plan.elements()[number], "name");
-    return found != nullptr && name == found;
-}
-
-// Whether a process with an old copy of the plan may have brought that back.
-bool is_earlier(const ItemReport &report, const ItemReport &last)
-{
-    const auto progress = [](const ItemReport &one) {
-        return std::atol(one.progress.value_or("0").c_str());
-    };
-    return report.result == last.result && progress(report) < progress(last);
-}
-
-// One without it is as a process with an old copy of the plan has written it.
-bool bears_mark(const Plan &plan, const Job::Target &target)
-{
-    const char *found = mxmlElementGetAttr(plan.elements()[target.element], kMark);
-    return target.mark.empty() || (found != nullptr && target.mark == found);
-}
-
 } // namespace
 
 // --- a job --------------------------------------------------------------------
 
-Runner::Runner(Host &host, Signals &signals, Run &run, const std::vector<Listener *> &listeners,
-               const Limits &limits)
+Runner::Runner(LibraryProcess &host, Signals &signals, Run &run,
+               const std::vector<Listener *> &listeners, const Limits &limits)
     : host_(host), signals_(signals), run_(run), listeners_(listeners), limits_(limits)
 {
     signals_.take_suspensions();
@@ -156,7 +113,7 @@ bool Runner::run(const Job &job)
         require_all_started(job, next);
         require_plan();
     }
-    tell_ended();
+    notify_ended();
     return run_.why_unfinished.empty();
 }
 
@@ -175,7 +132,7 @@ void Runner::require_all_started(const Job &job, std::size_t next)
             listener->started(run_, place);
         }
         result.seconds = 0;
-        result.outcome = Outcome::silent;
+        result.outcome = Outcome::no_result;
         result.reason = module_gone_.empty()
                             ? "the library never reached it; run with --log FILE to see why"
                             : "the library never reached it: " + module_gone_;
@@ -189,7 +146,7 @@ void Runner::require_all_started(const Job &job, std::size_t next)
 void Runner::require_plan()
 {
     const std::string text = whole_stored_plan();
-    if (Plan::read(text) || Plan::load(text)) {
+    if (Plan::parse_annotated(text) || Plan::load_as_library(text)) {
         return;
     }
     give_up(std::string("the stored plan ") + kStoredPlan +
@@ -197,24 +154,25 @@ void Runner::require_plan()
     broken_ = true;
 }
 
-void Runner::handle(const Host::Event &event, const Job &job, std::size_t &next, bool &runs)
+void Runner::handle(const LibraryProcess::Event &event, const Job &job, std::size_t &next,
+                    bool &runs)
 {
     switch (event.kind) {
-    case Host::Event::Kind::item:
+    case LibraryProcess::Event::Kind::item:
         move_on(event);
         start_next(job, next, event);
         break;
-    case Host::Event::Kind::ended:
+    case LibraryProcess::Event::Kind::ended:
         end_item(event);
         break;
-    case Host::Event::Kind::returned:
+    case LibraryProcess::Event::Kind::returned:
         runs = false;
         move_on(event);
         break;
-    case Host::Event::Kind::stopped:
+    case LibraryProcess::Event::Kind::stopped:
         note_stop(event);
         break;
-    case Host::Event::Kind::gone:
+    case LibraryProcess::Event::Kind::gone:
         runs = false;
         lose_module(event);
         break;
@@ -222,7 +180,7 @@ void Runner::handle(const Host::Event &event, const Job &job, std::size_t &next,
 }
 
 // It costs the items that it was running; the next ones get another.
-void Runner::lose_module(const Host::Event &event)
+void Runner::lose_module(const LibraryProcess::Event &event)
 {
     module_gone_ = "the library's process ended " + event.text + "; --log FILE keeps what it says";
     stop_asked_ = false;
@@ -230,10 +188,10 @@ void Runner::lose_module(const Host::Event &event)
         append_output(item(active_.back().place).output, host_.take_output(event.output));
     }
     read_reports(whole_stored_plan());
-    for (Active &active : active_) {
+    for (RunningItem &active : active_) {
         finish(active, on_run_clock(event.time));
     }
-    tell_ended();
+    notify_ended();
     end_left_running();
     if (!broken_) {
         host_.restart();
@@ -243,9 +201,9 @@ void Runner::lose_module(const Host::Event &event)
 void Runner::watch(bool command_runs)
 {
     read_signals();
-    look();
+    poll_reports();
     stop_what_is_due(command_runs);
-    tell_ended();
+    notify_ended();
     tick();
 }
 
@@ -256,7 +214,7 @@ void Runner::tick()
     if (!active_.empty()) {
         append_output(item(active_.back().place).output, output);
     }
-    for (const Active &active : active_) {
+    for (const RunningItem &active : active_) {
         item(active.place).running = std::max(0.0, Seconds(now() - active.start).count());
         item(active.place).stopping = active.stop.has_value();
     }
@@ -275,21 +233,21 @@ const ItemRun &Runner::item(const Place &place) const
     return run_.suites[place.suite].items[place.item];
 }
 
-bool Runner::gathers(const Active &active) const
+bool Runner::gathers(const RunningItem &active) const
 {
     return is_gatherer(item(active.place).name, vendor_);
 }
 
 // --- an item's start and end --------------------------------------------------
 
-void Runner::start_next(const Job &job, std::size_t &next, const Host::Event &event)
+void Runner::start_next(const Job &job, std::size_t &next, const LibraryProcess::Event &event)
 {
     vendor_ = event.value;
     const std::size_t at = next++;
     if (at >= job.targets.size() || !job.targets[at]) {
         return;
     }
-    Active active;
+    RunningItem active;
     active.place = {job.suite, job.targets[at]->item};
     active.target = *job.targets[at];
     active.start = on_run_clock(event.time);
@@ -312,21 +270,21 @@ void Runner::start_next(const Job &job, std::size_t &next, const Host::Event &ev
 
 // The item's process has ended, and the library waits: what stands in the plan now is
 // what the item has reported.
-void Runner::end_item(const Host::Event &event)
+void Runner::end_item(const LibraryProcess::Event &event)
 {
     const std::string output = host_.take_output(event.output);
     const bool is_watched = !active_.empty() && !active_.back().moved_on;
     if (is_watched) {
         const std::string plan = whole_stored_plan();
         read_reports(plan); // before what it has left can report again
-        active_.back().report_lost = !Plan::read(plan);
+        active_.back().report_lost = !Plan::parse_annotated(plan);
     }
     const std::vector<Leftover> left =
         event.left_running
             ? note_left_running(is_watched ? active_.back().target.element : kNoElement)
             : std::vector<Leftover>();
     if (is_watched) {
-        Active &active = active_.back();
+        RunningItem &active = active_.back();
         ItemRun &result = item(active.place);
         append_output(result.output, output);
         active.moved_on = true;
@@ -339,35 +297,35 @@ void Runner::end_item(const Host::Event &event)
         }
         result.left_running = left;
         finish(active, active.moved_on_at);
-        tell_ended();
+        notify_ended();
     }
     host_.go_on();
 }
 
 // The library has gone on to its next item, or has returned: it was with the
 // gatherer, or with an item that it could not start.
-void Runner::move_on(const Host::Event &event)
+void Runner::move_on(const LibraryProcess::Event &event)
 {
     const std::string output = host_.take_output(event.output);
     if (active_.empty()) {
         return;
     }
-    Active &active = active_.back();
+    RunningItem &active = active_.back();
     append_output(item(active.place).output, output);
     if (active.moved_on) {
         return;
     }
     active.moved_on = true;
     active.moved_on_at = on_run_clock(event.time);
-    read_reports(event.kind == Host::Event::Kind::returned ? host_.read_back()
-                                                           : whole_stored_plan());
+    read_reports(event.kind == LibraryProcess::Event::Kind::returned ? host_.read_back()
+                                                                     : whole_stored_plan());
     if (!gathers(active) || !active.gatherer_end.empty()) {
         finish(active, active.moved_on_at);
-        tell_ended();
+        notify_ended();
     }
 }
 
-void Runner::finish(Active &active, TimePoint end)
+void Runner::finish(RunningItem &active, TimePoint end)
 {
     if (active.done) {
         return;
@@ -391,7 +349,7 @@ void Runner::finish(Active &active, TimePoint end)
     mend_stored_plan();
 }
 
-void Runner::judge(const Active &active)
+void Runner::judge(const RunningItem &active)
 {
     ItemRun &result = item(active.place);
     const ItemReport &report = result.report;
@@ -401,7 +359,7 @@ void Runner::judge(const Active &active)
         result.outcome = *active.stop;
         result.reason = why_stopped(active);
     } else if (!module_gone_.empty()) {
-        result.outcome = has_reported ? Outcome::failed : Outcome::silent;
+        result.outcome = has_reported ? Outcome::failed : Outcome::no_result;
         result.reason = module_gone_;
         result.overruled = has_reported;
     } else if (result.signal != 0) {
@@ -409,7 +367,7 @@ void Runner::judge(const Active &active)
         result.reason = "died by " + name_of_signal(result.signal) +
                         (has_reported ? ", though it " + reported(report) : "");
     } else if (!has_reported || active.report_lost) {
-        result.outcome = Outcome::silent;
+        result.outcome = Outcome::no_result;
         result.reason = why_silent(active);
     } else if (!active.gatherer_end.empty() && report.progress != "100") {
         result.outcome = Outcome::failed;
@@ -428,7 +386,7 @@ void Runner::judge(const Active &active)
     }
 }
 
-std::string Runner::why_stopped(const Active &active)
+std::string Runner::why_stopped(const RunningItem &active)
 {
     if (!active.was_stopped && !module_gone_.empty()) {
         return "past the limit of " + fine_duration(limits_.item->count()) + ": " + module_gone_;
@@ -446,7 +404,7 @@ std::string Runner::why_stopped(const Active &active)
            (active.killed ? ", as it did not end when it was asked to" : "");
 }
 
-std::string Runner::why_silent(const Active &active)
+std::string Runner::why_silent(const RunningItem &active)
 {
     const auto suffix = vendor_suffix(vendor_);
     if (!suffix) {
@@ -471,22 +429,22 @@ std::string Runner::why_silent(const Active &active)
     }
     const std::string text = read_stored_plan().value_or("");
     std::string why;
-    if (Plan::read(text) && !Plan::load(text, &why)) {
+    if (Plan::parse_annotated(text) && !Plan::load_as_library(text, &why)) {
         return "no report can be written any more: the stored plan does not load (" + why + ")";
     }
     if (text.empty()) {
         return "no report could be written: the stored plan is gone";
     }
-    if (!Plan::read(text)) {
+    if (!Plan::parse_annotated(text)) {
         return "no report could be written: the stored plan is not whole any more";
     }
     return gathers(active) ? "no result was reported within " +
-                                 fine_duration(limits_.item.value_or(kGathering).count())
+                                 fine_duration(limits_.item.value_or(kForGathering).count())
                            : "ended without reporting a result";
 }
 
 // In the order of their starts, because that is the order of their numbers.
-void Runner::tell_ended()
+void Runner::notify_ended()
 {
     while (!active_.empty() && active_.front().done) {
         const Place place = active_.front().place;
@@ -494,125 +452,6 @@ void Runner::tell_ended()
         for (Listener *listener : listeners_) {
             listener->ended(run_, place);
         }
-    }
-}
-
-// --- reports ------------------------------------------------------------------
-
-// Reads the plan where it has changed; one that is being written is left for the
-// next time.
-void Runner::look()
-{
-    struct stat status {
-    };
-    if ((!active_.empty() || !judged_.empty()) && stat(kStoredPlan, &status) == 0 &&
-        S_ISREG(status.st_mode) &&
-        (status.st_mtim.tv_sec != plan_status_.st_mtim.tv_sec ||
-         status.st_mtim.tv_nsec != plan_status_.st_mtim.tv_nsec ||
-         status.st_size != plan_status_.st_size || status.st_ino != plan_status_.st_ino)) {
-        const auto text = read_stored_plan();
-        if (text && Plan::read(*text)) {
-            plan_status_ = status;
-            read_reports(*text);
-            if (!Plan::load(*text)) {
-                mend_stored_plan(); // or who reports next could not
-            }
-        }
-    }
-    for (Active &active : active_) {
-        look_for_gatherer(active);
-        const ItemReport &report = item(active.place).report;
-        const bool has_ended = report.progress == "100" && report.result;
-        if (active.moved_on && !active.done &&
-            (has_ended || !active.gatherer_end.empty() ||
-             (!limits_.item && now() - active.moved_on_at > kGathering))) {
-            finish(active, now());
-        }
-    }
-}
-
-// Without it the library would wait at its port without end, and what has died
-// reports no more.
-void Runner::look_for_gatherer(Active &active)
-{
-    if (active.done || !active.gatherer_end.empty() || !gathers(active) ||
-        now() - active.gatherer_looked_for < kBetweenLooks) {
-        return;
-    }
-    active.gatherer_looked_for = now();
-    active.gatherer_missed = host_.processes().has_gatherer() ? 0 : active.gatherer_missed + 1;
-    if (active.gatherer_missed < 2 || now() - active.start < kBeforeMissed) {
-        return;
-    }
-    active.gatherer_end = active.moved_on ? "the gatherer ended before it had reported"
-                                          : "the gatherer ended before it connected";
-    if (!active.moved_on) {
-        release_trigger();
-    }
-}
-
-void Runner::read_reports(const std::string &text)
-{
-    const auto plan = Plan::read(text);
-    if (!plan) {
-        return;
-    }
-    for (Active &active : active_) {
-        read_report(active, *plan);
-    }
-    for (Judged &judged : judged_) {
-        read_late_report(judged, *plan);
-    }
-}
-
-void Runner::read_report(Active &active, const Plan &plan)
-{
-    const std::size_t number = active.target.element;
-    if (active.done || !is_item(plan, number, item(active.place).name)) {
-        return;
-    }
-    active.overwritten = !bears_mark(plan, active.target);
-    if (active.overwritten) {
-        return; // what it says is of an earlier run
-    }
-    ItemRun &result = item(active.place);
-    ItemReport report = plan.report(number);
-    if (report.result == "") { // it has been made loadable already
-        report.result.reset();
-        report.result_without_value = true;
-    }
-    if (as_made_loadable(report) == as_made_loadable(result.report)) {
-        return;
-    }
-    active.undone = result.report.result && !report.result;
-    result.report = std::move(report);
-    for (Listener *listener : listeners_) {
-        listener->progressed(run_, active.place);
-    }
-}
-
-void Runner::read_late_report(Judged &judged, const Plan &plan)
-{
-    const std::size_t number = judged.target.element;
-    if (!is_item(plan, number, item(judged.place).name) || !bears_mark(plan, judged.target)) {
-        return;
-    }
-    const auto is_same = [&](const Active &active) {
-        return active.place.suite == judged.place.suite && active.place.item == judged.place.item;
-    };
-    if (std::ranges::any_of(active_, is_same)) {
-        plan_status_ = {}; // its end is told first: look again then
-        return;
-    }
-    const ItemReport report = plan.report(number);
-    const bool has_reported = report.result || report.result_without_value;
-    if (!has_reported || as_made_loadable(report) == as_made_loadable(judged.report) ||
-        is_earlier(report, judged.report)) {
-        return;
-    }
-    judged.report = report;
-    for (Listener *listener : listeners_) {
-        listener->late(run_, judged.place, report);
     }
 }
 

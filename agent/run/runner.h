@@ -44,8 +44,8 @@ class Runner
     };
 
     // All of them outlive the runner.
-    Runner(Host &host, Signals &signals, Run &run, const std::vector<Listener *> &listeners,
-           const Limits &limits);
+    Runner(LibraryProcess &host, Signals &signals, Run &run,
+           const std::vector<Listener *> &listeners, const Limits &limits);
 
     // Runs one job after another and fills in the run. False where the run has
     // come to its end: the run then says why.
@@ -82,7 +82,7 @@ class Runner
     using TimePoint = SteadyClock::time_point;
 
     // An item from its start until its end has been told.
-    struct Active {
+    struct RunningItem {
         Place place;
         Job::Target target;
         TimePoint start;
@@ -102,6 +102,9 @@ class Runner
         std::string gatherer_end;
     };
 
+    // The gatherer's command returns when the gatherer has been told; its report comes in
+    // its own time.
+    static constexpr std::chrono::duration<double> kForGathering{10};
     static constexpr std::size_t kNoElement = static_cast<std::size_t>(-1);
 
     // An item that has been judged, and may be reported still.
@@ -115,47 +118,47 @@ class Runner
     TimePoint on_run_clock(TimePoint time) const; // of a moment on the steady clock
 
     void watch(bool command_runs);
-    void handle(const Host::Event &event, const Job &job, std::size_t &next, bool &runs);
-    void start_next(const Job &job, std::size_t &next, const Host::Event &event);
-    void end_item(const Host::Event &event);
-    void move_on(const Host::Event &event);
-    void lose_module(const Host::Event &event);
+    void handle(const LibraryProcess::Event &event, const Job &job, std::size_t &next, bool &runs);
+    void start_next(const Job &job, std::size_t &next, const LibraryProcess::Event &event);
+    void end_item(const LibraryProcess::Event &event);
+    void move_on(const LibraryProcess::Event &event);
+    void lose_module(const LibraryProcess::Event &event);
     void require_all_started(const Job &job, std::size_t next);
     void require_plan();
-    void look();
+    void poll_reports();
     void read_reports(const std::string &text);
-    void read_report(Active &active, const Plan &plan);
+    void read_report(RunningItem &active, const Plan &plan);
     void read_late_report(Judged &judged, const Plan &plan);
-    void look_for_gatherer(Active &active);
+    void poll_gatherer(RunningItem &active);
     void read_signals();
     void suspend();
     void stop_what_is_due(bool command_runs);
-    void press_stop(Active &active, bool command_runs);
-    void stop_gatherer(Active &active, bool command_runs, SteadyClock::duration waited);
-    void note_stop(const Host::Event &event);
-    void cannot_stop(Active &active);
+    void try_stop(RunningItem &active, bool command_runs);
+    void stop_gatherer(RunningItem &active, bool command_runs, SteadyClock::duration waited);
+    void note_stop(const LibraryProcess::Event &event);
+    void cannot_stop(RunningItem &active);
     std::vector<Leftover> item_processes() const;
     std::vector<Leftover> note_left_running(std::size_t element);
     void end_left_running();
     void end_gatherer();
     template <typename Find> void end_all(const Find &find);
-    void finish(Active &active, TimePoint end);
-    void judge(const Active &active);
-    std::string why_silent(const Active &active);
-    std::string why_stopped(const Active &active);
-    void tell_ended();
+    void finish(RunningItem &active, TimePoint end);
+    void judge(const RunningItem &active);
+    std::string why_silent(const RunningItem &active);
+    std::string why_stopped(const RunningItem &active);
+    void notify_ended();
     void tick();
 
     ItemRun &item(const Place &place);
     const ItemRun &item(const Place &place) const;
-    bool gathers(const Active &active) const;
+    bool gathers(const RunningItem &active) const;
 
-    Host &host_;
+    LibraryProcess &host_;
     Signals &signals_;
     Run &run_;
     const std::vector<Listener *> &listeners_;
     Limits limits_;
-    std::deque<Active> active_;
+    std::deque<RunningItem> active_;
     std::vector<Judged> judged_;             // of this round
     std::vector<Leftover> left_;             // by items of this round
     std::vector<std::size_t> left_elements_; // the items' elements

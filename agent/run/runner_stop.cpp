@@ -38,7 +38,7 @@ std::string described(const std::vector<Leftover> &processes)
         all.push_back(one_line(one.name) + " (pid " + std::to_string(one.process) + ", state " +
                       state_of(one.process) + ")");
     }
-    return listing(all);
+    return join_and(all);
 }
 
 } // namespace
@@ -71,7 +71,7 @@ void Runner::read_signals()
         signal_ = signal;
         signal_taken_at_ = now();
         give_up("interrupted by " + signal_name(signal));
-        for (Active &active : active_) {
+        for (RunningItem &active : active_) {
             if (!active.stop) {
                 active.stop = Outcome::stopped;
                 active.stop_wanted_at = now();
@@ -103,21 +103,21 @@ void Runner::suspend()
 
 void Runner::stop_what_is_due(bool command_runs)
 {
-    for (Active &active : active_) {
+    for (RunningItem &active : active_) {
         if (!active.done && !active.stop && limits_.item && now() - active.start > *limits_.item) {
             active.stop = Outcome::timed_out;
             active.stop_wanted_at = now();
         }
     }
     if (!active_.empty() && !active_.back().done && active_.back().stop) {
-        press_stop(active_.back(), command_runs);
+        try_stop(active_.back(), command_runs);
     }
     if (active_.empty() && command_runs && signal_ != 0 &&
         now() - signal_taken_at_ > limits_.grace + kBeforeGivingUp) {
         host_.kill_module(); // it comes to no item, and does not return
     }
     // the library stops only what it started last: an earlier gatherer gets signals alone
-    for (Active &active : active_) {
+    for (RunningItem &active : active_) {
         if (&active != &active_.back() && !active.done && active.stop) {
             stop_gatherer(active, false, now() - active.stop_wanted_at);
         }
@@ -126,7 +126,7 @@ void Runner::stop_what_is_due(bool command_runs)
 
 // Through the library, again and again, as the item may only just be starting; and
 // by a signal that nothing can ignore where that does not help in time.
-void Runner::press_stop(Active &active, bool command_runs)
+void Runner::try_stop(RunningItem &active, bool command_runs)
 {
     const auto waited = now() - active.stop_wanted_at;
     const bool gatherer = gathers(active);
@@ -154,7 +154,7 @@ void Runner::press_stop(Active &active, bool command_runs)
     }
 }
 
-void Runner::stop_gatherer(Active &active, bool command_runs, SteadyClock::duration waited)
+void Runner::stop_gatherer(RunningItem &active, bool command_runs, SteadyClock::duration waited)
 {
     if (command_runs && waited > kBeforeRelease) {
         active.was_stopped = true;
@@ -176,13 +176,13 @@ void Runner::stop_gatherer(Active &active, bool command_runs, SteadyClock::durat
 
 // A stop that found nothing has met an item whose process has another name, as a
 // script's is its shell's.
-void Runner::note_stop(const Host::Event &event)
+void Runner::note_stop(const LibraryProcess::Event &event)
 {
     stop_asked_ = false;
     if (active_.empty() || active_.back().done) {
         return;
     }
-    Active &active = active_.back();
+    RunningItem &active = active_.back();
     if (event.value == 0) {
         active.was_stopped = true;
     } else {
@@ -195,7 +195,7 @@ void Runner::note_stop(const Host::Event &event)
     }
 }
 
-void Runner::cannot_stop(Active &active)
+void Runner::cannot_stop(RunningItem &active)
 {
     const std::vector<Leftover> left = item_processes();
     broken_ = true;
@@ -249,7 +249,7 @@ template <typename Find> void Runner::end_all(const Find &find)
         }
         std::this_thread::sleep_for(kTurn);
         read_signals();
-        look();
+        poll_reports();
         tick();
     }
 }
@@ -272,7 +272,7 @@ void Runner::make_way_for(const Job &job)
         }
         require_trigger_port(); // an item may have taken it
     }
-    look();
+    poll_reports();
     std::erase_if(judged_, [&](const Judged &judged) { return is_of_job(judged.target.element); });
 }
 
@@ -284,7 +284,7 @@ void Runner::end_round()
     if (gatherer_may_report_late_) {
         end_gatherer();
     }
-    look();
+    poll_reports();
     judged_.clear();
 }
 

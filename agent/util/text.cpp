@@ -265,7 +265,7 @@ bool near(std::size_t edits, std::size_t length)
 
 } // namespace
 
-std::string clean(std::string_view bytes)
+std::string sanitize_utf8(std::string_view bytes)
 {
     return cleaned(bytes, "\t\n\r", visible);
 }
@@ -301,7 +301,7 @@ std::size_t first_not_utf8(std::string_view bytes)
     return std::string_view::npos;
 }
 
-std::size_t columns(std::string_view text)
+std::size_t display_width(std::string_view text)
 {
     const Widths widths;
     std::size_t result = 0;
@@ -313,17 +313,17 @@ std::size_t columns(std::string_view text)
     return result;
 }
 
-std::string fit(std::string_view text, std::size_t width)
+std::string pad_or_ellipsize(std::string_view text, std::size_t width)
 {
-    std::string result = cut(text, width);
-    result.append(width - columns(result), ' ');
+    std::string result = ellipsize(text, width);
+    result.append(width - display_width(result), ' ');
     return result;
 }
 
-std::string cut(std::string_view text, std::size_t width)
+std::string ellipsize(std::string_view text, std::size_t width)
 {
     constexpr std::size_t kDots = 3;
-    if (columns(text) <= width) {
+    if (display_width(text) <= width) {
         return std::string(text);
     }
     if (width <= kDots) {
@@ -347,12 +347,12 @@ std::string nearest(std::string_view word, const std::vector<std::string> &candi
     return best != nullptr ? *best : "";
 }
 
-std::string amount(std::size_t count, const std::string &thing)
+std::string plural(std::size_t count, const std::string &thing)
 {
     return std::to_string(count) + " " + thing + (count == 1 ? "" : "s");
 }
 
-std::string listing(const std::vector<std::string> &words)
+std::string join_and(const std::vector<std::string> &words)
 {
     std::string text;
     for (std::size_t at = 0; at < words.size(); ++at) {
@@ -401,7 +401,7 @@ std::vector<std::string> aligned(const std::vector<std::vector<std::string>> &ro
     std::vector<std::size_t> widths(is_number.size());
     for (const auto &row : rows) {
         for (std::size_t column = 0; column < row.size(); ++column) {
-            widths[column] = std::max(widths[column], columns(row[column]));
+            widths[column] = std::max(widths[column], display_width(row[column]));
         }
     }
     const std::size_t others =
@@ -413,8 +413,8 @@ std::vector<std::string> aligned(const std::vector<std::vector<std::string>> &ro
     for (const auto &row : rows) {
         std::string line;
         for (std::size_t column = 0; column < row.size(); ++column) {
-            const std::string text = cut(row[column], widths[column]);
-            const std::string blanks(widths[column] - columns(text), ' ');
+            const std::string text = ellipsize(row[column], widths[column]);
+            const std::string blanks(widths[column] - display_width(text), ' ');
             line += (column > 0 ? "  " : "") + (is_number[column] ? blanks + text : text + blanks);
         }
         line.erase(line.find_last_not_of(' ') + 1);

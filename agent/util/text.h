@@ -18,7 +18,7 @@ namespace fptest
 // Valid UTF-8 with every control character but tab, line feed and carriage
 // return made visible: as its picture (U+2400 and on, U+2421 for DEL), C1
 // controls and bytes that are no UTF-8 as U+FFFD.
-std::string clean(std::string_view bytes);
+std::string sanitize_utf8(std::string_view bytes);
 
 // As clean(), and on one line: tabs and line ends are pictures, too, and what
 // turns the direction of a text (overrides, embeddings, isolates) is U+FFFD.
@@ -36,24 +36,24 @@ std::string replaced(std::string_view text, std::span<const Replacement> list);
 std::size_t first_not_utf8(std::string_view bytes);
 
 // Terminal columns that a clean text takes.
-std::size_t columns(std::string_view text);
+std::size_t display_width(std::string_view text);
 
 // The text in exactly that many columns: padded with blanks, or cut and ended
 // by "..." (by dots alone where there is no room for more).
-std::string fit(std::string_view text, std::size_t width);
+std::string pad_or_ellipsize(std::string_view text, std::size_t width);
 
-// As fit(), but a shorter text is not padded.
-std::string cut(std::string_view text, std::size_t width);
+// As pad_or_ellipsize(), but a shorter text is not padded.
+std::string ellipsize(std::string_view text, std::size_t width);
 
 // The candidate that is spelled most like the word; empty where none is near
 // enough to be meant.
 std::string nearest(std::string_view word, const std::vector<std::string> &candidates);
 
 // "1 item", "2 items"
-std::string amount(std::size_t count, const std::string &thing);
+std::string plural(std::size_t count, const std::string &thing);
 
 // "a", "a and b", "a, b and c"
-std::string listing(const std::vector<std::string> &words);
+std::string join_and(const std::vector<std::string> &words);
 
 // Seconds for people: "0.3 s", "12.0 s", "3:05", "1:02:05".
 std::string duration(double seconds);

@@ -19,7 +19,7 @@
 
 using fptest::check;
 using fptest::Finding;
-using fptest::PlanUse;
+using fptest::PlanSource;
 using fptest::read_shell_line;
 using fptest::Shell;
 using fptest::ShellReading;
@@ -35,7 +35,7 @@ bool has_error(const std::string &args)
     }
     return fptest::has_errors(
         check("<P><CmdGroup name=\"A\"><Cmd name=\"X\" args=\"" + escaped + "\"/></CmdGroup></P>",
-              PlanUse::stored));
+              PlanSource::stored));
 }
 
 // Whether the shell does run a line with these args.
@@ -130,7 +130,7 @@ TEST(CheckedGrammar, IsAskedOfTheShellForFiveSecondsInAll)
     }
     const auto begin = std::chrono::steady_clock::now();
     const auto findings =
-        check("<P>\n<CmdGroup name=\"A\">\n" + items + "</CmdGroup>\n</P>\n", PlanUse::stored);
+        check("<P>\n<CmdGroup name=\"A\">\n" + items + "</CmdGroup>\n</P>\n", PlanSource::stored);
     EXPECT_LT(std::chrono::steady_clock::now() - begin, std::chrono::seconds(12));
     EXPECT_EQ(std::ranges::count(findings,
                                  "the device's shell has been asked for as long as fptest waits "

@@ -29,13 +29,13 @@
 using fptest::check;
 using fptest::Finding;
 using fptest::Plan;
-using fptest::PlanUse;
+using fptest::PlanSource;
 using namespace std::string_literals;
 
 namespace
 {
 
-std::string messages(const std::string &text, PlanUse use)
+std::string messages(const std::string &text, PlanSource use)
 {
     std::string all;
     for (const Finding &finding : check(text, use)) {
@@ -158,7 +158,7 @@ class Check : public testing::TestWithParam<Case>
 TEST_P(Check, Finds)
 {
     const Case &one = GetParam();
-    EXPECT_EQ(messages(one.text, one.kind == "sent" ? PlanUse::to_send : PlanUse::stored),
+    EXPECT_EQ(messages(one.text, one.kind == "sent" ? PlanSource::to_send : PlanSource::stored),
               one.findings);
 }
 
@@ -186,17 +186,17 @@ std::string demo_plan()
 TEST(CheckedPlan, OfTheDemoHasNoFindings)
 {
     ASSERT_NE(demo_plan(), "");
-    EXPECT_EQ(messages(demo_plan(), PlanUse::to_send), "");
-    EXPECT_EQ(messages(demo_plan(), PlanUse::stored), "");
+    EXPECT_EQ(messages(demo_plan(), PlanSource::to_send), "");
+    EXPECT_EQ(messages(demo_plan(), PlanSource::stored), "");
 }
 
 TEST(Findings, AreErrorsOrWarnings)
 {
     const std::string empty = group("A", "");
     EXPECT_FALSE(fptest::has_errors({}));
-    EXPECT_FALSE(fptest::has_errors(check("<P>" + empty + "</P>", PlanUse::stored)));
-    EXPECT_TRUE(fptest::has_errors(check("", PlanUse::stored)));
-    EXPECT_TRUE(fptest::has_errors(check("<P>" + empty + "<CmdGroup/></P>", PlanUse::stored)));
+    EXPECT_FALSE(fptest::has_errors(check("<P>" + empty + "</P>", PlanSource::stored)));
+    EXPECT_TRUE(fptest::has_errors(check("", PlanSource::stored)));
+    EXPECT_TRUE(fptest::has_errors(check("<P>" + empty + "<CmdGroup/></P>", PlanSource::stored)));
 }
 
 // --- any plan, any bytes -------------------------------------------------------------
@@ -222,7 +222,7 @@ const std::vector<std::string> kPieces = pieces();
 // errors say so of every path that goes wrong.
 void expect_sound(const std::string &text)
 {
-    for (const PlanUse use : {PlanUse::to_send, PlanUse::stored}) {
+    for (const PlanSource use : {PlanSource::to_send, PlanSource::stored}) {
         std::size_t before = 0;
         for (const Finding &finding : check(text, use)) {
             ASSERT_LE(before, finding.offset) << text;
@@ -234,17 +234,17 @@ void expect_sound(const std::string &text)
             ASSERT_LE(finding.text.size(), 2000U) << text;
         }
     }
-    if (fptest::has_errors(check(text, PlanUse::stored))) {
+    if (fptest::has_errors(check(text, PlanSource::stored))) {
         return;
     }
-    const auto plan = Plan::load(text);
+    const auto plan = Plan::load_as_library(text);
     ASSERT_TRUE(plan) << text;
     std::set<std::string> groups;
     std::size_t items = 0;
     for (const Plan::Group &one : plan->groups()) {
         ASSERT_TRUE(groups.insert(one.name).second) << text;
         std::vector<std::size_t> run;
-        for (const auto &element : plan->run_by(one.name)) {
+        for (const auto &element : plan->resolve(one.name)) {
             if (element) {
                 run.push_back(element->number);
             }
@@ -253,7 +253,7 @@ void expect_sound(const std::string &text)
         for (std::size_t index = 0; index < run.size(); ++index) {
             const Plan::Element &item = one.items[index];
             ASSERT_EQ(run[index], item.number) << text;
-            const auto found = plan->run_by(one.name, *item.name);
+            const auto found = plan->resolve(one.name, *item.name);
             ASSERT_TRUE(found && found->number == item.number) << text;
             ASSERT_TRUE(item.args) << text;
             ++items;
@@ -303,7 +303,7 @@ TEST(CheckedPlan, WithoutErrorsRunsWhatItSays)
         }
         text += "</P>";
         ASSERT_NO_FATAL_FAILURE(expect_sound(text));
-        sound += fptest::has_errors(check(text, PlanUse::stored)) ? 0 : 1;
+        sound += fptest::has_errors(check(text, PlanSource::stored)) ? 0 : 1;
     }
     EXPECT_GT(sound, 500U); // else little has been tried
 }
@@ -366,7 +366,7 @@ TEST(CheckedPlan, OfTenThousandItemsTakesNoTime)
     for (const std::string &content : {group("A", comments), group("A", nested), groups,
                                        group("A", others) + group("B", others)}) {
         const auto start = std::chrono::steady_clock::now();
-        EXPECT_NE(check("<P>" + content + "</P>", PlanUse::stored).size(), 0U);
+        EXPECT_NE(check("<P>" + content + "</P>", PlanSource::stored).size(), 0U);
         EXPECT_LT(std::chrono::steady_clock::now() - start, std::chrono::seconds(2));
     }
 }

@@ -3,21 +3,20 @@
 
 // The completion of fptest's command line in bash.
 #include "../quoted.h"
-#include "report_files.h"
+#include "support/files.h"
+#include "support/process.h"
+#include "support/temporary_directory.h"
 
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
 
 #include <algorithm>
-#include <cstdlib>
 #include <filesystem>
 #include <string>
 #include <vector>
 
-using report_files::Directory;
-using report_files::lines_of;
-using report_files::read_file;
-using report_files::write_file;
+using support::read_file;
+using support::write_file;
 using ::testing::ElementsAre;
 using ::testing::IsEmpty;
 using ::testing::UnorderedElementsAre;
@@ -30,13 +29,9 @@ using Lines = std::vector<std::string>;
 
 Lines output_of(const std::string &command)
 {
-    const Directory directory;
-    EXPECT_EQ(std::system(("(" + command + ") >" + directory.path("out")).c_str()), 0) << command;
-    Lines lines = lines_of(read_file(directory.path("out")));
-    for (std::string &line : lines) {
-        line.pop_back();
-    }
-    return lines;
+    const support::Ended ended = support::run_shell(command);
+    EXPECT_EQ(ended.status, 0) << command;
+    return support::lines_of(ended.out);
 }
 
 // Each test has an fptest that lists what the test says, and notes how it was
@@ -87,7 +82,7 @@ class Completion : public ::testing::Test
         return std::filesystem::exists(directory_.path("calls"));
     }
 
-    Directory directory_;
+    support::TemporaryDirectory directory_;
 };
 
 TEST_F(Completion, OffersTheSubCommands)

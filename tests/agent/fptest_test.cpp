@@ -37,7 +37,7 @@ class Fptest : public FptestTest
 };
 
 // The columns of a text in UTF-8 without wide characters.
-std::size_t columns(const std::string &text)
+std::size_t display_width(const std::string &text)
 {
     return static_cast<std::size_t>(
         std::ranges::count_if(text, [](unsigned char c) { return (c & 0xc0U) != 0x80U; }));
@@ -79,7 +79,7 @@ TEST_F(Fptest, HasHelpWithExamplesForEveryCommand)
         const std::string help = help_of(command);
         EXPECT_THAT(help, HasSubstr("\nExamples:\n  fptest " + command));
         for (const std::string &line : lines_of(help)) {
-            EXPECT_LE(columns(line), 80U) << line;
+            EXPECT_LE(display_width(line), 80U) << line;
             EXPECT_EQ(line.find_last_not_of(' ') + 1, line.size()) << line;
         }
     }

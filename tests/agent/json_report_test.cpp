@@ -81,7 +81,7 @@ TEST_F(JsonReport, ProgressIsTimedByTheClock)
 
 TEST_F(JsonReport, HasNullForWhatIsNotKnown)
 {
-    ItemRun one = item("a", Outcome::silent);
+    ItemRun one = item("a", Outcome::no_result);
     one.seconds.reset();
     one.start.reset();
     const Json end = events(json_lines_of(run_of({suite("G", {one})})), "end").at(0);

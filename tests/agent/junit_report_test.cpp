@@ -20,7 +20,7 @@ TEST_F(JunitReport, IsThisDocument)
 {
     RunOfItems run =
         run_of({suite("Bringup", {passed("SpiCheck"), failed("DeadPixel"),
-                                  item("QuietRun", Outcome::silent, "nothing reported")})});
+                                  item("QuietRun", Outcome::no_result, "nothing reported")})});
     EXPECT_EQ(junit_of(run), R"(<?xml version="1.0" encoding="UTF-8"?>
 <testsuites name="fptest" tests="3" failures="1" errors="1" skipped="0" time="2.500" timestamp="2024-05-06T07:08:09">
   <testsuite name="Bringup" tests="3" failures="1" errors="1" skipped="0" time="0.903" timestamp="2024-05-06T07:08:10">

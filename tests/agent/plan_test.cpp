@@ -53,7 +53,7 @@ std::string plan_of(const std::string &content)
 Plan loaded(const std::string &text)
 {
     std::string why;
-    std::optional<Plan> plan = Plan::load(text, &why);
+    std::optional<Plan> plan = Plan::load_as_library(text, &why);
     if (!plan) {
         throw std::runtime_error("not loaded: " + why);
     }
@@ -63,7 +63,7 @@ Plan loaded(const std::string &text)
 std::string reason(const std::string &text)
 {
     std::string why = "(loaded)";
-    EXPECT_FALSE(Plan::load(text, &why)) << text;
+    EXPECT_FALSE(Plan::load_as_library(text, &why)) << text;
     return why;
 }
 
@@ -103,7 +103,7 @@ TEST(StoredPart, IsTheTextWithoutColonsInFrontUpToAColonAZeroByteOrItsLimit)
              {limit + "x", limit},
              {"::" + limit + "x", limit},
          }) {
-        EXPECT_EQ(fptest::stored_part(text), stored) << text;
+        EXPECT_EQ(fptest::as_stored(text), stored) << text;
     }
 }
 
@@ -195,7 +195,7 @@ TEST(LoadedPlan, StaysWholeWhenItIsMoved)
     const Plan plan = std::move(first);
     EXPECT_EQ(plan.number(plan.elements()[3]), 3U);
     EXPECT_THAT(listed(plan), ElementsAre("A: x y"));
-    EXPECT_EQ(plan.run_by("A", "y")->number, 4U);
+    EXPECT_EQ(plan.resolve("A", "y")->number, 4U);
 }
 
 TEST(LoadedPlan, MayBeInUtf16AsForTheLibrary)
@@ -250,15 +250,15 @@ TEST(LoadedPlan, KeepsTheFirstReasonOfThisTextOnly)
     EXPECT_EQ(reason("<P><Cmd name=\"x"), "a tag in it is broken off or malformed");
     // &q; has two things against it
     EXPECT_EQ(reason("<P>&q;</P>"), "Entity name 'q;' not supported under parent <P>.");
-    EXPECT_FALSE(Plan::load("x"));
+    EXPECT_FALSE(Plan::load_as_library("x"));
 }
 
 TEST(LoadedPlan, PrintsNothingAndLeavesTheLibraryAsItWas)
 {
     testing::internal::CaptureStderr();
-    EXPECT_FALSE(Plan::load("x"));
-    EXPECT_FALSE(Plan::read("<a><b></a></b>"));
-    EXPECT_TRUE(Plan::load("<a/>"));
+    EXPECT_FALSE(Plan::load_as_library("x"));
+    EXPECT_FALSE(Plan::parse_annotated("<a><b></a></b>"));
+    EXPECT_TRUE(Plan::load_as_library("<a/>"));
     EXPECT_EQ(testing::internal::GetCapturedStderr(), "");
     testing::internal::CaptureStderr();
     EXPECT_EQ(mxmlLoadString(nullptr, "x", nullptr), nullptr);
@@ -292,7 +292,7 @@ TEST(LoadedPlan, MayHaveDescriptorZero)
 {
     const int kept = dup(STDIN_FILENO);
     close(STDIN_FILENO);
-    const auto plan = Plan::load("<P/>");
+    const auto plan = Plan::load_as_library("<P/>");
     dup2(kept, STDIN_FILENO);
     close(kept);
     EXPECT_TRUE(plan);
@@ -303,11 +303,11 @@ TEST(LoadedPlan, NeedsRoomInMemory)
     std::signal(SIGXFSZ, SIG_IGN);
     {
         const Limit small(RLIMIT_FSIZE, 10);
-        EXPECT_TRUE(Plan::load("<P></P>"));
-        EXPECT_THROW(Plan::load("<P>       </P>"), std::system_error);
+        EXPECT_TRUE(Plan::load_as_library("<P></P>"));
+        EXPECT_THROW(Plan::load_as_library("<P>       </P>"), std::system_error);
     }
     std::signal(SIGXFSZ, SIG_DFL);
-    EXPECT_TRUE(Plan::load("<P>       </P>"));
+    EXPECT_TRUE(Plan::load_as_library("<P>       </P>"));
 }
 
 // --- groups -----------------------------------------------------------------------------
@@ -370,15 +370,15 @@ TEST(Paths, TellWhichElementsRunAndWhatTheyAre)
 {
     const Plan plan = loaded(
         plan_of(group("A", cmd("x") + "<Task name=\"t\" args=\"1\"/>" + cmd("y") + "<!-- c -->")));
-    const auto run = plan.run_by("A");
+    const auto run = plan.resolve("A");
     ASSERT_EQ(run.size(), 4U);
     EXPECT_EQ(run[0]->number, 3U);
     EXPECT_EQ(run[1]->tag, "Task");
     EXPECT_EQ(run[1]->args, "1");
     EXPECT_FALSE(run[3]);
-    EXPECT_EQ(plan.run_by("A", "y")->number, 5U);
-    EXPECT_THAT(plan.run_by("A\0b"s), testing::SizeIs(4)); // a zero byte ends a path
-    EXPECT_FALSE(plan.run_by("", "x"));
+    EXPECT_EQ(plan.resolve("A", "y")->number, 5U);
+    EXPECT_THAT(plan.resolve("A\0b"s), testing::SizeIs(4)); // a zero byte ends a path
+    EXPECT_FALSE(plan.resolve("", "x"));
 }
 
 // --- reading while it is written ----------------------------------------------------------
@@ -393,7 +393,7 @@ constexpr char kAnnotated[] =
 
 TEST(ReadPlan, TellsWhatEveryItemHasReported)
 {
-    const auto plan = Plan::read(kAnnotated);
+    const auto plan = Plan::parse_annotated(kAnnotated);
     ASSERT_TRUE(plan);
     const auto groups = plan->groups();
     ASSERT_EQ(groups.size(), 1U);
@@ -413,21 +413,21 @@ TEST(ReadPlan, NeedsAWholeTextThatTheLibraryLoads)
     for (const std::string &whole :
          {annotated.substr(0, annotated.rfind('>') + 1),
           "<P><CmdGroup name=\"A\"><Cmd name=\"x\" args=\"\" /></CmdGroup></P>"s, "<P />"s}) {
-        EXPECT_TRUE(Plan::read(whole));
+        EXPECT_TRUE(Plan::parse_annotated(whole));
         for (std::size_t size = 0; size < whole.size(); ++size) {
-            EXPECT_FALSE(Plan::read(whole.substr(0, size))) << size;
+            EXPECT_FALSE(Plan::parse_annotated(whole.substr(0, size))) << size;
         }
     }
     for (const char *text : {"<P><a></b></P>", "</P>", "text"}) {
-        EXPECT_FALSE(Plan::read(text)) << text;
+        EXPECT_FALSE(Plan::parse_annotated(text)) << text;
     }
 }
 
 // The report of the one item of a plan, with these attributes.
 std::optional<ItemReport> report_of(const std::string &attributes)
 {
-    const auto plan =
-        Plan::read("<P><CmdGroup name=\"A\"><Cmd name=\"x\" " + attributes + "/></CmdGroup></P>");
+    const auto plan = Plan::parse_annotated("<P><CmdGroup name=\"A\"><Cmd name=\"x\" " +
+                                            attributes + "/></CmdGroup></P>");
     return plan ? std::optional(plan->groups().at(0).items.at(0).report) : std::nullopt;
 }
 
@@ -446,13 +446,13 @@ TEST(ReadPlan, TellsAValueThatIsEmptyFromOneThatIsMissing)
     EXPECT_EQ(report_of("result=\"\""), (ItemReport{std::nullopt, "", false, std::nullopt}));
     EXPECT_EQ(report_of("result"), (ItemReport{std::nullopt, std::nullopt, true, std::nullopt}));
     EXPECT_EQ(report_of("progress"), (ItemReport{"", std::nullopt, false, std::nullopt}));
-    EXPECT_EQ(Plan::read("<P><CmdGroup name=\"A\"><Cmd name=\"x\" args/></CmdGroup></P>")
+    EXPECT_EQ(Plan::parse_annotated("<P><CmdGroup name=\"A\"><Cmd name=\"x\" args/></CmdGroup></P>")
                   ->groups()
                   .at(0)
                   .items.at(0)
                   .args,
               "");
-    EXPECT_TRUE(Plan::read("<Cmd name=\"x\" result/>")->report(0).result_without_value);
+    EXPECT_TRUE(Plan::parse_annotated("<Cmd name=\"x\" result/>")->report(0).result_without_value);
 }
 
 // --- places of elements ---------------------------------------------------------------------
@@ -567,12 +567,12 @@ TEST(DemoPlan, RunsWhatItSays)
     EXPECT_THAT(listed(plan), ElementsAre("Bringup: SpiCheck DeadPixel FingerWait QuietRun",
                                           "Gather: SensorProbe", "Endurance: BurnIn"));
     for (const Plan::Group &one : plan.groups()) {
-        const auto run = plan.run_by(one.name);
+        const auto run = plan.resolve(one.name);
         ASSERT_EQ(run.size(), one.items.size());
         for (std::size_t index = 0; index < run.size(); ++index) {
             ASSERT_TRUE(run[index]);
             EXPECT_EQ(run[index]->number, one.items[index].number);
-            EXPECT_EQ(plan.run_by(one.name, *one.items[index].name)->number,
+            EXPECT_EQ(plan.resolve(one.name, *one.items[index].name)->number,
                       one.items[index].number);
         }
     }

@@ -58,7 +58,7 @@ TEST_F(Reports, AgreeOnTheCountsOfAnyRun)
         const auto &[passed, failed, not_run] = expected;
         EXPECT_EQ(count(run).passed, passed);
         EXPECT_EQ(count(run).failed, failed);
-        EXPECT_EQ(count(run).to_go, not_run);
+        EXPECT_EQ(count(run).not_run, not_run);
         EXPECT_EQ(count(run).all(), passed + failed + not_run);
         const std::string json = json_of(run);
         const std::string text = tap_of(run);
@@ -110,7 +110,7 @@ TEST(Counts, TakeEveryOtherOutcomeForFailed)
     const Counts counts = count(mixed_run());
     EXPECT_EQ(counts.passed, 1U);
     EXPECT_EQ(counts.failed, 4U);
-    EXPECT_EQ(counts.to_go, 1U);
+    EXPECT_EQ(counts.not_run, 1U);
     EXPECT_EQ(count(mixed_run().suites[1].items).failed, 2U);
 }
 

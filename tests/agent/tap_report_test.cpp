@@ -269,7 +269,7 @@ TEST_F(Prove, CountsTheGroupsThatFailed)
 {
     const Ended end =
         proved(run_of({suite("G", {passed("a"), failed("b"), failed("c")}),
-                       suite("H", {passed("c")}), suite("I", {item("d", Outcome::silent)})}));
+                       suite("H", {passed("c")}), suite("I", {item("d", Outcome::no_result)})}));
     EXPECT_NE(end.status, 0);
     EXPECT_THAT(end.out, HasSubstr("Failed 2/3 subtests"));
     EXPECT_THAT(end.out, HasSubstr("Failed tests:  1, 3"));

@@ -50,7 +50,7 @@ TEST(Clean, LeavesPlainTextAndTheFirstAndTheLastCharacterOfEverySizeAlone)
 {
     for (const char *text : {"", "3 dead pixels, limit 2 ~", "\u00A0", "\u07FF", "\u0800", "\uD7FF",
                              "\uE000", "\uFFFD", "\uFFFE", "\uFFFF", "\U00010000", "\U0010FFFF"}) {
-        EXPECT_EQ(clean(text), text);
+        EXPECT_EQ(sanitize_utf8(text), text);
         EXPECT_EQ(one_line(text), text);
     }
 }
@@ -61,18 +61,18 @@ TEST(Clean, ShowsEveryControlCharacterButTabsAndLineEndsByItsPicture)
         const std::string picture = {'\xE2', '\x90', static_cast<char>(0x80 + code)};
         const std::string byte(1, static_cast<char>(code));
         const bool kept = code == '\t' || code == '\n' || code == '\r';
-        EXPECT_EQ(clean(byte), kept ? byte : picture) << code;
+        EXPECT_EQ(sanitize_utf8(byte), kept ? byte : picture) << code;
         EXPECT_EQ(one_line(byte), picture) << code;
     }
-    EXPECT_EQ(clean("\x7F"), "\u2421");
-    EXPECT_EQ(clean("\x1B[31m\0red"s), "\u241B[31m\u2400red");
+    EXPECT_EQ(sanitize_utf8("\x7F"), "\u2421");
+    EXPECT_EQ(sanitize_utf8("\x1B[31m\0red"s), "\u241B[31m\u2400red");
 }
 
 TEST(Clean, ReplacesTheControlCharactersAboveAscii)
 {
     for (int code = 0x80; code < 0xA0; ++code) {
         const std::string text = {'a', '\xC2', static_cast<char>(code), 'b'};
-        EXPECT_EQ(clean(text), "a\uFFFDb") << code;
+        EXPECT_EQ(sanitize_utf8(text), "a\uFFFDb") << code;
         EXPECT_EQ(one_line(text), "a\uFFFDb") << code;
     }
 }
@@ -91,24 +91,25 @@ TEST(Clean, ReplacesEveryByteThatIsNoUtf8)
         for (std::size_t left = bytes.size(); left > 0; --left) {
             expected += "\uFFFD";
         }
-        EXPECT_EQ(clean("<" + bytes + ">"), "<" + expected + ">") << testing::PrintToString(bytes);
+        EXPECT_EQ(sanitize_utf8("<" + bytes + ">"), "<" + expected + ">")
+            << testing::PrintToString(bytes);
     }
 }
 
 TEST(Clean, ReplacesACharacterThatBreaksOffAndGoesOnAfterIt)
 {
-    EXPECT_EQ(clean("a\xC3"), "a\uFFFD");
-    EXPECT_EQ(clean("a\xE6\x97"), "a\uFFFD\uFFFD");
-    EXPECT_EQ(clean("a\xF0\x9F\x98"), "a\uFFFD\uFFFD\uFFFD");
-    EXPECT_EQ(clean(std::string_view("a\u00E9").substr(0, 2)), "a\uFFFD");
-    EXPECT_EQ(clean("\xE6x\xC3\xC3\xA9"), "\uFFFDx\uFFFD\u00E9");
+    EXPECT_EQ(sanitize_utf8("a\xC3"), "a\uFFFD");
+    EXPECT_EQ(sanitize_utf8("a\xE6\x97"), "a\uFFFD\uFFFD");
+    EXPECT_EQ(sanitize_utf8("a\xF0\x9F\x98"), "a\uFFFD\uFFFD\uFFFD");
+    EXPECT_EQ(sanitize_utf8(std::string_view("a\u00E9").substr(0, 2)), "a\uFFFD");
+    EXPECT_EQ(sanitize_utf8("\xE6x\xC3\xC3\xA9"), "\uFFFDx\uFFFD\u00E9");
 }
 
 TEST(OneLine, TurnsNoText)
 {
     for (const std::string turn : {"\u202A", "\u202E", "\u2066", "\u2069"}) {
         EXPECT_EQ(one_line("a" + turn + "b"), "a\uFFFDb");
-        EXPECT_EQ(clean("a" + turn + "b"), "a" + turn + "b"); // files keep it
+        EXPECT_EQ(sanitize_utf8("a" + turn + "b"), "a" + turn + "b"); // files keep it
     }
     // their neighbours, a mark that belongs to a text among them
     for (const std::string other : {"\u200F", "\u2029", "\u202F", "\u2065", "\u206A"}) {
@@ -127,31 +128,31 @@ TEST(Replaced, TakesTheFirstOfTheListAtEveryPlace)
 
 TEST(Columns, CountsWhatATerminalShows)
 {
-    EXPECT_EQ(columns(""), 0U);
-    EXPECT_EQ(columns("SpiCheck"), 8U);
-    EXPECT_EQ(columns("\u00E9\u2588\u2026"), 3U);
-    EXPECT_EQ(columns(kWide), 2U);
-    EXPECT_EQ(columns(kSmile), 2U);
-    EXPECT_EQ(columns("e"s + kAccent), 1U);
-    EXPECT_EQ(columns("\uFFFD\u241B"), 2U);
+    EXPECT_EQ(display_width(""), 0U);
+    EXPECT_EQ(display_width("SpiCheck"), 8U);
+    EXPECT_EQ(display_width("\u00E9\u2588\u2026"), 3U);
+    EXPECT_EQ(display_width(kWide), 2U);
+    EXPECT_EQ(display_width(kSmile), 2U);
+    EXPECT_EQ(display_width("e"s + kAccent), 1U);
+    EXPECT_EQ(display_width("\uFFFD\u241B"), 2U);
     // which the C library does not know
-    EXPECT_EQ(columns("\uFFFF"), 1U);
-    EXPECT_EQ(columns("\U0010FFFF"), 1U);
+    EXPECT_EQ(display_width("\uFFFF"), 1U);
+    EXPECT_EQ(display_width("\U0010FFFF"), 1U);
 }
 
 TEST(Columns, DoesNotDependOnTheLocaleAndLeavesItAlone)
 {
     ASSERT_STREQ(std::setlocale(LC_ALL, "C"), "C");
     const locale_t before = uselocale(nullptr);
-    EXPECT_EQ(columns(kWide), 2U);
-    EXPECT_EQ(fit(kWide, 5), kWide + "   "s);
+    EXPECT_EQ(display_width(kWide), 2U);
+    EXPECT_EQ(pad_or_ellipsize(kWide, 5), kWide + "   "s);
     EXPECT_EQ(uselocale(nullptr), before);
     EXPECT_STREQ(std::setlocale(LC_ALL, nullptr), "C");
 
     const locale_t own = newlocale(LC_ALL_MASK, "C.UTF-8", nullptr);
     ASSERT_NE(own, nullptr);
     uselocale(own);
-    EXPECT_EQ(columns(kWide), 2U);
+    EXPECT_EQ(display_width(kWide), 2U);
     EXPECT_EQ(uselocale(nullptr), own);
     uselocale(before);
     freelocale(own);
@@ -163,8 +164,9 @@ TEST(ColumnsDeathTest, AreOneForEachCharacterWhereNoLocaleTells)
     EXPECT_EXIT(
         {
             no_utf8_locale = true;
-            const bool right = columns("\u65E5e\u0301") == 3 && fit(kWide, 3) == "\u65E5  " &&
-                               cut("\u65E5\u65E5\u65E5\u65E5\u65E5", 4) == "\u65E5...";
+            const bool right = display_width("\u65E5e\u0301") == 3 &&
+                               pad_or_ellipsize(kWide, 3) == "\u65E5  " &&
+                               ellipsize("\u65E5\u65E5\u65E5\u65E5\u65E5", 4) == "\u65E5...";
             std::_Exit(right ? 0 : 1);
         },
         ::testing::ExitedWithCode(0), "");
@@ -204,8 +206,10 @@ TEST(Fit, PadsWhatIsCut)
              {"abe\u0301\u0323defg", 5, "ab..."},
              {"e\u0301", 3, "e\u0301"},
          }) {
-        EXPECT_EQ(cut(text, width), fitted) << width;
-        EXPECT_EQ(fit(text, width), fitted + std::string(width - columns(fitted), ' ')) << width;
+        EXPECT_EQ(ellipsize(text, width), fitted) << width;
+        EXPECT_EQ(pad_or_ellipsize(text, width),
+                  fitted + std::string(width - display_width(fitted), ' '))
+            << width;
     }
 }
 
@@ -221,9 +225,10 @@ TEST(Fit, AlwaysTakesExactlyThatManyColumns)
         }
         state = state * 1103515245U + 12345U;
         const std::size_t width = state / 65536 % 15;
-        EXPECT_EQ(columns(fit(text, width)), width) << text;
-        EXPECT_EQ(clean(fit(text, width)), fit(text, width)) << text;
-        EXPECT_LE(columns(cut(text, width)), width) << text;
+        EXPECT_EQ(display_width(pad_or_ellipsize(text, width)), width) << text;
+        EXPECT_EQ(sanitize_utf8(pad_or_ellipsize(text, width)), pad_or_ellipsize(text, width))
+            << text;
+        EXPECT_LE(display_width(ellipsize(text, width)), width) << text;
     }
 }
 
@@ -292,10 +297,10 @@ TEST(Nearest, CountsCharactersAndNotBytes)
 
 TEST(Listing, ReadsLikeASentence)
 {
-    EXPECT_EQ(listing({}), "");
-    EXPECT_EQ(listing({"a"}), "a");
-    EXPECT_EQ(listing({"a", "b"}), "a and b");
-    EXPECT_EQ(listing({"a", "b", "c"}), "a, b and c");
+    EXPECT_EQ(join_and({}), "");
+    EXPECT_EQ(join_and({"a"}), "a");
+    EXPECT_EQ(join_and({"a", "b"}), "a and b");
+    EXPECT_EQ(join_and({"a", "b", "c"}), "a, b and c");
 }
 
 // --- times -------------------------------------------------------------------

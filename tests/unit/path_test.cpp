@@ -89,16 +89,16 @@ std::string shown(const std::optional<Plan::Element> &element)
 // The same as the agent tells it, whether it is asked by one name or by two.
 Lines by_agent(const std::string &text, const std::string &path, bool by_item)
 {
-    const auto plan = Plan::load(text);
+    const auto plan = Plan::load_as_library(text);
     if (!plan) {
         return {"not loaded"};
     }
     Lines runs;
-    for (const auto &element : plan->run_by(path)) {
+    for (const auto &element : plan->resolve(path)) {
         runs.push_back(shown(element));
     }
     if (const auto slash = path.find('/'); slash != path.npos) {
-        EXPECT_EQ(shown(plan->run_by(path.substr(0, slash), path.substr(slash + 1))),
+        EXPECT_EQ(shown(plan->resolve(path.substr(0, slash), path.substr(slash + 1))),
                   by_item ? runs.at(0) : "-");
     }
     return runs;
@@ -296,7 +296,7 @@ TEST_F(Path, OfAnyPlanIsToldByThePlanAsTheLibraryLooksItUp)
     for (int round = 0; round < 300; ++round) {
         const std::string text = random_plan(random);
         mxml_node_t *const tree = load_plan(text);
-        const auto plan = Plan::load(text);
+        const auto plan = Plan::load_as_library(text);
         ASSERT_TRUE(plan) << text;
         for (const char *group : {"a", "b", "c"}) {
             Lines expected;
@@ -304,12 +304,12 @@ TEST_F(Path, OfAnyPlanIsToldByThePlanAsTheLibraryLooksItUp)
                 expected.push_back(number_of(internals::get_node_byIndex(tree, group, index)));
             }
             Lines told;
-            for (const auto &element : plan->run_by(group)) {
+            for (const auto &element : plan->resolve(group)) {
                 told.push_back(number_of(element));
             }
             ASSERT_EQ(told, expected) << text;
             for (const char *item : {"a", "b", "c"}) {
-                const auto found = plan->run_by(group, item);
+                const auto found = plan->resolve(group, item);
                 const int index = internals::get_node_index(group, item, 3);
                 ASSERT_EQ(number_of(found),
                           number_of(internals::get_node_byIndex(tree, group, index)))

@@ -1,0 +1,183 @@
+// SPDX-FileCopyrightText: 2026 The Quillmark authors
+// SPDX-License-Identifier: Apache-2.0
+
+// What the runner learns of items from the stored plan: their reports while they run, and
+// those that come late.
+#include "run/runner.h"
+
+#include "module/stored_plan.h"
+#include "plan/plan_text.h"
+#include "run/trigger.h"
+
+#include <algorithm>
+#include <cstdlib>
+#include <sys/stat.h>
+
+namespace fptest
+{
+namespace
+{
+
+using namespace std::chrono_literals;
+
+// A gatherer that is being started may not be there yet.
+constexpr auto kBeforeMissed = 500ms;
+constexpr auto kBetweenPolls = 250ms;
+
+// As it reads once the plan has been made loadable.
+ItemReport as_made_loadable(ItemReport report)
+{
+    if (report.result_without_value) {
+        report.result_without_value = false;
+        report.result = "";
+    }
+    report.description = report.description.value_or("");
+    return report;
+}
+
+// Whether that element is the item still, and not one of another plan.
+bool is_item(const Plan &plan, std::size_t number, const std::string &name)
+{
+    if (number >= plan.elements().size()) {
+        return false;
+    }
+    const char *found = mxmlElementGetAttr(plan.elements()[number], "name");
+    return found != nullptr && name == found;
+}
+
+// Whether a process with an old copy of the plan may have brought that back.
+bool is_earlier(const ItemReport &report, const ItemReport &last)
+{
+    const auto progress = [](const ItemReport &one) {
+        return std::atol(one.progress.value_or("0").c_str());
+    };
+    return report.result == last.result && progress(report) < progress(last);
+}
+
+// One without it is as a process with an old copy of the plan has written it.
+bool bears_mark(const Plan &plan, const Job::Target &target)
+{
+    const char *found = mxmlElementGetAttr(plan.elements()[target.element], kMark);
+    return target.mark.empty() || (found != nullptr && target.mark == found);
+}
+
+} // namespace
+
+// Reads the plan where it has changed; one that is being written is left for the
+// next time.
+void Runner::poll_reports()
+{
+    struct stat status {
+    };
+    if ((!active_.empty() || !judged_.empty()) && stat(kStoredPlan, &status) == 0 &&
+        S_ISREG(status.st_mode) &&
+        (status.st_mtim.tv_sec != plan_status_.st_mtim.tv_sec ||
+         status.st_mtim.tv_nsec != plan_status_.st_mtim.tv_nsec ||
+         status.st_size != plan_status_.st_size || status.st_ino != plan_status_.st_ino)) {
+        const auto text = read_stored_plan();
+        if (text && Plan::parse_annotated(*text)) {
+            plan_status_ = status;
+            read_reports(*text);
+            if (!Plan::load_as_library(*text)) {
+                mend_stored_plan(); // or who reports next could not
+            }
+        }
+    }
+    for (RunningItem &active : active_) {
+        poll_gatherer(active);
+        const ItemReport &report = item(active.place).report;
+        const bool has_ended = report.progress == "100" && report.result;
+        if (active.moved_on && !active.done &&
+            (has_ended || !active.gatherer_end.empty() ||
+             (!limits_.item && now() - active.moved_on_at > kForGathering))) {
+            finish(active, now());
+        }
+    }
+}
+
+// Without it the library would wait at its port without end, and what has died
+// reports no more.
+void Runner::poll_gatherer(RunningItem &active)
+{
+    if (active.done || !active.gatherer_end.empty() || !gathers(active) ||
+        now() - active.gatherer_looked_for < kBetweenPolls) {
+        return;
+    }
+    active.gatherer_looked_for = now();
+    active.gatherer_missed = host_.processes().has_gatherer() ? 0 : active.gatherer_missed + 1;
+    if (active.gatherer_missed < 2 || now() - active.start < kBeforeMissed) {
+        return;
+    }
+    active.gatherer_end = active.moved_on ? "the gatherer ended before it had reported"
+                                          : "the gatherer ended before it connected";
+    if (!active.moved_on) {
+        release_trigger();
+    }
+}
+
+void Runner::read_reports(const std::string &text)
+{
+    const auto plan = Plan::parse_annotated(text);
+    if (!plan) {
+        return;
+    }
+    for (RunningItem &active : active_) {
+        read_report(active, *plan);
+    }
+    for (Judged &judged : judged_) {
+        read_late_report(judged, *plan);
+    }
+}
+
+void Runner::read_report(RunningItem &active, const Plan &plan)
+{
+    const std::size_t number = active.target.element;
+    if (active.done || !is_item(plan, number, item(active.place).name)) {
+        return;
+    }
+    active.overwritten = !bears_mark(plan, active.target);
+    if (active.overwritten) {
+        return; // what it says is of an earlier run
+    }
+    ItemRun &result = item(active.place);
+    ItemReport report = plan.report(number);
+    if (report.result == "") { // it has been made loadable already
+        report.result.reset();
+        report.result_without_value = true;
+    }
+    if (as_made_loadable(report) == as_made_loadable(result.report)) {
+        return;
+    }
+    active.undone = result.report.result && !report.result;
+    result.report = std::move(report);
+    for (Listener *listener : listeners_) {
+        listener->progressed(run_, active.place);
+    }
+}
+
+void Runner::read_late_report(Judged &judged, const Plan &plan)
+{
+    const std::size_t number = judged.target.element;
+    if (!is_item(plan, number, item(judged.place).name) || !bears_mark(plan, judged.target)) {
+        return;
+    }
+    const auto is_same = [&](const RunningItem &active) {
+        return active.place.suite == judged.place.suite && active.place.item == judged.place.item;
+    };
+    if (std::ranges::any_of(active_, is_same)) {
+        plan_status_ = {}; // its end is told first: look again then
+        return;
+    }
+    const ItemReport report = plan.report(number);
+    const bool has_reported = report.result || report.result_without_value;
+    if (!has_reported || as_made_loadable(report) == as_made_loadable(judged.report) ||
+        is_earlier(report, judged.report)) {
+        return;
+    }
+    judged.report = report;
+    for (Listener *listener : listeners_) {
+        listener->late(run_, judged.place, report);
+    }
+}
+
+} // namespace fptest
