@@ -12,6 +12,7 @@
 
 #include <algorithm>
 #include <cerrno>
+#include <csignal>
 #include <cstdio>
 #include <memory>
 #include <string>
@@ -120,8 +121,17 @@ Exit report(const ReportOptions &options)
         std::fputs("fptest: bytes of the description that no plan can hold are replaced\n", stderr);
     }
     require_room(text.size() + kAttributes + kLongestEntity * description.size());
+    // a stop that came into the middle of it would cut the plan
+    sigset_t stops;
+    sigset_t before;
+    sigemptyset(&stops);
+    for (const int signal : {SIGHUP, SIGINT, SIGTERM}) {
+        sigaddset(&stops, signal);
+    }
+    sigprocmask(SIG_BLOCK, &stops, &before);
     FPTEST_SetTransation(options.group.c_str(), options.item.c_str(), options.progress,
                          options.result, description.c_str());
+    sigprocmask(SIG_SETMASK, &before, nullptr);
 
     const auto written = Plan::load_as_library(read_stored());
     ItemReport wanted;

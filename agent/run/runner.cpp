@@ -10,6 +10,8 @@
 #include "util/text.h"
 
 #include <algorithm>
+#include <array>
+#include <csignal>
 #include <cstdlib>
 #include <sys/wait.h>
 #include <thread>
@@ -48,8 +50,12 @@ int signal_of(int status)
     if (WIFSIGNALED(status)) {
         return WTERMSIG(status);
     }
+    constexpr std::array kHarmless{SIGCHLD, SIGCONT, SIGSTOP, SIGTSTP,
+                                   SIGTTIN, SIGTTOU, SIGURG,  SIGWINCH};
     const int signal = WEXITSTATUS(status) - 128;
-    return name_of_signal(signal).starts_with("SIG") ? signal : 0;
+    return signal > 0 && signal < NSIG && std::ranges::find(kHarmless, signal) == kHarmless.end()
+               ? signal
+               : 0;
 }
 
 } // namespace
@@ -345,7 +351,8 @@ void Runner::finish(RunningItem &active, TimePoint end)
         gatherer_may_report_late_ = true;
         signal_each(host_.processes().of_gatherer(), SIGTERM);
     }
-    judged_.push_back({active.place, active.target, result.report});
+    judged_.push_back({active.place, active.target, std::move(active.seen)});
+    judged_.back().seen.push_back(result.report);
     mend_stored_plan();
 }
 

@@ -100,6 +100,7 @@ class Runner
         TimePoint gatherer_looked_for;
         int gatherer_missed = 0; // how many times in a row
         std::string gatherer_end;
+        std::vector<ItemReport> seen; // the last of those before its report
     };
 
     // The gatherer's command returns when the gatherer has been told; its report comes in
@@ -111,7 +112,7 @@ class Runner
     struct Judged {
         Place place;
         Job::Target target;
-        ItemReport report;
+        std::vector<ItemReport> seen; // an old copy of the plan may bring one of them back
     };
 
     TimePoint now() const;

@@ -10,8 +10,8 @@
 #include "run/trigger.h"
 
 #include <algorithm>
-#include <cstdlib>
 #include <sys/stat.h>
+#include <utility>
 
 namespace fptest
 {
@@ -19,6 +19,8 @@ namespace
 {
 
 using namespace std::chrono_literals;
+
+constexpr std::size_t kSeen = 100; // reports that are kept of an item
 
 // A gatherer that is being started may not be there yet.
 constexpr auto kBeforeMissed = 500ms;
@@ -43,15 +45,6 @@ bool is_item(const Plan &plan, std::size_t number, const std::string &name)
     }
     const char *found = mxmlElementGetAttr(plan.elements()[number], "name");
     return found != nullptr && name == found;
-}
-
-// Whether a process with an old copy of the plan may have brought that back.
-bool is_earlier(const ItemReport &report, const ItemReport &last)
-{
-    const auto progress = [](const ItemReport &one) {
-        return std::atol(one.progress.value_or("0").c_str());
-    };
-    return report.result == last.result && progress(report) < progress(last);
 }
 
 // One without it is as a process with an old copy of the plan has written it.
@@ -149,7 +142,10 @@ void Runner::read_report(RunningItem &active, const Plan &plan)
         return;
     }
     active.undone = result.report.result && !report.result;
-    result.report = std::move(report);
+    if (active.seen.size() == kSeen) {
+        active.seen.erase(active.seen.begin());
+    }
+    active.seen.push_back(std::exchange(result.report, std::move(report)));
     for (Listener *listener : listeners_) {
         listener->progressed(run_, active.place);
     }
@@ -170,11 +166,13 @@ void Runner::read_late_report(Judged &judged, const Plan &plan)
     }
     const ItemReport report = plan.report(number);
     const bool has_reported = report.result || report.result_without_value;
-    if (!has_reported || as_made_loadable(report) == as_made_loadable(judged.report) ||
-        is_earlier(report, judged.report)) {
+    const auto is_report = [&](const ItemReport &one) {
+        return as_made_loadable(one) == as_made_loadable(report);
+    };
+    if (!has_reported || std::ranges::any_of(judged.seen, is_report)) {
         return;
     }
-    judged.report = report;
+    judged.seen.push_back(report);
     for (Listener *listener : listeners_) {
         listener->late(run_, judged.place, report);
     }

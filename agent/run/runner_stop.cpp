@@ -267,7 +267,11 @@ void Runner::make_way_for(const Job &job)
         return target && is_gatherer(run_.suites[job.suite].items[target->item].name, vendor_);
     };
     if (std::ranges::any_of(job.targets, is_gatherers)) {
-        if (gatherer_may_report_late_) {
+        // the library does not find one that is a script, and would start another beside it
+        const std::vector<Leftover> running = host_.processes().of_gatherer();
+        const bool is_found = std::ranges::any_of(
+            running, [](const Leftover &one) { return one.name.starts_with(kGatherer); });
+        if (gatherer_may_report_late_ || (!running.empty() && !is_found)) {
             end_gatherer();
         }
         require_trigger_port(); // an item may have taken it

@@ -335,6 +335,38 @@ TEST_F(Trust, TellsAReportThatComesInTheMomentOfTheItemsEnd)
                 HasSubstr("G/Script: late report, result 1: dead; it changes nothing\n"));
 }
 
+TEST_F(Trust, FailsWhatARealTimeSignalHasKilled)
+{
+    run_group(
+        {{"Script", "'fptest report G Script --progress 100 --result 0; kill -40 $$'; true"}});
+    EXPECT_THAT(outcomes(), ElementsAre("Script: passed")); // the shell's end is what counts
+    run_group({{"Script", "'fptest report G Script --progress 100 --result 0; kill -40 $$'"}});
+    EXPECT_THAT(outcomes(), ElementsAre("Script: failed"));
+    EXPECT_EQ(reasons().at(0), "died by signal 40, though it reported the result 0");
+}
+
+TEST_F(Trust, TellsALateReportOfLessProgress)
+{
+    const Ended ended =
+        run_group({{"Script", "'(sleep 0.3; fptest report G Script --progress 90 --result 0 "
+                              "--description retrying) &amp; fptest report G Script --progress 100 "
+                              "--result 0'"},
+                   {"Item", "sleep 0.8 report G 100 0 fine"}});
+    EXPECT_THAT(ended.out,
+                HasSubstr("G/Script: late report, result 0: retrying; it changes nothing\n"));
+}
+
+TEST_F(Trust, LeavesOneGathererAloneThatIsAScript)
+{
+    // the library does not find it by its name
+    run_group({{"SensorProbe", "--help >/dev/null; exec /system/bin/Item gather report-here G "
+                               "SensorProbe 100 0 fine sleep 30"}},
+              {"--repeat", "3"});
+    EXPECT_THAT(outcomes(),
+                ElementsAre("SensorProbe: passed", "SensorProbe: passed", "SensorProbe: passed"));
+    EXPECT_EQ(device::processes_named("/system/bin/Item").size(), 1U);
+}
+
 TEST_F(Trust, TellsAReportThatGoesIntoAnItemBeforeItsOwn)
 {
     const Ended ended = run_group({{"Item", "report G 100 0 fine"},
