@@ -19,10 +19,6 @@ using namespace device;
 namespace
 {
 
-constexpr char kProbe[] = "/system/bin/SensorProbe";
-// Its name holds the gatherer's, so that it counts as one; it connects nowhere.
-constexpr char kHolder[] = "/system/bin/SensorProbeHolder";
-
 class Gatherer : public DeviceTest
 {
   protected:
@@ -38,15 +34,6 @@ class Gatherer : public DeviceTest
         const Socket client = connect_to(port);
         command.join();
         return receive(client);
-    }
-
-    static std::size_t count_open(const std::string &kind)
-    {
-        const auto open = descriptors();
-        return static_cast<std::size_t>(
-            std::count_if(open.begin(), open.end(), [&](const auto &descriptor) {
-                return descriptor.second.starts_with(kind);
-            }));
     }
 };
 
