@@ -12,31 +12,31 @@ namespace device
 namespace
 {
 
+Lines by(const std::string &function, Lines texts)
+{
+    for (std::string &text : texts) {
+        text.insert(0, function + "| ");
+    }
+    return texts;
+}
+
 // Up to the item's lookup by name.
 Lines lines_of_command(const std::string &item)
 {
-    return {"fptest_ParseCmdLine| testHead is : XMLNodePath",
-            "fptest_ParseCmdLine| testName is : P/G/" + item,
-            "fptest_ItemsTest| Input cmdline : P/G/" + item,
-            "get_node_level| level = 3",
-            "get_node_level| node name = " + item,
-            "get_node_name| enter...",
-            "get_node_name| root node:P",
-            "get_node_name| mid node:G",
-            "get_node_name| leaf node:" + item,
-            "get_node_index| enter..."};
+    return by("fptest_ParseCmdLine", {"testHead is : XMLNodePath", "testName is : P/G/" + item}) +
+           by("fptest_ItemsTest", {"Input cmdline : P/G/" + item}) +
+           by("get_node_level", {"level = 3", "node name = " + item}) +
+           by("get_node_name", {"enter...", "root node:P", "mid node:G", "leaf node:" + item}) +
+           by("get_node_index", {"enter..."});
 }
 
 Lines lines_of_lookup(const std::string &item, const std::string &args, const Lines &query)
 {
-    return lines_of_command(item) +
-           Lines{"SingleItemExecute| enter... !",
-                 "get_node_byIndex| enter...",
-                 "get_node_byIndex| curernt leaf node name = " + item,
-                 "get_node_byIndex| leave...",
-                 "SingleItemExecute| mxmlElementGetAttr name=" + item + "- args=" + args,
-                 "ResourceReduce| \ncbuf=ps | grep /system/bin/SensorProbe"} +
-           query + Lines{"SingleItemExecute| tpCmd:/system/bin/" + item + " " + args};
+    return lines_of_command(item) + by("SingleItemExecute", {"enter... !"}) +
+           by("get_node_byIndex", {"enter...", "curernt leaf node name = " + item, "leave..."}) +
+           by("SingleItemExecute", {"mxmlElementGetAttr name=" + item + "- args=" + args}) +
+           by("ResourceReduce", {"\ncbuf=ps | grep /system/bin/SensorProbe"}) + query +
+           by("SingleItemExecute", {"tpCmd:/system/bin/" + item + " " + args});
 }
 
 } // namespace
@@ -86,10 +86,10 @@ Lines lines_of_store(const std::string &plan, const Lines &failure)
 Lines lines_of_unloaded(const std::string &item, const Lines &failure)
 {
     return lines_of_command(item) + failure +
-           Lines{"get_node_index| get_node_index[]:load config file failed",
-                 "SingleItemExecute| enter... !", "get_node_byIndex| enter...",
-                 "get_node_byIndex| get_node_byIndex[]:load config file failed",
-                 "SingleItemExecute| get node by Index fail!"};
+           by("get_node_index", {"get_node_index[]:load config file failed"}) +
+           by("SingleItemExecute", {"enter... !"}) +
+           by("get_node_byIndex", {"enter...", "get_node_byIndex[]:load config file failed"}) +
+           by("SingleItemExecute", {"get node by Index fail!"});
 }
 
 Lines lines_of_gatherer(const std::string &args, const Lines &query, const Lines &trigger)
@@ -101,51 +101,42 @@ Lines lines_of_gatherer(const std::string &args, const Lines &query, const Lines
 
 Lines lines_of_report(int progress, const std::string &description, const Lines &save)
 {
-    return Lines{"FPTEST_SetTransation| enter...",
-                 "FPTEST_SetTransation| input node name = Note",
-                 "get_node_index| enter...",
-                 "FPTEST_SetTransation| iResult = 0",
-                 "FPTEST_SetTransation| index=0 - iResult=0 - iProgress=" +
-                     std::to_string(progress) + " - iDesc=" + description,
-                 "updateSrcXmlFile| enter... !",
-                 "updateSrcXmlFile| curernt node name is: Note",
-                 "updateSrcXmlFile| start update progress!",
-                 "updateSrcXmlFile| start update result!",
-                 "updateSrcXmlFile| start update description!",
-                 "updateSrcXmlFile| start save xml!",
-                 "save_XmlFile| enter..."} +
-           save +
-           Lines{"updateSrcXmlFile| update Src Xml File success . leave...",
-                 "FPTEST_SetTransation| leave..."};
+    return by("FPTEST_SetTransation", {"enter...", "input node name = Note"}) +
+           by("get_node_index", {"enter..."}) +
+           by("FPTEST_SetTransation",
+              {"iResult = 0", "index=0 - iResult=0 - iProgress=" + std::to_string(progress) +
+                                  " - iDesc=" + description}) +
+           by("updateSrcXmlFile",
+              {"enter... !", "curernt node name is: Note", "start update progress!",
+               "start update result!", "start update description!", "start save xml!"}) +
+           by("save_XmlFile", {"enter..."}) + save +
+           by("updateSrcXmlFile", {"update Src Xml File success . leave..."}) +
+           by("FPTEST_SetTransation", {"leave..."});
 }
 
 Lines lines_of_unloaded_report(int progress, const std::string &description, const Lines &failure)
 {
-    return Lines{"FPTEST_SetTransation| enter...", "FPTEST_SetTransation| input node name = Note",
-                 "get_node_index| enter..."} +
-           failure +
-           Lines{"get_node_index| get_node_index[]:load config file failed",
-                 "FPTEST_SetTransation| iResult = 0",
-                 "FPTEST_SetTransation| index=-1 - iResult=0 - iProgress=" +
-                     std::to_string(progress) + " - iDesc=" + description,
-                 "updateSrcXmlFile| enter... !"} +
-           failure +
-           Lines{"updateSrcXmlFile| updateSrcXmlFile[]:load config file failed",
-                 "FPTEST_SetTransation| leave..."};
+    return by("FPTEST_SetTransation", {"enter...", "input node name = Note"}) +
+           by("get_node_index", {"enter..."}) + failure +
+           by("get_node_index", {"get_node_index[]:load config file failed"}) +
+           by("FPTEST_SetTransation",
+              {"iResult = 0", "index=-1 - iResult=0 - iProgress=" + std::to_string(progress) +
+                                  " - iDesc=" + description}) +
+           by("updateSrcXmlFile", {"enter... !"}) + failure +
+           by("updateSrcXmlFile", {"updateSrcXmlFile[]:load config file failed"}) +
+           by("FPTEST_SetTransation", {"leave..."});
 }
 
 Lines lines_of_read_back(std::size_t size)
 {
     const std::string count = std::to_string(size);
-    return Lines{"FPTEST_ExtractResultMsg| enter... !", "FPTEST_ExtractResultMsg| offset = 0",
-                 "FPTEST_ExtractResultMsg| offset = " + count,
-                 "FPTEST_ExtractResultMsg| offset = 0"} +
+    return by("FPTEST_ExtractResultMsg",
+              {"enter... !", "offset = 0", "offset = " + count, "offset = 0"}) +
            (size == 0 ? Lines{}
-                      : Lines{"FPTEST_ExtractResultMsg| read file unfinish, continue... n = " +
-                              count + " "}) +
-           Lines{"FPTEST_ExtractResultMsg| reach the end of file",
-                 "FPTEST_ExtractResultMsg| read byte count = " + count,
-                 "FPTEST_ExtractResultMsg| leave..."};
+                      : by("FPTEST_ExtractResultMsg",
+                           {"read file unfinish, continue... n = " + count + " "})) +
+           by("FPTEST_ExtractResultMsg",
+              {"reach the end of file", "read byte count = " + count, "leave..."});
 }
 
 Lines lines_of_note(const Lines &query, const std::string &args)
