@@ -190,6 +190,13 @@ std::vector<std::pair<int, std::string>> descriptors()
     return open;
 }
 
+std::size_t count_open(const std::string &kind)
+{
+    const auto open = descriptors();
+    return static_cast<std::size_t>(std::ranges::count_if(
+        open, [&](const auto &descriptor) { return descriptor.second.starts_with(kind); }));
+}
+
 pid_t start_program(const std::vector<std::string> &arguments)
 {
     std::vector<char *> argv;

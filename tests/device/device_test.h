@@ -12,6 +12,7 @@
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
 
+#include <cstddef>
 #include <string>
 #include <sys/types.h>
 #include <utility>
@@ -24,6 +25,9 @@ inline constexpr char kPlanFile[] = "/data/vorlane/src1.xml";
 inline constexpr char kParameterFile[] = "/etc/vorlane/sysparms/vr_common_cfg.xml";
 inline constexpr char kLogFile[] = "/tmp/vr.log";
 inline constexpr unsigned short kTriggerPort = 34952;
+inline constexpr char kProbe[] = "/system/bin/SensorProbe";
+// Its name holds the gatherer's, so that it counts as one; it connects nowhere.
+inline constexpr char kHolder[] = "/system/bin/SensorProbeHolder";
 
 using support::eventually;
 using support::Lines;
@@ -84,6 +88,9 @@ std::string status_field(pid_t pid, const std::string &field);
 
 // Descriptors of this process with what they refer to; the log's is left out.
 std::vector<std::pair<int, std::string>> descriptors();
+
+// How many of them refer to that kind, as "socket:".
+std::size_t count_open(const std::string &kind);
 
 // Starts a program by its whole path, and expects that it is there.
 pid_t start_program(const std::vector<std::string> &arguments);

@@ -7,10 +7,9 @@
 #include "network.h"
 
 #include <algorithm>
-#include <cerrno>
+#include <chrono>
 #include <csignal>
-#include <sys/resource.h>
-#include <sys/socket.h>
+#include <string>
 #include <thread>
 #include <unistd.h>
 
@@ -18,10 +17,6 @@ using namespace device;
 
 namespace
 {
-
-constexpr char kProbe[] = "/system/bin/SensorProbe";
-// Its name holds the gatherer's, so that it counts as one; it connects nowhere.
-constexpr char kHolder[] = "/system/bin/SensorProbeHolder";
 
 class Gatherer : public DeviceTest
 {
@@ -38,15 +33,6 @@ class Gatherer : public DeviceTest
         const Socket client = connect_to(port);
         command.join();
         return receive(client);
-    }
-
-    static std::size_t count_open(const std::string &kind)
-    {
-        const auto open = descriptors();
-        return static_cast<std::size_t>(
-            std::count_if(open.begin(), open.end(), [&](const auto &descriptor) {
-                return descriptor.second.starts_with(kind);
-            }));
     }
 };
 
@@ -204,50 +190,6 @@ TEST_F(Gatherer, TakenPortGoesUnnoticedAndTheCommandWaitsElsewhere)
                                          "Sock_Init1| retWri=13", "Sock_Init1| retWri success"}));
 }
 
-// The process may open so many descriptors more, and no other.
-class DescriptorLimit
-{
-  public:
-    explicit DescriptorLimit(rlim_t more)
-    {
-        getrlimit(RLIMIT_NOFILE, &before_);
-        const int next = dup(STDIN_FILENO);
-        close(next);
-        const rlimit tight{static_cast<rlim_t>(next) + more, before_.rlim_max};
-        EXPECT_EQ(setrlimit(RLIMIT_NOFILE, &tight), 0);
-    }
-    ~DescriptorLimit()
-    {
-        setrlimit(RLIMIT_NOFILE, &before_);
-    }
-    DescriptorLimit(const DescriptorLimit &) = delete;
-    DescriptorLimit &operator=(const DescriptorLimit &) = delete;
-
-  private:
-    rlimit before_{};
-};
-
-TEST_F(Gatherer, IsStartedWhenTheQueryCannotBeAndAFailedAcceptLeavesItsListenerOpen)
-{
-    store_plan();
-    run_path("P/G/Note"); // loads the plan
-    log_lines();
-    {
-        // enough for the listening socket, but for no pipe and no connection
-        const DescriptorLimit limit(1);
-        run_path("P/G/SensorProbe");
-    }
-    const Lines lines = log_lines();
-    ASSERT_GE(lines.size(), 6U);
-    EXPECT_THAT(Lines(lines.end() - 6, lines.end()),
-                ElementsAre("ResourceReduce| popen error!",
-                            "SingleItemExecute| tpCmd:/system/bin/SensorProbe --group G",
-                            "SingleItemExecute| \nrow=-1", "Sock_Init1| accept error!",
-                            "Sock_Init1| errno=" + std::to_string(EMFILE),
-                            "SingleItemExecute| leave... !"));
-    EXPECT_THAT(listeners(), ElementsAre("00000000:8888"));
-}
-
 TEST_F(Gatherer, StartedInTheBackgroundItStaysUnreapedWhenItEnds)
 {
     store_plan();
@@ -268,11 +210,7 @@ TEST_F(Gatherer, StartedInTheBackgroundItStaysUnreapedWhenItEnds)
     EXPECT_EQ(std::count_if(all.begin(), all.end(), is_zombie), 1);
 }
 
-void host_handler(int /*signal*/)
-{
-}
-
-TEST_F(Gatherer, LauncherPutsTheHostsSignalsBackAndTheChildIgnoresNone)
+TEST_F(Gatherer, LauncherPutsTheHostsSignalMaskBackAndTheChildIgnoresNone)
 {
     sigset_t mask;
     sigset_t before;
@@ -280,13 +218,9 @@ TEST_F(Gatherer, LauncherPutsTheHostsSignalsBackAndTheChildIgnoresNone)
     sigemptyset(&mask);
     sigaddset(&mask, SIGUSR2);
     sigprocmask(SIG_BLOCK, &mask, &before);
-    std::signal(SIGINT, host_handler);
-    std::signal(SIGQUIT, host_handler);
     store_plan();
     run_path("P/G/SensorProbe");
 
-    EXPECT_EQ(std::signal(SIGINT, SIG_DFL), host_handler);
-    EXPECT_EQ(std::signal(SIGQUIT, SIG_DFL), host_handler);
     sigprocmask(SIG_SETMASK, &before, &after);
     EXPECT_EQ(sigismember(&after, SIGUSR2), 1);
     EXPECT_EQ(sigismember(&after, SIGCHLD), 0);

@@ -25,6 +25,7 @@ using Words = std::vector<std::string>;
 inline const fs::path tree = QUILLMARK_SOURCE_DIR;
 inline const fs::path build = QUILLMARK_BINARY_DIR;
 inline const std::string device_run = tree / "device/run";
+inline const std::string this_program = fs::read_symlink("/proc/self/exe");
 
 // ---- processes --------------------------------------------------------------
 

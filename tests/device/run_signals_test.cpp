@@ -1,8 +1,8 @@
 // SPDX-FileCopyrightText: 2026 The Quillmark authors
 // SPDX-License-Identifier: Apache-2.0
 
-// How a device ends: by COMMAND, by signals, by keys typed at a terminal.
-#include "../quoted.h"
+// How a device ends: by COMMAND and by signals.
+#include "common/descriptor.h"
 #include "launcher_runner.h"
 
 #include <algorithm>
@@ -10,13 +10,21 @@
 #include <cctype>
 #include <chrono>
 #include <csignal>
+#include <cstddef>
 #include <cstdio>
+#include <cstdlib>
+#include <ctime>
 #include <fcntl.h>
+#include <filesystem>
+#include <map>
 #include <optional>
-#include <pty.h>
+#include <stdexcept>
+#include <string>
+#include <sys/types.h>
 #include <thread>
 #include <unistd.h>
-#include <utmp.h>
+#include <utility>
+#include <vector>
 
 using namespace launcher;
 using namespace std::chrono_literals;
@@ -131,117 +139,6 @@ TEST_F(Device, WhatCommandLeavesRunningEndsWithIt)
     EXPECT_TRUE(eventually([&] { return processes_with(length).empty(); }));
 }
 
-// ---- keys -------------------------------------------------------------------
-
-// A program at a terminal of its own, until that is closed.
-class AtATerminal
-{
-  public:
-    explicit AtATerminal(const Words &words)
-    {
-        int terminal = -1;
-        int other_side = -1;
-        EXPECT_EQ(openpty(&terminal, &other_side, nullptr, nullptr, nullptr), 0);
-        terminal_ = Descriptor(terminal);
-        const Descriptor closed(other_side);
-        support::Start start = start_of(words);
-        start.shares_streams = true;
-        start.prepare = [other_side] { login_tty(other_side); };
-        process_.emplace(start);
-    }
-    int terminal() const
-    {
-        return terminal_.get();
-    }
-    void close()
-    {
-        terminal_ = Descriptor(-1);
-    }
-    Outcome outcome()
-    {
-        return outcome_of(*process_);
-    }
-
-  private:
-    Descriptor terminal_{-1};
-    std::optional<support::Process> process_;
-};
-
-// Runs a script on a device at a terminal, and types a key when it says "ready".
-Outcome at_a_terminal(const std::string &script, char key)
-{
-    AtATerminal device({device_run, "--", "sh", "-c", script});
-    std::string out;
-    bool typed = false;
-    for (std::array<char, 4096> buffer{};;) {
-        const ssize_t got = read(device.terminal(), buffer.data(), buffer.size());
-        if (got <= 0) {
-            break;
-        }
-        out.append(buffer.data(), static_cast<std::size_t>(got));
-        if (!typed && out.find("ready") != std::string::npos) {
-            typed = write(device.terminal(), &key, 1) == 1;
-        }
-    }
-    return {device.outcome().status, out, ""};
-}
-
-constexpr char ctrl_c = '\x03';
-constexpr char ctrl_backslash = '\x1c';
-
-TEST_F(Device, CtrlCIsCommandsToHandle)
-{
-    const Outcome outcome = at_a_terminal(
-        "trap 'echo handled; exit 7' INT; echo ready; while :; do sleep 0.05; done", ctrl_c);
-
-    EXPECT_NE(outcome.out.find("handled"), std::string::npos) << outcome.out;
-    EXPECT_EQ(outcome.status, 7);
-}
-
-TEST_F(Device, CtrlCEndsACommandThatDoesNotHandleIt)
-{
-    // not said by the shell, which may lose the key on the way to becoming another program
-    const std::string sleeper = R"(exec /usr/bin/perl -e '$| = 1; alarm 9; print "ready"; sleep')";
-
-    EXPECT_EQ(at_a_terminal(sleeper, ctrl_c).status, 130);
-}
-
-TEST_F(Device, CtrlCDoesNotEndACommandThatIgnoresIt)
-{
-    const Outcome outcome = at_a_terminal("trap '' INT; echo ready; sleep 0.5; echo done", ctrl_c);
-
-    EXPECT_NE(outcome.out.find("done"), std::string::npos) << outcome.out;
-    EXPECT_EQ(outcome.status, 0);
-}
-
-TEST_F(Device, CtrlBackslashIsCommandsToHandle)
-{
-    EXPECT_EQ(at_a_terminal("trap 'exit 8' QUIT; echo ready; while :; do sleep 0.05; done",
-                            ctrl_backslash)
-                  .status,
-              8);
-}
-
-TEST_F(Device, ASignalThatTheCallerIgnoresStaysIgnored)
-{
-    const Outcome outcome =
-        run({"sh", "-c", "trap '' INT; exec \"$0\" sh -c 'kill -INT $$; echo on'", device_run});
-
-    EXPECT_EQ(outcome.out, "on\n");
-    EXPECT_EQ(outcome.status, 0);
-}
-
-const std::string this_program = fs::read_symlink("/proc/self/exe");
-
-TEST_F(Device, CtrlCComesToCommandOnce)
-{
-    const Outcome outcome =
-        at_a_terminal("exec " + quoted(this_program) + " " + say_signals_option, ctrl_c);
-
-    EXPECT_TRUE(outcome.out.ends_with("ready\r\n^CINT\r\n")) << outcome.out;
-    EXPECT_EQ(outcome.status, 7);
-}
-
 // ---- signals ----------------------------------------------------------------
 
 // A device in a process group of its own, started by a process that starts nothing
@@ -304,29 +201,28 @@ class SignalledDevice
 
 const Words signal_sayer = {this_program, say_signals_option};
 
-TEST_F(Device, SignalsToItAloneAreHandedOnToCommandOnce)
+TEST_F(Device, ASignalThatTheCallerIgnoresStaysIgnored)
 {
-    for (const auto &[name, number] : ending_signals) {
-        SignalledDevice device(signal_sayer);
-        ASSERT_TRUE(device.says("ready"));
+    const Outcome outcome =
+        run({"sh", "-c", "trap '' INT; exec \"$0\" sh -c 'kill -INT $$; echo on'", device_run});
 
-        device.signal(number);
-
-        EXPECT_EQ(device.wait(), 7);
-        EXPECT_EQ(device.out(), "ready\n" + name + "\n");
-    }
+    EXPECT_EQ(outcome.out, "on\n");
+    EXPECT_EQ(outcome.status, 0);
 }
 
-TEST_F(Device, SignalsToItsGroupComeToCommandOnce)
+TEST_F(Device, SignalsToItAloneOrToItsGroupComeToCommandOnce)
 {
-    for (const auto &[name, number] : ending_signals) {
-        SignalledDevice device(signal_sayer);
-        ASSERT_TRUE(device.says("ready"));
+    for (const auto send : {&SignalledDevice::signal, &SignalledDevice::signal_group}) {
+        for (const auto &[name, number] : ending_signals) {
+            SCOPED_TRACE(name);
+            SignalledDevice device(signal_sayer);
+            ASSERT_TRUE(device.says("ready"));
 
-        device.signal_group(number);
+            (device.*send)(number);
 
-        EXPECT_EQ(device.wait(), 7);
-        EXPECT_EQ(device.out(), "ready\n" + name + "\n");
+            EXPECT_EQ(device.wait(), 7);
+            EXPECT_EQ(device.out(), "ready\n" + name + "\n");
+        }
     }
 }
 
@@ -482,40 +378,24 @@ TEST_F(NamespaceDevice, ABwrapThatIsKilledHasRefusedNothing)
     EXPECT_EQ(outcome.err, "device/run: bwrap was ended by signal 9 as it tried the device\n");
 }
 
-// Nobody reads it.
-class FullPipe
+// What is read, by nobody, and what is written.
+std::pair<Descriptor, Descriptor> full_pipe()
 {
-  public:
-    FullPipe()
-    {
-        if (pipe2(ends_.data(), O_CLOEXEC | O_NONBLOCK) != 0) {
-            throw std::runtime_error("pipe2");
-        }
-        const std::array<char, 4096> page{};
-        while (write(ends_[1], page.data(), page.size()) > 0) {
-        }
-        fcntl(ends_[1], F_SETFL, 0);
+    std::array<int, 2> ends{};
+    if (pipe2(ends.data(), O_CLOEXEC | O_NONBLOCK) != 0) {
+        throw std::runtime_error("pipe2");
     }
-    FullPipe(const FullPipe &) = delete;
-    FullPipe &operator=(const FullPipe &) = delete;
-    ~FullPipe()
-    {
-        close(ends_[0]);
-        close(ends_[1]);
+    const std::array<char, 4096> page{};
+    while (write(ends[1], page.data(), page.size()) > 0) {
     }
-    int writing() const
-    {
-        return ends_[1];
-    }
-
-  private:
-    std::array<int, 2> ends_{};
-};
+    fcntl(ends[1], F_SETFL, 0);
+    return {Descriptor(ends[0]), Descriptor(ends[1])};
+}
 
 TEST_F(NamespaceDevice, SignalsAreHandedOnWhileNobodyReadsItsErrors)
 {
-    const FullPipe errors;
-    SignalledDevice device(signal_sayer, {}, errors.writing());
+    const auto [unread, errors] = full_pipe();
+    SignalledDevice device(signal_sayer, {}, errors.get());
     ASSERT_TRUE(device.says("ready"));
 
     device.signal(SIGTERM);
@@ -526,10 +406,10 @@ TEST_F(NamespaceDevice, SignalsAreHandedOnWhileNobodyReadsItsErrors)
 
 TEST_F(NamespaceDevice, ACommandThatGoesOnIsEndedWhileNobodyReadsItsErrors)
 {
-    const FullPipe errors;
+    const auto [unread, errors] = full_pipe();
     const std::string mark = unique_length();
     SignalledDevice device({"sh", "-c", "trap '' TERM; echo ready; echo errors >&2", mark}, {},
-                           errors.writing());
+                           errors.get());
     ASSERT_TRUE(device.says("ready"));
 
     device.signal(SIGTERM);
@@ -583,25 +463,6 @@ TEST_F(NamespaceDevice, TheEndOfItsCallersThreadIsNoHangUp)
 
     EXPECT_EQ(device->wait(), 7);
     EXPECT_EQ(device->out(), "ready\nTERM\n");
-}
-
-TEST_F(Device, AClosedTerminalComesToCommandOnce)
-{
-    // the terminal's first process, which gets the signal, may be device/run or a shell
-    for (const std::string first : {"exec ", ""}) {
-        const TemporaryDirectory host;
-        const fs::path said = host.path() / "said";
-        AtATerminal shell({"sh", "-c", first + "\"$0\" \"$1\" \"$2\" >\"$3\" 2>&1; :", device_run,
-                           this_program, say_signals_option, said});
-        ASSERT_TRUE(eventually([&] { return last_line(read_file(said)) == "ready"; }));
-
-        shell.close();
-
-        EXPECT_TRUE(eventually([&] { return last_line(read_file(said)) == "HUP"; }));
-        shell.outcome();
-        std::this_thread::sleep_for(700ms);
-        EXPECT_EQ(lines_of(read_file(said)).end()[-2], "ready") << read_file(said);
-    }
 }
 
 } // namespace
