@@ -36,6 +36,18 @@ TEST(WritableDirectory, IsNotMadeInADirectoryOfTheSystem)
     EXPECT_FALSE(fs::exists(directory));
 }
 
+TEST(WritableDirectory, IsNotMadeWhereTheDeviceHasItsOwn)
+{
+    const fs::path directory = "/system/quillmark-must-not-make-this";
+
+    for (const std::string option : {"--data", "--out"}) {
+        EXPECT_EQ(refused({option, directory, "--", "true"}).err,
+                  "device/run: " + option + " " + directory.string() +
+                      ": the device has its own directory of that name\n");
+        EXPECT_FALSE(fs::exists(directory));
+    }
+}
+
 TEST(WritableDirectory, IsJudgedByWhereALinkLeads)
 {
     const TemporaryDirectory host;
