@@ -56,6 +56,7 @@ Work work_of(const Comparison &comparison, const std::function<void()> &side)
     quiet_on_log(hear);
     take_turn(comparison, side);
     quiet_on_log(nullptr);
+    work = nullptr;
     done.outcome = comparison.outcome();
     comparison.clear();
     return done;

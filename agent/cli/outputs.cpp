@@ -110,7 +110,7 @@ void settle_outputs(RunOptions &options)
     require_log_of_its_own(options.log, reports.empty() ? Beside::view : Beside::results);
     for (std::string *report : {&options.json, &options.junit}) {
         if (is_standard_output(*report)) {
-            *report = "-";
+            report->assign(1, '-');
         }
     }
 }

@@ -258,7 +258,7 @@ TEST(PositionInText, ComesInAnyOrder)
 {
     const std::string text = "\uFEFFa\n\u00E9b";
     fptest::Positions positions(text);
-    for (const std::size_t offset : {7, 6, 7, 3, 1, 8}) {
+    for (const std::size_t offset : {7U, 6U, 7U, 3U, 1U, 8U}) {
         const Position place = positions.of(offset);
         const Position alone = fptest::Positions(text).of(offset);
         EXPECT_EQ(place.line, alone.line) << offset;

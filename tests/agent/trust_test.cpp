@@ -15,7 +15,6 @@ using device::kPlanFile;
 using device::lines_of;
 using device::read_file;
 using device::start_program;
-using fptest_runner::Ended;
 using fptest_runner::expect_refusal;
 using fptest_runner::FptestProcess;
 using fptest_runner::run_fptest;
