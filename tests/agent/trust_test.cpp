@@ -125,7 +125,7 @@ TEST_F(Trust, RunsNoGathererWhosePortAnItemHasTaken)
     const Items items = {
         {"Script",
          "'fptest report G Script --progress 100 --result 0; nc -l -p 34952 "
-         "&lt;/dev/null >/dev/null 2>/dev/null &amp; until netstat -ltn | grep -q :34952; do "
+         "&lt;/dev/null >/dev/null 2>/dev/null &amp; until netstat -ltn | grep -q 34952; do "
          "sleep 0.05; done'"},
         {"SensorProbe", "--group G --seconds 0"}};
     Ended ended = run_group(items);
