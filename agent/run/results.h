@@ -55,8 +55,8 @@ struct Suite {
 
 struct Counts {
     std::size_t passed = 0;
-    std::size_t failed = 0;  // failed, silent, timed out and stopped
-    std::size_t not_run = 0; // not run
+    std::size_t failed = 0; // also no result, timed out and stopped
+    std::size_t not_run = 0;
 
     std::size_t all() const
     {
