@@ -26,8 +26,8 @@ NamedFile librarys_file()
     return {"the library", kStoredPlan};
 }
 
-// Whether both are one file, by whatever name, of which one would overwrite the
-// other: into a pipe or a terminal both may write.
+// Whether both are one file, by whatever name, in which the two would overwrite or break
+// up each other: to a terminal both may write.
 bool are_same_file(const std::string &one, const std::string &other)
 {
     struct stat first {
@@ -35,8 +35,8 @@ bool are_same_file(const std::string &one, const std::string &other)
     struct stat second {
     };
     if (stat(one.c_str(), &first) == 0 && stat(other.c_str(), &second) == 0) {
-        return S_ISREG(first.st_mode) && first.st_dev == second.st_dev &&
-               first.st_ino == second.st_ino;
+        return (S_ISREG(first.st_mode) || S_ISFIFO(first.st_mode)) &&
+               first.st_dev == second.st_dev && first.st_ino == second.st_ino;
     }
     std::error_code none;
     const auto whole = [&none](const std::string &path) {

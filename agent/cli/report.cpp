@@ -44,19 +44,6 @@ struct ReportOptions {
 constexpr std::size_t kLongestEntity = 6;
 constexpr std::size_t kAttributes = 64;
 
-std::string read_stored()
-{
-    if (auto text = read_stored_plan()) {
-        return *text;
-    }
-    if (errno == ENOENT) {
-        throw Failure(Exit::environment, std::string("no plan is stored in ") + kStoredPlan +
-                                             ", so nothing can be reported: store one with fptest "
-                                             "run --plan FILE");
-    }
-    throw Failure(Exit::environment, std::string(kStoredPlan) + " cannot be read: " + why_unread());
-}
-
 Plan load_stored(const std::string &text)
 {
     std::string why;
@@ -112,7 +99,8 @@ Exit report(const ReportOptions &options)
     choose_log(options.log);
     mend_stored_plan(); // or a report that has spoiled it would cost this one
     const Descriptor lock = lock_stored_plan();
-    const std::string text = read_stored();
+    const std::string text =
+        require_stored_plan(", so nothing can be reported: store one with fptest run --plan FILE");
     const Plan plan = load_stored(text);
     const std::size_t number = find_item(plan, options);
     // Mini-XML would not load such a plan again
@@ -133,7 +121,7 @@ Exit report(const ReportOptions &options)
                          options.result, description.c_str());
     sigprocmask(SIG_SETMASK, &before, nullptr);
 
-    const auto written = Plan::load_as_library(read_stored());
+    const auto written = Plan::load_as_library(read_stored_plan().value_or(""));
     ItemReport wanted;
     wanted.progress = std::to_string(options.progress);
     wanted.result = std::to_string(options.result);

@@ -50,19 +50,13 @@ struct Source {
 
 std::string read_plan(const std::string &file)
 {
-    const std::string path = file.empty() ? kStoredPlan : file;
-    if (auto text = file.empty() ? read_stored_plan() : read_file(path)) {
+    if (file.empty()) {
+        return require_stored_plan(": give one with --plan FILE");
+    }
+    if (auto text = read_file(file)) {
         return *text;
     }
-    if (!file.empty()) {
-        throw Failure(Exit::usage, one_line(path) + ": " + why_unread());
-    }
-    if (errno == ENOENT) {
-        throw Failure(Exit::environment, std::string("no plan is stored in ") + kStoredPlan +
-                                             ": give one with --plan FILE");
-    }
-    throw Failure(Exit::environment, std::string(kStoredPlan) + " cannot be read: " + why_unread() +
-                                         "; give a plan with --plan FILE");
+    throw Failure(Exit::usage, one_line(file) + ": " + why_unread());
 }
 
 // A plan that a command cannot hold is put into its place as a file.
@@ -236,9 +230,6 @@ Exit run(RunOptions options)
     }
 
     const Work work = work_of(paths, source.plan, options.as_group);
-    if (work.jobs.empty()) {
-        throw Failure(Exit::usage, "there is nothing to run: the groups named have no items");
-    }
     require_programs(work, vendor, options.force);
     if (source.use == PlanSource::to_send) {
         store(*host, source.text);

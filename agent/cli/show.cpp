@@ -59,17 +59,13 @@ void print(const std::vector<Row> &rows)
 
 std::string read_shown(const std::string &file)
 {
-    const std::string path = file.empty() ? kStoredPlan : file;
-    if (auto text = file.empty() ? read_stored_plan() : read_file(path)) {
+    if (file.empty()) {
+        return require_stored_plan(": run one with fptest run --plan FILE, or name a file to show");
+    }
+    if (auto text = read_file(file)) {
         return *text;
     }
-    if (file.empty() && errno == ENOENT) {
-        throw Failure(Exit::environment, std::string("no plan is stored in ") + kStoredPlan +
-                                             ": run one with fptest run --plan FILE, or name a "
-                                             "file to show");
-    }
-    throw Failure(file.empty() ? Exit::environment : Exit::usage,
-                  one_line(path) + ": " + why_unread());
+    throw Failure(Exit::usage, one_line(file) + ": " + why_unread());
 }
 
 Exit show(const std::string &file)

@@ -4,6 +4,7 @@
 #include "module/preflight.h"
 
 #include "module/processes.h"
+#include "module/stored_plan.h"
 #include "plan/plan.h"
 #include "util/failure.h"
 #include "util/text.h"
@@ -86,13 +87,7 @@ void require_device()
                                              " is not writable: " + std::strerror(errno) +
                                              "; make it, or run this as another user");
     }
-    struct stat plan {
-    };
-    if (stat(kStoredPlan, &plan) == 0 && !S_ISREG(plan.st_mode) && !S_ISDIR(plan.st_mode)) {
-        // whoever opened it could wait for ever
-        throw Failure(Exit::environment,
-                      std::string(kStoredPlan) + " is no regular file: remove it");
-    }
+    require_regular_plan();
 }
 
 void require_room(std::size_t bytes)
@@ -120,7 +115,7 @@ void require_stored(const std::string &found, const std::string &wanted)
         throw Failure(Exit::environment,
                       "the plan was not stored: " + std::to_string(found.size()) + " of " +
                           std::to_string(wanted.size()) + " bytes are in " + kStoredPlan +
-                          "; make room and store it again");
+                          "; make room and store it again, or see why with --log FILE");
     }
 }
 

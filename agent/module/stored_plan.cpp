@@ -27,6 +27,28 @@ std::optional<std::string> read_stored_plan()
     return read_file(kStoredPlan, O_NONBLOCK);
 }
 
+std::string require_stored_plan(const std::string &what_to_do)
+{
+    require_regular_plan();
+    if (auto text = read_stored_plan()) {
+        return *text;
+    }
+    const std::string plan = kStoredPlan;
+    throw Failure(Exit::environment, errno == ENOENT
+                                         ? "no plan is stored in " + plan + what_to_do
+                                         : plan + " cannot be read: " + why_unread());
+}
+
+void require_regular_plan()
+{
+    struct stat plan {
+    };
+    if (stat(kStoredPlan, &plan) == 0 && !S_ISREG(plan.st_mode)) {
+        throw Failure(Exit::environment,
+                      std::string(kStoredPlan) + " is no regular file: remove it");
+    }
+}
+
 std::string whole_stored_plan()
 {
     std::string text;

@@ -17,6 +17,14 @@ namespace fptest
 // Its text as it is; nothing where it cannot be read, errno then says why.
 std::optional<std::string> read_stored_plan();
 
+// Its text; throws a Failure where it cannot be read. What to do where there is none is
+// added to "no plan is stored in ...".
+std::string require_stored_plan(const std::string &what_to_do);
+
+// Throws a Failure where something else is in its place, such as a FIFO: whoever opened
+// that could wait for ever.
+void require_regular_plan();
+
 // What is made of its text. That is read again for a while where nothing can be made of
 // it: somebody may just be writing it.
 template <typename Make> auto made_of_stored_plan(std::string &text, const Make &make)

@@ -119,6 +119,19 @@ bool runs_something(const std::optional<Plan::Element> &element)
     return element && element->name && !element->name->empty();
 }
 
+// What the library runs for it; a Failure where that is nothing.
+std::vector<std::optional<Plan::Element>> resolve(const Path &path, const Plan &plan)
+{
+    auto items = path.item.empty() ? plan.resolve(path.group)
+                                   : std::vector{plan.resolve(path.group, path.item)};
+    if (std::ranges::none_of(items, runs_something)) {
+        throw Failure(Exit::usage, quoted(path.text) +
+                                       " leads to nothing that can be run: leave it out, or "
+                                       "see fptest check");
+    }
+    return items;
+}
+
 // Whether every item of the group is what a path with its name runs.
 bool is_addressable(const Plan &plan, const std::string &group,
                     const std::vector<std::optional<Plan::Element>> &items)
@@ -141,12 +154,8 @@ class WorkPlanner
 
     void add(const Path &path)
     {
-        if (!path.item.empty()) {
-            add_job(path.text, path.group, {plan_.resolve(path.group, path.item)});
-            return;
-        }
-        const auto items = plan_.resolve(path.group);
-        if (as_group_ || !is_addressable(plan_, path.group, items)) {
+        const auto items = resolve(path, plan_);
+        if (as_group_ || !path.item.empty() || !is_addressable(plan_, path.group, items)) {
             add_job(path.text, path.group, items);
             return;
         }
@@ -220,7 +229,9 @@ std::vector<Path> all_paths(const Plan &plan)
     }
     std::vector<Path> paths;
     for (const std::string &group : group_names(plan)) {
-        paths.push_back({root + "/" + group, root, group, ""});
+        if (std::ranges::any_of(plan.resolve(group), runs_something)) {
+            paths.push_back({root + "/" + group, root, group, ""});
+        }
     }
     return paths;
 }
@@ -239,9 +250,7 @@ void list_items(const std::vector<Path> &paths, const Plan &plan, const std::str
     std::vector<std::pair<std::string, std::string>> lines;
     std::size_t width = 0;
     for (const Path &path : paths) {
-        const auto items = path.item.empty() ? plan.resolve(path.group)
-                                             : std::vector{plan.resolve(path.group, path.item)};
-        for (const auto &item : items) {
+        for (const auto &item : resolve(path, plan)) {
             if (!runs_something(item)) {
                 continue;
             }

@@ -35,14 +35,14 @@ Path parse_path(const std::string &text, const Plan &plan, const std::string &pl
 // "; the groups are a, b and c"
 std::string known_groups(const Plan &plan);
 
-// One for each group of the plan.
+// One for each group of the plan that has something to run.
 std::vector<Path> all_paths(const Plan &plan);
 
 // A command for each item; for each path where that is wanted, or an item has no path
-// of its own.
+// of its own. Throws a Failure where a path leads to nothing that can be run.
 Work work_of(const std::vector<Path> &paths, const Plan &plan, bool as_group);
 
-// Prints the items with the commands that would be run for them.
+// Prints the items with the commands that would be run for them. Throws as work_of().
 void list_items(const std::vector<Path> &paths, const Plan &plan, const std::string &suffix);
 
 } // namespace fptest

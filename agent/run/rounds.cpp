@@ -108,6 +108,10 @@ class Rounds
                 run_.finished = true;
                 return;
             }
+            runner_.end_round();
+            if (!runner_.goes_on()) {
+                return;
+            }
             begin_next();
         }
     }
@@ -146,7 +150,6 @@ class Rounds
 
     void begin_next()
     {
-        runner_.end_round();
         summarize(run_);
         for (Listener *listener : listeners_) {
             listener->round_over(run_);

@@ -88,10 +88,15 @@ void Runner::give_up(const std::string &why)
     }
 }
 
-bool Runner::run(const Job &job)
+bool Runner::goes_on()
 {
     read_signals();
-    if (!run_.why_unfinished.empty()) {
+    return run_.why_unfinished.empty();
+}
+
+bool Runner::run(const Job &job)
+{
+    if (!goes_on()) {
         return false;
     }
     module_gone_.clear();

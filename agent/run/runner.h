@@ -51,6 +51,9 @@ class Runner
     // come to its end: the run then says why.
     bool run(const Job &job);
 
+    // Whether the run goes on: no signal has come, and nothing has ended it.
+    bool goes_on();
+
     // Before the reports of its items are cleared from the plan: what an earlier
     // run of them left running would report into this one, and is ended.
     void make_way_for(const Job &job);

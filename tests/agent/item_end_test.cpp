@@ -129,6 +129,19 @@ TEST_F(ItemEnd, SecondInterruptionLeavesNoItemThatIgnoresTheStop)
     EXPECT_TRUE(eventually([] { return running_items().empty(); }, 20));
 }
 
+TEST_F(ItemEnd, InterruptionBetweenTwoRoundsBeginsNoOtherRound)
+{
+    FptestProcess fptest(with_group(
+        {{"Item", "report G 100 0 fine; /system/bin/Third ignore-stop sleep 60 &amp;"}},
+        {"--grace", "1.5", "--repeat", "2"}));
+    ASSERT_TRUE(eventually([] { return events("end").size() == 1; }));
+    std::this_thread::sleep_for(std::chrono::milliseconds(300));
+    fptest.signal(SIGTERM);
+    EXPECT_EQ(fptest.wait().status, 130);
+    EXPECT_EQ(events("finish").at(0).at("rounds"), 1);
+    EXPECT_EQ(events("finish").at(0).at("not_run"), 1);
+}
+
 TEST_F(ItemEnd, HangUpAfterAnInterruptionIsTheSameInterruption)
 {
     for (const int first : {SIGINT, SIGHUP}) {

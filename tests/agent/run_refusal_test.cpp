@@ -143,18 +143,14 @@ TEST_F(Refusal, WithoutAPlan)
            {"--plan", work("none.xml"), "P/G"});
 }
 
-TEST_F(Refusal, WhereADirectoryIsInThePlansPlace)
+TEST_F(Refusal, OfOneFifoForTwoReports)
 {
-    fs::create_directories(std::string(kPlanFile) + "/full");
-    expect(3,
-           "fptest: /data/vorlane/src1.xml cannot be read: Is a directory; give a plan with "
-           "--plan FILE",
-           {"P/G"});
-    const std::string text = group_of({{"Item", "note /tmp/scene/order"}});
-    expect(3,
-           "fptest: the plan was not stored: 0 of " + std::to_string(text.size()) +
-               " bytes are in /data/vorlane/src1.xml; make room and store it again",
-           {"--plan", plan(text), "P/G"});
+    ASSERT_EQ(mkfifo(work("fifo").c_str(), 0600), 0);
+    expect(2,
+           "fptest: --json and --junit both want the file /tmp/scene/fifo: give them files of "
+           "their own",
+           {"--json", work("fifo"), "--junit", work("fifo"), "--plan",
+            plan(group_of({{"Item", "note /tmp/scene/order"}})), "P/G"});
 }
 
 // --- devices ---------------------------------------------------------------------------

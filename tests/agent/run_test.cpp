@@ -238,12 +238,22 @@ TEST_P(RunPaths, Runs)
 INSTANTIATE_TEST_SUITE_P(, RunPaths, ::testing::ValuesIn(kPathCases),
                          [](const auto &one) { return one.param.name; });
 
-TEST_F(Run, SaysWhereANameLeadsToNothing)
+TEST_F(Run, RunsNothingWhereAPathLeadsToNothing)
 {
-    const Ended ended = run({"--force", "--plan", plan(kShifted), "P/G/Third"});
-    EXPECT_EQ(ended.status, 2);
-    EXPECT_THAT(ended.err, EndsWith("fptest: there is nothing to run: the groups named have no "
-                                    "items\n"));
+    std::string text = kShifted;
+    text.insert(text.find("</P>"), "<CmdGroup name=\"Empty\"/>");
+    const std::string file = plan(text);
+    for (const std::string path : {"P/G/Third", "P/Empty"}) {
+        for (const char *way : {"--force", "--list"}) {
+            const Ended ended =
+                run_fptest({"run", "--force", way, "--plan", file, "P/G/Item", path});
+            EXPECT_EQ(ended.status, 2);
+            EXPECT_EQ(ended.out, "");
+            EXPECT_THAT(ended.err, EndsWith("fptest: '" + path +
+                                            "' leads to nothing that can be run: leave it out, "
+                                            "or see fptest check\n"));
+        }
+    }
     EXPECT_FALSE(is_there("order"));
 }
 

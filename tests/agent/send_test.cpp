@@ -64,7 +64,8 @@ TEST_F(Send, SaysThatAPlanWasNotStored)
     EXPECT_EQ(ended.status, 3);
     EXPECT_EQ(ended.out, "Ping Success!\n\n"); // no reply to what was not sent any more
     EXPECT_EQ(ended.err, "fptest: the plan was not stored: 0 of 3 bytes are in "
-                         "/data/vorlane/src1.xml; make room and store it again\n");
+                         "/data/vorlane/src1.xml; make room and store it again, or see "
+                         "why with --log FILE\n");
     EXPECT_THAT(paths_run(), ElementsAre());
 }
 

@@ -8,6 +8,7 @@
 #include <algorithm>
 #include <csignal>
 #include <fcntl.h>
+#include <filesystem>
 #include <sys/stat.h>
 #include <unistd.h>
 
@@ -444,16 +445,22 @@ TEST_F(Trust, GoesOnWhereAReportIsTooLongForTheLimitOfFiles)
                                              "went on without it\n"));
 }
 
-TEST_F(Trust, OpensNoFifoInPlaceOfThePlan)
+TEST_F(Trust, TakesNoFifoAndNoDirectoryForThePlan)
 {
-    unlink(kPlanFile);
-    ASSERT_EQ(mkfifo(kPlanFile, 0600), 0);
     const std::string path = plan(kOnePasses);
-    for (const device::Lines &arguments :
-         {device::Lines{"run", "--plan", path, "P/G"}, {"run", "P/G"}, {"send", "pingtest"}}) {
-        expect_refusal(3, "fptest: /data/vorlane/src1.xml is no regular file: remove it",
-                       arguments);
+    for (const auto &make : {mkfifo, mkdir}) {
+        std::filesystem::remove(kPlanFile);
+        ASSERT_EQ(make(kPlanFile, 0700), 0);
+        for (const device::Lines &arguments :
+             {device::Lines{"run", "--plan", path, "P/G"},
+              {"run", "P/G"},
+              {"run", "--list"},
+              {"send", "pingtest"},
+              {"show"},
+              {"report", "G", "Item", "--progress", "1", "--result", "0"}}) {
+            expect_refusal(3, "fptest: /data/vorlane/src1.xml is no regular file: remove it",
+                           arguments);
+        }
     }
-    EXPECT_EQ(run_fptest({"show"}).status, 2);
-    unlink(kPlanFile);
+    std::filesystem::remove(kPlanFile);
 }
