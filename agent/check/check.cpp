@@ -18,10 +18,10 @@ std::vector<Finding> check(const std::string &text, PlanSource use)
         findings.error(0, "the plan is UTF-16: save it as UTF-8");
         return findings.take();
     }
-    if (use == PlanSource::to_send) {
-        check_size(text, findings);
+    if (use != PlanSource::stored) {
+        check_size(text, use, findings);
     }
-    const std::string stored = use == PlanSource::to_send ? as_stored(text) : text;
+    const std::string stored = use == PlanSource::stored ? text : as_stored(text);
     if (const std::optional<Plan> plan = check_form(text, stored, findings)) {
         check_plan(text, *plan, findings);
     }

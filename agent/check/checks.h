@@ -16,7 +16,7 @@ namespace fptest
 inline constexpr char kDeclaration[] = "<?xml version=\"1.0\"?>";
 
 // What a command would cut off the text.
-void check_size(const std::string &text, Findings &findings);
+void check_size(const std::string &text, PlanSource use, Findings &findings);
 
 // Loads the text, after saying what is wrong with its form. Stored is what of it the
 // library would get. Nothing where there is no use in looking at what the plan says.

@@ -21,7 +21,7 @@ constexpr std::size_t kShownPath = 80; // columns
 
 std::string path_of(const std::string &group)
 {
-    return "'" + ellipsize(one_line("root/" + group), kShownPath) + "'";
+    return in_quotes("root/" + group, kShownPath);
 }
 
 std::string path_of(const std::string &group, const std::string &item)
@@ -35,12 +35,12 @@ std::string names_of(const Resolution &resolution)
     std::size_t count = 0;
     for (const auto &element : resolution) {
         if (element && ++count == 1) {
-            first = in_quotes(element->name.value());
+            first = quoted_name(element->name.value());
         }
     }
     return count == 0   ? "nothing"
            : count == 1 ? first
-                        : first + " and " + std::to_string(count - 1) + " more";
+                        : fmt::format("{} and {} more", first, count - 1);
 }
 
 std::string path_damage(std::string_view name)

@@ -9,6 +9,7 @@
 
 #include <algorithm>
 #include <cstddef>
+#include <fmt/core.h>
 #include <string>
 #include <string_view>
 #include <utility>
@@ -20,13 +21,17 @@ namespace fptest
 class Findings
 {
   public:
-    void error(std::size_t offset, std::string text)
+    template <typename... Values>
+    void error(std::size_t offset, fmt::format_string<Values...> text, Values &&...values)
     {
-        list_.push_back({Finding::Severity::error, offset, std::move(text)});
+        list_.push_back(
+            {Finding::Severity::error, offset, fmt::format(text, std::forward<Values>(values)...)});
     }
-    void warning(std::size_t offset, std::string text)
+    template <typename... Values>
+    void warning(std::size_t offset, fmt::format_string<Values...> text, Values &&...values)
     {
-        list_.push_back({Finding::Severity::warning, offset, std::move(text)});
+        list_.push_back({Finding::Severity::warning, offset,
+                         fmt::format(text, std::forward<Values>(values)...)});
     }
 
     // In the order of the text.
@@ -40,11 +45,12 @@ class Findings
     std::vector<Finding> list_;
 };
 
+inline constexpr std::size_t kShownName = 63; // columns
+
 // A name, or what stands for one, in a message.
-inline std::string in_quotes(std::string_view text)
+inline std::string quoted_name(std::string_view name)
 {
-    constexpr std::size_t kShown = 63; // columns
-    return "'" + ellipsize(one_line(text), kShown) + "'";
+    return in_quotes(name, kShownName);
 }
 
 } // namespace fptest

@@ -20,8 +20,7 @@ namespace
 {
 
 constexpr std::size_t kNone = std::string::npos;
-constexpr std::size_t kShownName = 63; // columns
-constexpr std::size_t kShownWhy = 160;
+constexpr std::size_t kShownWhy = 160; // columns
 
 bool is_name(std::string_view name)
 {
@@ -114,10 +113,10 @@ class FormChecker
         for (const Attribute *attribute : given_) {
             if (attribute->begin < up_to) {
                 findings_.error(attribute->begin,
-                                "attribute " + in_quotes(attribute->name) +
-                                    " has no value: the library would not load the plan; write " +
-                                    ellipsize(one_line(attribute->name), kShownName) +
-                                    "=\"\" or leave it out");
+                                "attribute {} has no value: the library would not load the plan; "
+                                "write {}=\"\" or leave it out",
+                                quoted_name(attribute->name),
+                                ellipsize(one_line(attribute->name), kShownName));
             }
         }
     }
@@ -127,17 +126,16 @@ class FormChecker
         const std::size_t offset = place_of(flaw);
         if (flaw.error == XML_ERROR_ABORTED) {
             findings_.error(offset,
-                            std::string("an entity is declared here: the library would not ") +
-                                (Plan::load_as_library(stored_) ? "know it" : "load the plan") +
-                                "; write its text where it is used");
+                            "an entity is declared here: the library would not {}; write its text "
+                            "where it is used",
+                            Plan::load_as_library(stored_) ? "know it" : "load the plan");
             return;
         }
         findings_.error(
-            offset, "not well-formed, " + reason(flaw.error, offset) + ": the library would " +
-                        (Plan::load_as_library(stored_) ? "load it all the same, and run what it "
-                                                          "took from it"
-                                                        : "not load it") +
-                        advice(flaw.error, offset));
+            offset, "not well-formed, {}: the library would {}; {}", reason(flaw.error, offset),
+            Plan::load_as_library(stored_) ? "load it all the same, and run what it took from it"
+                                           : "not load it",
+            advice(flaw.error, offset));
     }
 
     // Where a person looks for it: the parser names the tag for an entity in it,
@@ -186,31 +184,31 @@ class FormChecker
         const std::string open = open_at(tags_, offset);
         switch (error) {
         case XML_ERROR_TAG_MISMATCH:
-            return "; close <" + open + "> before";
+            return fmt::format("close <{}> before", open);
         case XML_ERROR_NO_ELEMENTS:
-            return open.empty() ? "; write a plan" : "; close <" + open + ">";
+            return open.empty() ? "write a plan" : fmt::format("close <{}>", open);
         case XML_ERROR_INVALID_TOKEN:
             return token_advice(offset);
         case XML_ERROR_UNCLOSED_TOKEN:
         case XML_ERROR_UNCLOSED_CDATA_SECTION:
-            return "; end what begins here";
+            return "end what begins here";
         case XML_ERROR_PARTIAL_CHAR:
-            return "; complete the character";
+            return "complete the character";
         case XML_ERROR_DUPLICATE_ATTRIBUTE:
-            return "; keep one of the two";
+            return "keep one of the two";
         case XML_ERROR_JUNK_AFTER_DOC_ELEMENT:
-            return "; put everything into one element";
+            return "put everything into one element";
         case XML_ERROR_UNDEFINED_ENTITY:
-            return "; write &amp; for a '&'";
+            return "write &amp; for a '&'";
         case XML_ERROR_MISPLACED_XML_PI:
-            return "; begin the text with it";
+            return "begin the text with it";
         case XML_ERROR_BAD_CHAR_REF:
-            return "; leave it out";
+            return "leave it out";
         case XML_ERROR_UNKNOWN_ENCODING:
         case XML_ERROR_INCORRECT_ENCODING:
-            return "; declare UTF-8, or leave the declaration out";
+            return "declare UTF-8, or leave the declaration out";
         default:
-            return "; fix it here";
+            return "fix it here";
         }
     }
 
@@ -218,18 +216,18 @@ class FormChecker
     {
         const auto byte = static_cast<unsigned char>(offset < text_.size() ? text_[offset] : ' ');
         if (offset > 0 && text_[offset - 1] == '&') {
-            return "; write &amp; for a '&'";
+            return "write &amp; for a '&'";
         }
         if (byte == '<') {
-            return "; write &lt; for a '<'";
+            return "write &lt; for a '<'";
         }
         if (byte >= 0x80) {
-            return "; save it as UTF-8";
+            return "save it as UTF-8";
         }
         if (std::iscntrl(byte) != 0 && std::isspace(byte) == 0) {
-            return "; leave the control character out";
+            return "leave the control character out";
         }
-        return "; fix it here";
+        return "fix it here";
     }
 
     // Mini-XML ignores the declaration: it takes every text for UTF-8.
@@ -271,15 +269,15 @@ class FormChecker
             return;
         }
         if (const std::size_t beside = beside_root(); beside != kNone) {
-            findings_.error(beside, std::string("the library would not load a plan without a "
-                                                "declaration that has something beside its root "
-                                                "element; begin it with ") +
-                                        kDeclaration);
+            findings_.error(beside,
+                            "the library would not load a plan without a declaration that has "
+                            "something beside its root element; begin it with {}",
+                            kDeclaration);
             return;
         }
-        findings_.error(undefined_entity(0), "well-formed, but the library would not load it: " +
-                                                 ellipsize(one_line(why), kShownWhy) +
-                                                 "; fix that");
+        findings_.error(undefined_entity(0),
+                        "well-formed, but the library would not load it: {}; fix that",
+                        ellipsize(one_line(why), kShownWhy));
     }
 
     // What stands beside the root element, where Mini-XML takes that for a

@@ -100,14 +100,14 @@ class LaterGroupsCheck
                 continue;
             }
             first = item;
-            text = "group " + in_quotes(*earlier->name) + " has no item " + in_quotes(*item->name) +
-                   ", and finds this one after it: " + path_of(*earlier->name, *item->name) +
-                   " would run " + names_of({run}) + "; check the group in paths to it";
+            text = fmt::format("group {} has no item {}, and finds this one after it: {} would run "
+                               "{}; check the group in paths to it",
+                               quoted_name(*earlier->name), quoted_name(*item->name),
+                               path_of(*earlier->name, *item->name), names_of({run}));
         }
         if (first != nullptr) {
-            findings_.warning(places_.of(first->number, "name"),
-                              more > 0 ? text + ", and to " + std::to_string(more) + " more here"
-                                       : text);
+            findings_.warning(places_.of(first->number, "name"), "{}{}", text,
+                              more > 0 ? fmt::format(", and to {} more here", more) : "");
         }
     }
 

@@ -4,9 +4,12 @@
 #include "check/messages.h"
 
 #include "util/text.h"
+#include "util/write.h"
 
 #include <algorithm>
 #include <cstddef>
+#include <fmt/core.h>
+#include <utf8.h>
 #include <utility>
 
 namespace fptest
@@ -24,20 +27,18 @@ bool continues(char byte)
 // The end of a clean text that takes at most that many columns.
 std::string_view end_of(std::string_view text, std::size_t width)
 {
-    std::size_t begin = text.size();
-    while (begin > 0) {
-        std::size_t next = begin - 1;
-        while (next > 0 && continues(text[next])) {
-            --next;
-        }
-        const std::size_t taken = display_width(text.substr(next, begin - next));
+    const char *begin = text.data() + text.size();
+    const char *next = begin;
+    while (next != text.data()) {
+        utf8::unchecked::prior(next);
+        const std::size_t taken = display_width({next, begin});
         if (taken > width) {
             break;
         }
         width -= taken;
         begin = next;
     }
-    return text.substr(begin);
+    return {begin, text.data() + text.size()};
 }
 
 std::string shown(std::string_view source)
@@ -94,10 +95,10 @@ std::string Messages::of(const Finding &finding)
         after = ellipsize(after, kAfter);
         before = "..." + std::string(end_of(before, kWidth - 3 - display_width(after)));
     }
-    return file_ + ":" + std::to_string(place.line) + ":" + std::to_string(place.column) +
-           (finding.severity == Finding::Severity::error ? ": error: " : ": warning: ") +
-           finding.text + "\n" + ellipsize(before + after, kWidth) + "\n" +
-           std::string(display_width(before), ' ') + "^\n";
+    return fmt::format("{}:{}:{}: {}: {}\n{}\n{:>{}}\n", file_, place.line, place.column,
+                       finding.severity == Finding::Severity::error ? "error" : "warning",
+                       finding.text, ellipsize(before + after, kWidth), '^',
+                       display_width(before) + 1);
 }
 
 void print(std::FILE *stream, const std::string &file, std::string_view text,
@@ -110,8 +111,7 @@ void print(std::FILE *stream, const std::string &file, std::string_view text,
         std::fputs(messages.of(findings[index]).c_str(), stream);
     }
     if (findings.size() > shown) {
-        std::fprintf(stream, "%s: %zu more are not shown\n", one_line(file).c_str(),
-                     findings.size() - shown);
+        print_to(stream, "{}: {} more are not shown\n", one_line(file), findings.size() - shown);
     }
 }
 

@@ -23,7 +23,6 @@ namespace
 {
 
 constexpr std::size_t kNone = std::string::npos;
-constexpr std::size_t kShownName = 63; // columns
 constexpr std::size_t kShownEffects = 3;
 constexpr std::size_t kShownKinds = 5;
 constexpr std::array kVendors = {0, 1, 2};
@@ -68,7 +67,7 @@ std::string kind_of(mxml_node_t *node)
            : tag.starts_with("![CDATA[") ? "CDATA"
            : tag.starts_with("!")        ? "a declaration"
            : tag.starts_with("?")        ? "an instruction"
-                                         : "<" + ellipsize(one_line(tag), kShownName) + ">";
+                                  : fmt::format("<{}>", ellipsize(one_line(tag), kShownName));
 }
 
 class PlanChecker
@@ -85,8 +84,8 @@ class PlanChecker
         check_tags();
         if (groups_.empty()) {
             findings_.error(places_.of(root()),
-                            "no CmdGroup in it: the library would find nothing "
-                            "to run; put the items into <CmdGroup name=\"...\">");
+                            "no CmdGroup in it: the library would find nothing to run; put the "
+                            "items into <CmdGroup name=\"...\">");
             return;
         }
         for (Group &group : groups_) {
@@ -94,9 +93,9 @@ class PlanChecker
             check_items(group);
         }
         for (const Item &item : stray_) {
-            findings_.error(places_.of(item.number), item_words(item) + " is in no group: no node "
-                                                                        "path leads to it; put it "
-                                                                        "into a <CmdGroup>");
+            findings_.error(places_.of(item.number),
+                            "{} is in no group: no node path leads to it; put it into a <CmdGroup>",
+                            item_words(item));
             check_program(item);
         }
         for (const Group &group : groups_) {
@@ -169,7 +168,7 @@ class PlanChecker
     [[nodiscard]] static std::string item_words(const Item &item)
     {
         return item.name.value_or("").empty() ? "an item without a name"
-                                              : "item " + in_quotes(*item.name);
+                                              : fmt::format("item {}", quoted_name(*item.name));
     }
 
     // --- names ---
@@ -181,9 +180,8 @@ class PlanChecker
                 const char *tag = mxmlGetElement(node);
                 if (strcasecmp(tag, meant) == 0 && std::strcmp(tag, meant) != 0) {
                     findings_.warning(places_.of(plan_.number(node)),
-                                      kind_of(node) +
-                                          " is ignored: element names are case-sensitive; write <" +
-                                          meant + ">");
+                                      "{} is ignored: element names are case-sensitive; write <{}>",
+                                      kind_of(node), meant);
                 }
             }
         }
@@ -196,36 +194,38 @@ class PlanChecker
         if (group.node == plan_.top()) {
             findings_.error(places_.of(group.number),
                             "the library looks for groups below the top of the document, and would "
-                            "not find this one; begin it with " +
-                                std::string(kDeclaration));
+                            "not find this one; begin it with {}",
+                            kDeclaration);
         } else if (name.empty()) {
-            if (!places_.is_valueless(group.number, "name")) {
-                findings_.error(place, group.name ? "the name of a group is empty: no node path "
-                                                    "leads to it; write one"
-                                                  : "a group has no name: no node path leads to "
-                                                    "it; add name=\"...\"");
-            }
+            check_unnamed(group.number,
+                          group.name
+                              ? "the name of a group is empty: no node path leads to it; write one"
+                              : "a group has no name: no node path leads to it; add name=\"...\"");
         } else if (const std::string damage = path_damage(name); !damage.empty()) {
-            findings_.error(place, "group " + in_quotes(name) +
-                                       " cannot be addressed: a node path " + damage + ", and " +
-                                       path_of(name) + " would run " +
-                                       names_of(plan_.resolve(name)) + "; rename it");
+            findings_.error(place,
+                            "group {} cannot be addressed: a node path {}, and {} would run {}; "
+                            "rename it",
+                            quoted_name(name), damage, path_of(name),
+                            names_of(plan_.resolve(name)));
         } else if (name.size() > kNameLimit) {
-            findings_.error(place, "group " + in_quotes(name) + too_long(name) +
-                                       names_of(plan_.resolve(name)) + "; shorten it");
+            report_length(place, "group", name, names_of(plan_.resolve(name)));
         } else if (mxml_node_t *const first = plan_.find_group(name); first != group.node) {
-            findings_.error(place, "a second group " + in_quotes(name) + ": " + path_of(name) +
-                                       " finds the one in " + places_.line_of(plan_.number(first)) +
-                                       ", and never this one; rename it");
+            findings_.error(place,
+                            "a second group {}: {} finds the one in {}, and never this one; rename "
+                            "it",
+                            quoted_name(name), path_of(name), places_.line_of(plan_.number(first)));
         } else {
             group.found = true;
         }
     }
 
-    static std::string too_long(const std::string &name)
+    void report_length(std::size_t place, const char *what, const std::string &name,
+                       const std::string &run)
     {
-        return " cannot be addressed: its name has " + std::to_string(name.size()) +
-               " bytes, a node path holds " + std::to_string(kNameLimit) + " of it and would run ";
+        findings_.error(place,
+                        "{} {} cannot be addressed: its name has {} bytes, a node path holds {} of "
+                        "it and would run {}; shorten it",
+                        what, quoted_name(name), name.size(), kNameLimit, run);
     }
 
     void check_items(const Group &group)
@@ -234,7 +234,11 @@ class PlanChecker
         for (const Item &item : group.items) {
             const std::string name = item.name.value_or("");
             if (name.empty()) {
-                check_unnamed(item);
+                check_unnamed(item.number,
+                              item.name ? "the name of an item is empty: the library would not run "
+                                          "it; write the name of its program"
+                                        : "an item has no name: the library would not run it; add "
+                                          "name=\"...\" with the name of its program");
                 continue;
             }
             const auto [first, is_first] = firsts.try_emplace(name, item.number);
@@ -249,14 +253,10 @@ class PlanChecker
         }
     }
 
-    void check_unnamed(const Item &item)
+    void check_unnamed(std::size_t element, const char *text)
     {
-        if (!places_.is_valueless(item.number, "name")) {
-            findings_.error(places_.of(item.number, "name"),
-                            item.name ? "the name of an item is empty: the library would not run "
-                                        "it; write the name of its program"
-                                      : "an item has no name: the library would not run it; add "
-                                        "name=\"...\" with the name of its program");
+        if (!places_.is_valueless(element, "name")) {
+            findings_.error(places_.of(element, "name"), "{}", text);
         }
     }
 
@@ -266,19 +266,20 @@ class PlanChecker
         const std::size_t place = places_.of(item.number, "name");
         if (const std::string damage = path_damage(name); !damage.empty()) {
             const bool cuts_program = name.find_first_of("\t\n") != name.npos;
-            findings_.error(place, "item " + in_quotes(name) +
-                                       " cannot be addressed: a node path " + damage +
-                                       (cuts_program ? ", as is the name of its program" : "") +
-                                       ", and " + path_of(*group.name, name) + " would run " +
-                                       run_of(group, name) + "; rename it");
+            findings_.error(place,
+                            "item {} cannot be addressed: a node path {}{}, and {} would run {}; "
+                            "rename it",
+                            quoted_name(name), damage,
+                            cuts_program ? ", as is the name of its program" : "",
+                            path_of(*group.name, name), run_of(group, name));
         } else if (name.size() > kNameLimit) {
-            findings_.error(place, "item " + in_quotes(name) + too_long(name) +
-                                       run_of(group, name) + "; shorten it");
+            report_length(place, "item", name, run_of(group, name));
         } else if (first != nullptr) {
-            findings_.error(place, "a second item " + in_quotes(name) + " in group " +
-                                       in_quotes(*group.name) + ": " + path_of(*group.name, name) +
-                                       " finds the one in " + places_.line_of(*first) +
-                                       ", and so do reports; rename it");
+            findings_.error(place,
+                            "a second item {} in group {}: {} finds the one in {}, and so do "
+                            "reports; rename it",
+                            quoted_name(name), quoted_name(*group.name), path_of(*group.name, name),
+                            places_.line_of(*first));
         }
     }
 
@@ -297,13 +298,11 @@ class PlanChecker
         }
         const std::size_t place = places_.of(item.number, "name");
         if (name.size() > kStopLimit && name.size() <= kNameLimit) {
-            findings_.warning(place, "item " + in_quotes(name) +
-                                         " may not be found to be stopped: ps is asked for the "
-                                         "first " +
-                                         std::to_string(kStopLimit) + " of the " +
-                                         std::to_string(name.size()) +
-                                         " bytes of its name, and finds another or none; shorten "
-                                         "it");
+            findings_.warning(place,
+                              "item {} may not be found to be stopped: ps is asked for the first "
+                              "{} of the {} bytes of its name, and finds another or none; shorten "
+                              "it",
+                              quoted_name(name), kStopLimit, name.size());
         }
         shell_checker_.check({name, item.args.value_or(""), place, [&](std::size_t at) {
                                   return places_.inside(item.number, "args", at);
@@ -317,21 +316,23 @@ class PlanChecker
         const std::string &name = *item.name;
         const std::size_t place = places_.of(item.number, "name");
         const auto vendor = vendor_name(name);
-        const std::string gatherer = kGatherer;
-        if (name == gatherer + "_qsee" || (vendor && vendor->name == gatherer)) {
-            findings_.warning(place, "item " + in_quotes(name) + " is not the gatherer: that is " +
-                                         in_quotes(gatherer) +
-                                         ", to which the library adds the vendor's suffix; leave "
-                                         "it out");
+        if (name == std::string(kGatherer) + "_qsee" || (vendor && vendor->name == kGatherer)) {
+            findings_.warning(place,
+                              "item {} is not the gatherer: that is '{}', to which the library "
+                              "adds the vendor's suffix; leave it out",
+                              quoted_name(name), kGatherer);
+        } else if (vendor && names_.contains(vendor->name)) {
+            findings_.warning(place,
+                              "item {0} would be run as {1} under vendor {2}, and item {3} as {0}; "
+                              "rename one",
+                              quoted_name(name), quoted_name(name + vendor->suffix), vendor->vendor,
+                              quoted_name(vendor->name));
         } else if (vendor) {
-            const std::string under = " under vendor " + std::to_string(vendor->vendor);
-            const std::string twice = in_quotes(name + vendor->suffix) + under;
-            findings_.warning(place, names_.contains(vendor->name)
-                                         ? "item " + in_quotes(name) + " would be run as " + twice +
-                                               ", and item " + in_quotes(vendor->name) + " as " +
-                                               in_quotes(name) + "; rename one"
-                                         : "item " + in_quotes(name) + " would be run as " + twice +
-                                               ": the library adds the suffix; leave it out");
+            findings_.warning(place,
+                              "item {} would be run as {} under vendor {}: the library adds the "
+                              "suffix; leave it out",
+                              quoted_name(name), quoted_name(name + vendor->suffix),
+                              vendor->vendor);
         }
     }
 
@@ -340,10 +341,9 @@ class PlanChecker
         if (!item.args) {
             const std::string line = command_line(*item.name, std::nullopt, "");
             findings_.error(places_.of(item.number),
-                            "item " + in_quotes(*item.name) +
-                                " has no args: its command line would "
-                                "be " +
-                                in_quotes(line) + ", which the shell refuses; add args=\"\"");
+                            "item {} has no args: its command line would be {}, which the shell "
+                            "refuses; add args=\"\"",
+                            quoted_name(*item.name), quoted_name(line));
             return;
         }
         std::vector<std::string> excesses;
@@ -351,15 +351,14 @@ class PlanChecker
             const std::size_t size =
                 command_line(*item.name, item.args, vendor_suffix(vendor).value()).size();
             if (size > kCommandLimit) {
-                excesses.push_back(std::to_string(size - kCommandLimit) + " under vendor " +
-                                   std::to_string(vendor));
+                excesses.push_back(fmt::format("{} under vendor {}", size - kCommandLimit, vendor));
             }
         }
         if (!excesses.empty()) {
             findings_.error(places_.of(item.number, "args"),
-                            "the command line of item " + in_quotes(*item.name) + " is cut to " +
-                                std::to_string(kCommandLimit) + " bytes, by " + join_and(excesses) +
-                                "; shorten its " + (item.args->empty() ? "name" : "args"));
+                            "the command line of item {} is cut to {} bytes, by {}; shorten its {}",
+                            quoted_name(*item.name), kCommandLimit, join_and(excesses),
+                            item.args->empty() ? "name" : "args");
         }
     }
 
@@ -367,27 +366,28 @@ class PlanChecker
 
     void check_nested(const Group &group, const Item &item)
     {
-        std::string text = item_words(item) + " is not directly in its group, but in " +
-                           kind_of(mxmlGetParent(item.node)) + ": ";
         const std::string name = item.name.value_or("");
+        std::string effect = "no node path leads to it";
         if (group.found && is_addressable(name)) {
             const auto run = plan_.resolve(*group.name, name);
-            text += run && run->number == item.number
-                        ? path_of(*group.name, name) + " finds it by chance"
-                        : path_of(*group.name, name) + " would run " + names_of({run});
-        } else {
-            text += "no node path leads to it";
+            const std::string path = path_of(*group.name, name);
+            effect = run && run->number == item.number
+                         ? fmt::format("{} finds it by chance", path)
+                         : fmt::format("{} would run {}", path, names_of({run}));
         }
-        findings_.error(places_.of(item.number), text + "; put it directly into a group");
+        findings_.error(places_.of(item.number),
+                        "{} is not directly in its group, but in {}: {}; put it directly into a "
+                        "group",
+                        item_words(item), kind_of(mxmlGetParent(item.node)), effect);
     }
 
     void check_positions(const Group &group)
     {
         if (group.items.empty() && group.nested.empty() && group.others.empty()) {
             findings_.warning(places_.of(group.number),
-                              "group " + in_quotes(*group.name) + " is empty: " +
-                                  path_of(*group.name) + " would run nothing, and an item of it " +
-                                  "is looked for in the groups after it; put items into it");
+                              "group {} is empty: {} would run nothing, and an item of it is "
+                              "looked for in the groups after it; put items into it",
+                              quoted_name(*group.name), path_of(*group.name));
         }
         if (group.others.empty()) {
             return;
@@ -395,15 +395,18 @@ class PlanChecker
         const Resolution run = plan_.resolve(*group.name);
         const bool said = report_run_others(group, run) || !group.nested.empty();
         const std::vector<std::string> effects = shifts_of(group, run);
-        const std::string cause = kinds_of(group.others) + " in group " + in_quotes(*group.name);
+        const std::string kinds = kinds_of(group.others);
         const std::size_t place = place_of_others(group);
         if (!effects.empty()) {
-            findings_.error(place, cause + ", which shifts the positions: " + some_of(effects) +
-                                       "; keep all but items out of the group");
+            findings_.error(place,
+                            "{} in group {}, which shifts the positions: {}; keep all but items "
+                            "out of the group",
+                            kinds, quoted_name(*group.name), some_of(effects));
         } else if (!said) {
-            findings_.warning(place, cause + ": " + path_of(*group.name) +
-                                         " would look for more items than there are, and go on; "
-                                         "keep all but items out of the group");
+            findings_.warning(place,
+                              "{} in group {}: {} would look for more items than there are, and go "
+                              "on; keep all but items out of the group",
+                              kinds, quoted_name(*group.name), path_of(*group.name));
         }
     }
 
@@ -416,10 +419,10 @@ class PlanChecker
                 continue;
             }
             findings_.error(places_.of(element->number),
-                            kind_of(plan_.elements()[element->number]) + " in group " +
-                                in_quotes(*group.name) + " has a name, by which " +
-                                path_of(*group.name) +
-                                " would run it like an item; put it outside of the group");
+                            "{} in group {} has a name, by which {} would run it like an item; put "
+                            "it outside of the group",
+                            kind_of(plan_.elements()[element->number]), quoted_name(*group.name),
+                            path_of(*group.name));
             found = true;
         }
         return found;
@@ -435,7 +438,7 @@ class PlanChecker
     {
         if (const std::size_t count = effects.size(); count > kShownEffects) {
             effects.resize(kShownEffects);
-            effects.push_back("so on for " + std::to_string(count - kShownEffects) + " more");
+            effects.push_back(fmt::format("so on for {} more", count - kShownEffects));
         }
         return join_and(effects);
     }
@@ -474,7 +477,7 @@ class PlanChecker
     {
         std::vector<std::string> effects;
         if (!runs_its_items(group, run)) {
-            effects.push_back(path_of(*group.name) + " would run " + names_of(run));
+            effects.push_back(fmt::format("{} would run {}", path_of(*group.name), names_of(run)));
         }
         std::unordered_set<std::string> seen;
         for (const Item &item : group.items) {
@@ -484,7 +487,8 @@ class PlanChecker
             }
             const auto found = plan_.resolve(*group.name, name);
             if (!found || found->number != item.number) {
-                effects.push_back(path_of(*group.name, name) + " would run " + names_of({found}));
+                effects.push_back(
+                    fmt::format("{} would run {}", path_of(*group.name, name), names_of({found})));
             }
         }
         return effects;

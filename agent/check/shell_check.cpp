@@ -24,7 +24,7 @@ std::string shell_characters(std::string_view name)
     std::vector<std::string> found;
     for (const char taken : kTaken) {
         if (name.find(taken) != name.npos) {
-            found.push_back(taken == ' ' ? "a blank" : std::string("'") + taken + "'");
+            found.push_back(taken == ' ' ? "a blank" : fmt::format("'{}'", taken));
         }
     }
     return join_and(found);
@@ -39,14 +39,14 @@ bool is_read_closely(std::string_view line)
 
 std::string reason(const Fault &fault)
 {
-    const std::string mark = in_quotes(fault.mark);
+    const std::string mark = quoted_name(fault.mark);
     switch (fault.kind) {
     case Fault::Kind::no_end:
-        return "it finds no end of the " + mark + " here; end it, or put a '\\' before it";
+        return fmt::format("it finds no end of the {} here; end it, or put a '\\' before it", mark);
     case Fault::Kind::unexpected:
-        return "it takes no " + mark + " here; put it in quotes, or leave it out";
+        return fmt::format("it takes no {} here; put it in quotes, or leave it out", mark);
     case Fault::Kind::nothing_after:
-        return "nothing follows the " + mark + " here; put it in quotes, or leave it out";
+        return fmt::format("nothing follows the {} here; put it in quotes, or leave it out", mark);
     }
     return {};
 }
@@ -99,8 +99,8 @@ void ShellChecker::check(const Item &item)
     if (const std::size_t at = item.args.find('\r'); at != item.args.npos && !ends_line) {
         findings_.warning(item.args_place(at),
                           "the shell takes the carriage return here for a character like any "
-                          "other, and would hand it to item " +
-                              in_quotes(item.name) + "; leave it out");
+                          "other, and would hand it to item {}; leave it out",
+                          quoted_name(item.name));
     }
 }
 
@@ -118,10 +118,9 @@ ShellChecker::Verdict ShellChecker::judge(const Item &item, const std::string &l
             is_limit_told_ = true;
             findings_.warning(item.name_place,
                               "the device's shell has been asked for as long as fptest waits for "
-                              "it: from item " +
-                                  in_quotes(item.name) +
-                                  " on, what it would refuse may be missed; check the rest as a "
-                                  "plan of its own");
+                              "it: from item {} on, what it would refuse may be missed; check the "
+                              "rest as a plan of its own",
+                              quoted_name(item.name));
         }
     }
     return verdict;
@@ -136,65 +135,77 @@ bool ShellChecker::is_refused(const std::string &backticks, std::string &why)
 
 void ShellChecker::report_name(const Item &item, const std::string &characters, bool is_refused)
 {
-    const std::string text = "item " + in_quotes(item.name) + " has " + characters +
-                             " in its name, which the shell reads as its own: it would ";
     if (is_refused) {
-        findings_.error(item.name_place, text + "refuse the command line; rename it");
+        findings_.error(item.name_place,
+                        "item {} has {} in its name, which the shell reads as its own: it would "
+                        "refuse the command line; rename it",
+                        quoted_name(item.name), characters);
     } else {
-        findings_.warning(item.name_place, text + "not run a program of that name; rename it");
+        findings_.warning(item.name_place,
+                          "item {} has {} in its name, which the shell reads as its own: it would "
+                          "not run a program of that name; rename it",
+                          quoted_name(item.name), characters);
     }
 }
 
 void ShellChecker::report_refusal(const Item &item, const Verdict &verdict, std::size_t args_begin)
 {
-    const std::string text =
-        "the shell would refuse the command line of item " + in_quotes(item.name) + ": ";
-    if (const auto &fault = verdict.reading.fault) {
-        findings_.error(item.args_place(fault->at - args_begin), text + reason(*fault));
-    } else {
-        findings_.error(item.args_place(0), text + one_line(verdict.why) + "; fix its args");
-    }
+    const auto &fault = verdict.reading.fault;
+    findings_.error(
+        item.args_place(fault ? fault->at - args_begin : 0),
+        "the shell would refuse the command line of item {}: {}", quoted_name(item.name),
+        fault ? reason(*fault) : fmt::format("{}; fix its args", one_line(verdict.why)));
 }
 
 void ShellChecker::report_effect(const Item &item, const Effect &effect, std::size_t place)
 {
-    const std::string name = in_quotes(item.name);
-    const std::string unless =
-        "; put the " + in_quotes(effect.mark) + " in quotes if it is meant for the item";
-    const std::string refusal = "the shell would refuse the command line of item " + name + ": ";
+    const std::string name = quoted_name(item.name);
+    const std::string text = quoted_name(effect.text);
+    const std::string mark = quoted_name(effect.mark);
+    std::string why;
     switch (effect.kind) {
     case Effect::Kind::command:
         report_command(item, effect, place);
         break;
     case Effect::Kind::expansion:
-        if (std::string why; shell_.ask_to_expand(effect.text, why) == Shell::Answer::refused) {
-            findings_.error(place, refusal + one_line(why) +
-                                       "; put a '\\' before the '$' here if it is "
-                                       "meant for the item");
+        if (shell_.ask_to_expand(effect.text, why) == Shell::Answer::refused) {
+            findings_.error(place,
+                            "the shell would refuse the command line of item {}: {}; put a '\\' "
+                            "before the '$' here if it is meant for the item",
+                            name, one_line(why));
         }
         break;
     case Effect::Kind::substitution:
-        if (std::string why; effect.mark == "`" && is_refused(effect.text, why)) {
-            findings_.error(place, refusal + "between the backticks here, " + one_line(why) +
-                                       "; put a '\\' before them if they are meant for the item");
+        if (effect.mark == "`" && is_refused(effect.text, why)) {
+            findings_.error(
+                place,
+                "the shell would refuse the command line of item {}: between the backticks here, "
+                "{}; put a '\\' before them if they are meant for the item",
+                name, one_line(why));
             break;
         }
-        findings_.warning(place, "the shell would run " + in_quotes(effect.text) +
-                                     " as a command of its own before item " + name +
-                                     ", and put what that prints here; put a '\\' before it if "
-                                     "it is meant for the item");
+        findings_.warning(place,
+                          "the shell would run {} as a command of its own before item {}, and put "
+                          "what that prints here; put a '\\' before it if it is meant for the item",
+                          text, name);
         break;
     case Effect::Kind::redirection:
-        findings_.warning(place, "the shell would redirect item " + name + " by " +
-                                     in_quotes(effect.text) + ", and not hand it that" + unless);
+        findings_.warning(place,
+                          "the shell would redirect item {} by {}, and not hand it that; put the "
+                          "{} in quotes if it is meant for the item",
+                          name, text, mark);
         break;
     case Effect::Kind::comment:
-        findings_.warning(place, "the shell would take " + in_quotes(effect.text) +
-                                     " for a comment, and not hand it to item " + name + unless);
+        findings_.warning(place,
+                          "the shell would take {} for a comment, and not hand it to item {}; put "
+                          "the {} in quotes if it is meant for the item",
+                          text, name, mark);
         break;
     case Effect::Kind::function:
-        findings_.error(place, "the shell would make a function of item " + name +
-                                   " here, and run nothing" + unless);
+        findings_.error(place,
+                        "the shell would make a function of item {} here, and run nothing; put the "
+                        "{} in quotes if it is meant for the item",
+                        name, mark);
         break;
     }
 }
@@ -202,30 +213,38 @@ void ShellChecker::report_effect(const Item &item, const Effect &effect, std::si
 // What ends the item's own command.
 void ShellChecker::report_command(const Item &item, const Effect &effect, std::size_t place)
 {
-    const std::string name = in_quotes(item.name);
-    const std::string unless =
-        "; put the " + in_quotes(effect.mark) + " in quotes if it is meant for the item";
-    const std::string second = "run " + in_quotes(effect.text) + " as a command of its own";
+    const std::string name = quoted_name(item.name);
+    const std::string text = quoted_name(effect.text);
+    const std::string mark = quoted_name(effect.mark);
     if (effect.mark == "\n") {
-        findings_.error(place, "the shell would end the command of item " + name +
-                                   " at the line feed here, and " + second +
-                                   "; write a blank in its place");
+        findings_.error(place,
+                        "the shell would end the command of item {} at the line feed here, and run "
+                        "{} as a command of its own; write a blank in its place",
+                        name, text);
+    } else if ((effect.mark == "&" || effect.mark == "|&") && effect.text.empty()) {
+        findings_.warning(place,
+                          "the shell would run item {} in the background, so that it ends at once "
+                          "for the library; put the {} in quotes if it is meant for the item",
+                          name, mark);
     } else if (effect.mark == "&" || effect.mark == "|&") {
         findings_.warning(place,
-                          "the shell would run item " + name + " in the background" +
-                              (effect.text.empty() ? ", so that it ends at once for the library"
-                                                   : ", and " + second) +
-                              unless);
+                          "the shell would run item {} in the background, and run {} as a command "
+                          "of its own; put the {} in quotes if it is meant for the item",
+                          name, text, mark);
     } else if (effect.text.empty()) {
-        findings_.warning(place, "the shell would end the command of item " + name +
-                                     " here, and not hand it the " + in_quotes(effect.mark) +
-                                     unless);
+        findings_.warning(place,
+                          "the shell would end the command of item {0} here, and not hand it the "
+                          "{1}; put the {1} in quotes if it is meant for the item",
+                          name, mark);
     } else {
-        const std::string when = effect.mark == "&&"   ? " where item " + name + " succeeds"
-                                 : effect.mark == "||" ? " where item " + name + " fails"
-                                 : effect.mark == "|"  ? " on what item " + name + " prints"
-                                                       : ", after item " + name;
-        findings_.warning(place, "the shell would " + second + when + unless);
+        const std::string when = effect.mark == "&&" ? fmt::format(" where item {} succeeds", name)
+                                 : effect.mark == "||" ? fmt::format(" where item {} fails", name)
+                                 : effect.mark == "|" ? fmt::format(" on what item {} prints", name)
+                                                      : fmt::format(", after item {}", name);
+        findings_.warning(place,
+                          "the shell would run {} as a command of its own{}; put the {} in quotes "
+                          "if it is meant for the item",
+                          text, when, mark);
     }
 }
 

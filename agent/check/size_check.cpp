@@ -19,8 +19,9 @@ constexpr std::size_t kNone = std::string::npos;
 class SizeChecker
 {
   public:
-    SizeChecker(const std::string &text, Findings &findings)
-        : stored_(as_stored(text)), command_(text.substr(0, text.find('\0'))), findings_(findings)
+    SizeChecker(const std::string &text, PlanSource use, Findings &findings)
+        : stored_(as_stored(text)), command_(text.substr(0, text.find('\0'))), use_(use),
+          findings_(findings)
     {
         const std::size_t begin = std::min(command_.find_first_not_of(':'), command_.size());
         colon_ = command_.find(':', begin);
@@ -39,18 +40,17 @@ class SizeChecker
         }
         if (zero_ && colon_ == kNone && command_.size() <= kPlanLimit) {
             findings_.error(command_.size(),
-                            "a command takes a plan up to its first zero byte, so " +
-                                plural(stored_.size(), "byte") + " would be stored" + fate("them") +
-                                "; save it as UTF-8");
+                            "a command takes a plan up to its first zero byte, so {} would be "
+                            "stored, and the library would {}; save it as UTF-8",
+                            plural(stored_.size(), "byte"), fate("them"));
         }
     }
 
   private:
-    [[nodiscard]] std::string fate(const std::string &what) const
+    [[nodiscard]] std::string fate(const char *what) const
     {
-        return std::string(", and the library would ") + (Plan::load_as_library(stored_)
-                                                              ? "load " + what + " without the rest"
-                                                              : "not load " + what);
+        return Plan::load_as_library(stored_) ? fmt::format("load {} without the rest", what)
+                                              : fmt::format("not load {}", what);
     }
 
     // Whether a character reference may stand there: not in comments and the like.
@@ -71,34 +71,31 @@ class SizeChecker
         const auto more = std::count(command_.begin() + static_cast<std::ptrdiff_t>(colon_),
                                      command_.end(), ':') -
                           1;
-        std::string text = "a command takes a plan up to its first ':', ";
-        if (colon_ < kPlanLimit) {
-            text += "so " + std::to_string(stored_.size()) + " of " +
-                    plural(command_.size(), "byte") + " would be stored" + fate("them");
-        } else {
-            text +=
-                "which is after the " + std::to_string(kPlanLimit) + " bytes that it takes anyway";
-        }
-        text += takes_references(colon_) ? "; write &#58; in its place" : "; leave it out";
-        if (more > 0) {
-            text += ", and the " + std::to_string(more) + " after it";
-        }
-        findings_.error(colon_, text);
+        const std::string effect =
+            colon_ < kPlanLimit
+                ? fmt::format("so {} of {} would be stored, and the library would {}",
+                              stored_.size(), plural(command_.size(), "byte"), fate("them"))
+                : fmt::format("which is after the {} bytes that it takes anyway", kPlanLimit);
+        findings_.error(colon_, "a command takes a plan up to its first ':', {}; {}{}", effect,
+                        takes_references(colon_) ? "write &#58; in its place" : "leave it out",
+                        more > 0 ? fmt::format(", and the {} after it", more) : "");
     }
 
     void check_length()
     {
-        findings_.error(
-            kPlanLimit,
-            std::to_string(command_.size()) + " bytes are " +
-                std::to_string(command_.size() - kPlanLimit) + " more than the " +
-                std::to_string(kPlanLimit) + " that a command stores: the plan would be cut here" +
-                (colon_ < kPlanLimit ? ", were it not cut at a ':' before" : fate("it")) +
-                "; shorten it, or have fptest run --plan place it as a file");
+        findings_.error(kPlanLimit,
+                        "{} bytes are {} more than the {} that a command stores: the plan would be "
+                        "cut here, {}; shorten it, or {}",
+                        command_.size(), command_.size() - kPlanLimit, kPlanLimit,
+                        colon_ < kPlanLimit ? "were it not cut at a ':' before"
+                                            : "and the library would " + fate("it"),
+                        use_ == PlanSource::as_sent ? "leave --as-sent out"
+                                                    : "have fptest run --plan place it as a file");
     }
 
     std::string stored_;
     std::string command_;
+    PlanSource use_;
     Findings &findings_;
     std::size_t colon_;
     bool zero_;
@@ -106,9 +103,9 @@ class SizeChecker
 
 } // namespace
 
-void check_size(const std::string &text, Findings &findings)
+void check_size(const std::string &text, PlanSource use, Findings &findings)
 {
-    SizeChecker(text, findings).check();
+    SizeChecker(text, use, findings).check();
 }
 
 } // namespace fptest

@@ -8,6 +8,7 @@
 
 #include <algorithm>
 #include <cstddef>
+#include <fmt/core.h>
 #include <string>
 #include <string_view>
 #include <unordered_map>
@@ -70,7 +71,7 @@ class SourceMap
     [[nodiscard]] std::string line_of(std::size_t element) const
     {
         const auto end = std::ranges::lower_bound(line_ends_, of(element));
-        return "line " + std::to_string(end - line_ends_.begin() + 1);
+        return fmt::format("line {}", end - line_ends_.begin() + 1);
     }
 
   private:

@@ -6,9 +6,11 @@
 #include "plan/plan.h"
 #include "util/files.h"
 #include "util/text.h"
+#include "util/write.h"
 
 #include <algorithm>
 #include <cstdio>
+#include <fmt/core.h>
 #include <memory>
 #include <string>
 #include <vector>
@@ -29,16 +31,17 @@ struct CheckOptions {
 // What it holds is known of a plan that loads.
 std::string size_of(const std::string &text, PlanSource use)
 {
-    std::string size = use == PlanSource::stored ? plural(text.size(), "byte")
-                                                 : std::to_string(text.size()) + " of " +
-                                                       std::to_string(kPlanLimit) + " bytes";
+    std::string size = use == PlanSource::stored
+                           ? plural(text.size(), "byte")
+                           : fmt::format("{} of {} bytes", text.size(), kPlanLimit);
     if (const auto plan = Plan::load_as_library(text)) {
         std::size_t items = 0;
         const auto groups = plan->groups();
         for (const Plan::Group &group : groups) {
             items += group.items.size();
         }
-        size = plural(groups.size(), "group") + ", " + plural(items, "item") + ", " + size;
+        size =
+            fmt::format("{}, {}, {}", plural(groups.size(), "group"), plural(items, "item"), size);
     }
     return size;
 }
@@ -52,8 +55,8 @@ bool check_file(const std::string &file, const std::string &text, PlanSource use
     const auto errors = static_cast<std::size_t>(
         std::ranges::count(findings, Finding::Severity::error, &Finding::severity));
     const std::size_t warnings = findings.size() - errors;
-    std::printf("%s: %s, %s (%s)\n", name.c_str(), plural(errors, "error").c_str(),
-                plural(warnings, "warning").c_str(), size_of(text, use).c_str());
+    print_to(stdout, "{}: {}, {} ({})\n", name, plural(errors, "error"),
+             plural(warnings, "warning"), size_of(text, use));
     return errors == 0;
 }
 
@@ -69,7 +72,7 @@ Exit check_files(const CheckOptions &options)
         if (const auto text = read_file(file)) {
             sound = check_file(file, *text, options.use) && sound;
         } else {
-            std::fprintf(stderr, "fptest: %s: %s\n", one_line(file).c_str(), why_unread().c_str());
+            say("{}: {}", one_line(file), why_unread());
             readable = false;
         }
     }

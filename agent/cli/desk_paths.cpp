@@ -5,9 +5,9 @@
 
 #include "util/failure.h"
 #include "util/text.h"
+#include "util/write.h"
 
 #include <cerrno>
-#include <cstdio>
 #include <cstdlib>
 #include <filesystem>
 #include <sys/stat.h>
@@ -58,19 +58,18 @@ void look_after_reports(const std::vector<std::pair<std::string, std::string>> &
         const fs::path directory = parent.empty() ? "." : parent;
         if (access(directory.c_str(), W_OK) != 0 && errno == EROFS) {
             throw Failure(Exit::environment,
-                          name +
-                              ": the host's directories are read-only on the virtual device: "
-                              "device/run --out DIR gives a working directory that can be written");
+                          "{}: the host's directories are read-only on the virtual device: "
+                          "device/run --out DIR gives a working directory that can be written",
+                          name);
         }
         if (goes_with_device(directory, device)) {
             lost.push_back(name);
         }
     }
     if (!lost.empty()) {
-        std::fprintf(stderr,
-                     "fptest: %s %s with the virtual device when it ends; device/run --out DIR "
-                     "gives a working directory that stays\n",
-                     join_and(lost).c_str(), lost.size() == 1 ? "goes" : "go");
+        say("{} {} with the virtual device when it ends; device/run --out DIR gives a working "
+            "directory that stays",
+            join_and(lost), lost.size() == 1 ? "goes" : "go");
     }
 }
 

@@ -6,6 +6,7 @@
 #include "cli/usage.h"
 #include "util/files.h"
 #include "util/text.h"
+#include "util/write.h"
 
 #include <CLI/CLI.hpp>
 
@@ -13,6 +14,7 @@
 #include <csignal>
 #include <cstdio>
 #include <exception>
+#include <fmt/core.h>
 #include <string>
 #include <vector>
 
@@ -87,13 +89,13 @@ class CommandLine
             return;
         }
         if (word.starts_with('-')) {
-            throw fptest::Failure(Exit::usage, fptest::unknown_option(word, app_));
+            throw fptest::Failure(Exit::usage, "{}", fptest::unknown_option(word, app_));
         }
-        const std::string near = fptest::nearest(word, names);
-        throw fptest::Failure(Exit::usage,
-                              "there is no command '" + fptest::one_line(word) + "'" +
-                                  (near.empty() ? "; the" : "; did you mean '" + near + "'? The") +
-                                  " commands are " + fptest::join_and(names));
+        const std::string text = fmt::format("there is no command {}{}", fptest::in_quotes(word),
+                                             fptest::did_you_mean(fptest::nearest(word, names)));
+        throw fptest::Failure(
+            Exit::usage, "{}",
+            fptest::with_advice(text, fmt::format("the commands are {}", fptest::join_and(names))));
     }
 
     CLI::App app_{"Runs test plans of a fingerprint-sensor stack through the Quillmark library.",
@@ -104,7 +106,7 @@ class CommandLine
 Exit complain(Exit status, const std::string &text)
 {
     std::fflush(stdout);
-    std::fprintf(stderr, "fptest: %s\n", text.c_str());
+    fptest::say("{}", text);
     return status;
 }
 

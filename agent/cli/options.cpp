@@ -9,7 +9,7 @@
 
 #include <algorithm>
 #include <charconv>
-#include <sstream>
+#include <fmt/core.h>
 #include <utility>
 
 namespace fptest
@@ -20,7 +20,7 @@ namespace
 // What is wrong with a value, which a shell's variable may have left empty.
 std::string refused(const std::string &value, const std::string &why)
 {
-    return value.empty() ? "its value is empty" : "'" + one_line(value) + "' " + why;
+    return value.empty() ? "its value is empty" : fmt::format("{} {}", in_quotes(value), why);
 }
 
 template <typename Number> CLI::Validator number_in(Number least, Number most)
@@ -34,10 +34,7 @@ template <typename Number> CLI::Validator number_in(Number least, Number most)
                 if (is_number && number >= least && number <= most) {
                     return std::string();
                 }
-                std::ostringstream complaint;
-                complaint.precision(10);
-                complaint << "is no number from " << least << " to " << most;
-                return refused(text, complaint.str());
+                return refused(text, fmt::format("is no number from {} to {}", least, most));
             },
             ""};
 }
@@ -95,10 +92,7 @@ CLI::Validator time_span()
                 if (!(seconds >= 0.001)) {
                     return refused(text, "is no time as 90, 90s, 10m, 2h or 1d");
                 }
-                std::ostringstream put_down;
-                put_down.precision(17);
-                put_down << seconds;
-                text = put_down.str();
+                text = fmt::format("{}", seconds);
                 return std::string();
             },
             ""};

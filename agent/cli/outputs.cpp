@@ -82,9 +82,9 @@ void require_different(const std::vector<NamedFile> &files)
             if (!file.empty() && !other_file.empty() && file != "-" && other_file != "-" &&
                 are_same_file(file, other_file) &&
                 !(option == "--plan" && other_option == "the library")) {
-                throw Failure(Exit::usage, option + " and " + other_option +
-                                               " both want the file " + one_line(file) +
-                                               ": give them files of their own");
+                throw Failure(Exit::usage,
+                              "{} and {} both want the file {}: give them files of their own",
+                              option, other_option, one_line(file));
             }
         }
     }
@@ -101,8 +101,8 @@ void settle_outputs(RunOptions &options)
                        librarys_file()});
     const auto reports = reports_on_standard_output(options);
     if (reports.size() > 1) {
-        throw Failure(Exit::usage,
-                      join_and(reports) + " each want standard output: give all but one a file");
+        throw Failure(Exit::usage, "{} each want standard output: give all but one a file",
+                      join_and(reports));
     }
     if (!reports.empty()) {
         require_standard_output(reports.front());
@@ -121,7 +121,7 @@ void require_writable_reports(const RunOptions &options)
          {options.json.empty() ? "" : json_obstacle(options.json),
           options.junit.empty() ? "" : junit_obstacle(options.junit)}) {
         if (!obstacle.empty()) {
-            throw Failure(Exit::environment, obstacle + "; nothing was run");
+            throw Failure(Exit::environment, "{}; nothing was run", obstacle);
         }
     }
 }
@@ -136,8 +136,10 @@ void require_log_of_its_own(const std::string &log, Beside beside)
     const bool is_apart = beside == Beside::nothing ||
                           (!is_regular && (beside == Beside::view || isatty(STDOUT_FILENO) != 0));
     if (file.second == "-" || (!is_apart && is_standard_output(file.second))) {
-        throw Failure(Exit::usage, label(file) + " is standard output, which is not for the "
-                                                 "library's log: name a file for that");
+        throw Failure(
+            Exit::usage,
+            "{} is standard output, which is not for the library's log: name a file for that",
+            label(file));
     }
 }
 

@@ -9,11 +9,12 @@
 #include "quillmark.h"
 #include "util/files.h"
 #include "util/text.h"
+#include "util/write.h"
 
 #include <algorithm>
 #include <cerrno>
 #include <csignal>
-#include <cstdio>
+#include <fmt/core.h>
 #include <memory>
 #include <string>
 
@@ -49,8 +50,8 @@ Plan load_stored(const std::string &text)
     std::string why;
     auto plan = Plan::load_as_library(text, &why);
     if (!plan) {
-        throw Failure(Exit::environment, std::string(kStoredPlan) + " does not load (" +
-                                             one_line(why) + "): store the plan again");
+        throw Failure(Exit::environment, "{} does not load ({}): store the plan again", kStoredPlan,
+                      one_line(why));
     }
     return std::move(*plan);
 }
@@ -58,15 +59,11 @@ Plan load_stored(const std::string &text)
 [[noreturn]] void unknown(const std::string &where, const std::string &what,
                           const std::string &name, const std::vector<std::string> &names)
 {
-    const std::string near = nearest(name, names);
-    std::vector<std::string> shown;
-    for (const std::string &one : names) {
-        shown.push_back(one_line(one));
-    }
-    throw Failure(Exit::usage,
-                  where + " has no " + what + " '" + one_line(name) + "'" +
-                      (near.empty() ? "; it" : "; did you mean '" + one_line(near) + "'? It") +
-                      (shown.empty() ? " has none at all" : " has " + join_and(shown)));
+    const std::string known =
+        names.empty() ? "it has none at all" : fmt::format("it has {}", one_line(join_and(names)));
+    const std::string text = fmt::format("{} has no {} {}{}", where, what, in_quotes(name),
+                                         did_you_mean(nearest(name, names)));
+    throw Failure(Exit::usage, "{}", with_advice(text, known));
 }
 
 // The item's number in the plan. Only its own group is looked at: the library
@@ -89,8 +86,8 @@ std::size_t find_item(const Plan &plan, const ReportOptions &options)
         }
         names.push_back(item.name.value_or(""));
     }
-    unknown("group '" + one_line(options.group) + "' of the stored plan", "item", options.item,
-            names);
+    unknown(fmt::format("group {} of the stored plan", in_quotes(options.group)), "item",
+            options.item, names);
 }
 
 Exit report(const ReportOptions &options)
@@ -106,7 +103,7 @@ Exit report(const ReportOptions &options)
     // Mini-XML would not load such a plan again
     const std::string description = sanitize_utf8(options.description);
     if (description != options.description) {
-        std::fputs("fptest: bytes of the description that no plan can hold are replaced\n", stderr);
+        say("bytes of the description that no plan can hold are replaced");
     }
     require_room(text.size() + kAttributes + kLongestEntity * description.size());
     // a stop that came into the middle of it would cut the plan
@@ -127,9 +124,10 @@ Exit report(const ReportOptions &options)
     wanted.result = std::to_string(options.result);
     wanted.description = as_loaded(description);
     if (!written || !(written->report(number) == wanted)) {
-        throw Failure(Exit::environment, std::string("the report is not in ") + kStoredPlan +
-                                             ": is it writable? --log FILE tells what the library "
-                                             "met");
+        throw Failure(
+            Exit::environment,
+            "the report is not in {}: is it writable? --log FILE tells what the library met",
+            kStoredPlan);
     }
     return Exit::success;
 }

@@ -15,6 +15,7 @@
 #include "run/runner.h"
 #include "util/files.h"
 #include "util/text.h"
+#include "util/write.h"
 
 #include <algorithm>
 #include <cerrno>
@@ -56,26 +57,18 @@ std::string read_plan(const std::string &file)
     if (auto text = read_file(file)) {
         return *text;
     }
-    throw Failure(Exit::usage, one_line(file) + ": " + why_unread());
+    throw Failure(Exit::usage, "{}: {}", one_line(file), why_unread());
 }
 
 // A plan that a command cannot hold is put into its place as a file.
 PlanSource use_of(const RunOptions &options, const std::string &text)
 {
-    const bool is_sent = !options.plan.empty() && (options.as_sent || text.size() <= kPlanLimit);
-    return is_sent ? PlanSource::to_send : PlanSource::stored;
-}
-
-// --as-sent is what keeps a long plan from being placed.
-void advise_to_place(std::vector<Finding> &findings)
-{
-    constexpr std::string_view kOther = "have fptest run --plan place it as a file";
-    for (Finding &finding : findings) {
-        if (finding.text.ends_with(kOther)) {
-            finding.text.replace(finding.text.size() - kOther.size(), kOther.size(),
-                                 "leave --as-sent out");
-        }
+    if (options.plan.empty()) {
+        return PlanSource::stored;
     }
+    return options.as_sent             ? PlanSource::as_sent
+           : text.size() <= kPlanLimit ? PlanSource::to_send
+                                       : PlanSource::stored;
 }
 
 Source open_plan(const RunOptions &options)
@@ -85,25 +78,21 @@ Source open_plan(const RunOptions &options)
                                                    : options.plan;
     const std::string text = read_plan(options.plan);
     const PlanSource use = use_of(options, text);
-    auto findings = check(text, use);
-    if (options.as_sent) {
-        advise_to_place(findings);
-    }
+    const auto findings = check(text, use);
     if (has_errors(findings) && !options.force) {
         print(stderr, name, text, findings);
         throw Failure(Exit::usage, "nothing was run, because the plan has errors; fix them, or "
                                    "run it as it is with --force");
     }
     if (!findings.empty() && !options.quiet) {
-        std::fprintf(stderr, "fptest: the plan has %s: see fptest check %s%s\n",
-                     has_errors(findings) ? "errors" : "warnings",
-                     use == PlanSource::stored ? "--for file " : "", one_line(name).c_str());
+        say("the plan has {}: see fptest check {}{}", has_errors(findings) ? "errors" : "warnings",
+            use == PlanSource::stored ? "--for file " : "", one_line(name));
     }
     std::string why;
-    auto plan = Plan::load_as_library(use == PlanSource::to_send ? as_stored(text) : text, &why);
+    auto plan = Plan::load_as_library(use == PlanSource::stored ? text : as_stored(text), &why);
     if (!plan) {
-        throw Failure(Exit::usage,
-                      one_line(name) + ": the library cannot load this plan: " + one_line(why));
+        throw Failure(Exit::usage, "{}: the library cannot load this plan: {}", one_line(name),
+                      one_line(why));
     }
     return {name, text, std::move(*plan), use};
 }
@@ -131,10 +120,10 @@ void require_programs(const Work &work, int vendor, bool force)
         }
     }
     if (!missing.empty() && !force) {
-        throw Failure(Exit::environment, "no program " + join_and(missing) +
-                                             " on this device: install what is missing "
-                                             "(device/run --bin DIR adds programs), or run the "
-                                             "rest with --force");
+        throw Failure(Exit::environment,
+                      "no program {} on this device: install what is missing (device/run --bin DIR "
+                      "adds programs), or run the rest with --force",
+                      join_and(missing));
     }
     require_no_leftovers(programs);
     if (gatherer) {
@@ -157,10 +146,9 @@ void place(const Source &source, bool quiet)
     const Descriptor lock = lock_stored_plan();
     replace_stored_plan(source.text);
     if (!quiet) {
-        std::fprintf(stderr,
-                     "fptest: %s: its %zu bytes are more than the %zu that a command stores, so "
-                     "it was placed as the file %s\n",
-                     one_line(source.name).c_str(), source.text.size(), kPlanLimit, kStoredPlan);
+        say("{}: its {} bytes are more than the {} that a command stores, so it was placed as the "
+            "file {}",
+            one_line(source.name), source.text.size(), kPlanLimit, kStoredPlan);
     }
 }
 
@@ -171,8 +159,8 @@ void require_nothing_to_report_of_a_list(const RunOptions &options)
                                : !options.junit.empty() ? "--junit"
                                                         : "";
     if (options.list && !report.empty()) {
-        throw Failure(Exit::usage, "--list runs nothing that " + report +
-                                       " could tell of: leave one of them out");
+        throw Failure(Exit::usage,
+                      "--list runs nothing that {} could tell of: leave one of them out", report);
     }
 }
 
@@ -214,9 +202,9 @@ Exit run(RunOptions options)
         paths.push_back(parse_path(text, source.plan, source.name, options.force));
     }
     if (paths.empty() && !options.list) {
-        throw Failure(Exit::usage, "no PATH given: say what to run, as root/group or "
-                                   "root/group/item" +
-                                       known_groups(source.plan));
+        throw Failure(Exit::usage,
+                      "no PATH given: say what to run, as root/group or root/group/item{}",
+                      known_groups(source.plan));
     }
     require_writable_reports(options);
     choose_log(options.log);
@@ -231,7 +219,7 @@ Exit run(RunOptions options)
 
     const Work work = work_of(paths, source.plan, options.as_group);
     require_programs(work, vendor, options.force);
-    if (source.use == PlanSource::to_send) {
+    if (source.use != PlanSource::stored) {
         store(*host, source.text);
     } else if (!options.plan.empty()) {
         place(source, options.quiet);

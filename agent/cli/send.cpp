@@ -9,6 +9,7 @@
 #include "plan/plan.h"
 #include "run/signals.h"
 #include "util/files.h"
+#include "util/write.h"
 
 #include <algorithm>
 #include <cerrno>
@@ -48,8 +49,8 @@ std::vector<std::string> read_commands()
     std::vector<std::string> commands;
     const auto input = read_file("-");
     if (!input || input->empty()) {
-        throw Failure(Exit::usage, "no command can be read from standard input" +
-                                       (input ? std::string() : ": " + why_unread()));
+        throw Failure(Exit::usage, "no command can be read from standard input{}",
+                      input ? "" : ": " + why_unread());
     }
     const std::string &text = *input;
     for (std::size_t at = 0; at < text.size();) {
@@ -114,11 +115,11 @@ class Sender
                 host_.pass_output(stderr, event->output);
             }
             if (event && event->kind == LibraryProcess::Event::Kind::item) {
-                std::fprintf(stderr, "vendor = %d\n", event->value);
+                print_to(stderr, "vendor = {}\n", event->value);
             }
             host_.pass_output(stderr);
             if (event && event->kind == LibraryProcess::Event::Kind::gone) {
-                throw Failure(Exit::environment, gone_text(*event));
+                throw Failure(Exit::environment, "{}", gone_text(*event));
             }
             if (event && event->kind == LibraryProcess::Event::Kind::returned) {
                 return interrupted_ ? std::nullopt : std::optional(event->text);

@@ -7,6 +7,7 @@
 #include "util/files.h"
 #include "util/terminal.h"
 #include "util/text.h"
+#include "util/write.h"
 
 #include <cerrno>
 #include <cstdio>
@@ -52,8 +53,7 @@ void print(const std::vector<Row> &rows)
 {
     for (const std::string &line : aligned(rows, {false, false, true, true, false})) {
         const bool is_cut = isatty(STDOUT_FILENO) != 0;
-        std::printf("%s\n",
-                    is_cut ? ellipsize(line, terminal_width(stdout)).c_str() : line.c_str());
+        print_to(stdout, "{}\n", is_cut ? ellipsize(line, terminal_width(stdout)) : line);
     }
 }
 
@@ -65,7 +65,7 @@ std::string read_shown(const std::string &file)
     if (auto text = read_file(file)) {
         return *text;
     }
-    throw Failure(Exit::usage, one_line(file) + ": " + why_unread());
+    throw Failure(Exit::usage, "{}: {}", one_line(file), why_unread());
 }
 
 Exit show(const std::string &file)
@@ -74,12 +74,12 @@ Exit show(const std::string &file)
     const std::string name = file.empty() ? kStoredPlan : file == "-" ? "<stdin>" : one_line(file);
     const auto plan = Plan::parse_annotated(read_shown(file));
     if (!plan) {
-        throw Failure(Exit::usage,
-                      name + " is no whole test plan: fptest check says what is wrong");
+        throw Failure(Exit::usage, "{} is no whole test plan: fptest check says what is wrong",
+                      name);
     }
     const auto rows = table(*plan);
     if (rows.size() == 1) {
-        throw Failure(Exit::usage, name + " has no items: fptest check says more");
+        throw Failure(Exit::usage, "{} has no items: fptest check says more", name);
     }
     print(rows);
     return Exit::success;

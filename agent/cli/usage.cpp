@@ -7,6 +7,7 @@
 #include "util/text.h"
 
 #include <algorithm>
+#include <fmt/core.h>
 #include <vector>
 
 namespace fptest
@@ -37,11 +38,12 @@ std::string mismatch(const CLI::App &command, const std::string &text)
     }
     const std::string name = option->get_name();
     if (option->get_expected_max() == 0) {
-        return name + " takes no value";
+        return fmt::format("{} takes no value", name);
     }
     return option->count() > 1
-               ? name + " is given " + std::to_string(option->count()) + " times: give it once"
-               : name + " lacks its value: give it as " + name + " " + option->get_type_name();
+               ? fmt::format("{} is given {} times: give it once", name, option->count())
+               : fmt::format("{0} lacks its value: give it as {0} {1}", name,
+                             option->get_type_name());
 }
 
 std::string without_option(const CLI::App &command, const std::string &word)
@@ -58,8 +60,7 @@ std::string without_option(const CLI::App &command, const std::string &word)
         }
     }
     const std::string near = longer.size() == 1 ? longer.front() : nearest(word, names);
-    return "there is no option '" + one_line(word) + "'" +
-           (near.empty() ? "" : "; did you mean '" + near + "'?");
+    return fmt::format("there is no option {}{}", in_quotes(word), did_you_mean(near));
 }
 
 std::string surplus(const CLI::App &app, const CLI::App &command, const std::string &text)
@@ -70,17 +71,17 @@ std::string surplus(const CLI::App &app, const CLI::App &command, const std::str
     }
     const std::string &word = words.front();
     if (!word.starts_with('-') || word == "-") {
-        return "'" + one_line(word) + "' is one argument too many";
+        return fmt::format("{} is one argument too many", in_quotes(word));
     }
     return command.get_option_no_throw(word) != nullptr
-               ? word + " is no option where it comes after --: put it before that"
+               ? fmt::format("{} is no option where it comes after --: put it before that", word)
                : without_option(command, word);
 }
 
 std::string with_help(const std::string &text, const std::string &command)
 {
-    return text + (text.ends_with('?') ? " See" : "; see") + " fptest" +
-           (command.empty() ? "" : " " + command) + " --help";
+    return with_advice(text,
+                       fmt::format("see fptest {}--help", command.empty() ? "" : command + " "));
 }
 
 } // namespace
@@ -97,8 +98,9 @@ std::vector<std::string> readable(const CLI::App &command, std::vector<std::stri
             continue;
         }
         if (option->get_expected_max() == 0) {
-            throw Failure(Exit::usage,
-                          with_help(option->get_name() + " takes no value", command.get_name()));
+            throw Failure(Exit::usage, "{}",
+                          with_help(fmt::format("{} takes no value", option->get_name()),
+                                    command.get_name()));
         }
         words[at].pop_back();
         words.insert(words.begin() + static_cast<std::ptrdiff_t>(++at), "");
@@ -130,7 +132,7 @@ std::string usage_line(const CLI::App *app, const CLI::Error &error)
     default:
         break;
     }
-    return "fptest: " + with_help(text, commands.empty() ? "" : command.get_name()) + "\n";
+    return fmt::format("fptest: {}\n", with_help(text, commands.empty() ? "" : command.get_name()));
 }
 
 } // namespace fptest

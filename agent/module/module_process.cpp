@@ -14,6 +14,7 @@
 #include <cstdio>
 #include <cstdlib>
 #include <fcntl.h>
+#include <fmt/core.h>
 #include <poll.h>
 #include <sys/mman.h>
 #include <sys/prctl.h>
@@ -238,12 +239,10 @@ void LibraryProcess::lose()
     while (waitpid(pid_, &status, 0) < 0 && errno == EINTR) {
     }
     pid_ = -1;
-    const std::string how = WIFSIGNALED(status)
-                                ? "by signal " + std::to_string(WTERMSIG(status))
-                                : "with status " + std::to_string(WEXITSTATUS(status));
     Event event{};
     event.kind = Event::Kind::gone;
-    event.text = how;
+    event.text = WIFSIGNALED(status) ? fmt::format("by signal {}", WTERMSIG(status))
+                                     : fmt::format("with status {}", WEXITSTATUS(status));
     event.time = std::chrono::steady_clock::now();
     event.output = output_size();
     events_.push_back(std::move(event));

@@ -13,6 +13,7 @@
 #include <cstdlib>
 #include <cstring>
 #include <fcntl.h>
+#include <fmt/core.h>
 #include <netinet/in.h>
 #include <string_view>
 #include <sys/file.h>
@@ -35,8 +36,7 @@ std::string for_all_processes(const std::string &file)
         {"/dev/stdout", "1"}, {"/dev/stderr", "2"}, {"/dev/fd/", ""}, {"/proc/self/fd/", ""}};
     for (const auto &[name, number] : kOwn) {
         if (number.empty() ? file.starts_with(name) : file == name) {
-            return "/proc/" + std::to_string(getpid()) + "/fd/" + std::string(number) +
-                   file.substr(name.size());
+            return fmt::format("/proc/{}/fd/{}{}", getpid(), number, file.substr(name.size()));
         }
     }
     return file;
@@ -70,8 +70,8 @@ void choose_log(const std::string &option)
         open(path.c_str(), O_WRONLY | O_CREAT | O_APPEND | O_NONBLOCK | O_CLOEXEC, 0644));
     // the library says nothing of what it cannot write
     if (!log.is_open() || write(log.get(), "", 0) < 0) {
-        throw Failure(Exit::environment, label(file) + " cannot be written: " +
-                                             std::strerror(errno) + "; name another file");
+        throw Failure(Exit::environment, "{} cannot be written: {}; name another file", label(file),
+                      std::strerror(errno));
     }
     setenv(kLogVariable, path.c_str(), 1);
 }
@@ -83,9 +83,9 @@ void require_device()
                                          "on a desk, run it as: device/run -- fptest ...");
     }
     if (access(kDataDirectory, W_OK | X_OK) != 0) {
-        throw Failure(Exit::environment, std::string(kDataDirectory) +
-                                             " is not writable: " + std::strerror(errno) +
-                                             "; make it, or run this as another user");
+        throw Failure(Exit::environment,
+                      "{} is not writable: {}; make it, or run this as another user",
+                      kDataDirectory, std::strerror(errno));
     }
     require_regular_plan();
 }
@@ -103,9 +103,10 @@ void require_room(std::size_t bytes)
     const std::size_t freed =
         stat(kStoredPlan, &old) == 0 ? static_cast<std::size_t>(old.st_blocks) * 512 : 0;
     if (static_cast<std::size_t>(disk.f_bavail) * disk.f_frsize + freed < bytes) {
-        throw Failure(Exit::environment, std::string("the disk of ") + kDataDirectory +
-                                             " is full: make room for " + std::to_string(bytes) +
-                                             " bytes; the stored plan is as it was");
+        throw Failure(
+            Exit::environment,
+            "the disk of {} is full: make room for {} bytes; the stored plan is as it was",
+            kDataDirectory, bytes);
     }
 }
 
@@ -113,9 +114,9 @@ void require_stored(const std::string &found, const std::string &wanted)
 {
     if (found != wanted) {
         throw Failure(Exit::environment,
-                      "the plan was not stored: " + std::to_string(found.size()) + " of " +
-                          std::to_string(wanted.size()) + " bytes are in " + kStoredPlan +
-                          "; make room and store it again, or see why with --log FILE");
+                      "the plan was not stored: {} of {} bytes are in {}; make room and store it "
+                      "again, or see why with --log FILE",
+                      found.size(), wanted.size(), kStoredPlan);
     }
 }
 
@@ -141,16 +142,15 @@ void require_trigger_port()
     if (probe.is_open() &&
         bind(probe.get(), reinterpret_cast<const sockaddr *>(&address), sizeof address) != 0) {
         throw Failure(Exit::environment,
-                      "port " + std::to_string(kTriggerPort) +
-                          " is not available: " + std::strerror(errno) +
-                          "; the gatherer's run would never end: stop what listens there "
-                          "(netstat -ltnp names it)");
+                      "port {} is not available: {}; the gatherer's run would never end: stop what "
+                      "listens there (netstat -ltnp names it)",
+                      kTriggerPort, std::strerror(errno));
     }
 }
 
 std::string gone_text(const LibraryProcess::Event &event)
 {
-    return "the library's process ended " + event.text + "; --log FILE keeps what it says";
+    return fmt::format("the library's process ended {}; --log FILE keeps what it says", event.text);
 }
 
 int send_and_wait(LibraryProcess &host, const std::string &command)
@@ -166,7 +166,7 @@ int send_and_wait(LibraryProcess &host, const std::string &command)
             return vendor;
         }
         if (event && event->kind == LibraryProcess::Event::Kind::gone) {
-            throw Failure(Exit::environment, gone_text(*event));
+            throw Failure(Exit::environment, "{}", gone_text(*event));
         }
     }
 }
@@ -174,10 +174,10 @@ int send_and_wait(LibraryProcess &host, const std::string &command)
 void require_no_leftovers(const std::vector<std::string> &programs)
 {
     if (const auto found = process_of_any(programs)) {
-        throw Failure(Exit::environment, one_line(found->first) +
-                                             " of an earlier run is still running, as process " +
-                                             std::to_string(found->second) +
-                                             ", and would report into this one: end it first");
+        throw Failure(Exit::environment,
+                      "{} of an earlier run is still running, as process {}, and would report into "
+                      "this one: end it first",
+                      one_line(found->first), found->second);
     }
 }
 
@@ -186,11 +186,11 @@ int ask_vendor(LibraryProcess &host)
     // a path that leads nowhere: the selector is read and told before that shows
     const int vendor = send_and_wait(host, "XMLNodePath::-/fptest asks for the vendor/-");
     if (!vendor_suffix(vendor)) {
-        throw Failure(
-            Exit::environment,
-            "the vendor selector is " + std::to_string(vendor) +
-                ", and the library runs nothing then: set device/SysParam/Quillmark/vendor "
-                "to 0, 1 or 2 in /etc/vorlane/sysparms/vr_common_cfg.xml");
+        throw Failure(Exit::environment,
+                      "the vendor selector is {}, and the library runs nothing then: set "
+                      "device/SysParam/Quillmark/vendor to 0, 1 or 2 in "
+                      "/etc/vorlane/sysparms/vr_common_cfg.xml",
+                      vendor);
     }
     return vendor;
 }

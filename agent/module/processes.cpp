@@ -4,16 +4,16 @@
 #include "module/processes.h"
 
 #include "plan/plan.h"
+#include "util/files.h"
 
 #include <algorithm>
 #include <charconv>
 #include <csignal>
 #include <cstdlib>
 #include <filesystem>
-#include <fstream>
+#include <fmt/core.h>
 #include <map>
 #include <optional>
-#include <sstream>
 #include <system_error>
 
 namespace fptest
@@ -37,17 +37,9 @@ std::string last_part(const std::string &path)
     return path.substr(path.rfind('/') + 1);
 }
 
-std::string file_text(const std::filesystem::path &path)
-{
-    const std::ifstream file(path, std::ios::binary);
-    std::ostringstream text; // makes nothing of a process that has ended
-    text << file.rdbuf();
-    return text.str();
-}
-
 std::optional<Process> read_process(const std::filesystem::path &directory)
 {
-    const std::string stat = file_text(directory / "stat");
+    const std::string stat = read_file(directory / "stat").value_or("");
     const auto open = stat.find('(');
     const auto close = stat.rfind(')');
     if (open == std::string::npos || close == std::string::npos || close + 4 > stat.size()) {
@@ -58,7 +50,7 @@ std::optional<Process> read_process(const std::filesystem::path &directory)
     char *end = nullptr;
     process.parent = static_cast<pid_t>(std::strtol(stat.c_str() + close + 3, &end, 10));
     process.group = static_cast<pid_t>(std::strtol(end, nullptr, 10));
-    const std::string arguments = file_text(directory / "cmdline");
+    const std::string arguments = read_file(directory / "cmdline").value_or("");
     const std::string command = arguments.c_str();
     process.program = command.empty() ? stat.substr(open + 1, close - open - 1) : command;
     process.name = last_part(process.program);
@@ -232,7 +224,7 @@ std::vector<Leftover> ChildProcesses::of_gatherer() const
 
 char state_of(pid_t process)
 {
-    const auto found = read_process("/proc/" + std::to_string(process));
+    const auto found = read_process(fmt::format("/proc/{}", process));
     return found ? found->state : '?';
 }
 

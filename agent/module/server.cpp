@@ -19,6 +19,7 @@
 #include <cstdio>
 #include <cstdlib>
 #include <fcntl.h>
+#include <fmt/core.h>
 #include <mutex>
 #include <sstream>
 #include <string>
@@ -170,8 +171,7 @@ class Server
         };
         fstat(STDOUT_FILENO, &output); // the other one is elsewhere during a stop
         const auto now = steady_clock::now().time_since_epoch();
-        return std::to_string(duration_cast<nanoseconds>(now).count()) + " " +
-               std::to_string(output.st_size) + " ";
+        return fmt::format("{} {} ", duration_cast<nanoseconds>(now).count(), output.st_size);
     }
 
     // The stop's shell complains that there is no process 9: that is kept out of the

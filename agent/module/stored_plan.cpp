@@ -33,10 +33,10 @@ std::string require_stored_plan(const std::string &what_to_do)
     if (auto text = read_stored_plan()) {
         return *text;
     }
-    const std::string plan = kStoredPlan;
-    throw Failure(Exit::environment, errno == ENOENT
-                                         ? "no plan is stored in " + plan + what_to_do
-                                         : plan + " cannot be read: " + why_unread());
+    if (errno == ENOENT) {
+        throw Failure(Exit::environment, "no plan is stored in {}{}", kStoredPlan, what_to_do);
+    }
+    throw Failure(Exit::environment, "{} cannot be read: {}", kStoredPlan, why_unread());
 }
 
 void require_regular_plan()
@@ -44,8 +44,7 @@ void require_regular_plan()
     struct stat plan {
     };
     if (stat(kStoredPlan, &plan) == 0 && !S_ISREG(plan.st_mode)) {
-        throw Failure(Exit::environment,
-                      std::string(kStoredPlan) + " is no regular file: remove it");
+        throw Failure(Exit::environment, "{} is no regular file: remove it", kStoredPlan);
     }
 }
 
@@ -100,9 +99,8 @@ void replace_stored_plan(const std::string &text)
         std::rename(aside.c_str(), kStoredPlan) != 0) {
         const int error = errno;
         unlink(aside.c_str());
-        throw Failure(Exit::environment, std::string(kStoredPlan) +
-                                             " cannot be written: " + std::strerror(error) +
-                                             "; the old plan is still there");
+        throw Failure(Exit::environment, "{} cannot be written: {}; the old plan is still there",
+                      kStoredPlan, std::strerror(error));
     }
 }
 

@@ -16,6 +16,7 @@
 #include <cstdio>
 #include <cstdlib>
 #include <fcntl.h>
+#include <fmt/core.h>
 #include <functional>
 #include <optional>
 #include <string_view>
@@ -46,7 +47,7 @@ bool is_replaceable(const std::string &path)
 // What is written before it takes the place of the target.
 std::string aside_of(const std::string &target)
 {
-    return target + "." + std::to_string(getpid()) + ".tmp";
+    return fmt::format("{}.{}.tmp", target, getpid());
 }
 
 // A file without a name, gone with this process.

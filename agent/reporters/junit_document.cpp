@@ -6,10 +6,9 @@
 #include "reporters/wording.h"
 #include "util/text.h"
 
-#include <array>
 #include <chrono>
 #include <cmath>
-#include <cstdio>
+#include <fmt/core.h>
 #include <optional>
 #include <string_view>
 
@@ -40,21 +39,18 @@ std::string escaped(std::string_view text)
 std::string attribute(const char *name, std::string_view value)
 {
     static constexpr Replacement kEscapes[] = {{"\t", "&#9;"}, {"\n", "&#10;"}};
-    return std::string(" ") + name + "=\"" + replaced(escaped(value), kEscapes) + "\"";
+    return fmt::format(" {}=\"{}\"", name, replaced(escaped(value), kEscapes));
 }
 
 std::string attribute(const char *name, std::size_t value)
 {
-    return attribute(name, std::to_string(value));
+    return fmt::format(" {}=\"{}\"", name, value);
 }
 
 std::string time_attribute(double seconds)
 {
     const long long milliseconds = std::llround(seconds * 1000);
-    std::array<char, 40> text{};
-    std::snprintf(text.data(), text.size(), "%lld.%03lld", milliseconds / 1000,
-                  milliseconds % 1000);
-    return attribute("time", text.data());
+    return fmt::format(" time=\"{}.{:03}\"", milliseconds / 1000, milliseconds % 1000);
 }
 
 // In whole seconds and without a zone, as the format has it.
@@ -66,14 +62,15 @@ std::string timestamp_attribute(std::chrono::system_clock::time_point time)
 std::string property(const std::string &indent, const char *name,
                      const std::optional<std::string> &value)
 {
-    return value ? indent + "<property" + attribute("name", name) + attribute("value", *value) +
-                       "/>\n"
+    return value ? fmt::format("{}<property{}{}/>\n", indent, attribute("name", name),
+                               attribute("value", *value))
                  : "";
 }
 
 std::string properties(const std::string &indent, const std::string &inside)
 {
-    return inside.empty() ? "" : indent + "<properties>\n" + inside + indent + "</properties>\n";
+    return inside.empty() ? ""
+                          : fmt::format("{0}<properties>\n{1}{0}</properties>\n", indent, inside);
 }
 
 // --- its pieces --------------------------------------------------------------
@@ -125,22 +122,22 @@ std::string details(const ItemRun &item)
     const ItemReport &report = item.report;
     std::string text;
     if (report.result) {
-        text += "result: " + *report.result + "\n";
+        text += fmt::format("result: {}\n", *report.result);
     }
     if (report.progress) {
-        text += "progress: " + *report.progress + "\n";
+        text += fmt::format("progress: {}\n", *report.progress);
     }
     if (report.description) {
-        text += "description: " + *report.description + "\n";
+        text += fmt::format("description: {}\n", *report.description);
     }
     if (item.exit_status) {
-        text += "exit status: " + std::to_string(*item.exit_status) + "\n";
+        text += fmt::format("exit status: {}\n", *item.exit_status);
     }
     if (item.signal != 0) {
-        text += "signal: " + name_of_signal(item.signal) + "\n";
+        text += fmt::format("signal: {}\n", name_of_signal(item.signal));
     }
     if (!item.left_running.empty()) {
-        text += "left running: " + left_running(item) + "\n";
+        text += fmt::format("left running: {}\n", left_running(item));
     }
     return text;
 }
@@ -149,9 +146,10 @@ std::string not_run(const Run &run, const std::string &reason, bool was_running)
 {
     const std::string message =
         attribute("message", reason.empty() ? why_not_run(run, was_running) : reason);
-    return run.finished ? "      <skipped" + message + "/>\n"
-                        : "      <error" + attribute("type", was_running ? "running" : "not run") +
-                              message + "/>\n";
+    return run.finished
+               ? fmt::format("      <skipped{}/>\n", message)
+               : fmt::format("      <error{}{}/>\n",
+                             attribute("type", was_running ? "running" : "not run"), message);
 }
 
 std::string verdict(const Run &run, const ItemRun &item)
@@ -162,11 +160,11 @@ std::string verdict(const Run &run, const ItemRun &item)
     if (item.outcome == Outcome::not_run) {
         return not_run(run, item.reason, item.start.has_value());
     }
-    const std::string element = item.outcome == Outcome::failed ? "failure" : "error";
-    const char *const type = item.outcome == Outcome::failed ? "result" : word(item.outcome);
-    return "      <" + element + attribute("type", type) +
-           attribute("message", item.reason.empty() ? word(item.outcome) : item.reason) + ">" +
-           escaped(details(item)) + "</" + element + ">\n";
+    const bool has_failed = item.outcome == Outcome::failed;
+    return fmt::format("      <{0}{1}{2}>{3}</{0}>\n", has_failed ? "failure" : "error",
+                       attribute("type", has_failed ? "result" : word(item.outcome)),
+                       attribute("message", item.reason.empty() ? word(item.outcome) : item.reason),
+                       escaped(details(item)));
 }
 
 std::string test_case(const Run &run, const ItemRun &item)
@@ -178,20 +176,19 @@ std::string test_case(const Run &run, const ItemRun &item)
     const Value status = item.exit_status ? Value(std::to_string(*item.exit_status)) : Value();
     const Value signal = item.signal != 0 ? Value(name_of_signal(item.signal)) : Value();
     const Value left = item.left_running.empty() ? Value() : Value(left_running(item));
-    std::string text = "    <testcase" + attribute("classname", item.group) +
-                       attribute("name", item.name + of_round(run)) +
-                       time_attribute(item.seconds.value_or(0)) + ">\n";
-    text += properties("      ", property(indent, "progress", report.progress) +
-                                     property(indent, "result", result) +
-                                     property(indent, "description", report.description) +
-                                     property(indent, "exit_status", status) +
-                                     property(indent, "signal", signal) +
-                                     property(indent, "left_running", left));
-    text += verdict(run, item);
-    if (!item.output.empty()) {
-        text += "      <system-out>" + escaped(item.output) + "</system-out>\n";
-    }
-    return text + "    </testcase>\n";
+    const std::string inside =
+        property(indent, "progress", report.progress) + property(indent, "result", result) +
+        property(indent, "description", report.description) +
+        property(indent, "exit_status", status) + property(indent, "signal", signal) +
+        property(indent, "left_running", left);
+    const std::string output =
+        item.output.empty()
+            ? ""
+            : fmt::format("      <system-out>{}</system-out>\n", escaped(item.output));
+    return fmt::format(
+        "    <testcase{}{}{}>\n{}{}{}    </testcase>\n", attribute("classname", item.group),
+        attribute("name", item.name + of_round(run)), time_attribute(item.seconds.value_or(0)),
+        properties("      ", inside), verdict(run, item), output);
 }
 
 // Each item over its rounds.
@@ -200,13 +197,12 @@ std::string summary_properties(const Run &run, const std::string &indent)
     std::string text;
     for (const Summary &one : run.summary) {
         const Times &times = one.times;
-        std::string value =
-            std::to_string(one.passed) + " of " + std::to_string(times.count()) + " passed";
+        std::string value = fmt::format("{} of {} passed", one.passed, times.count());
         if (times.count() > 0) {
-            value += ", least " + fine_duration(times.least()) + ", median " +
-                     fine_duration(times.median()) + ", longest " + fine_duration(times.longest());
+            value += fmt::format(", least {}, median {}, longest {}", fine_duration(times.least()),
+                                 fine_duration(times.median()), fine_duration(times.longest()));
         }
-        text += property(indent, ("summary " + one.group + "/" + one.name).c_str(), value);
+        text += property(indent, fmt::format("summary {}/{}", one.group, one.name).c_str(), value);
     }
     return text;
 }
@@ -222,8 +218,6 @@ std::string test_suite(const Run &run, std::size_t number, const std::vector<Lat
         seconds += suite.items[at].seconds.value_or(0);
         start = suite.items[at].start.value_or(start);
     }
-    std::string text = "  <testsuite" + attribute("name", title(run, suite)) + attributes(tests) +
-                       time_attribute(seconds) + timestamp_attribute(start) + ">\n";
     const std::string indent(6, ' ');
     std::string inside = property(indent, "plan", run.plan) +
                          property(indent, "vendor", std::to_string(run.vendor)) +
@@ -238,11 +232,14 @@ std::string test_suite(const Run &run, std::size_t number, const std::vector<Lat
     if (has_ended && run.round > 1 && number + 1 == run.suites.size()) {
         inside += summary_properties(run, indent);
     }
-    text += properties("    ", inside);
+    std::string cases;
     for (const ItemRun &item : suite.items) {
-        text += test_case(run, item);
+        cases += test_case(run, item);
     }
-    return text + "  </testsuite>\n";
+    return fmt::format("  <testsuite{}{}{}{}>\n{}{}  </testsuite>\n",
+                       attribute("name", title(run, suite)), attributes(tests),
+                       time_attribute(seconds), timestamp_attribute(start),
+                       properties("    ", inside), cases);
 }
 
 } // namespace
@@ -286,8 +283,9 @@ std::string junit_head(const Run &run, const Tests &before)
         ++tests.all;
         ++tests.errors;
     }
-    return "<?xml version=\"1.0\" encoding=\"UTF-8\"?>\n<testsuites" + attribute("name", "fptest") +
-           attributes(tests) + time_attribute(run.seconds) + timestamp_attribute(run.start) + ">\n";
+    return fmt::format(
+        "<?xml version=\"1.0\" encoding=\"UTF-8\"?>\n<testsuites name=\"fptest\"{}{}{}>\n",
+        attributes(tests), time_attribute(run.seconds), timestamp_attribute(run.start));
 }
 
 std::string junit_round(const Run &run, const std::vector<Late> &late)
@@ -317,16 +315,16 @@ std::string junit_tail(const Run &run)
         return "</testsuites>\n";
     }
     const int first = run.round + 1;
-    const std::string name = rounds_to_come(run) > 1 ? "rounds " + std::to_string(first) + " to " +
-                                                           std::to_string(*run.rounds)
-                                                     : "round " + std::to_string(first);
+    const std::string name = rounds_to_come(run) > 1
+                                 ? fmt::format("rounds {} to {}", first, *run.rounds)
+                                 : fmt::format("round {}", first);
     Tests tests;
     tests.all = 1;
     tests.errors = 1;
-    return "  <testsuite" + attribute("name", name) + attributes(tests) + time_attribute(0) +
-           timestamp_attribute(run.start) + ">\n    <testcase" + attribute("classname", "rounds") +
-           attribute("name", name) + time_attribute(0) + ">\n" + not_run(run, "", false) +
-           "    </testcase>\n  </testsuite>\n</testsuites>\n";
+    return fmt::format("  <testsuite name=\"{0}\"{1}{2}{3}>\n    <testcase classname=\"rounds\" "
+                       "name=\"{0}\"{2}>\n{4}    </testcase>\n  </testsuite>\n</testsuites>\n",
+                       name, attributes(tests), time_attribute(0), timestamp_attribute(run.start),
+                       not_run(run, "", false));
 }
 
 } // namespace fptest

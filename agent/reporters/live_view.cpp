@@ -11,6 +11,7 @@
 #include <algorithm>
 #include <charconv>
 #include <chrono>
+#include <fmt/core.h>
 #include <numeric>
 #include <string>
 #include <utility>
@@ -59,8 +60,7 @@ class Line
         const std::string shown = ellipsize(text, room());
         if (coloured_ && colour != Colour::none && !shown.empty()) {
             static constexpr const char *codes[] = {"", "31", "32", "33", "36"};
-            text_ +=
-                std::string("\x1b[") + codes[static_cast<int>(colour)] + "m" + shown + "\x1b[0m";
+            text_ += fmt::format("\x1b[{}m{}\x1b[0m", codes[static_cast<int>(colour)], shown);
         } else {
             text_ += shown;
         }
@@ -220,14 +220,14 @@ class LiveView : public Listener
         Line line = new_line();
         const std::size_t width = line.room();
         const std::size_t bar = width >= 95 ? 16 : width >= 60 ? 8 : 0;
-        line.add("  " + pad_or_ellipsize(one_line(item.name), std::min(name_width_, width / 3)) +
-                 " ");
+        line.add(fmt::format(
+            "  {} ", pad_or_ellipsize(one_line(item.name), std::min(name_width_, width / 3))));
         add_progress(line, item.report, bar);
         line.add(right(duration(item.seconds.value_or(item.running)), 6) + "  ");
         line.add(pad_or_ellipsize(
                      runs ? (item.stopping ? "stopping" : "running") : word(item.outcome), 9),
                  runs ? Colour::cyan : colour_of(item.outcome));
-        line.add(" " + right(result_of(item.report), 2) + "  ");
+        line.add(fmt::format(" {}  ", right(result_of(item.report), 2)));
         return line;
     }
 
@@ -240,7 +240,7 @@ class LiveView : public Listener
                               progress >= 0 && progress <= 100;
         if (bar > 0) {
             const std::size_t full = is_share ? bar * static_cast<std::size_t>(progress) / 100 : 0;
-            line.add("[" + std::string(full, '#') + std::string(bar - full, ' ') + "] ");
+            line.add(fmt::format("[{:<{}}] ", std::string(full, '#'), bar));
         }
         line.add(right(is_share ? text + "%" : text, 4) + " ");
     }
@@ -255,10 +255,10 @@ class LiveView : public Listener
     {
         const Counts counts = count(run);
         Line line = new_line();
-        line.add(std::to_string(counts.passed) + " passed",
+        line.add(fmt::format("{} passed", counts.passed),
                  counts.passed > 0 ? Colour::green : Colour::none);
         line.add(", ");
-        line.add(std::to_string(counts.failed) + " failed",
+        line.add(fmt::format("{} failed", counts.failed),
                  counts.failed > 0 ? Colour::red : Colour::none);
         const std::string all = total(run);
         // the rest of it, from the comma after the failed ones
@@ -297,7 +297,7 @@ class LiveView : public Listener
                 return sum + std::max<std::size_t>(1, (line + width - 1) / width);
             });
         drawn_.clear();
-        return "\r" + (rows > 1 ? "\x1b[" + std::to_string(rows - 1) + "A" : "") + "\x1b[J";
+        return rows > 1 ? fmt::format("\r\x1b[{}A\x1b[J", rows - 1) : "\r\x1b[J";
     }
 
     // While the terminal does not take what it was given, frames are left out.

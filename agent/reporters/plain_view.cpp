@@ -9,6 +9,7 @@
 
 #include <algorithm>
 #include <chrono>
+#include <fmt/core.h>
 #include <string>
 #include <string_view>
 
@@ -55,11 +56,10 @@ class PlainView : public Listener
         }
         said_ = Clock::now();
         const ItemRun &item = item_at(run, place_);
-        std::string text = name_of(run, item) + (item.stopping ? ": stopping" : ": running");
-        if (item.report.progress) {
-            text += ", progress " + one_line(*item.report.progress);
-        }
-        print(text + ", " + duration(item.running));
+        print(
+            fmt::format("{}: {}{}, {}", name_of(run, item), item.stopping ? "stopping" : "running",
+                        item.report.progress ? ", progress " + one_line(*item.report.progress) : "",
+                        duration(item.running)));
         print_output(new_output(item.output));
         output_said_ = item.output;
     }
@@ -72,8 +72,8 @@ class PlainView : public Listener
         if (quiet_ && passed && item.left_running.empty()) {
             return;
         }
-        std::string text =
-            name_of(run, item) + ": " + word(item.outcome) + reported_result(item.report);
+        std::string text = fmt::format("{}: {}{}", name_of(run, item), word(item.outcome),
+                                       reported_result(item.report));
         if (const std::string how = how_it_ended(item); !how.empty()) {
             text += ", " + how;
         }
@@ -125,7 +125,7 @@ class PlainView : public Listener
   private:
     static std::string name_of(const Run &run, const ItemRun &item)
     {
-        return one_line(item.group) + "/" + one_line(item.name) + of_round(run);
+        return fmt::format("{}/{}{}", one_line(item.group), one_line(item.name), of_round(run));
     }
 
     // What has come to it since it was shown. Of one that is longer than what is kept

@@ -10,6 +10,7 @@
 #include <algorithm>
 #include <cmath>
 #include <cstdlib>
+#include <fmt/core.h>
 #include <optional>
 #include <string_view>
 #include <utility>
@@ -55,12 +56,12 @@ std::string quoted(std::string_view text)
 
 std::string plan_line(std::size_t points)
 {
-    return "1.." + std::to_string(points) + (points == 0 ? " # SKIP nothing to run\n" : "\n");
+    return fmt::format("1..{}{}\n", points, points == 0 ? " # SKIP nothing to run" : "");
 }
 
 std::string point(bool ok, std::size_t number, const std::string &name)
 {
-    return (ok ? "ok " : "not ok ") + std::to_string(number) + " - " + escaped(name);
+    return fmt::format("{} {} - {}", ok ? "ok" : "not ok", number, escaped(name));
 }
 
 std::string skipped(const Run &run, const ItemRun &item)
@@ -72,7 +73,7 @@ std::string skipped(const Run &run, const ItemRun &item)
 
 std::string entry(const char *name, const std::string &value)
 {
-    return std::string(kIndent) + "  " + name + ": " + value + "\n";
+    return fmt::format("{}  {}: {}\n", kIndent, name, value);
 }
 
 std::string entry(const char *name, const std::optional<std::string> &text)
@@ -113,8 +114,8 @@ std::string item_point(const Run &run, const ItemRun &item, std::size_t number)
 {
     const bool ran = item.outcome != Outcome::not_run;
     const bool ok = !ran || item.outcome == Outcome::passed;
-    return kIndent + point(ok, number, item.name) +
-           (ran ? "\n" + diagnosis(item) : skipped(run, item) + "\n");
+    return fmt::format("{}{}{}\n{}", kIndent, point(ok, number, item.name),
+                       ran ? "" : skipped(run, item), ran ? diagnosis(item) : "");
 }
 
 std::string suite_point(const Run &run, const Suite &suite, std::size_t number)
@@ -186,14 +187,12 @@ class TapReport : public Listener
         for (const std::string &line : summary_table(run)) {
             text += comment(line);
         }
-        text += comment(std::to_string(counts.passed) + " passed, " +
-                        std::to_string(counts.failed) + " failed, " +
-                        std::to_string(counts.not_run) + " not run in " + duration(run.seconds));
+        text += fmt::format("# {} passed, {} failed, {} not run in {}\n", counts.passed,
+                            counts.failed, counts.not_run, duration(run.seconds));
         if (!run.finished) {
-            text += "Bail out!  " +
-                    one_line(run.why_unfinished.empty() ? "the run did not finish"
-                                                        : run.why_unfinished) +
-                    "\n";
+            text += fmt::format("Bail out!  {}\n", run.why_unfinished.empty()
+                                                       ? "the run did not finish"
+                                                       : one_line(run.why_unfinished));
         }
         write(text);
     }
@@ -211,7 +210,7 @@ class TapReport : public Listener
   private:
     static std::string comment(const std::string &text)
     {
-        return "# " + text + "\n";
+        return fmt::format("# {}\n", text);
     }
 
     void begin_round(const Run &run)
@@ -232,7 +231,7 @@ class TapReport : public Listener
         while (suite_ < run.suites.size() && (all || suite_ < begun_)) {
             const Suite &suite = run.suites[suite_];
             if (!std::exchange(open_, true)) {
-                text += "# Subtest: " + escaped(title(run, suite)) + "\n";
+                text += fmt::format("# Subtest: {}\n", escaped(title(run, suite)));
                 text += kIndent + plan_line(suite.items.size());
             }
             for (; item_ < suite.items.size() && (all || ended_[suite_][item_]); ++item_) {

@@ -7,6 +7,7 @@
 
 #include <algorithm>
 #include <csignal>
+#include <fmt/core.h>
 #include <string_view>
 #include <utility>
 
@@ -23,11 +24,11 @@ constexpr std::size_t kTableColumns = 80;
 std::string time_limit(double seconds)
 {
     static constexpr std::pair<long long, const char *> kUnits[] = {
-        {86400, " d"}, {3600, " h"}, {60, " min"}, {1, " s"}};
+        {86400, "d"}, {3600, "h"}, {60, "min"}, {1, "s"}};
     const auto whole = static_cast<long long>(seconds);
     for (const auto &[size, unit] : kUnits) {
         if (static_cast<double>(whole) == seconds && whole % size == 0) {
-            return std::to_string(whole / size) + unit;
+            return fmt::format("{} {}", whole / size, unit);
         }
     }
     return fine_duration(seconds);
@@ -42,10 +43,10 @@ std::string rounds(const Run &run)
         text = "at most " + text;
     }
     if (run.time_limit) {
-        text += " for " + time_limit(*run.time_limit);
+        text += fmt::format(" for {}", time_limit(*run.time_limit));
     }
     if (run.until_fail) {
-        text += std::string(run.time_limit ? " or" : "") + " until an item fails";
+        text += run.time_limit ? " or until an item fails" : " until an item fails";
     }
     return text;
 }
@@ -58,42 +59,38 @@ std::string heading(const Run &run)
     for (const Suite &suite : run.suites) {
         items += suite.items.size();
     }
-    return one_line(run.plan) + ": " + plural(items, "item") + ", vendor " +
-           std::to_string(run.vendor) + (has_rounds(run) ? ", " + rounds(run) : "");
+    return fmt::format("{}: {}, vendor {}{}", one_line(run.plan), plural(items, "item"), run.vendor,
+                       has_rounds(run) ? ", " + rounds(run) : "");
 }
 
 std::string total(const Run &run)
 {
     const Counts counts = count(run);
-    std::string text =
-        std::to_string(counts.passed) + " passed, " + std::to_string(counts.failed) + " failed";
     const bool has_ended = run.finished || !run.why_unfinished.empty();
-    if (has_ended && (counts.not_run > 0 || !run.finished)) {
-        text += ", " + std::to_string(counts.not_run) + " not run";
-    } else if (!has_ended && has_fixed_rounds(run)) {
-        text += ", " + std::to_string(counts.not_run) + " to go";
-    } else if (!has_ended) {
-        text += ", round " + std::to_string(run.round);
-    }
-    return text + ", " + duration(run.seconds);
+    const std::string rest = has_ended && (counts.not_run > 0 || !run.finished)
+                                 ? fmt::format(", {} not run", counts.not_run)
+                             : has_ended             ? ""
+                             : has_fixed_rounds(run) ? fmt::format(", {} to go", counts.not_run)
+                                                     : fmt::format(", round {}", run.round);
+    return fmt::format("{} passed, {} failed{}, {}", counts.passed, counts.failed, rest,
+                       duration(run.seconds));
 }
 
 std::string how_it_ended(const ItemRun &item)
 {
     const bool was_ended = item.outcome == Outcome::timed_out || item.outcome == Outcome::stopped;
     if (item.signal != 0 && !(was_ended && item.signal == SIGTERM)) {
-        return "died by " + name_of_signal(item.signal);
+        return fmt::format("died by {}", name_of_signal(item.signal));
     }
     const int status = item.exit_status.value_or(0);
-    return status != 0 ? "exit status " + std::to_string(status) : "";
+    return status != 0 ? fmt::format("exit status {}", status) : "";
 }
 
 std::string left_running(const ItemRun &item)
 {
     std::string text;
     for (const Leftover &one : item.left_running) {
-        text +=
-            (text.empty() ? "" : ", ") + one.name + " (pid " + std::to_string(one.process) + ")";
+        text += fmt::format("{}{} (pid {})", text.empty() ? "" : ", ", one.name, one.process);
     }
     return text;
 }
@@ -105,7 +102,9 @@ std::string result_of(const ItemReport &report)
 
 std::string reported_result(const ItemReport &report)
 {
-    return report.result || report.result_without_value ? ", result " + result_of(report) : "";
+    return report.result || report.result_without_value
+               ? fmt::format(", result {}", result_of(report))
+               : "";
 }
 
 std::string remark(const ItemRun &item)
@@ -124,13 +123,14 @@ std::string remark(const ItemRun &item)
 
 std::string late_report(const ItemRun &item, const ItemReport &report)
 {
-    std::string text = one_line(item.group) + "/" + one_line(item.name) + ": late report" +
-                       reported_result(report);
-    if (!report.result && !report.result_without_value && report.progress) {
-        text += ", progress " + one_line(*report.progress);
-    }
+    const bool has_result = report.result || report.result_without_value;
+    const std::string progress = !has_result && report.progress
+                                     ? fmt::format(", progress {}", one_line(*report.progress))
+                                     : "";
     const std::string said = one_line(report.description.value_or(""));
-    return text + (said.empty() ? "" : ": " + said) + "; it changes nothing";
+    return fmt::format("{}/{}: late report{}{}{}; it changes nothing", one_line(item.group),
+                       one_line(item.name), reported_result(report), progress,
+                       said.empty() ? "" : ": " + said);
 }
 
 std::vector<std::string> last_lines(std::string_view output)
@@ -148,7 +148,7 @@ std::vector<std::string> last_lines(std::string_view output)
     if (lines.size() > kOutputLines) {
         const std::size_t left_out = lines.size() - kOutputLines;
         lines.erase(lines.begin(), lines.end() - kOutputLines);
-        lines.insert(lines.begin(), "(" + plural(left_out, "line") + " before)");
+        lines.insert(lines.begin(), fmt::format("({} before)", plural(left_out, "line")));
     }
     return lines;
 }
@@ -162,7 +162,7 @@ std::vector<std::string> summary_table(const Run &run)
     for (const Summary &one : run.summary) {
         const Times &times = one.times;
         rows.push_back({one_line(one.group) + "/" + one_line(one.name),
-                        std::to_string(one.passed) + " of " + std::to_string(times.count())});
+                        fmt::format("{} of {}", one.passed, times.count())});
         for (const double seconds : {times.least(), times.median(), times.longest()}) {
             rows.back().push_back(times.count() > 0 ? fine_duration(seconds) : "-");
         }

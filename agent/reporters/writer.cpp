@@ -11,6 +11,7 @@
 #include <csignal>
 #include <fcntl.h>
 #include <filesystem>
+#include <fmt/core.h>
 #include <mutex>
 #include <sys/stat.h>
 #include <thread>
@@ -170,8 +171,8 @@ void Writer::write(const std::string &text)
         return;
     }
     if (state.queue.size() + state.in_work + text.size() > kMostWaiting) {
-        state.failure = state.name + ": nobody reads it, and more than " +
-                        std::to_string(kMostWaiting >> 20) + " MiB wait";
+        state.failure = fmt::format("{}: nobody reads it, and more than {} MiB wait", state.name,
+                                    kMostWaiting >> 20);
         state.queue.clear();
         return;
     }
@@ -195,7 +196,7 @@ void Writer::write_now(const std::string &text)
     };
     const bool is_known = is_own_ && fstat(state_->descriptor, &status) == 0;
     if (is_known && status.st_nlink == 0) {
-        state_->failure = state_->name + ": somebody has removed it";
+        state_->failure = fmt::format("{}: somebody has removed it", state_->name);
         return;
     }
     if (written == text.size()) {

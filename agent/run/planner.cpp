@@ -5,9 +5,11 @@
 
 #include "util/failure.h"
 #include "util/text.h"
+#include "util/write.h"
 
 #include <algorithm>
 #include <cstdio>
+#include <fmt/core.h>
 #include <optional>
 #include <utility>
 
@@ -17,11 +19,6 @@ namespace
 {
 
 // --- paths --------------------------------------------------------------------
-
-std::string quoted(const std::string &text)
-{
-    return "'" + one_line(text) + "'";
-}
 
 std::vector<std::string> group_names(const Plan &plan)
 {
@@ -52,15 +49,10 @@ std::string instead(const std::string &name, const std::vector<std::string> &nam
                     const std::string &what)
 {
     if (names.empty()) {
-        return "; there are no " + what;
+        return fmt::format("; there are no {}", what);
     }
-    const std::string near = nearest(name, names);
-    std::vector<std::string> shown;
-    for (const std::string &one : names) {
-        shown.push_back(one_line(one));
-    }
-    return (near.empty() ? "; the " : "; did you mean " + quoted(near) + "? The ") + what +
-           " are " + join_and(shown);
+    return with_advice(did_you_mean(nearest(name, names)),
+                       fmt::format("the {} are {}", what, one_line(join_and(names))));
 }
 
 Path parts_of(const std::string &text, const Plan &plan)
@@ -73,22 +65,23 @@ Path parts_of(const std::string &text, const Plan &plan)
         }
         at = end + 1;
     }
-    const std::string shape = ": a path is root/group or root/group/item";
     if (parts.size() < 2) {
-        throw Failure(Exit::usage, quoted(text) + " names no group" + shape +
-                                       instead("", group_names(plan), "groups"));
+        throw Failure(Exit::usage, "{} names no group: a path is root/group or root/group/item{}",
+                      in_quotes(text), instead("", group_names(plan), "groups"));
     }
     if (parts.size() > 3) {
-        throw Failure(Exit::usage, quoted(text) + " has too many parts" + shape);
+        throw Failure(Exit::usage, "{} has too many parts: a path is root/group or root/group/item",
+                      in_quotes(text));
     }
     if (text.find_first_of(":\t\n") != std::string::npos) {
-        throw Failure(Exit::usage, quoted(text) + " has a ':', a tab or a line feed, at which the "
-                                                  "library would cut it: name it without");
+        throw Failure(Exit::usage,
+                      "{} has a ':', a tab or a line feed, at which the library would cut it: name "
+                      "it without",
+                      in_quotes(text));
     }
     if (text.size() > kPathLimit) {
-        throw Failure(Exit::usage, "a path of " + std::to_string(text.size()) +
-                                       " bytes is cut at " + std::to_string(kPathLimit) +
-                                       ": name the root with less");
+        throw Failure(Exit::usage, "a path of {} bytes is cut at {}: name the root with less",
+                      text.size(), kPathLimit);
     }
     if (parts.size() == 3) {
         return {text, parts[0], parts[1], parts[2]};
@@ -100,16 +93,16 @@ void require_known(const Path &path, const Plan &plan, const std::string &plan_n
 {
     const auto groups = group_names(plan);
     if (std::ranges::find(groups, path.group) == groups.end()) {
-        throw Failure(Exit::usage, "no group " + quoted(path.group) + " in " + one_line(plan_name) +
-                                       instead(path.group, groups, "groups"));
+        throw Failure(Exit::usage, "no group {} in {}{}", in_quotes(path.group),
+                      one_line(plan_name), instead(path.group, groups, "groups"));
     }
     const auto items = item_names(plan, path.group);
     if (path.item.empty() || force || std::ranges::find(items, path.item) != items.end()) {
         return;
     }
-    throw Failure(Exit::usage, "no item " + quoted(path.item) + " in group " + quoted(path.group) +
-                                   " of " + one_line(plan_name) +
-                                   instead(path.item, items, "items of the group"));
+    throw Failure(Exit::usage, "no item {} in group {} of {}{}", in_quotes(path.item),
+                  in_quotes(path.group), one_line(plan_name),
+                  instead(path.item, items, "items of the group"));
 }
 
 // --- jobs ---------------------------------------------------------------------
@@ -125,9 +118,9 @@ std::vector<std::optional<Plan::Element>> resolve(const Path &path, const Plan &
     auto items = path.item.empty() ? plan.resolve(path.group)
                                    : std::vector{plan.resolve(path.group, path.item)};
     if (std::ranges::none_of(items, runs_something)) {
-        throw Failure(Exit::usage, quoted(path.text) +
-                                       " leads to nothing that can be run: leave it out, or "
-                                       "see fptest check");
+        throw Failure(Exit::usage,
+                      "{} leads to nothing that can be run: leave it out, or see fptest check",
+                      in_quotes(path.text));
     }
     return items;
 }
@@ -261,7 +254,7 @@ void list_items(const std::vector<Path> &paths, const Plan &plan, const std::str
         }
     }
     for (const auto &[path, command] : lines) {
-        std::printf("%s  %s\n", pad_or_ellipsize(path, width).c_str(), command.c_str());
+        print_to(stdout, "{}  {}\n", pad_or_ellipsize(path, width), command);
     }
 }
 

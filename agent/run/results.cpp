@@ -5,6 +5,7 @@
 
 #include <algorithm>
 #include <csignal>
+#include <fmt/core.h>
 #include <iterator>
 #include <utility>
 
@@ -115,12 +116,12 @@ std::string name_of_signal(int signal)
     };
     const auto *const found =
         std::ranges::find(kNames, signal, &std::pair<int, const char *>::first);
-    return found != std::end(kNames) ? found->second : "signal " + std::to_string(signal);
+    return found != std::end(kNames) ? found->second : fmt::format("signal {}", signal);
 }
 
 std::string of_round(const Run &run)
 {
-    return has_rounds(run) ? " (round " + std::to_string(run.round) + ")" : "";
+    return has_rounds(run) ? fmt::format(" (round {})", run.round) : "";
 }
 
 std::string title(const Run &run, const Suite &suite)

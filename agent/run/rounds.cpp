@@ -9,12 +9,12 @@
 #include "plan/plan_text.h"
 #include "util/files.h"
 #include "util/text.h"
+#include "util/write.h"
 
 #include <algorithm>
 #include <chrono>
-#include <cstdio>
+#include <fmt/core.h>
 #include <poll.h>
-#include <sstream>
 #include <thread>
 #include <unistd.h>
 #include <utility>
@@ -31,10 +31,8 @@ using Clock = std::chrono::steady_clock;
 std::string new_mark()
 {
     static unsigned count = 0;
-    std::ostringstream mark;
-    mark << std::hex << std::chrono::system_clock::now().time_since_epoch().count() << '-'
-         << ++count;
-    return mark.str();
+    const auto now = std::chrono::system_clock::now().time_since_epoch().count();
+    return fmt::format("{:x}-{:x}", now, ++count);
 }
 
 // Shows only this run's results: removes old ones, and marks the items, to recognise
@@ -56,8 +54,8 @@ void clear_reports(Job &job)
         return; // a forced one that is not well-formed: nobody has reported in it
     }
     if (!cleared) {
-        throw Failure(Exit::environment,
-                      std::string(kStoredPlan) + " is gone, or not whole any more: store it again");
+        throw Failure(Exit::environment, "{} is gone, or not whole any more: store it again",
+                      kStoredPlan);
     }
     try {
         require_room(cleared->size());
@@ -143,8 +141,8 @@ class Rounds
             return false;
         }
         const ItemRun &item = item_at(run_, {job.suite, (*failed)->item});
-        run_.why_ended =
-            item.group + "/" + item.name + of_round(run_) + " did not pass (--until-fail)";
+        run_.why_ended = fmt::format("{}/{}{} did not pass (--until-fail)", item.group, item.name,
+                                     of_round(run_));
         return true;
     }
 
@@ -185,7 +183,7 @@ void say_at_end(const std::string &text)
 {
     pollfd errors{STDERR_FILENO, POLLOUT, 0};
     if (!text.empty() && poll(&errors, 1, 0) > 0) {
-        std::fprintf(stderr, "fptest: %s\n", text.c_str());
+        say("{}", text);
     }
 }
 
@@ -243,10 +241,10 @@ void begin(Run &run, const std::vector<Listener *> &listeners, Signals &signals)
         begun.push_back(listener);
         const std::string failure = listener->failure();
         if (!failure.empty() && !is_interrupted(signals)) {
-            run.why_unfinished = failure + "; nothing was run";
+            run.why_unfinished = fmt::format("{}; nothing was run", failure);
             finish(run, begun);
             flush(begun, signals, true);
-            throw Failure(Exit::environment, run.why_unfinished);
+            throw Failure(Exit::environment, "{}", run.why_unfinished);
         }
     }
 }
@@ -285,10 +283,10 @@ Exit run_rounds(const std::vector<Listener *> &listeners, const Runner::Limits &
     if (!failure.empty() && (broken || runner.broken())) {
         say_at_end(failure);
     } else if (!failure.empty()) {
-        throw Failure(Exit::environment, failure + "; the run went on without it");
+        throw Failure(Exit::environment, "{}; the run went on without it", failure);
     }
     if (broken || runner.broken()) {
-        throw Failure(Exit::environment, run.why_unfinished + runner.advice());
+        throw Failure(Exit::environment, "{}", run.why_unfinished);
     }
     const Counts counts = count(run);
     return counts.passed == counts.all() ? Exit::success : Exit::items_failed;

@@ -3,6 +3,7 @@
 
 #include "run/runner.h"
 
+#include "module/preflight.h"
 #include "module/stored_plan.h"
 #include "plan/plan_text.h"
 #include "run/trigger.h"
@@ -13,6 +14,7 @@
 #include <array>
 #include <csignal>
 #include <cstdlib>
+#include <fmt/core.h>
 #include <sys/wait.h>
 #include <thread>
 #include <unistd.h>
@@ -40,7 +42,7 @@ std::string reported(const ItemReport &report)
 {
     return report.result_without_value
                ? "reported a result that is none of 0, 1 and -2: the plan has no text for it"
-               : "reported the result " + report.result.value_or("");
+               : fmt::format("reported the result {}", report.result.value_or(""));
 }
 
 // What the item died by; 0 where it ended by itself. A shell that has not become the
@@ -146,7 +148,7 @@ void Runner::require_all_started(const Job &job, std::size_t next)
         result.outcome = Outcome::no_result;
         result.reason = module_gone_.empty()
                             ? "the library never reached it; run with --log FILE to see why"
-                            : "the library never reached it: " + module_gone_;
+                            : fmt::format("the library never reached it: {}", module_gone_);
         for (Listener *listener : listeners_) {
             listener->ended(run_, place);
         }
@@ -160,8 +162,8 @@ void Runner::require_plan()
     if (Plan::parse_annotated(text) || Plan::load_as_library(text)) {
         return;
     }
-    give_up(std::string("the stored plan ") + kStoredPlan +
-            " is gone, or not whole any more: store it again");
+    give_up(fmt::format("the stored plan {} is gone, or not whole any more: store it again",
+                        kStoredPlan));
     broken_ = true;
 }
 
@@ -193,7 +195,7 @@ void Runner::handle(const LibraryProcess::Event &event, const Job &job, std::siz
 // It costs the items that it was running; the next ones get another.
 void Runner::lose_module(const LibraryProcess::Event &event)
 {
-    module_gone_ = "the library's process ended " + event.text + "; --log FILE keeps what it says";
+    module_gone_ = gone_text(event);
     stop_asked_ = false;
     if (!active_.empty()) {
         append_output(item(active_.back().place).output, host_.take_output(event.output));
@@ -275,7 +277,7 @@ void Runner::start_next(const Job &job, std::size_t &next, const LibraryProcess:
     }
     if (vendor_ != run_.vendor) {
         append_output(item(active.place).output,
-                      "fptest: the vendor is " + std::to_string(vendor_) + " by now\n");
+                      fmt::format("fptest: the vendor is {} by now\n", vendor_));
     }
 }
 
@@ -376,20 +378,20 @@ void Runner::judge(const RunningItem &active)
         result.overruled = has_reported;
     } else if (result.signal != 0) {
         result.outcome = Outcome::failed;
-        result.reason = "died by " + name_of_signal(result.signal) +
-                        (has_reported ? ", though it " + reported(report) : "");
+        result.reason = fmt::format("died by {}{}", name_of_signal(result.signal),
+                                    has_reported ? ", though it " + reported(report) : "");
     } else if (!has_reported || active.report_lost) {
         result.outcome = Outcome::no_result;
         result.reason = why_silent(active);
     } else if (!active.gatherer_end.empty() && report.progress != "100") {
         result.outcome = Outcome::failed;
-        result.reason = "the gatherer ended at progress " + report.progress.value_or("0") +
-                        ", though it " + reported(report);
+        result.reason = fmt::format("the gatherer ended at progress {}, though it {}",
+                                    report.progress.value_or("0"), reported(report));
         result.overruled = true;
     } else if (limits_.exit_status && result.exit_status.value_or(0) != 0) {
         result.outcome = Outcome::failed;
-        result.reason = "ended with exit status " + std::to_string(*result.exit_status) +
-                        ", though it " + reported(report);
+        result.reason = fmt::format("ended with exit status {}, though it {}", *result.exit_status,
+                                    reported(report));
     } else if (report.result == std::to_string(run_.pass_code)) {
         result.outcome = Outcome::passed;
     } else {
@@ -401,30 +403,33 @@ void Runner::judge(const RunningItem &active)
 std::string Runner::why_stopped(const RunningItem &active)
 {
     if (!active.was_stopped && !module_gone_.empty()) {
-        return "past the limit of " + fine_duration(limits_.item->count()) + ": " + module_gone_;
+        return fmt::format("past the limit of {}: {}", fine_duration(limits_.item->count()),
+                           module_gone_);
     }
+    const double seconds = *item(active.place).seconds;
     if (!active.was_stopped) {
-        return "ended by itself after " + fine_duration(*item(active.place).seconds) +
-               ", past the limit of " + fine_duration(limits_.item->count());
+        return fmt::format("ended by itself after {}, past the limit of {}", fine_duration(seconds),
+                           fine_duration(limits_.item->count()));
     }
-    const std::string interruption =
-        (active.killed ? " after the run was interrupted by " : " by ") + signal_name(signal_);
-    const std::string how = active.stop == Outcome::stopped
-                                ? interruption
-                                : " after " + duration(*item(active.place).seconds);
-    return (active.killed ? "killed" : "stopped") + how +
-           (active.killed ? ", as it did not end when it was asked to" : "");
+    const bool is_interrupted = active.stop == Outcome::stopped;
+    if (!active.killed) {
+        return is_interrupted ? fmt::format("stopped by {}", signal_name(signal_))
+                              : fmt::format("stopped after {}", duration(seconds));
+    }
+    return fmt::format("killed after {}, as it did not end when it was asked to",
+                       is_interrupted ? "the run was interrupted by " + signal_name(signal_)
+                                      : duration(seconds));
 }
 
 std::string Runner::why_silent(const RunningItem &active)
 {
     const auto suffix = vendor_suffix(vendor_);
     if (!suffix) {
-        return "vendor " + std::to_string(vendor_) + " runs no item";
+        return fmt::format("vendor {} runs no item", vendor_);
     }
     const std::string program = program_of(item(active.place).name, *suffix);
     if (is_plain_name(item(active.place).name) && access(program.c_str(), X_OK) != 0) {
-        return "there is no program " + one_line(program);
+        return fmt::format("there is no program {}", one_line(program));
     }
     if (!active.gatherer_end.empty()) {
         return active.gatherer_end;
@@ -442,7 +447,8 @@ std::string Runner::why_silent(const RunningItem &active)
     const std::string text = read_stored_plan().value_or("");
     std::string why;
     if (Plan::parse_annotated(text) && !Plan::load_as_library(text, &why)) {
-        return "no report can be written any more: the stored plan does not load (" + why + ")";
+        return fmt::format("no report can be written any more: the stored plan does not load ({})",
+                           why);
     }
     if (text.empty()) {
         return "no report could be written: the stored plan is gone";
@@ -450,9 +456,10 @@ std::string Runner::why_silent(const RunningItem &active)
     if (!Plan::parse_annotated(text)) {
         return "no report could be written: the stored plan is not whole any more";
     }
-    return gathers(active) ? "no result was reported within " +
-                                 fine_duration(limits_.item.value_or(kForGathering).count())
-                           : "ended without reporting a result";
+    return gathers(active)
+               ? fmt::format("no result was reported within {}",
+                             fine_duration(limits_.item.value_or(kForGathering).count()))
+               : "ended without reporting a result";
 }
 
 // In the order of their starts, because that is the order of their numbers.

@@ -71,11 +71,6 @@ class Runner
     {
         return broken_;
     }
-    // What to do about it, to be said after why the run is unfinished.
-    const std::string &advice() const
-    {
-        return advice_;
-    }
     // Ends the run early: what was not run stays so, for this reason.
     void give_up(const std::string &why);
 
@@ -179,7 +174,6 @@ class Runner
     bool gatherer_may_report_late_ = false; // it may still report what it was told in vain
     std::string module_gone_;               // why, in the job in which its process ended
     bool broken_ = false;
-    std::string advice_;
 };
 
 } // namespace fptest

@@ -12,6 +12,7 @@
 #include <algorithm>
 #include <csignal>
 #include <cstdio>
+#include <fmt/core.h>
 #include <poll.h>
 #include <thread>
 #include <unistd.h>
@@ -35,8 +36,8 @@ std::string described(const std::vector<Leftover> &processes)
 {
     std::vector<std::string> all;
     for (const Leftover &one : processes) {
-        all.push_back(one_line(one.name) + " (pid " + std::to_string(one.process) + ", state " +
-                      state_of(one.process) + ")");
+        all.push_back(fmt::format("{} (pid {}, state {})", one_line(one.name), one.process,
+                                  state_of(one.process)));
     }
     return join_and(all);
 }
@@ -70,7 +71,7 @@ void Runner::read_signals()
         }
         signal_ = signal;
         signal_taken_at_ = now();
-        give_up("interrupted by " + signal_name(signal));
+        give_up(fmt::format("interrupted by {}", signal_name(signal)));
         for (RunningItem &active : active_) {
             if (!active.stop) {
                 active.stop = Outcome::stopped;
@@ -199,8 +200,8 @@ void Runner::cannot_stop(RunningItem &active)
 {
     const std::vector<Leftover> left = item_processes();
     broken_ = true;
-    give_up(item(active.place).group + "/" + item(active.place).name +
-            " cannot be killed: " + described(left) + " goes on running");
+    give_up(fmt::format("{}/{} cannot be killed: {} goes on running", item(active.place).group,
+                        item(active.place).name, described(left)));
     active.was_stopped = true;
     active.killed = true;
     finish(active, now());
@@ -238,7 +239,8 @@ template <typename Find> void Runner::end_all(const Find &find)
     for (auto left = find(); !left.empty(); left = find()) {
         const auto waited = now() - begin;
         if (waited > limits_.grace + kBeforeGivingUp) {
-            give_up(described(left) + " cannot be killed, and would report into the next round");
+            give_up(fmt::format("{} cannot be killed, and would report into the next round",
+                                described(left)));
             broken_ = true;
             return;
         }

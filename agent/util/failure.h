@@ -4,8 +4,9 @@
 // How the program ends, and what makes it end early.
 #pragma once
 
+#include <fmt/core.h>
 #include <stdexcept>
-#include <string>
+#include <utility>
 
 namespace fptest
 {
@@ -22,7 +23,9 @@ enum class Exit {
 class Failure : public std::runtime_error
 {
   public:
-    Failure(Exit status, const std::string &text) : std::runtime_error(text), status_(status)
+    template <typename... Values>
+    Failure(Exit status, fmt::format_string<Values...> text, Values &&...values)
+        : std::runtime_error(fmt::format(text, std::forward<Values>(values)...)), status_(status)
     {
     }
     Exit status() const

@@ -37,7 +37,7 @@ void fill_standard_descriptors()
 void require_standard_output(const std::string &who)
 {
     if (!standard_output_was_open) {
-        throw Failure(Exit::environment, who + " wants standard output, which is closed: open it");
+        throw Failure(Exit::environment, "{} wants standard output, which is closed: open it", who);
     }
 }
 
@@ -73,7 +73,7 @@ std::string why_unread()
 {
     return errno != EFBIG
                ? std::strerror(errno)
-               : "longer than the " + std::to_string(kFileLimit >> 20U) + " MiB that fptest reads";
+               : fmt::format("longer than the {} MiB that fptest reads", kFileLimit >> 20U);
 }
 
 std::string end_of_links(const std::string &path)

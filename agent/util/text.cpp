@@ -4,13 +4,13 @@
 #include "util/text.h"
 
 #include <algorithm>
-#include <array>
+#include <cctype>
 #include <clocale>
 #include <cmath>
-#include <cstdio>
-#include <ctime>
 #include <cwchar>
+#include <fmt/chrono.h>
 #include <numeric>
+#include <utf8.h>
 #include <utility>
 
 namespace fptest
@@ -23,72 +23,23 @@ constexpr char32_t kReplacement = 0xFFFD;
 
 // --- UTF-8 -------------------------------------------------------------------
 
-struct Character {
-    char32_t code = kReplacement;
-    std::size_t size = 1; // in bytes
-};
-
-// What a first byte tells of its character: how many bytes follow, its own bits,
-// and the least code that needs that many.
-struct Lead {
-    std::size_t more = 0;
-    char32_t bits = 0;
-    char32_t least = 0;
-};
-
-Lead lead_of(unsigned char byte)
+// Hands over each character with the bytes that it takes: a byte that is no UTF-8 as
+// one U+FFFD.
+template <typename Use> void for_each_character(std::string_view text, const Use &use)
 {
-    if (byte < 0x80) {
-        return {0, byte, 0};
-    }
-    if (byte < 0xC0) {
-        return {0, 0, 1}; // no first byte: the code that it gives is too small
-    }
-    if (byte < 0xE0) {
-        return {1, byte & 0x1FU, 0x80};
-    }
-    if (byte < 0xF0) {
-        return {2, byte & 0x0FU, 0x800};
-    }
-    return {3, byte & 0x0FU, 0x10000};
-}
-
-// The first character of a text that is not empty. Where there is none, that is
-// one byte and the replacement character.
-Character decode(std::string_view text)
-{
-    const Lead lead = lead_of(static_cast<unsigned char>(text.front()));
-    if (lead.more >= text.size()) {
-        return {};
-    }
-    char32_t code = lead.bits;
-    for (std::size_t at = 1; at <= lead.more; ++at) {
-        const auto byte = static_cast<unsigned char>(text[at]);
-        if ((byte & 0xC0U) != 0x80U) {
-            return {};
+    const char *at = text.data();
+    const char *const end = at + text.size();
+    while (at != end) {
+        const char *const flaw = utf8::find_invalid(at, end);
+        while (at != flaw) {
+            const char *const begin = at;
+            const char32_t code = utf8::unchecked::next(at);
+            use(code, static_cast<std::size_t>(at - begin));
         }
-        code = code << 6U | (byte & 0x3FU);
-    }
-    const bool surrogate = code >= 0xD800 && code <= 0xDFFF;
-    if (code < lead.least || code > 0x10FFFF || surrogate) {
-        return {};
-    }
-    return {code, lead.more + 1};
-}
-
-void append(std::string &text, char32_t code)
-{
-    const auto tail = [code](unsigned shift) {
-        return static_cast<char>(0x80U | (code >> shift & 0x3FU));
-    };
-    if (code < 0x80) {
-        text += static_cast<char>(code);
-    } else if (code < 0x800) {
-        text += {static_cast<char>(0xC0U | code >> 6U), tail(0)};
-    } else if (code < 0x10000) {
-        text += {static_cast<char>(0xE0U | code >> 12U), tail(6), tail(0)};
-    } else {
-        text += {static_cast<char>(0xF0U | code >> 18U), tail(12), tail(6), tail(0)};
+        if (at != end) {
+            use(kReplacement, 1);
+            ++at;
+        }
     }
 }
 
@@ -112,16 +63,12 @@ char32_t visible_on_line(char32_t code)
     return turns ? kReplacement : visible(code);
 }
 
-std::string cleaned(std::string_view bytes, std::string_view kept, char32_t (*shown)(char32_t))
+template <typename Shown> std::string cleaned(std::string_view bytes, const Shown &shown)
 {
     std::string text;
     text.reserve(bytes.size());
-    while (!bytes.empty()) {
-        const Character character = decode(bytes);
-        const bool keep = kept.find(bytes.front()) != std::string_view::npos;
-        append(text, keep ? character.code : shown(character.code));
-        bytes.remove_prefix(character.size);
-    }
+    for_each_character(
+        bytes, [&](char32_t code, std::size_t /* size */) { utf8::append(shown(code), text); });
     return text;
 }
 
@@ -184,15 +131,12 @@ class Widths
 std::string_view start_of(std::string_view text, std::size_t width)
 {
     const Widths widths;
+    std::size_t taken = 0;
     std::size_t end = 0;
-    for (std::size_t taken = 0; end < text.size();) {
-        const Character character = decode(text.substr(end));
-        taken += widths.of(character.code);
-        if (taken > width) {
-            break;
-        }
-        end += character.size;
-    }
+    for_each_character(text, [&](char32_t code, std::size_t size) {
+        taken += widths.of(code);
+        end += taken <= width ? size : 0;
+    });
     return text.substr(0, end);
 }
 
@@ -204,11 +148,7 @@ constexpr std::size_t kCase = 1;   // the same one, but not its case
 std::u32string characters(std::string_view text)
 {
     std::u32string result;
-    while (!text.empty()) {
-        const Character character = decode(text);
-        result += character.code;
-        text.remove_prefix(character.size);
-    }
+    for_each_character(text, [&](char32_t code, std::size_t /* size */) { result += code; });
     return result;
 }
 
@@ -267,12 +207,19 @@ bool near(std::size_t edits, std::size_t length)
 
 std::string sanitize_utf8(std::string_view bytes)
 {
-    return cleaned(bytes, "\t\n\r", visible);
+    return cleaned(bytes, [](char32_t code) {
+        return code == '\t' || code == '\n' || code == '\r' ? code : visible(code);
+    });
 }
 
 std::string one_line(std::string_view bytes)
 {
-    return cleaned(bytes, "", visible_on_line);
+    return cleaned(bytes, visible_on_line);
+}
+
+std::string in_quotes(std::string_view text, std::size_t width)
+{
+    return fmt::format("'{}'", ellipsize(one_line(text), width));
 }
 
 std::string replaced(std::string_view text, std::span<const Replacement> list)
@@ -291,25 +238,15 @@ std::string replaced(std::string_view text, std::span<const Replacement> list)
 
 std::size_t first_not_utf8(std::string_view bytes)
 {
-    for (std::size_t at = 0; at < bytes.size();) {
-        const Character character = decode(bytes.substr(at));
-        if (character.code == kReplacement && character.size == 1) {
-            return at;
-        }
-        at += character.size;
-    }
-    return std::string_view::npos;
+    return utf8::find_invalid(bytes);
 }
 
 std::size_t display_width(std::string_view text)
 {
     const Widths widths;
     std::size_t result = 0;
-    while (!text.empty()) {
-        const Character character = decode(text);
-        result += widths.of(character.code);
-        text.remove_prefix(character.size);
-    }
+    for_each_character(text,
+                       [&](char32_t code, std::size_t /* size */) { result += widths.of(code); });
     return result;
 }
 
@@ -347,9 +284,23 @@ std::string nearest(std::string_view word, const std::vector<std::string> &candi
     return best != nullptr ? *best : "";
 }
 
-std::string plural(std::size_t count, const std::string &thing)
+std::string did_you_mean(const std::string &near)
 {
-    return std::to_string(count) + " " + thing + (count == 1 ? "" : "s");
+    return near.empty() ? "" : fmt::format("; did you mean {}?", in_quotes(near));
+}
+
+std::string with_advice(const std::string &text, std::string advice)
+{
+    if (!text.ends_with('?')) {
+        return fmt::format("{}; {}", text, advice);
+    }
+    advice.front() = static_cast<char>(std::toupper(static_cast<unsigned char>(advice.front())));
+    return fmt::format("{} {}", text, advice);
+}
+
+std::string plural(std::size_t count, std::string_view thing)
+{
+    return fmt::format("{} {}{}", count, thing, count == 1 ? "" : "s");
 }
 
 std::string join_and(const std::vector<std::string> &words)
@@ -369,30 +320,18 @@ std::string duration(double seconds)
     // what lasts longer than centuries has been measured wrong
     const double sane = seconds > 0 ? std::min(seconds, 1e10) : 0;
     const long long tenths = std::llround(sane * 10);
-    std::array<char, 40> text{};
     if (tenths < 600) {
-        std::snprintf(text.data(), text.size(), "%lld.%lld s", tenths / 10, tenths % 10);
-        return text.data();
+        return fmt::format("{}.{} s", tenths / 10, tenths % 10);
     }
     const long long whole = std::llround(sane);
-    const long long hours = whole / 3600;
-    const long long minutes = whole / 60 % 60;
-    if (hours > 0) {
-        std::snprintf(text.data(), text.size(), "%lld:%02lld:%02lld", hours, minutes, whole % 60);
-    } else {
-        std::snprintf(text.data(), text.size(), "%lld:%02lld", minutes, whole % 60);
-    }
-    return text.data();
+    const long long minutes = whole / 60;
+    return minutes < 60 ? fmt::format("{}:{:02}", minutes, whole % 60)
+                        : fmt::format("{}:{:02}:{:02}", minutes / 60, minutes % 60, whole % 60);
 }
 
 std::string fine_duration(double seconds)
 {
-    if (!(seconds < 9.9995)) {
-        return duration(seconds);
-    }
-    std::array<char, 40> text{};
-    std::snprintf(text.data(), text.size(), "%.3f s", std::max(seconds, 0.0));
-    return text.data();
+    return seconds < 9.9995 ? fmt::format("{:.3f} s", std::max(seconds, 0.0)) : duration(seconds);
 }
 
 std::vector<std::string> aligned(const std::vector<std::vector<std::string>> &rows,
@@ -427,15 +366,8 @@ std::string timestamp(std::chrono::system_clock::time_point time)
 {
     using namespace std::chrono;
     const auto whole = floor<std::chrono::seconds>(time);
-    const auto fraction = floor<milliseconds>(time - whole);
-    const std::time_t value = system_clock::to_time_t(whole);
-    std::tm parts{};
-    gmtime_r(&value, &parts);
-    std::array<char, 32> text{};
-    const std::size_t end = std::strftime(text.data(), text.size(), "%Y-%m-%dT%H:%M:%S", &parts);
-    std::snprintf(text.data() + end, text.size() - end, ".%03dZ",
-                  static_cast<int>(fraction.count()));
-    return text.data();
+    const auto fraction = floor<milliseconds>(time - whole).count();
+    return fmt::format("{:%FT%T}.{:03}Z", fmt::gmtime(system_clock::to_time_t(whole)), fraction);
 }
 
 } // namespace fptest

@@ -24,6 +24,9 @@ std::string sanitize_utf8(std::string_view bytes);
 // turns the direction of a text (overrides, embeddings, isolates) is U+FFFD.
 std::string one_line(std::string_view bytes);
 
+// In quotes and on one line; cut where it takes more columns than that.
+std::string in_quotes(std::string_view text, std::size_t width = std::string::npos);
+
 struct Replacement {
     std::string_view from;
     std::string_view to;
@@ -49,8 +52,14 @@ std::string ellipsize(std::string_view text, std::size_t width);
 // enough to be meant.
 std::string nearest(std::string_view word, const std::vector<std::string> &candidates);
 
+// "; did you mean 'near'?"; empty where none is near.
+std::string did_you_mean(const std::string &near);
+
+// "text; advice", or "text? Advice".
+std::string with_advice(const std::string &text, std::string advice);
+
 // "1 item", "2 items"
-std::string plural(std::size_t count, const std::string &thing);
+std::string plural(std::size_t count, std::string_view thing);
 
 // "a", "a and b", "a, b and c"
 std::string join_and(const std::vector<std::string> &words);

@@ -1,16 +1,19 @@
 // SPDX-FileCopyrightText: 2026 The Quillmark authors
 // SPDX-License-Identifier: Apache-2.0
 
-// Writing to descriptors.
+// Writing to descriptors, and to people.
 #pragma once
 
 #include <cerrno>
 #include <cstddef>
+#include <cstdio>
 #include <cstring>
+#include <fmt/core.h>
 #include <poll.h>
 #include <string>
 #include <string_view>
 #include <unistd.h>
+#include <utility>
 
 namespace fptest
 {
@@ -37,7 +40,20 @@ inline std::size_t write_text(int descriptor, std::string_view text)
 // "out.json: No space left on device"
 inline std::string failure_of(const std::string &file, int error)
 {
-    return file + ": " + std::strerror(error);
+    return fmt::format("{}: {}", file, std::strerror(error));
+}
+
+// As fmt::print(), which throws where a stream cannot be written.
+template <typename... Values>
+void print_to(std::FILE *stream, fmt::format_string<Values...> text, Values &&...values)
+{
+    std::fputs(fmt::format(text, std::forward<Values>(values)...).c_str(), stream);
+}
+
+// "fptest: TEXT" as a line on standard error.
+template <typename... Values> void say(fmt::format_string<Values...> text, Values &&...values)
+{
+    print_to(stderr, "fptest: {}\n", fmt::format(text, std::forward<Values>(values)...));
 }
 
 } // namespace fptest

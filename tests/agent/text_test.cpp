@@ -49,9 +49,11 @@ constexpr char kSmile[] = "\U0001F600"; // 4 bytes, 2 columns
 TEST(Clean, LeavesPlainTextAndTheFirstAndTheLastCharacterOfEverySizeAlone)
 {
     for (const char *text : {"", "3 dead pixels, limit 2 ~", "\u00A0", "\u07FF", "\u0800", "\uD7FF",
-                             "\uE000", "\uFFFD", "\uFFFE", "\uFFFF", "\U00010000", "\U0010FFFF"}) {
+                             "\uE000", "\uFDD0", "\uFEFF", "\uFFFD", "\uFFFE", "\uFFFF",
+                             "\U00010000", "\U0001FFFE", "\U0010FFFF"}) {
         EXPECT_EQ(sanitize_utf8(text), text);
         EXPECT_EQ(one_line(text), text);
+        EXPECT_EQ(first_not_utf8(text), std::string::npos);
     }
 }
 
@@ -79,20 +81,22 @@ TEST(Clean, ReplacesTheControlCharactersAboveAscii)
 
 TEST(Clean, ReplacesEveryByteThatIsNoUtf8)
 {
-    for (const std::string bytes :
-         {"\x80", "\xBF",                 // go on with no character
-          "\xC0\x80", "\xC1\xBF",         // two bytes for one of ASCII
-          "\xE0\x9F\xBF",                 // three bytes where two do
-          "\xF0\x8F\xBF\xBF",             // four bytes where three do
-          "\xED\xA0\x80", "\xED\xBF\xBF", // surrogates
-          "\xF4\x90\x80\x80",             // beyond the last character
-          "\xF8\x88\x80\x80\x80", "\xF9\x80\x80\x80\x80", "\xFD\x80\x80\x80\x80\x80", "\xFF"}) {
+    for (const std::string bytes : {"\x80", "\xBF",                 // go on with no character
+                                    "\xC0\x80", "\xC1\xBF",         // two bytes for one of ASCII
+                                    "\xE0\x80\x80", "\xE0\x9F\xBF", // three bytes where two do
+                                    "\xF0\x8F\xBF\xBF",             // four bytes where three do
+                                    "\xED\xA0\x80", "\xED\xBF\xBF", // surrogates
+                                    "\xED\xA0\xBD\xED\xB8\x80",     // a pair of them
+                                    "\xF4\x90\x80\x80",             // beyond the last character
+                                    "\xF5\x80\x80\x80", "\xF7\xBF\xBF\xBF", "\xF8\x88\x80\x80\x80",
+                                    "\xF9\x80\x80\x80\x80", "\xFD\x80\x80\x80\x80\x80", "\xFF"}) {
         std::string expected;
         for (std::size_t left = bytes.size(); left > 0; --left) {
             expected += "\uFFFD";
         }
         EXPECT_EQ(sanitize_utf8("<" + bytes + ">"), "<" + expected + ">")
             << testing::PrintToString(bytes);
+        EXPECT_EQ(first_not_utf8("\u00E9" + bytes + "\u00E9"), 2U) << testing::PrintToString(bytes);
     }
 }
 
@@ -103,6 +107,25 @@ TEST(Clean, ReplacesACharacterThatBreaksOffAndGoesOnAfterIt)
     EXPECT_EQ(sanitize_utf8("a\xF0\x9F\x98"), "a\uFFFD\uFFFD\uFFFD");
     EXPECT_EQ(sanitize_utf8(std::string_view("a\u00E9").substr(0, 2)), "a\uFFFD");
     EXPECT_EQ(sanitize_utf8("\xE6x\xC3\xC3\xA9"), "\uFFFDx\uFFFD\u00E9");
+    EXPECT_EQ(sanitize_utf8("\xE6\x97x"), "\uFFFD\uFFFDx");
+    EXPECT_EQ(sanitize_utf8("\xF0\x9F\x98x\xF0\x9Fx\xF0x"),
+              "\uFFFD\uFFFD\uFFFDx\uFFFD\uFFFDx\uFFFDx");
+    EXPECT_EQ(sanitize_utf8("\xF0\x9F\xE6\x97\xA5"), "\uFFFD\uFFFD\u65E5");
+    EXPECT_EQ(first_not_utf8("a\xE6\x97"), 1U);
+}
+
+TEST(Columns, AreOneForEachByteThatIsNoUtf8)
+{
+    EXPECT_EQ(display_width("a\xE6\x97"), 3U);
+    EXPECT_EQ(ellipsize("ab\xFF\xFFgoes on", 5), "ab...");
+    EXPECT_EQ(ellipsize("\xE6\x97goes on", 4), "\xE6...");
+}
+
+TEST(InQuotes, IsOnOneLineAndCutWhereThatIsWanted)
+{
+    EXPECT_EQ(in_quotes(""), "''");
+    EXPECT_EQ(in_quotes("a\nb"), "'a\u240Ab'");
+    EXPECT_EQ(in_quotes("SensorProbe", 8), "'Senso...'");
 }
 
 TEST(OneLine, TurnsNoText)
@@ -293,6 +316,19 @@ TEST(Nearest, CountsCharactersAndNotBytes)
 {
     EXPECT_EQ(nearest("ab\u65E5", {"ab\u672C"}), "ab\u672C");
     EXPECT_EQ(nearest("abcd", {"ab\U0001F600\U0001F600"}), "ab\U0001F600\U0001F600");
+}
+
+TEST(DidYouMean, IsAskedOfANearWord)
+{
+    EXPECT_EQ(did_you_mean("Scan"), "; did you mean 'Scan'?");
+    EXPECT_EQ(did_you_mean(""), "");
+}
+
+TEST(Advice, IsASentenceOfItsOwnAfterAQuestion)
+{
+    EXPECT_EQ(with_advice("no Scan", "leave it out"), "no Scan; leave it out");
+    EXPECT_EQ(with_advice("no Scan; did you mean 'Scam'?", "it has Scam"),
+              "no Scan; did you mean 'Scam'? It has Scam");
 }
 
 TEST(Listing, ReadsLikeASentence)
