@@ -13,11 +13,7 @@
 #include <set>
 
 using namespace fptest_runner;
-using device::kPlanFile;
-using device::Lines;
-using device::plan_of;
-using device::read_file;
-using device::write_file;
+using namespace device;
 using ::testing::Contains;
 using ::testing::IsSupersetOf;
 using ::testing::Not;

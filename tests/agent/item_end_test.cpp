@@ -11,10 +11,7 @@
 #include <unistd.h>
 
 using namespace fptest_runner;
-using device::eventually;
-using device::kPlanFile;
-using device::processes_named;
-using device::read_file;
+using namespace device;
 using ::testing::AllOf;
 using ::testing::Ge;
 using ::testing::Lt;
@@ -131,9 +128,9 @@ TEST_F(ItemEnd, SecondInterruptionLeavesNoItemThatIgnoresTheStop)
 
 TEST_F(ItemEnd, InterruptionBetweenTwoRoundsBeginsNoOtherRound)
 {
-    FptestProcess fptest(with_group(
-        {{"Item", "report G 100 0 fine; /system/bin/Third ignore-stop sleep 60 &amp;"}},
-        {"--grace", "1.5", "--repeat", "2"}));
+    FptestProcess fptest(
+        with_group({{"Item", "report G 100 0 fine; /system/bin/Third ignore-stop sleep 60 &amp;"}},
+                   {"--grace", "1.5", "--repeat", "2"}));
     ASSERT_TRUE(eventually([] { return events("end").size() == 1; }));
     std::this_thread::sleep_for(std::chrono::milliseconds(300));
     fptest.signal(SIGTERM);

@@ -8,11 +8,7 @@
 #include <filesystem>
 
 using namespace fptest_runner;
-using device::kPlanFile;
-using device::Lines;
-using device::plan_of;
-using device::read_file;
-using device::write_file;
+using namespace device;
 using ::testing::SizeIs;
 using ::testing::StartsWith;
 

@@ -21,11 +21,8 @@
 #include <utility>
 
 using namespace fptest_runner;
-using device::eventually;
-using device::read_file;
-using support::events_of;
-using support::outcomes;
-using support::parse_xml;
+using namespace device;
+using namespace support;
 using ::testing::ElementsAre;
 using ::testing::HasSubstr;
 using ::testing::SizeIs;

@@ -10,10 +10,7 @@
 #include <sys/stat.h>
 
 using namespace fptest_runner;
-using device::kPlanFile;
-using device::plan_of;
-using device::read_file;
-using device::write_file;
+using namespace device;
 using ::testing::EndsWith;
 using ::testing::SizeIs;
 using ::testing::StartsWith;

@@ -15,12 +15,8 @@
 #include <unistd.h>
 
 using namespace fptest_runner;
-using device::eventually;
-using device::read_file;
-using support::Element;
-using support::events_of;
-using support::parse_xml;
-using support::verdict_of;
+using namespace device;
+using namespace support;
 using ::testing::ElementsAre;
 using ::testing::HasSubstr;
 using ::testing::StartsWith;

@@ -11,11 +11,8 @@
 #include <sys/types.h>
 
 using namespace fptest_runner;
-using device::Lines;
-using device::processes_named;
-using device::set_vendor;
-using support::eventually;
-using support::read_file;
+using namespace device;
+using namespace support;
 using ::testing::EndsWith;
 using ::testing::SizeIs;
 using ::testing::StartsWith;

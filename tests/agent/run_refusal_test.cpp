@@ -8,11 +8,8 @@
 #include <filesystem>
 
 using namespace fptest_runner;
-using device::kPlanFile;
-using device::plan_of;
-using device::set_vendor;
-using support::read_file;
-using support::write_file;
+using namespace device;
+using namespace support;
 using ::testing::EndsWith;
 using ::testing::StartsWith;
 

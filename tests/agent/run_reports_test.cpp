@@ -11,20 +11,8 @@
 #include <unistd.h>
 
 using namespace fptest_runner;
-using device::kPlanFile;
-using device::Lines;
-using device::plan_of;
-using device::processes_named;
-using support::Element;
-using support::eventually;
-using support::parse_tap;
-using support::parse_xml;
-using support::read_file;
-using support::Tally;
-using support::tally_of_json;
-using support::tally_of_junit;
-using support::tally_of_tap;
-using support::Tap;
+using namespace device;
+using namespace support;
 using ::testing::EndsWith;
 using ::testing::StartsWith;
 

@@ -12,19 +12,8 @@
 #include <utility>
 
 using namespace fptest_runner;
-using device::Lines;
-using device::processes_named;
-using support::Element;
-using support::eventually;
-using support::parse_tap;
-using support::parse_xml;
-using support::Point;
-using support::read_file;
-using support::Tally;
-using support::tally_of_json;
-using support::tally_of_junit;
-using support::tally_of_tap;
-using support::Tap;
+using namespace device;
+using namespace support;
 using ::testing::Each;
 using ::testing::Not;
 using ::testing::SizeIs;

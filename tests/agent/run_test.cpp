@@ -10,12 +10,8 @@
 #include <unistd.h>
 
 using namespace fptest_runner;
-using device::kPlanFile;
-using device::Lines;
-using device::plan_of;
-using support::events_of;
-using support::read_file;
-using support::write_file;
+using namespace device;
+using namespace support;
 using ::testing::EndsWith;
 using ::testing::SizeIs;
 using ::testing::StartsWith;

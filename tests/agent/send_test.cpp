@@ -13,12 +13,7 @@
 #include <unistd.h>
 
 using namespace fptest_runner;
-using device::eventually;
-using device::kPlanFile;
-using device::plan_of;
-using device::processes_named;
-using device::read_file;
-using device::write_file;
+using namespace device;
 using ::testing::Not;
 
 namespace

@@ -16,11 +16,8 @@
 #include <unistd.h>
 
 using namespace fptest_runner;
-using device::kPlanFile;
-using device::read_file;
-using support::events_of;
-using support::outcomes;
-using support::parse_xml;
+using namespace device;
+using namespace support;
 using ::testing::ElementsAre;
 
 namespace

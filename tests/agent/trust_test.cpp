@@ -12,13 +12,8 @@
 #include <sys/stat.h>
 #include <unistd.h>
 
-using device::kPlanFile;
-using device::lines_of;
-using device::read_file;
-using device::start_program;
-using fptest_runner::expect_refusal;
-using fptest_runner::FptestProcess;
-using fptest_runner::run_fptest;
+using namespace device;
+using namespace fptest_runner;
 using ::testing::ElementsAre;
 using ::testing::HasSubstr;
 using ::testing::Not;

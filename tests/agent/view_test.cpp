@@ -11,9 +11,7 @@
 #include <regex>
 #include <unistd.h>
 
-using device::kPlanFile;
-using device::read_file;
-using device::write_file;
+using namespace device;
 using ::testing::Contains;
 using ::testing::Not;
 using ::testing::SizeIs;

@@ -23,9 +23,7 @@ namespace
 
 using namespace fptest;
 using namespace std::chrono_literals;
-using support::eventually;
-using support::read_file;
-using support::TemporaryDirectory;
+using namespace support;
 
 // A pipe; nobody reads it but on request.
 class Pipe

@@ -9,13 +9,8 @@
 #include <cstddef>
 #include <cstring>
 
-using platform::events;
-using platform::gives;
-using platform::left_open;
-using platform::limit;
-using platform::plan_steps;
-using sequences::levelled;
-using sequences::parsed;
+using namespace platform;
+using namespace sequences;
 
 namespace
 {

@@ -12,12 +12,7 @@
 #include <ostream>
 
 using namespace sequences;
-using platform::events;
-using platform::gives;
-using platform::left_open;
-using platform::plan_output;
-using platform::plan_steps;
-using platform::set_vendor;
+using namespace platform;
 using ::testing::Contains;
 using ::testing::Not;
 using ::testing::StartsWith;

@@ -6,12 +6,8 @@
 
 #include <cerrno>
 
-using platform::events;
-using platform::gives;
-using platform::plan_steps;
-using sequences::failed_launch;
-using sequences::launch;
-using sequences::launched;
+using namespace platform;
+using namespace sequences;
 
 namespace
 {

@@ -10,10 +10,7 @@
 #include <utility>
 
 using namespace sequences;
-using platform::events;
-using platform::gives;
-using platform::left_open;
-using platform::plan_steps;
+using namespace platform;
 
 namespace
 {

@@ -8,15 +8,8 @@
 #include <cstring>
 #include <memory>
 
-using platform::events;
-using platform::gives;
-using platform::left_open;
-using platform::plan_steps;
-using platform::plan_text;
-using platform::write_plan;
-using sequences::not_saved;
-using sequences::opened_to_save;
-using sequences::saved;
+using namespace platform;
+using namespace sequences;
 
 namespace
 {

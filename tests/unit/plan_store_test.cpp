@@ -9,11 +9,7 @@
 #include <memory>
 
 using namespace sequences;
-using platform::events;
-using platform::gives;
-using platform::left_open;
-using platform::plan_steps;
-using platform::write_plan;
+using namespace platform;
 
 namespace
 {

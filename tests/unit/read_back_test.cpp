@@ -12,13 +12,7 @@
 #include <ostream>
 #include <unistd.h>
 
-using platform::events;
-using platform::gives;
-using platform::left_open;
-using platform::limit;
-using platform::pass;
-using platform::plan_steps;
-using platform::write_plan;
+using namespace platform;
 using ::testing::AllOf;
 using ::testing::Contains;
 using ::testing::ExitedWithCode;

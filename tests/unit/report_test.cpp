@@ -9,12 +9,7 @@
 #include <cstring>
 
 using namespace sequences;
-using platform::events;
-using platform::gives;
-using platform::left_open;
-using platform::plan_steps;
-using platform::plan_text;
-using platform::write_plan;
+using namespace platform;
 using ::testing::Contains;
 
 namespace

@@ -8,13 +8,8 @@
 #include <algorithm>
 #include <cerrno>
 
-using platform::events;
-using platform::gives;
-using platform::left_open;
-using platform::plan_steps;
-using sequences::failed_launch;
-using sequences::launch;
-using sequences::launched;
+using namespace platform;
+using namespace sequences;
 
 namespace
 {

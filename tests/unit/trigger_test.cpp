@@ -7,9 +7,7 @@
 #include <cerrno>
 
 using namespace sequences;
-using platform::gives;
-using platform::left_open;
-using platform::plan_steps;
+using namespace platform;
 
 namespace
 {
