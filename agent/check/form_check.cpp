@@ -69,6 +69,8 @@ class FormChecker
         }
         report_values(text_.size());
         report_encoding();
+        report_dropped_character();
+        report_cut_declaration();
         const bool endless = report_endless_comments();
         std::string why;
         std::optional<Plan> plan = Plan::load_as_library(repaired_, &why);
@@ -238,6 +240,41 @@ class FormChecker
         if (offset != kNone && text_.find('\0') == kNone) {
             findings_.error(offset, "not UTF-8: the library looks at no encoding declaration, and "
                                     "would read something else here; save it as UTF-8");
+        }
+    }
+
+    // As a byte order mark, wherever it is.
+    void report_dropped_character()
+    {
+        for (const Tag &tag : tags_) {
+            for (const Attribute &attribute : tag.attributes) {
+                const std::size_t at = text_.find("\xEF\xBB\xBF", attribute.value_begin);
+                if (attribute.has_value && at < attribute.value_end) {
+                    findings_.warning(at, "the library would drop the character U+FEFF here; leave "
+                                          "it out, or write &#xFEFF;");
+                    return;
+                }
+            }
+        }
+    }
+
+    // Mini-XML ends one at its first '>', and takes the rest for text.
+    void report_cut_declaration()
+    {
+        const Tag *declaration = nullptr;
+        std::size_t depth = 0;
+        for (const Tag &tag : tags_) {
+            if (tag.kind == Tag::Kind::declaration && declaration == nullptr) {
+                declaration = &tag;
+            }
+            if (declaration != nullptr && depth == 0 && tag.kind == Tag::Kind::text) {
+                findings_.error(declaration->begin,
+                                "the library would end this declaration at its first '>', and the "
+                                "first report would leave a plan that is no XML; leave it out");
+                return;
+            }
+            depth += tag.kind == Tag::Kind::open ? 1 : 0;
+            depth -= tag.kind == Tag::Kind::close && depth > 0 ? 1 : 0;
         }
     }
 

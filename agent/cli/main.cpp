@@ -118,6 +118,7 @@ int main(int argc, char **argv)
     // a reader that has left is met as an error where it is written to
     std::signal(SIGPIPE, SIG_IGN);
     std::signal(SIGXFSZ, SIG_IGN); // as is a limit of a file's size
+    std::signal(SIGCHLD, SIG_DFL); // or nothing can be waited for, if the caller ignores it
     Exit status = Exit::success;
     try {
         status = CommandLine().run(argc, argv);

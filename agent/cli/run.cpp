@@ -99,6 +99,39 @@ Source open_plan(const RunOptions &options)
 
 // --- before the run -----------------------------------------------------------
 
+std::vector<std::string> words_of(std::string text)
+{
+    std::ranges::replace(text, '\0', ' ');
+    std::istringstream stream(text);
+    return {std::istream_iterator<std::string>(stream), {}};
+}
+
+// The library starts none where one runs, whatever the plan says.
+void tell_of_running_gatherer(const Work &work, const Plan &plan, const std::string &suffix)
+{
+    const std::string program = program_of(kGatherer, suffix);
+    const auto running = process_of_any({program});
+    if (!running) {
+        return;
+    }
+    const std::string started =
+        read_file(fmt::format("/proc/{}/cmdline", running->second)).value_or("");
+    for (const Job &job : work.jobs) {
+        for (const auto &target : job.targets) {
+            if (!target || work.suites[job.suite].items[target->item].name != kGatherer) {
+                continue;
+            }
+            const char *args = mxmlElementGetAttr(plan.elements()[target->element], "args");
+            if (words_of(started) != words_of(fmt::format("{} {}", program, args ? args : ""))) {
+                say("a gatherer is running already, as '{}': the library triggers that one, and "
+                    "starts none",
+                    one_line(fmt::format("{}", fmt::join(words_of(started), " "))));
+                return;
+            }
+        }
+    }
+}
+
 void require_programs(const Work &work, int vendor, bool force)
 {
     const std::string suffix = vendor_suffix(vendor).value_or("");
@@ -133,23 +166,15 @@ void require_programs(const Work &work, int vendor, bool force)
 
 void store(LibraryProcess &host, const std::string &text)
 {
-    const std::string stored = as_stored(text);
-    require_room(stored.size());
     send_and_wait(host, "XMLFile::" + text);
-    require_stored(host.read_back(), stored);
+    require_stored(host.read_back(), as_stored(text));
 }
 
 // For a plan that is longer than what a command stores.
-void place(const Source &source, bool quiet)
+void place(const std::string &text)
 {
-    require_room(source.text.size());
     const Descriptor lock = lock_stored_plan();
-    replace_stored_plan(source.text);
-    if (!quiet) {
-        say("{}: its {} bytes are more than the {} that a command stores, so it was placed as the "
-            "file {}",
-            one_line(source.name), source.text.size(), kPlanLimit, kStoredPlan);
-    }
+    replace_stored_plan(text);
 }
 
 void require_nothing_to_report_of_a_list(const RunOptions &options)
@@ -219,12 +244,27 @@ Exit run(RunOptions options)
 
     const Work work = work_of(paths, source.plan, options.as_group);
     require_programs(work, vendor, options.force);
-    if (source.use != PlanSource::stored) {
-        store(*host, source.text);
-    } else if (!options.plan.empty()) {
-        place(source, options.quiet);
-        host.emplace(); // the one before keeps the plan that was there when it was asked
+    if (!options.quiet) {
+        tell_of_running_gatherer(work, source.plan, vendor_suffix(vendor).value_or(""));
     }
+    const bool is_sent = source.use != PlanSource::stored;
+    const bool is_placed = !is_sent && !options.plan.empty();
+    if (is_sent || is_placed) {
+        require_room(is_sent ? as_stored(source.text).size() : source.text.size());
+    }
+    if (is_placed && !options.quiet) {
+        say("{}: its {} bytes are more than the {} that a command stores, so it is placed as the "
+            "file {}",
+            one_line(source.name), source.text.size(), kPlanLimit, kStoredPlan);
+    }
+    const auto store_plan = [&] {
+        if (is_sent) {
+            store(*host, source.text);
+        } else if (is_placed) {
+            place(source.text);
+            host.emplace(); // the one before keeps the plan that was there when it was asked
+        }
+    };
     Run run;
     run.plan = source.name;
     run.rounds = options.repeat;
@@ -240,7 +280,7 @@ Exit run(RunOptions options)
     for (const auto &listener : owned) {
         listeners.push_back(listener.get());
     }
-    return run_rounds(listeners, limits_of(options), *host, signals, run, work);
+    return run_rounds(listeners, limits_of(options), *host, signals, run, work, store_plan);
 }
 
 } // namespace

@@ -60,7 +60,8 @@ void print(const std::vector<Row> &rows)
 std::string read_shown(const std::string &file)
 {
     if (file.empty()) {
-        return require_stored_plan(": run one with fptest run --plan FILE, or name a file to show");
+        require_stored_plan(": run one with fptest run --plan FILE, or name a file to show");
+        return whole_stored_plan();
     }
     if (auto text = read_file(file)) {
         return *text;

@@ -265,12 +265,20 @@ Tests tests_of_round(const Run &run)
 namespace
 {
 
-// Whether there is an error for rounds that have not begun. Where their number is open
-// that is the next one, unless something else says that the run was cut off.
-bool has_rounds_left(const Run &run)
+// Whether there is an error for what is still to come: rounds that have not begun, or
+// the end of the run, unless something else says that it was cut off.
+bool has_rest(const Run &run)
 {
-    const bool is_open = !run.finished && (!run.rounds || run.round < *run.rounds);
-    return rounds_to_come(run) > 0 || (is_open && tests_of_round(run).errors == 0);
+    return rounds_to_come(run) > 0 || (!run.finished && tests_of_round(run).errors == 0);
+}
+
+std::string name_of_rest(const Run &run)
+{
+    const int first = run.round + 1;
+    if (rounds_to_come(run) > 1) {
+        return fmt::format("rounds {} to {}", first, *run.rounds);
+    }
+    return run.round == run.rounds ? "end of the run" : fmt::format("round {}", first);
 }
 
 } // namespace
@@ -279,7 +287,7 @@ std::string junit_head(const Run &run, const Tests &before)
 {
     Tests tests = before;
     tests += tests_of_round(run);
-    if (has_rounds_left(run)) {
+    if (has_rest(run)) {
         ++tests.all;
         ++tests.errors;
     }
@@ -311,20 +319,16 @@ std::string junit_how_it_stands(const Run &run)
 
 std::string junit_tail(const Run &run)
 {
-    if (!has_rounds_left(run)) {
+    if (!has_rest(run)) {
         return "</testsuites>\n";
     }
-    const int first = run.round + 1;
-    const std::string name = rounds_to_come(run) > 1
-                                 ? fmt::format("rounds {} to {}", first, *run.rounds)
-                                 : fmt::format("round {}", first);
     Tests tests;
     tests.all = 1;
     tests.errors = 1;
     return fmt::format("  <testsuite name=\"{0}\"{1}{2}{3}>\n    <testcase classname=\"rounds\" "
                        "name=\"{0}\"{2}>\n{4}    </testcase>\n  </testsuite>\n</testsuites>\n",
-                       name, attributes(tests), time_attribute(0), timestamp_attribute(run.start),
-                       not_run(run, "", false));
+                       name_of_rest(run), attributes(tests), time_attribute(0),
+                       timestamp_attribute(run.start), not_run(run, "", false));
 }
 
 } // namespace fptest

@@ -237,7 +237,8 @@ class TapReport : public Listener
             for (; item_ < suite.items.size() && (all || ended_[suite_][item_]); ++item_) {
                 text += item_point(run, suite.items[item_], item_ + 1);
             }
-            if (item_ < suite.items.size()) {
+            // the round's last point waits for the end of all that items have left running
+            if (item_ < suite.items.size() || (!all && suite_ + 1 == run.suites.size())) {
                 break;
             }
             text += suite_point(run, suite, ++points_);

@@ -97,25 +97,27 @@ class Rounds
     {
     }
 
-    // Until the run has finished, or has come to an early end.
-    void run_all()
+    // Whether all has been done that was asked for, and nothing of it runs any more.
+    bool run_all()
     {
         while (run_one()) {
-            if (run_.round == run_.rounds ||
-                (run_.time_limit && run_.seconds >= *run_.time_limit)) {
-                run_.finished = true;
-                return;
-            }
             runner_.end_round();
             if (!runner_.goes_on()) {
-                return;
+                return false;
+            }
+            if (is_last()) {
+                return true;
             }
             begin_next();
         }
+        if (!runner_.broken()) {
+            runner_.end_round();
+        }
+        return false;
     }
 
   private:
-    // Whether there may be another one.
+    // Whether it has come to its end.
     bool run_one()
     {
         for (Job job : work_.jobs) {
@@ -125,11 +127,16 @@ class Rounds
                 return false;
             }
             if (run_.until_fail && has_failed(job)) {
-                run_.finished = true;
-                return false;
+                break;
             }
         }
         return true;
+    }
+
+    bool is_last() const
+    {
+        return !run_.why_ended.empty() || run_.round == run_.rounds ||
+               (run_.time_limit && run_.seconds >= *run_.time_limit);
     }
 
     bool has_failed(const Job &job)
@@ -231,6 +238,15 @@ bool is_interrupted(const Signals &signals)
     return poll(&signal, 1, 100) > 0;
 }
 
+[[noreturn]] void run_nothing(const std::string &why, Run &run,
+                              const std::vector<Listener *> &begun, Signals &signals)
+{
+    run.why_unfinished = why;
+    finish(run, begun);
+    flush(begun, signals, true);
+    throw Failure(Exit::environment, "{}", why);
+}
+
 // The view first: it writes nothing over. Where one of them fails, those that have begun
 // say so.
 void begin(Run &run, const std::vector<Listener *> &listeners, Signals &signals)
@@ -241,10 +257,7 @@ void begin(Run &run, const std::vector<Listener *> &listeners, Signals &signals)
         begun.push_back(listener);
         const std::string failure = listener->failure();
         if (!failure.empty() && !is_interrupted(signals)) {
-            run.why_unfinished = fmt::format("{}; nothing was run", failure);
-            finish(run, begun);
-            flush(begun, signals, true);
-            throw Failure(Exit::environment, "{}", run.why_unfinished);
+            run_nothing(fmt::format("{}; nothing was run", failure), run, begun, signals);
         }
     }
 }
@@ -252,18 +265,22 @@ void begin(Run &run, const std::vector<Listener *> &listeners, Signals &signals)
 } // namespace
 
 Exit run_rounds(const std::vector<Listener *> &listeners, const Runner::Limits &limits,
-                LibraryProcess &host, Signals &signals, Run &run, const Work &work)
+                LibraryProcess &host, Signals &signals, Run &run, const Work &work,
+                const std::function<void()> &store)
 {
     run.suites = work.suites;
     run.start = std::chrono::system_clock::now();
     begin(run, listeners, signals);
+    try {
+        store();
+    } catch (const Failure &failure) {
+        run_nothing(failure.what(), run, listeners, signals);
+    }
     Runner runner(host, signals, run, listeners, limits);
     bool broken = false;
     try {
-        Rounds(runner, run, listeners, work).run_all();
+        run.finished = Rounds(runner, run, listeners, work).run_all();
         if (!runner.broken()) {
-            runner.end_round();
-            run.finished = run.finished && !runner.broken();
             clear_marks();
         }
     } catch (const Failure &failure) {

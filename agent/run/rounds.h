@@ -9,14 +9,17 @@
 #include "run/runner.h"
 #include "util/failure.h"
 
+#include <functional>
 #include <vector>
 
 namespace fptest
 {
 
 // How fptest is to end. Throws a Failure where the run, or one of its reports, could
-// not be carried through.
+// not be carried through. The plan is stored once each report has been begun; where that
+// throws a Failure, they are ended.
 Exit run_rounds(const std::vector<Listener *> &listeners, const Runner::Limits &limits,
-                LibraryProcess &host, Signals &signals, Run &run, const Work &work);
+                LibraryProcess &host, Signals &signals, Run &run, const Work &work,
+                const std::function<void()> &store);
 
 } // namespace fptest

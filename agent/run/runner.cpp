@@ -257,6 +257,7 @@ void Runner::start_next(const Job &job, std::size_t &next, const LibraryProcess:
 {
     vendor_ = event.value;
     const std::size_t at = next++;
+    more_to_come_ = next < job.targets.size();
     if (at >= job.targets.size() || !job.targets[at]) {
         return;
     }
@@ -312,7 +313,11 @@ void Runner::end_item(const LibraryProcess::Event &event)
         finish(active, active.moved_on_at);
         notify_ended();
     }
-    host_.go_on();
+    if (signal_ != 0 && more_to_come_) {
+        host_.kill_module(); // or it would start the next item of its command
+    } else {
+        host_.go_on();
+    }
 }
 
 // The library has gone on to its next item, or has returned: it was with the

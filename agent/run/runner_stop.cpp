@@ -159,7 +159,11 @@ void Runner::stop_gatherer(RunningItem &active, bool command_runs, SteadyClock::
 {
     if (command_runs && waited > kBeforeRelease) {
         active.was_stopped = true;
-        release_trigger();
+        if (signal_ != 0 && more_to_come_) {
+            host_.kill_module();
+        } else {
+            release_trigger();
+        }
     }
     const std::vector<Leftover> left = host_.processes().of_gatherer();
     if (&active != &active_.back() && signal_each(left, SIGTERM)) {

@@ -139,6 +139,37 @@ TEST_F(ItemEnd, InterruptionBetweenTwoRoundsBeginsNoOtherRound)
     EXPECT_EQ(events("finish").at(0).at("not_run"), 1);
 }
 
+TEST_F(ItemEnd, RunIsOverWhenAllThatItLeftRunningHasEnded)
+{
+    FptestProcess fptest(with_group(
+        {{"Item", "report G 100 0 fine; /system/bin/Third ignore-stop sleep 60 &amp;"}},
+        {"--grace", "3", "--tap", "--junit", work("junit")}));
+    ASSERT_TRUE(eventually([] { return events("end").size() == 1; }));
+    std::this_thread::sleep_for(std::chrono::milliseconds(1300)); // until JUnit is written again
+    EXPECT_THAT(junit(), HasSubstr("<testsuites name=\"fptest\" tests=\"2\" failures=\"0\" "
+                                   "errors=\"1\""));
+    EXPECT_THAT(junit(), HasSubstr("<testcase classname=\"rounds\" name=\"end of the run\""));
+    fptest.signal(SIGTERM);
+    const Ended ended = fptest.wait();
+    EXPECT_EQ(ended.status, 130);
+    EXPECT_THAT(ended.out, HasSubstr("Bail out!  interrupted by SIGTERM"));
+    EXPECT_EQ(events("finish").at(0).at("finished"), false);
+    EXPECT_THAT(junit(), HasSubstr("errors=\"1\""));
+}
+
+TEST_F(ItemEnd, InterruptionOfAGroupsCommandStartsNoOtherItem)
+{
+    FptestProcess fptest(with_group({{"Item", "note /tmp/scene/begun sleep 60"},
+                                     {"Other", "note /tmp/scene/other report G 100 0 fine"},
+                                     {"Third", "note /tmp/scene/other report G 100 0 fine"}},
+                                    {"--as-group"}));
+    ASSERT_TRUE(wait_for_file("begun"));
+    fptest.signal(SIGINT);
+    EXPECT_EQ(fptest.wait().status, 130);
+    EXPECT_THAT(outcomes(), ElementsAre("Item: stopped", "Other: not run", "Third: not run"));
+    EXPECT_FALSE(is_there("other"));
+}
+
 TEST_F(ItemEnd, HangUpAfterAnInterruptionIsTheSameInterruption)
 {
     for (const int first : {SIGINT, SIGHUP}) {

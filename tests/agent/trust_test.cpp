@@ -459,3 +459,43 @@ TEST_F(Trust, TakesNoFifoAndNoDirectoryForThePlan)
     }
     std::filesystem::remove(kPlanFile);
 }
+
+// --- the caller's ways -----------------------------------------------------------------
+
+TEST_F(Trust, KnowsHowItemsEndWhereItsCallerIgnoresTheEndsOfChildren)
+{
+    plan("<P><CmdGroup name=\"G\">"
+         "<Cmd name=\"Item\" args=\"report G 100 0 fine; kill -SEGV $$\"/></CmdGroup></P>");
+    support::Start start;
+    start.arguments = {FPTEST_PROGRAM, "run", "--plan", work("plan.xml"), "P/G"};
+    start.prepare = [] { std::signal(SIGCHLD, SIG_IGN); };
+    const support::Ended ended = support::run(start);
+    EXPECT_EQ(ended.status, 1);
+    EXPECT_THAT(ended.out, HasSubstr("G/Item: failed, result 0, died by SIGSEGV"));
+}
+
+TEST_F(Trust, StoresNothingWhereAReportCannotBeWritten)
+{
+    write_file(kPlanFile, kOnePasses);
+    for (const bool is_long : {false, true}) {
+        const std::string other =
+            plan(plan_of({{"Other", {{"Item", std::string(is_long ? 3000 : 1, 'x')}}}}));
+        const Ended ended =
+            run_fptest({"run", "--json", "/dev/full", "--plan", other, "P/Other"});
+        EXPECT_EQ(ended.status, 3);
+        EXPECT_THAT(ended.err, HasSubstr("No space left on device; nothing was run"));
+        EXPECT_EQ(read_file(kPlanFile), kOnePasses);
+    }
+}
+
+TEST_F(Trust, ShowWaitsForAPlanThatIsBeingWritten)
+{
+    const std::string whole = kOnePasses;
+    write_file(kPlanFile, whole.substr(0, whole.size() / 2));
+    std::thread writer([&] {
+        std::this_thread::sleep_for(std::chrono::milliseconds(200));
+        write_file(kPlanFile, whole);
+    });
+    EXPECT_EQ(run_fptest({"show"}).status, 0);
+    writer.join();
+}
