@@ -8,7 +8,7 @@
 #include <clocale>
 #include <cmath>
 #include <cwchar>
-#include <fmt/chrono.h>
+#include <fmt/core.h>
 #include <numeric>
 #include <utf8.h>
 #include <utility>
@@ -365,9 +365,13 @@ std::vector<std::string> aligned(const std::vector<std::vector<std::string>> &ro
 std::string timestamp(std::chrono::system_clock::time_point time)
 {
     using namespace std::chrono;
-    const auto whole = floor<std::chrono::seconds>(time);
-    const auto fraction = floor<milliseconds>(time - whole).count();
-    return fmt::format("{:%FT%T}.{:03}Z", fmt::gmtime(system_clock::to_time_t(whole)), fraction);
+    const auto day = floor<days>(time);
+    const year_month_day date(day);
+    const hh_mm_ss clock(floor<milliseconds>(time - day));
+    return fmt::format("{:04}-{:02}-{:02}T{:02}:{:02}:{:02}.{:03}Z", static_cast<int>(date.year()),
+                       static_cast<unsigned>(date.month()), static_cast<unsigned>(date.day()),
+                       clock.hours().count(), clock.minutes().count(), clock.seconds().count(),
+                       clock.subseconds().count());
 }
 
 } // namespace fptest
