@@ -141,9 +141,9 @@ TEST_F(ItemEnd, InterruptionBetweenTwoRoundsBeginsNoOtherRound)
 
 TEST_F(ItemEnd, RunIsOverWhenAllThatItLeftRunningHasEnded)
 {
-    FptestProcess fptest(with_group(
-        {{"Item", "report G 100 0 fine; /system/bin/Third ignore-stop sleep 60 &amp;"}},
-        {"--grace", "3", "--tap", "--junit", work("junit")}));
+    FptestProcess fptest(
+        with_group({{"Item", "report G 100 0 fine; /system/bin/Third ignore-stop sleep 60 &amp;"}},
+                   {"--grace", "3", "--tap", "--junit", work("junit")}));
     ASSERT_TRUE(eventually([] { return events("end").size() == 1; }));
     std::this_thread::sleep_for(std::chrono::milliseconds(1300)); // until JUnit is written again
     EXPECT_THAT(junit(), HasSubstr("<testsuites name=\"fptest\" tests=\"2\" failures=\"0\" "

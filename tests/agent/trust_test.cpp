@@ -480,8 +480,7 @@ TEST_F(Trust, StoresNothingWhereAReportCannotBeWritten)
     for (const bool is_long : {false, true}) {
         const std::string other =
             plan(plan_of({{"Other", {{"Item", std::string(is_long ? 3000 : 1, 'x')}}}}));
-        const Ended ended =
-            run_fptest({"run", "--json", "/dev/full", "--plan", other, "P/Other"});
+        const Ended ended = run_fptest({"run", "--json", "/dev/full", "--plan", other, "P/Other"});
         EXPECT_EQ(ended.status, 3);
         EXPECT_THAT(ended.err, HasSubstr("No space left on device; nothing was run"));
         EXPECT_EQ(read_file(kPlanFile), kOnePasses);
