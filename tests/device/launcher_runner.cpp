@@ -115,3 +115,12 @@ void NamespaceDevice::SetUp()
 }
 
 } // namespace launcher
+
+int main(int argc, char **argv)
+{
+    if (argc > 1 && std::string(argv[1]) == launcher::say_signals_option) {
+        return launcher::say_signals();
+    }
+    testing::InitGoogleTest(&argc, argv);
+    return RUN_ALL_TESTS();
+}

@@ -52,17 +52,10 @@ def status_of(process, seconds=60):
 
 def run(*words, text="", **options):
     """Runs a program to its end, with that text as its input."""
-    # files, as a pipe stays open for what the program leaves running
-    with contextlib.ExitStack() as stack:
-        streams = [stack.enter_context(tempfile.TemporaryFile()) for _ in range(3)]
-        streams[0].write(text.encode())
-        streams[0].seek(0)
-        process = stack.enter_context(started(
-            *words, stdin=streams[0], stdout=streams[1], stderr=streams[2], **options))
-        status = status_of(process)
-        for stream in streams:
-            stream.seek(0)
-        return Outcome(status, streams[1].read().decode(), streams[2].read().decode())
+    pipes = {"stdin": subprocess.PIPE, "stdout": subprocess.PIPE, "stderr": subprocess.PIPE}
+    with started(*words, **pipes | options) as process:
+        out, err = process.communicate(text.encode(), 60)
+        return Outcome(status_of(process), out.decode(), err.decode())
 
 
 def eventually(condition, seconds=10):
