@@ -54,6 +54,8 @@ def reports(err):
      'progress="100" result="1" description="3 dead pixels, limit 2"'),
     ("FingerWait", 1, [(-2, 0), (-2, 100)],
      'progress="100" result="-2" description="no finger within 0.05 s"'),
+    ("BurnIn", 0, [(-2, progress) for progress in range(0, 100, 5)] + [(0, 100)],
+     'progress="100" result="0" description="stable for 0.05 s"'),
 ])
 def test_items_report_their_steps_and_end_as_they_report(item, status, reported, last,
                                                          data):
@@ -61,16 +63,6 @@ def test_items_report_their_steps_and_end_as_they_report(item, status, reported,
 
     assert (outcome.status, reports(outcome.err)) == (status, reported)
     assert data.report(item) == last
-
-
-def test_burnin_reports_now_and_then_and_passes_in_the_end(data):
-    status, _, err = data.shell("BurnIn --group sensor --seconds 0.1")
-
-    assert status == 0
-    assert len(reports(err)) == 21
-    assert reports(err)[1] == (-2, 5)
-    assert data.report("BurnIn") == (
-        'progress="100" result="0" description="stable for 0.1 s"')
 
 
 def test_burnin_is_still_running_after_a_while_and_ends_by_sigterm(data):
@@ -87,19 +79,14 @@ def test_quietrun_never_reports(data):
     assert content(data.plan) == PLAN
 
 
-def test_vendor_variants_report_under_the_plans_name(data):
-    data.shell("DeadPixel_ca --group sensor --seconds 0; "
-               "FingerWait_ca_qsee --group sensor --seconds 0")
+@pytest.mark.parametrize("command, item", [
+    ("DeadPixel_ca", "DeadPixel"), ("FingerWait_ca_qsee", "FingerWait"),
+    ("DeadPixel --item QuietRun", "QuietRun")])
+def test_items_report_under_the_plans_name_or_the_one_given(command, item, data):
+    data.shell(f"{command} --group sensor --seconds 0")
 
-    assert data.report("DeadPixel") != ""
-    assert data.report("FingerWait") != ""
-
-
-def test_items_report_under_the_name_given(data):
-    data.shell("DeadPixel --group sensor --item QuietRun --seconds 0")
-
-    assert data.report("DeadPixel") == ""
-    assert data.report("QuietRun") != ""
+    assert data.report(item) != ""
+    assert content(data.plan).count("progress=") == 1
 
 
 def test_items_do_not_undo_each_others_reports(data):
@@ -144,13 +131,12 @@ def test_items_say_in_one_line_what_is_wrong_with_their_options(command, complai
 
 # ---- the gatherer ------------------------------------------------------------------------
 
-def say(text):
-    """Listens once on the library's port and says that."""
-    return f"printf '{text}' | timeout 5 netcat -l -p 34952 >/dev/null; "
+LISTENER = " | timeout 5 netcat -l -p 34952 >/dev/null; "
+GATHER = "printf 'gather again!'" + LISTENER
 
 
-def gatherers_complaints(data, saying, until):
-    """Starts a gatherer, speaks to it, and gives it time to come to a gathering; it runs
+def tell_gatherer(data, saying, until):
+    """Starts a gatherer, speaks to it, gives it time to come so far, and sees that it runs
     on. What it complained of."""
     _, out, err = data.shell(
         f"/system/bin/SensorProbe --group sensor --seconds 0.02 & {saying}"
@@ -162,33 +148,25 @@ def gatherers_complaints(data, saying, until):
     return [line for line in err.splitlines() if line.startswith("SensorProbe: ")]
 
 
-def test_the_gatherer_gathers_each_time_it_is_told(data):
-    assert not gatherers_complaints(data, 2 * say("gather again!"), "gathering 2")
-    assert data.report("SensorProbe") == GATHERED.format(2)
-    assert content(data.directory / "readings.txt").startswith("gatherings 2\n")
+@pytest.mark.parametrize("saying, times, complaints", [
+    (GATHER + GATHER, 2, []),
+    ("(printf gather; sleep 0.1; printf ' again!')" + LISTENER, 1, []),
+    ("printf gather" + LISTENER + GATHER, 1,
+     ["SensorProbe: the trigger ended after 6 of 13 bytes"]),
+    ("printf hello" + LISTENER + GATHER, 1,
+     ['SensorProbe: the trigger is not "gather again!"']),
+], ids=["twice", "in pieces", "after one cut short", "after a wrong one"])
+def test_the_gatherer_gathers_each_time_it_is_told(saying, times, complaints, data):
+    assert tell_gatherer(data, saying, f"gathering {times}") == complaints
+    assert data.report("SensorProbe") == GATHERED.format(times)
+    assert content(data.directory / "readings.txt").startswith(f"gatherings {times}\n")
 
 
 def test_the_gatherer_does_nothing_until_it_is_told(data):
-    gatherers_complaints(data, "", "no gathering at all")
+    tell_gatherer(data, "", "no gathering at all")
 
     assert data.report("SensorProbe") == ""
     assert not (data.directory / "readings.txt").exists()
-
-
-@pytest.mark.parametrize("trigger, complaint", [
-    ("gather", "SensorProbe: the trigger ended after 6 of 13 bytes"),
-    ("hello", 'SensorProbe: the trigger is not "gather again!"')])
-def test_the_gatherer_outlives_a_wrong_trigger(trigger, complaint, data):
-    assert gatherers_complaints(data, say(trigger) + say("gather again!"),
-                                "gathering 1") == [complaint]
-    assert data.report("SensorProbe") == GATHERED.format(1)
-
-
-def test_the_gatherer_puts_a_trigger_together_that_comes_in_pieces(data):
-    gatherers_complaints(data, "(printf gather; sleep 0.1; printf ' again!') | "
-                               "timeout 5 netcat -l -p 34952 >/dev/null; ", "gathering 1")
-
-    assert data.report("SensorProbe") == GATHERED.format(1)
 
 
 def test_the_gatherer_of_vendor_two_gathers_once_and_ends(data):
