@@ -65,10 +65,12 @@ def test_with_out_a_plan_is_looked_for_there_and_then_in_the_callers_directory(c
     assert with_out("results", caller, "fptest", "check", "plans/demo.xml").status == 1
 
 
-def test_with_out_a_command_of_the_callers_directory_is_found(caller):
+def test_with_out_a_command_is_looked_for_there_and_then_in_the_callers_directory(caller):
     make_program(caller / "mine", "#!/system/bin/sh\npwd\n")
-
     assert with_out("results", caller, "./mine").out == f"{caller}/results\n"
+
+    make_program(caller / "results/mine", "#!/system/bin/sh\necho another\n")
+    assert with_out("results", caller, "./mine").out == "another\n"
 
 
 # ---- where reports go without it ---------------------------------------------------------
