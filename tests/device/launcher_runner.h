@@ -54,11 +54,6 @@ Outcome shell(const std::string &script, const Words &options = {},
 // What device/run has against the command line; it starts nothing then.
 Outcome refused(const Words &arguments, const Surroundings &surroundings = {});
 
-// This program itself as COMMAND: it says "ready" and what signals it gets, and ends with
-// 7 half a second after the last one.
-inline constexpr const char *say_signals_option = "--say-signals";
-int say_signals();
-
 using support::eventually;
 
 // ---- texts ------------------------------------------------------------------

@@ -439,9 +439,6 @@ int main(int argc, char **argv)
     if (argc > 1 && std::string(argv[1]) == call_the_libc) {
         return print_the_shell_of_the_libc();
     }
-    if (argc > 1 && std::string(argv[1]) == say_signals_option) {
-        return say_signals();
-    }
     testing::InitGoogleTest(&argc, argv);
     return RUN_ALL_TESTS();
 }
