@@ -5,6 +5,7 @@ what comes of it."""
 import collections
 import contextlib
 import functools
+import itertools
 import os
 import pathlib
 import signal
@@ -73,6 +74,23 @@ def eventually(condition, seconds=10):
 SIGNAL_SAYER = ("/usr/bin/python3", TREE / "tests/support/say_signals.py")
 
 
+lengths = itertools.count()
+
+
+def unique_length():
+    """A length to sleep that nobody else on this machine has."""
+    return f"9{os.getpid()}.{next(lengths)}"
+
+
+def is_running(word):
+    """Whether a process of this machine has that word among its arguments."""
+    for arguments in pathlib.Path("/proc").glob("[0-9]*/cmdline"):
+        with contextlib.suppress(OSError):  # it has ended
+            if word.encode() in arguments.read_bytes().split(b"\0"):
+                return True
+    return False
+
+
 # ---- files ---------------------------------------------------------------------------
 
 def content(path):
@@ -109,6 +127,35 @@ def way():
     """What the device is here: "namespace", "in-place", or "" where it does not start."""
     known = os.environ.get("QUILLMARK_TEST_WAY")
     return on_device("printenv", "QUILLMARK_DEVICE").out.strip() if known is None else known
+
+
+# What device/run says of a COMMAND that is not ended by SIGTERM.
+GOES_ON = "device/run: COMMAND goes on 10 s after SIGTERM, and is ended with its device\n"
+
+
+class SignalledDevice:
+    """A device in a process group of its own; what it says goes to a file."""
+
+    def __init__(self, process, said):
+        self.process = process
+        self.said = said
+
+    def out(self):
+        """What it has said, but for what device/run says of being in place."""
+        lines = content(self.said).splitlines(keepends=True)
+        return "".join(one for one in lines if not one.startswith("device/run: in place: "))
+
+    def says(self, text):
+        return eventually(lambda: text in self.out())
+
+    def signal(self, number):
+        os.kill(self.process.pid, number)
+
+    def signal_group(self, number):
+        os.killpg(self.process.pid, number)
+
+    def status(self):
+        return status_of(self.process)
 
 
 # ---- a machine to try device/run on that changes the root it runs in -----------------
