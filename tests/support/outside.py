@@ -1,0 +1,162 @@
+# SPDX-FileCopyrightText: 2026 The Quillmark authors
+# SPDX-License-Identifier: Apache-2.0
+"""What is tried from outside: programs as a person or a test runner starts them, and
+what comes of it."""
+import collections
+import contextlib
+import functools
+import os
+import pathlib
+import signal
+import subprocess
+import tempfile
+import time
+
+TREE = pathlib.Path(__file__).resolve().parents[2]
+BUILD = pathlib.Path(os.environ.get("QUILLMARK_BUILD") or TREE / "build/release")
+DEVICE_RUN = TREE / "device/run"
+
+# Programs are started as a shell in front starts them, however the tests were.
+for number in (signal.SIGHUP, signal.SIGINT, signal.SIGQUIT, signal.SIGTERM):
+    if signal.getsignal(number) == signal.SIG_IGN:
+        signal.signal(number, signal.SIG_DFL)
+
+
+# ---- programs ------------------------------------------------------------------------
+
+# The status is as a shell has it: 128 + N for signal N.
+Outcome = collections.namedtuple("Outcome", "status out err")
+
+
+@contextlib.contextmanager
+def started(*words, env=None, **options):
+    """The process of a program with these words, killed in the end if it is still there.
+
+    A variable of env that is None is taken away; the options are those of Popen."""
+    variables = os.environ | {"container": None, "LC_ALL": "C", "QUILLMARK_BUILD": BUILD}
+    variables |= env or {}
+    variables = {name: value for name, value in variables.items() if value is not None}
+    process = subprocess.Popen(words, env=variables, **{"cwd": TREE} | options)
+    try:
+        yield process
+    finally:
+        process.kill()
+        process.wait()
+
+
+def status_of(process, seconds=60):
+    """With what it ends within that time."""
+    status = process.wait(seconds)
+    return status if status >= 0 else 128 - status
+
+
+def run(*words, text="", **options):
+    """Runs a program to its end, with that text as its input."""
+    # files, as a pipe stays open for what the program leaves running
+    with contextlib.ExitStack() as stack:
+        streams = [stack.enter_context(tempfile.TemporaryFile()) for _ in range(3)]
+        streams[0].write(text.encode())
+        streams[0].seek(0)
+        process = stack.enter_context(started(
+            *words, stdin=streams[0], stdout=streams[1], stderr=streams[2], **options))
+        status = status_of(process)
+        for stream in streams:
+            stream.seek(0)
+        return Outcome(status, streams[1].read().decode(), streams[2].read().decode())
+
+
+def eventually(condition, seconds=10):
+    """Whether the condition holds, now or within that time."""
+    end = time.monotonic() + seconds
+    while not condition():
+        if time.monotonic() >= end:
+            return False
+        time.sleep(0.01)
+    return True
+
+
+# Words of a COMMAND that says "ready" and what signals it gets, and ends with 7 half a
+# second after the last one.
+SIGNAL_SAYER = ("/usr/bin/python3", TREE / "tests/support/say_signals.py")
+
+
+# ---- files ---------------------------------------------------------------------------
+
+def content(path):
+    """The text of a file: nothing of one that is not there."""
+    try:
+        return pathlib.Path(path).read_bytes().decode()
+    except FileNotFoundError:
+        return ""
+
+
+def make_program(path, script):
+    path.write_text(script)
+    path.chmod(0o700)
+
+
+# ---- the device ----------------------------------------------------------------------
+
+# What ps prints first.
+PS_HEADER = "USER     PID   PPID  VSIZE  RSS     WCHAN    PC         NAME"
+
+
+def on_device(*command, options=(), **others):
+    """Runs COMMAND on the device that has these options of device/run."""
+    return run(DEVICE_RUN, *options, "--", *command, **others)
+
+
+def shell(script, **others):
+    """Runs a script of the device's shell."""
+    return on_device("sh", "-c", script, **others)
+
+
+@functools.cache
+def way():
+    """What the device is here: "namespace", "in-place", or "" where it does not start."""
+    known = os.environ.get("QUILLMARK_TEST_WAY")
+    return on_device("printenv", "QUILLMARK_DEVICE").out.strip() if known is None else known
+
+
+# ---- a machine to try device/run on that changes the root it runs in -----------------
+
+def libraries():
+    for path in pathlib.Path("/").glob("lib*"):
+        if path.is_symlink():
+            yield from ("--symlink", path.readlink(), path)
+        else:
+            yield from ("--ro-bind", path, path)
+
+
+def on_machine(script, refuses_namespaces=True, is_container=False, user=0, sysctls=None,
+               options=()):
+    """Runs a script, whose $1 is device/run, in a sandbox with a root of its own.
+
+    Unless told otherwise it refuses further namespaces and shows no sign of a container.
+    The sysctls are a machine's own values in the place of the kernel's: what is not among
+    them is not there, but for what bwrap itself wants to read. The options are bwrap's."""
+    # A nested /proc can be mounted only where the outer one has nothing on top, as the
+    # one of bwrap's own making has.
+    words = (f"bwrap --unshare-user --uid {user} --gid {user} --disable-userns "
+             "--unshare-pid --proc /proc" if refuses_namespaces else
+             "unshare --user --map-root-user --mount --pid --fork --mount-proc "
+             "--kill-child bwrap --bind /proc /proc").split()
+    words += ("--die-with-parent --unshare-net --unshare-ipc --unshare-uts "
+              "--unshare-cgroup-try --ro-bind /usr /usr --dev /dev --tmpfs /tmp --dir /run "
+              "--dir /var/lib --dir /etc --ro-bind /etc/passwd /etc/passwd --dir /bin "
+              "--symlink /usr/bin/mksh /bin/mksh --symlink /usr/bin/dash /bin/sh").split()
+    words += [*libraries(), "--ro-bind", TREE, TREE, "--ro-bind", BUILD, BUILD]
+    if is_container:
+        words += ["--symlink", "/dev/null", "/.dockerenv"]
+    with tempfile.TemporaryDirectory() as directory:
+        if sysctls:
+            words += ["--tmpfs", "/proc/sys"]
+            sysctls = {"kernel/overflowuid": 65534, "kernel/overflowgid": 65534} | sysctls
+            for key, value in sysctls.items():
+                file = pathlib.Path(directory, key)
+                file.parent.mkdir(exist_ok=True)
+                file.write_text(f"{value}\n")
+                words += ["--ro-bind", file, f"/proc/sys/{key}"]
+        words += [*options, "--chdir", "/", "--setenv", "PATH", "/usr/sbin:/usr/bin",
+                  "--", "bash", "-c", script, DEVICE_RUN, DEVICE_RUN]
+        return run(*words)
