@@ -8,6 +8,7 @@ import functools
 import itertools
 import os
 import pathlib
+import re
 import signal
 import subprocess
 import tempfile
@@ -59,6 +60,13 @@ def run(*words, text="", **options):
         return Outcome(status_of(process), out.decode(), err.decode())
 
 
+def output_of(*words, **options):
+    """What a program prints that succeeds."""
+    outcome = run(*words, **options)
+    assert outcome.status == 0, f"{words}\n{outcome.out}{outcome.err}"
+    return outcome.out
+
+
 def eventually(condition, seconds=10):
     """Whether the condition holds, now or within that time."""
     end = time.monotonic() + seconds
@@ -104,6 +112,27 @@ def content(path):
 def make_program(path, script):
     path.write_text(script)
     path.chmod(0o700)
+
+
+# ---- builds --------------------------------------------------------------------------
+
+# What the build was configured with.
+CACHE = dict(re.findall(r"^(\w+):\w+=(.*)", content(BUILD / "CMakeCache.txt"), re.M))
+
+
+def configure(directory, *options, **others):
+    """Configures a build there. The status, and what was said, a blank after each word."""
+    outcome = run("cmake", "-B", directory, *options, **others)
+    return outcome.status, " ".join((outcome.out + outcome.err).split()) + " "
+
+
+def install_library(directory, *options):
+    """Builds the library alone in the directory, and installs it. Gives the prefix."""
+    build, prefix = directory / "build", directory / "prefix"
+    output_of("cmake", "-S", TREE, "-B", build, "-DQUILLMARK_BUILD_TOOLS=OFF", *options)
+    output_of("cmake", "--build", build)
+    output_of("cmake", "--install", build, "--prefix", prefix)
+    return prefix
 
 
 # ---- the device ----------------------------------------------------------------------

@@ -1,0 +1,51 @@
+# SPDX-FileCopyrightText: 2026 The Quillmark authors
+# SPDX-License-Identifier: Apache-2.0
+"""What becomes of the library where clang, lld, musl and the linker's options of an
+Android preset stand in the place of an NDK."""
+import platform
+import re
+import shutil
+
+import pytest
+from libraries import INTERFACE, entries_of, exports_of, make_makers_libraries
+from support.outside import CACHE, TREE, output_of
+
+MUSL = "x86_64-linux-musl"
+TOOLCHAIN = f"""
+set(CMAKE_SYSTEM_NAME Android)
+set(CMAKE_SYSTEM_VERSION 1)
+set(CMAKE_C_COMPILER clang)
+set(CMAKE_CXX_COMPILER clang++)
+set(CMAKE_C_COMPILER_TARGET x86_64-linux-android28)
+set(CMAKE_CXX_COMPILER_TARGET x86_64-linux-android28)
+set(CMAKE_TRY_COMPILE_TARGET_TYPE STATIC_LIBRARY)
+set(CMAKE_CXX_FLAGS_INIT "-nostdlibinc -nostdinc++ -isystem /usr/include/{MUSL}")
+set(CMAKE_SHARED_LINKER_FLAGS_INIT "-nostdlib -fuse-ld=lld -L/usr/lib/{MUSL} -lc")
+"""
+
+
+@pytest.mark.skipif(platform.machine() != "x86_64",
+                    reason="the emulator's preset, but another machine")
+def test_it_is_a_small_one_for_16_kilobyte_pages_with_the_makers_own(tmp_path):
+    toolchain = tmp_path / "build/cmake/android.toolchain.cmake"
+    toolchain.parent.mkdir(parents=True)
+    toolchain.write_text(TOOLCHAIN)
+    # alone, without its neighbours
+    shutil.copy(CACHE["MINIXML_INCLUDE_DIR"] + "/mxml.h", tmp_path)
+    output_of("cmake", "--preset", "android-x86_64", "-B", tmp_path / "built",
+              f"-DMINIXML_INCLUDE_DIR={tmp_path}",
+              f"-DMINIXML_LIBRARY={CACHE['MINIXML_LIBRARY']}",
+              f"-DVORLANE_LIBRARIES={make_makers_libraries(tmp_path)}",
+              cwd=TREE, env={"ANDROID_NDK_ROOT": tmp_path})
+    output_of("cmake", "--build", tmp_path / "built")
+
+    library = tmp_path / "built/libquillmark.so"
+    assert not library.is_symlink(), "Android knows no versions of libraries"
+    assert entries_of(library, "SONAME") == ["libquillmark.so"]
+    assert (entries_of(library, "NEEDED") ==
+            ["libc.so", "libmaker.so", "libmakerlog.so", "libmxml.so.1"])
+    assert exports_of(library) == INTERFACE
+    listing = output_of("readelf", "--segments", "--sections", "--wide", library)
+    assert set(re.findall(r"^ *LOAD .* (\S+)$", listing, re.M)) == {"0x4000"}
+    assert ".symtab" not in listing
+    assert library.stat().st_size <= 24 * 1024
