@@ -6,7 +6,6 @@
 #include "module/preflight.h"
 #include "module/stored_plan.h"
 #include "plan/plan_text.h"
-#include "run/trigger.h"
 #include "util/files.h"
 #include "util/text.h"
 
@@ -313,8 +312,8 @@ void Runner::end_item(const LibraryProcess::Event &event)
         finish(active, active.moved_on_at);
         notify_ended();
     }
-    if (signal_ != 0 && more_to_come_) {
-        host_.kill_module(); // or it would start the next item of its command
+    if (starts_no_more()) {
+        host_.kill_module();
     } else {
         host_.go_on();
     }

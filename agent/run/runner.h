@@ -134,6 +134,8 @@ class Runner
     void stop_what_is_due(bool command_runs);
     void try_stop(RunningItem &active, bool command_runs);
     void stop_gatherer(RunningItem &active, bool command_runs, SteadyClock::duration waited);
+    void release_command();
+    bool starts_no_more() const;
     void note_stop(const LibraryProcess::Event &event);
     void cannot_stop(RunningItem &active);
     std::vector<Leftover> item_processes() const;

@@ -7,7 +7,6 @@
 
 #include "module/stored_plan.h"
 #include "plan/plan_text.h"
-#include "run/trigger.h"
 
 #include <algorithm>
 #include <sys/stat.h>
@@ -104,7 +103,7 @@ void Runner::poll_gatherer(RunningItem &active)
     active.gatherer_end = active.moved_on ? "the gatherer ended before it had reported"
                                           : "the gatherer ended before it connected";
     if (!active.moved_on) {
-        release_trigger();
+        release_command();
     }
 }
 

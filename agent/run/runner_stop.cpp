@@ -155,15 +155,28 @@ void Runner::try_stop(RunningItem &active, bool command_runs)
     }
 }
 
+// The command waits for a gatherer that does not come.
+void Runner::release_command()
+{
+    if (starts_no_more()) {
+        host_.kill_module();
+    } else {
+        release_trigger();
+    }
+}
+
+// Whether the items that the command would come to next are not to be started: only the
+// end of the library's process keeps it from them.
+bool Runner::starts_no_more() const
+{
+    return signal_ != 0 && more_to_come_;
+}
+
 void Runner::stop_gatherer(RunningItem &active, bool command_runs, SteadyClock::duration waited)
 {
     if (command_runs && waited > kBeforeRelease) {
         active.was_stopped = true;
-        if (signal_ != 0 && more_to_come_) {
-            host_.kill_module();
-        } else {
-            release_trigger();
-        }
+        release_command();
     }
     const std::vector<Leftover> left = host_.processes().of_gatherer();
     if (&active != &active_.back() && signal_each(left, SIGTERM)) {

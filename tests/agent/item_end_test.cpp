@@ -157,19 +157,6 @@ TEST_F(ItemEnd, RunIsOverWhenAllThatItLeftRunningHasEnded)
     EXPECT_THAT(junit(), HasSubstr("errors=\"1\""));
 }
 
-TEST_F(ItemEnd, InterruptionOfAGroupsCommandStartsNoOtherItem)
-{
-    FptestProcess fptest(with_group({{"Item", "note /tmp/scene/begun sleep 60"},
-                                     {"Other", "note /tmp/scene/other report G 100 0 fine"},
-                                     {"Third", "note /tmp/scene/other report G 100 0 fine"}},
-                                    {"--as-group"}));
-    ASSERT_TRUE(wait_for_file("begun"));
-    fptest.signal(SIGINT);
-    EXPECT_EQ(fptest.wait().status, 130);
-    EXPECT_THAT(outcomes(), ElementsAre("Item: stopped", "Other: not run", "Third: not run"));
-    EXPECT_FALSE(is_there("other"));
-}
-
 TEST_F(ItemEnd, HangUpAfterAnInterruptionIsTheSameInterruption)
 {
     for (const int first : {SIGINT, SIGHUP}) {

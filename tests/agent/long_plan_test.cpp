@@ -51,7 +51,7 @@ Plan plan_of_groups(int count, const std::string &description)
 std::string placed(const std::string &name, const std::string &text)
 {
     return "fptest: " + name + ": its " + std::to_string(text.size()) +
-           " bytes are more than the 2048 that a command stores, so it was placed as the file "
+           " bytes are more than the 2048 that a command stores, so it is placed as the file "
            "/data/vorlane/src1.xml\n";
 }
 

@@ -63,7 +63,12 @@ TEST_F(Reports, AgreeOnTheCountsOfAnyRun)
         const std::string json = json_of(run);
         const std::string text = tap_of(run);
         EXPECT_EQ(tally_of_json(json), expected);
-        EXPECT_EQ(tally_of_junit(junit_of(run)), expected);
+        const std::string junit = junit_of(run);
+        const bool is_cut_at_end = junit.find("name=\"end of the run\"") != junit.npos;
+        Tally with_end = expected;
+        with_end.not_run += is_cut_at_end ? 1 : 0;
+        EXPECT_EQ(tally_of_junit(junit), with_end);
+        EXPECT_TRUE(run.finished ? !is_cut_at_end : junit.find("<error") != junit.npos);
         EXPECT_EQ(tally_of_tap(text), expected);
         EXPECT_EQ(events_of(json).back().at("finished"), run.finished);
         const Tap tap = parse_tap(text);
@@ -96,7 +101,9 @@ TEST_F(Reports, AreReadableAndUnfinishedWhereTheRunWasCutOff)
         EXPECT_TRUE(events(events_of(read_file(path("json"))), "finish").empty());
         play_a_part(*junit_report(path("xml")));
         for (const Element &group : parse_xml(read_file(path("xml"))).all("testsuite")) {
-            EXPECT_EQ(group.properties().at("finished"), "false");
+            if (group.attributes.at("name") != "end of the run") {
+                EXPECT_EQ(group.properties().at("finished"), "false");
+            }
         }
         play_tap(play_a_part);
         const Tap tap = parse_tap(read_file(path("tap")));

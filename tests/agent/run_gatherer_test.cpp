@@ -56,6 +56,23 @@ TEST_F(RunGatherer, WaitsForItsReport)
     EXPECT_THAT(ended.out, HasSubstr("gathering 2, 64 samples\n"));
     ASSERT_THAT(processes_named(kProbe), SizeIs(1));
     EXPECT_EQ(processes_named(kProbe)[0].pid, gatherer);
+    EXPECT_EQ(ended.err, "");
+
+    ended = run_group({{"SensorProbe", "--group G --seconds 2"}});
+    EXPECT_EQ(ended.err, "fptest: a gatherer is running already, as '/system/bin/SensorProbe "
+                         "--group G --seconds 1': the library triggers that one, and starts "
+                         "none\n");
+}
+
+TEST_F(RunGatherer, InterruptedInAGroupsCommandIsFollowedByNoOtherItem)
+{
+    FptestProcess fptest(with_group(
+        {{"SensorProbe", "--help; exec sleep 30"}, {"Other", notes("x")}}, {"--as-group"}));
+    EXPECT_TRUE(eventually([] { return module_waits_for_gatherer(); }, 30));
+    fptest.signal(SIGINT);
+    EXPECT_EQ(fptest.wait().status, 130);
+    EXPECT_THAT(outcomes(), ElementsAre("SensorProbe: stopped", "Other: not run"));
+    EXPECT_FALSE(is_there("order"));
 }
 
 TEST_F(RunGatherer, RunsTheNextItemOfAGroupWhileItGathers)

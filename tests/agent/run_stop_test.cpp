@@ -183,7 +183,7 @@ TEST_F(Run, RunsNothingWhereItIsInterruptedBefore)
     EXPECT_THAT(reasons(), Each("interrupted by Ctrl-C"));
 }
 
-TEST_F(Run, StopsWhatAnInterruptedGroupsCommandStartsNext)
+TEST_F(Run, StartsNoOtherItemOfAnInterruptedGroupsCommand)
 {
     const std::string sleeps = "note /tmp/scene/order tell-signal /tmp/scene/signal sleep 60";
     FptestProcess fptest(with_group({{"Item", sleeps}, {"Other", sleeps}, {"Third", sleeps}},
@@ -194,10 +194,11 @@ TEST_F(Run, StopsWhatAnInterruptedGroupsCommandStartsNext)
     EXPECT_EQ(ended.status, 130);
     EXPECT_LT(ended.seconds, 20);
     EXPECT_THAT(paths_run(), ElementsAre("P/G"));
-    EXPECT_THAT(outcomes(), ElementsAre("Item: stopped", "Other: stopped", "Third: stopped",
+    EXPECT_THAT(outcomes(), ElementsAre("Item: stopped", "Other: not run", "Third: not run",
                                         "Item: not run", "Other: not run", "Third: not run"));
+    EXPECT_THAT(lines_of(read_file(work("order"))), SizeIs(1));
     EXPECT_THAT(running_items(), IsEmpty());
-    EXPECT_EQ(reasons().at(2), "stopped by Ctrl-C");
+    EXPECT_EQ(reasons().at(2), "interrupted by Ctrl-C");
 }
 
 TEST_F(Run, StopsAScriptThatIsInterrupted)

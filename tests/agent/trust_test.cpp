@@ -478,8 +478,9 @@ TEST_F(Trust, StoresNothingWhereAReportCannotBeWritten)
 {
     write_file(kPlanFile, kOnePasses);
     for (const bool is_long : {false, true}) {
-        const std::string other =
-            plan(plan_of({{"Other", {{"Item", std::string(is_long ? 3000 : 1, 'x')}}}}));
+        const std::string other = plan("<P about=\"" + std::string(is_long ? 3000 : 1, 'x') +
+                                       "\"><CmdGroup name=\"Other\">"
+                                       "<Cmd name=\"Item\" args=\"\"/></CmdGroup></P>");
         const Ended ended = run_fptest({"run", "--json", "/dev/full", "--plan", other, "P/Other"});
         EXPECT_EQ(ended.status, 3);
         EXPECT_THAT(ended.err, HasSubstr("No space left on device; nothing was run"));
