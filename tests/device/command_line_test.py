@@ -47,6 +47,8 @@ def test_no_directory_has_an_empty_name(option):
     for words in ([option, ""], [f"{option}="]):
         assert_refused([*words, "--", "true"], f"{option} wants a directory, not an empty "
                        "name: is a shell variable not set?")
+    assert_refused([option, "--", "true"], f"{option} wants a directory, not '--': is a "
+                   "shell variable not set?")
 
 
 def test_the_environment_may_name_the_build():

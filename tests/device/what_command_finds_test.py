@@ -3,7 +3,7 @@
 """What COMMAND finds on the virtual device, and what the caller has of it."""
 import pytest
 
-from support.outside import content, make_program, on_device, shell, way
+from support.outside import DEVICE_RUN, content, make_program, on_device, run, shell, way
 
 pytestmark = pytest.mark.usefixtures("device")
 
@@ -15,6 +15,14 @@ def test_the_exit_status_is_passed_through():
     assert on_device("false").status == 1
     assert shell("exit 77").status == 77
     assert shell("kill -TERM $$").status == 143
+
+
+def test_the_exit_status_is_passed_through_where_the_caller_ignores_sigchld():
+    ignores = "import os, signal, sys; signal.signal(signal.SIGCHLD, signal.SIG_IGN); "
+    program = ignores + "os.execv(sys.argv[1], sys.argv[1:])"
+
+    assert run("/usr/bin/python3", "-c", program, DEVICE_RUN, "--", "sh", "-c",
+               "exit 6").status == 6
 
 
 def test_input_and_outputs_are_passed_through():

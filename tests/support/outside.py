@@ -15,7 +15,7 @@ import tempfile
 import time
 
 TREE = pathlib.Path(__file__).resolve().parents[2]
-BUILD = pathlib.Path(os.environ.get("QUILLMARK_BUILD") or TREE / "build/release")
+BUILD = pathlib.Path(os.environ.get("QUILLMARK_BUILD") or TREE / "build/release").resolve()
 DEVICE_RUN = TREE / "device/run"
 
 # Programs are started as a shell in front starts them, however the tests were.
