@@ -186,7 +186,7 @@ class JsonReport : public Listener
         const Counts counts = count(run);
         Json json = event("finish");
         json["finished"] = run.finished;
-        json["reason"] = words_or_null(run.finished ? run.why_ended : run.why_unfinished);
+        json["reason"] = words_or_null(why_not_all(run));
         json["rounds"] = run.round;
         json["passed"] = counts.passed;
         json["failed"] = counts.failed;

@@ -228,8 +228,7 @@ std::string test_suite(const Run &run, std::size_t number, const std::vector<Lat
             inside += property(indent, "late_report", one.text);
         }
     }
-    const bool has_ended = run.finished || !run.why_unfinished.empty();
-    if (has_ended && run.round > 1 && number + 1 == run.suites.size()) {
+    if (has_ended(run) && run.round > 1 && number + 1 == run.suites.size()) {
         inside += summary_properties(run, indent);
     }
     std::string cases;
@@ -310,9 +309,9 @@ std::string junit_how_it_stands(const Run &run)
     const std::string indent(6, ' ');
     std::string text = property(indent, "finished", run.finished ? "true" : "false");
     if (!run.finished) {
-        const bool has_ended = !run.why_unfinished.empty();
-        text += property(indent, "reason",
-                         has_ended ? run.why_unfinished : "the run went on when this was written");
+        text +=
+            property(indent, "reason",
+                     has_ended(run) ? run.why_unfinished : "the run went on when this was written");
     }
     return text;
 }

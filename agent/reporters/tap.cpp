@@ -66,7 +66,7 @@ std::string point(bool ok, std::size_t number, const std::string &name)
 
 std::string skipped(const Run &run, const ItemRun &item)
 {
-    const std::string &why = run.finished ? run.why_ended : run.why_unfinished;
+    const std::string &why = why_not_all(run);
     const std::string &reason = item.reason.empty() ? why : item.reason;
     return " # SKIP not run" + (reason.empty() ? "" : ": " + escaped(reason));
 }

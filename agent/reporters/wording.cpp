@@ -66,10 +66,9 @@ std::string heading(const Run &run)
 std::string total(const Run &run)
 {
     const Counts counts = count(run);
-    const bool has_ended = run.finished || !run.why_unfinished.empty();
-    const std::string rest = has_ended && (counts.not_run > 0 || !run.finished)
+    const std::string rest = has_ended(run) && (counts.not_run > 0 || !run.finished)
                                  ? fmt::format(", {} not run", counts.not_run)
-                             : has_ended             ? ""
+                             : has_ended(run)        ? ""
                              : has_fixed_rounds(run) ? fmt::format(", {} to go", counts.not_run)
                                                      : fmt::format(", round {}", run.round);
     return fmt::format("{} passed, {} failed{}, {}", counts.passed, counts.failed, rest,

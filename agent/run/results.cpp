@@ -51,6 +51,16 @@ Counts count(const Run &run)
     return sum;
 }
 
+bool has_ended(const Run &run)
+{
+    return run.finished || !run.why_unfinished.empty();
+}
+
+const std::string &why_not_all(const Run &run)
+{
+    return run.finished ? run.why_ended : run.why_unfinished;
+}
+
 bool has_rounds(const Run &run)
 {
     return run.rounds != 1;

@@ -110,6 +110,10 @@ Counts count(const std::vector<ItemRun> &items);
 // Of all rounds. To go is what is left of this round, and of those to come.
 Counts count(const Run &run);
 
+// Whether it is over, and why what has not been run has not.
+bool has_ended(const Run &run);
+const std::string &why_not_all(const Run &run);
+
 // Whether it is, or was to be, of more than one round.
 bool has_rounds(const Run &run);
 // Whether the number of rounds was known when it began.

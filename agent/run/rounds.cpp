@@ -222,7 +222,7 @@ void finish(Run &run, const std::vector<Listener *> &listeners)
     for (Suite &suite : run.suites) {
         for (ItemRun &item : suite.items) {
             if (item.outcome == Outcome::not_run) {
-                item.reason = run.finished ? run.why_ended : run.why_unfinished;
+                item.reason = why_not_all(run);
             }
         }
     }
