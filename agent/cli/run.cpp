@@ -122,7 +122,8 @@ void tell_of_running_gatherer(const Work &work, const Plan &plan, const std::str
                 continue;
             }
             const char *args = mxmlElementGetAttr(plan.elements()[target->element], "args");
-            if (words_of(started) != words_of(fmt::format("{} {}", program, args ? args : ""))) {
+            if (words_of(started) !=
+                words_of(fmt::format("{} {}", program, args != nullptr ? args : ""))) {
                 std::string line = started.substr(0, started.find_last_not_of('\0') + 1);
                 std::ranges::replace(line, '\0', ' ');
                 say("a gatherer is running already, as {}: the library triggers that one, and "
