@@ -3,7 +3,6 @@
 
 // The program as a whole: what it says of itself, wrong usage, and the commands
 // that only read.
-#include "../quoted.h"
 #include "fptest_runner.h"
 #include "terminal_session.h"
 
@@ -458,9 +457,7 @@ Lines completions(const Lines &words)
         line += (line.empty() ? "" : " ") + word;
     }
     const std::string script = "source /usr/share/bash-completion/bash_completion\n"
-                               "source " +
-                               quoted(QUILLMARK_SOURCE_DIR "/agent/completion/fptest") +
-                               "\n"
+                               "source \"$0\"\n"
                                "compopt() { :; }\n" // there is no line that is being edited
                                "function=$(complete -p fptest | sed 's/.*-F \\([^ ]*\\).*/\\1/')\n"
                                "COMP_WORDS=(" +
@@ -471,7 +468,8 @@ Lines completions(const Lines &words)
                                words.back() + "' '" + words.at(words.size() - 2) +
                                "'\n"
                                "printf '%s\\n' \"${COMPREPLY[@]}\"\n";
-    const Ended ended = run_program({"/usr/bin/bash", "--norc", "-c", script});
+    const Ended ended = run_program(
+        {"/usr/bin/bash", "--norc", "-c", script, QUILLMARK_SOURCE_DIR "/agent/completion/fptest"});
     EXPECT_EQ(ended.status, 0) << ended.out;
     Lines offered = lines_of(ended.out);
     for (std::string &word : offered) {
@@ -516,10 +514,11 @@ TEST_F(Fptest, CompletesWhatAReportIsAbout)
 TEST_F(Fptest, CompletesOnATerminal)
 {
     TerminalSession session({"/usr/bin/bash", "--norc", "--noprofile", "-i"}, 80, 24,
-                            {{"PS1", "ready> "}, {"PATH", "/system/bin:/usr/bin"}});
+                            {{"PS1", "ready> "},
+                             {"PATH", "/system/bin:/usr/bin"},
+                             {"COMPLETION", QUILLMARK_SOURCE_DIR "/agent/completion/fptest"}});
     ASSERT_TRUE(session.wait_for_text("ready>")) << session.text();
-    session.type("source /usr/share/bash-completion/bash_completion; source " +
-                 quoted(QUILLMARK_SOURCE_DIR "/agent/completion/fptest") +
+    session.type("source /usr/share/bash-completion/bash_completion; source \"$COMPLETION\""
                  "; echo soon-$((1 + 1))\n");
     ASSERT_TRUE(session.wait_for_text("soon-2")) << session.text();
     session.type("fptest rep\t");

@@ -3,20 +3,17 @@
 
 // What the benchmarks refuse: baselines that do not do the library's job, and wrong
 // command lines.
-#include "../quoted.h"
 #include "comparison.h"
 #include "quiet_vorlane.h"
+#include "support/process.h"
 
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
 
-#include <array>
 #include <cstdarg>
-#include <cstdio>
 #include <ostream>
 #include <stdexcept>
 #include <string>
-#include <sys/wait.h>
 
 namespace
 {
@@ -133,19 +130,12 @@ class BadCommandLine : public ::testing::TestWithParam<Refusal>
 TEST_P(BadCommandLine, GetsOneLineAndStatus2)
 {
     const auto &[name, arguments, line] = GetParam();
-    const std::string command =
-        quoted(QUILLMARK_SOURCE_DIR "/scripts/bench") + " " + arguments + " 2>&1";
-    std::array<char, 4096> buffer{};
-    std::string output;
-
-    FILE *pipe = popen(command.c_str(), "r");
-    while (fgets(buffer.data(), buffer.size(), pipe) != nullptr) {
-        output += buffer.data();
-    }
-    const int status = pclose(pipe);
-
-    EXPECT_EQ(output, std::string("scripts/bench: ") + line + "\n");
-    EXPECT_EQ(WEXITSTATUS(status), 2);
+    const support::Ended ended =
+        support::run({.arguments = {"/bin/sh", "-c", std::string("exec \"$0\" ") + arguments,
+                                    QUILLMARK_SOURCE_DIR "/scripts/bench"},
+                      .is_one_stream = true});
+    EXPECT_EQ(ended.out, std::string("scripts/bench: ") + line + "\n");
+    EXPECT_EQ(ended.status, 2);
 }
 
 INSTANTIATE_TEST_SUITE_P(

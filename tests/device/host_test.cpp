@@ -2,13 +2,10 @@
 // SPDX-License-Identifier: Apache-2.0
 
 // Hosts of other kinds, and what the library needs of its surroundings.
-#include "../quoted.h"
 #include "device_test.h"
+#include "support/process.h"
 
 #include <array>
-#include <cstdio>
-#include <cstdlib>
-#include <memory>
 
 using namespace device;
 
@@ -19,35 +16,26 @@ class Host : public DeviceTest
 {
 };
 
-std::string output_of(const std::string &command)
-{
-    std::string output;
-    const std::unique_ptr<FILE, int (*)(FILE *)> pipe(popen(command.c_str(), "r"), &pclose);
-    std::array<char, 256> buffer{};
-    while (fgets(buffer.data(), buffer.size(), pipe.get()) != nullptr) {
-        output += buffer.data();
-    }
-    return output;
-}
-
 const std::string kTests = QUILLMARK_BINARY_DIR "/tests/device";
-const std::string kHost = quoted(kTests + "/c_host");
+const std::string kHost = kTests + "/c_host";
 
 TEST_F(Host, InCGetsItsPingOnce)
 {
-    EXPECT_EQ(output_of(kHost), "0 <Ping Success!> <> 32 2049 1024 no plan\n");
+    EXPECT_EQ(support::run({.arguments = {kHost}}).out,
+              "0 <Ping Success!> <> 32 2049 1024 no plan\n");
 }
 
 TEST_F(Host, MakersLibraryIsReplacedAtLoadTime)
 {
-    unsetenv("VR_LOG_FILE");
-    EXPECT_EQ(
-        // by its name: the loader takes a blank for the end of a path
-        output_of("LD_LIBRARY_PATH=" + quoted(kTests) + " LD_PRELOAD=libother_vorlane.so " + kHost),
-        "other log: 4 VRCODE => testHead is : %s\n"
-        "other log: 4 VRCODE => Get ping reply success!\n"
-        "other log: 4 VRCODE => testHead is : %s\n"
-        "0 <Ping Success!> <> 32 2049 1024 no plan\n");
+    support::Start start{.arguments = {kHost}};
+    // by its name: the loader takes a blank for the end of a path
+    start.environment = {{"VR_LOG_FILE", std::nullopt},
+                         {"LD_LIBRARY_PATH", kTests},
+                         {"LD_PRELOAD", "libother_vorlane.so"}};
+    EXPECT_EQ(support::run(start).out, "other log: 4 VRCODE => testHead is : %s\n"
+                                       "other log: 4 VRCODE => Get ping reply success!\n"
+                                       "other log: 4 VRCODE => testHead is : %s\n"
+                                       "0 <Ping Success!> <> 32 2049 1024 no plan\n");
 }
 
 TEST_F(Host, FirstPingOfTheProcessIsAnsweredAndNoOther)

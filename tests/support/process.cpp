@@ -177,9 +177,4 @@ Ended run(const Start &start)
     return Process(start).wait();
 }
 
-Ended run_shell(const std::string &command)
-{
-    return Process({.arguments = {"/bin/sh", "-c", command}, .is_one_stream = true}).wait(600);
-}
-
 } // namespace support

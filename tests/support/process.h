@@ -77,7 +77,5 @@ class Process
 
 // Runs it to its end.
 Ended run(const Start &start);
-// A command of the shell, with everything it prints in out.
-Ended run_shell(const std::string &command);
 
 } // namespace support

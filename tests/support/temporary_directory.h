@@ -19,10 +19,9 @@ namespace support
 class TemporaryDirectory
 {
   public:
-    explicit TemporaryDirectory(
-        const std::filesystem::path &parent = std::filesystem::temp_directory_path())
+    TemporaryDirectory()
     {
-        std::string name = parent / "quillmark-test-XXXXXX";
+        std::string name = std::filesystem::temp_directory_path() / "quillmark-test-XXXXXX";
         if (mkdtemp(name.data()) == nullptr) {
             throw std::runtime_error("no temporary directory " + name);
         }
