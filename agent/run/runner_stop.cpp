@@ -14,6 +14,7 @@
 #include <cstdio>
 #include <fmt/core.h>
 #include <poll.h>
+#include <set>
 #include <thread>
 #include <unistd.h>
 
@@ -143,7 +144,8 @@ void Runner::try_stop(RunningItem &active, bool command_runs)
         return;
     }
     active.stop_tried_at = now();
-    if (!stop_asked_) {
+    // once: a second SIGTERM would begin what it does about the first one again
+    if (!stop_asked_ && !active.was_stopped) {
         host_.stop(item(active.place).name);
         stop_asked_ = true;
     }
@@ -179,8 +181,9 @@ void Runner::stop_gatherer(RunningItem &active, bool command_runs, SteadyClock::
         release_command();
     }
     const std::vector<Leftover> left = host_.processes().of_gatherer();
-    if (&active != &active_.back() && signal_each(left, SIGTERM)) {
+    if (&active != &active_.back() && !active.was_stopped && signal_each(left, SIGTERM)) {
         signal_each(left, SIGCONT); // one that is suspended would not see it
+        active.was_stopped = true;
     }
     if (waited > limits_.grace && signal_each(left, SIGKILL)) {
         active.was_stopped = true;
@@ -252,7 +255,7 @@ std::vector<Leftover> Runner::note_left_running(std::size_t element)
 template <typename Find> void Runner::end_all(const Find &find)
 {
     const auto begin = now();
-    TimePoint asked;
+    std::set<pid_t> asked;
     for (auto left = find(); !left.empty(); left = find()) {
         const auto waited = now() - begin;
         if (waited > limits_.grace + kBeforeGivingUp) {
@@ -261,11 +264,13 @@ template <typename Find> void Runner::end_all(const Find &find)
             broken_ = true;
             return;
         }
-        if (now() - asked > kBetweenStops) {
-            asked = now();
-            signal_each(left, waited > limits_.grace ? SIGKILL : SIGTERM);
-            signal_each(left, SIGCONT);
+        if (waited > limits_.grace) {
+            signal_each(left, SIGKILL);
         }
+        // once: a second SIGTERM would begin what they do about the first one again
+        std::erase_if(left, [&](const Leftover &one) { return !asked.insert(one.process).second; });
+        signal_each(left, SIGTERM);
+        signal_each(left, SIGCONT);
         std::this_thread::sleep_for(kTurn);
         read_signals();
         poll_reports();
@@ -303,6 +308,7 @@ void Runner::end_round()
 {
     if (!left_.empty()) {
         end_left_running();
+        require_plan();
     }
     if (gatherer_may_report_late_) {
         end_gatherer();

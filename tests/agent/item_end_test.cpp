@@ -139,6 +139,26 @@ TEST_F(ItemEnd, InterruptionBetweenTwoRoundsBeginsNoOtherRound)
     EXPECT_EQ(events("finish").at(0).at("not_run"), 1);
 }
 
+TEST_F(ItemEnd, StopComesOnceSoThatItsHandlerCanEnd)
+{
+    const std::string cleans_up = "clean() { echo asked >>/tmp/scene/asked; sleep 0.6; exit 0; }; "
+                                  "trap clean TERM; while true; do sleep 0.1; done";
+    run_group({{"Script", script(cleans_up)}}, {"--timeout", "0.5"});
+    EXPECT_THAT(reason(0), StartsWith("stopped after "));
+    EXPECT_THAT(lines_of(read_file(work("asked"))), testing::SizeIs(1));
+    run_group({{"Script", script("(" + cleans_up + ") &amp; " + script_report("0", "fine"))}});
+    EXPECT_THAT(lines_of(read_file(work("asked"))), testing::SizeIs(2));
+}
+
+TEST_F(ItemEnd, LeftoverThatDestroysThePlanAtTheEndIsTold)
+{
+    const Ended ended = run_group(
+        {{"Item",
+          "report G 100 0 fine; (trap true TERM; sleep 60; rm /data/vorlane/src1.xml) &amp;"}});
+    EXPECT_EQ(ended.status, 3);
+    EXPECT_THAT(ended.err, HasSubstr("src1.xml is gone"));
+}
+
 TEST_F(ItemEnd, RunIsOverWhenAllThatItLeftRunningHasEnded)
 {
     FptestProcess fptest(
