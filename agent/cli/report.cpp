@@ -12,7 +12,6 @@
 #include "util/write.h"
 
 #include <algorithm>
-#include <cerrno>
 #include <csignal>
 #include <fmt/core.h>
 #include <memory>

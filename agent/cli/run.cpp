@@ -18,12 +18,15 @@
 #include "util/write.h"
 
 #include <algorithm>
-#include <cerrno>
-#include <cstdio>
-#include <cstring>
+#include <fmt/core.h>
+#include <iterator>
 #include <memory>
+#include <optional>
+#include <sstream>
+#include <string>
 #include <unistd.h>
 #include <utility>
+#include <vector>
 
 namespace fptest
 {

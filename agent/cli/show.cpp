@@ -9,10 +9,9 @@
 #include "util/text.h"
 #include "util/write.h"
 
-#include <cerrno>
 #include <cstdio>
-#include <cstring>
 #include <memory>
+#include <optional>
 #include <string>
 #include <unistd.h>
 #include <vector>

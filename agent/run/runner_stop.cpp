@@ -144,7 +144,7 @@ void Runner::try_stop(RunningItem &active, bool command_runs)
         return;
     }
     active.stop_tried_at = now();
-    // once: a second SIGTERM would begin what it does about the first one again
+    // once: another SIGTERM would start its clean-up anew
     if (!stop_asked_ && !active.was_stopped) {
         host_.stop(item(active.place).name);
         stop_asked_ = true;
@@ -267,7 +267,7 @@ template <typename Find> void Runner::end_all(const Find &find)
         if (waited > limits_.grace) {
             signal_each(left, SIGKILL);
         }
-        // once: a second SIGTERM would begin what they do about the first one again
+        // once: another SIGTERM would start their clean-up anew
         std::erase_if(left, [&](const Leftover &one) { return !asked.insert(one.process).second; });
         signal_each(left, SIGTERM);
         signal_each(left, SIGCONT);
