@@ -105,13 +105,24 @@ void print(std::FILE *stream, const std::string &file, std::string_view text,
            const std::vector<Finding> &findings)
 {
     constexpr std::size_t kShown = 1000;
+    const auto is_error = [](const Finding &one) {
+        return one.severity == Finding::Severity::error;
+    };
     Messages messages(file, text);
-    const std::size_t shown = std::min(findings.size(), kShown);
-    for (std::size_t index = 0; index < shown; ++index) {
-        std::fputs(messages.of(findings[index]).c_str(), stream);
+    // no warning in an error's place
+    std::size_t errors = std::min<std::size_t>(std::ranges::count_if(findings, is_error), kShown);
+    std::size_t warnings = kShown - errors;
+    std::size_t hidden = 0;
+    for (const Finding &finding : findings) {
+        if (std::size_t &left = is_error(finding) ? errors : warnings; left > 0) {
+            --left;
+            std::fputs(messages.of(finding).c_str(), stream);
+        } else {
+            ++hidden;
+        }
     }
-    if (findings.size() > shown) {
-        print_to(stream, "{}: {} more are not shown\n", one_line(file), findings.size() - shown);
+    if (hidden > 0) {
+        print_to(stream, "{}: {} more are not shown\n", one_line(file), hidden);
     }
 }
 

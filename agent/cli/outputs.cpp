@@ -21,6 +21,8 @@ namespace fptest
 namespace
 {
 
+constexpr char kStandardInput[] = "/proc/self/fd/0";
+
 NamedFile librarys_file()
 {
     return {"the library", kStoredPlan};
@@ -82,9 +84,9 @@ void require_different(const std::vector<NamedFile> &files)
             if (!file.empty() && !other_file.empty() && file != "-" && other_file != "-" &&
                 are_same_file(file, other_file) &&
                 !(option == "--plan" && other_option == "the library")) {
-                throw Failure(Exit::usage,
-                              "{} and {} both want the file {}: give them files of their own",
-                              option, other_option, one_line(file));
+                throw Failure(
+                    Exit::usage, "{} and {} both want the file {}: give them files of their own",
+                    option, other_option, one_line(file == kStandardInput ? other_file : file));
             }
         }
     }
@@ -94,7 +96,7 @@ void require_different(const std::vector<NamedFile> &files)
 
 void settle_outputs(RunOptions &options)
 {
-    require_different({{"--plan", options.plan},
+    require_different({{"--plan", options.plan == "-" ? kStandardInput : options.plan},
                        {"--json", options.json},
                        {"--junit", options.junit},
                        log_file(options.log),
@@ -121,7 +123,7 @@ void require_writable_reports(const RunOptions &options)
          {options.json.empty() ? "" : json_obstacle(options.json),
           options.junit.empty() ? "" : junit_obstacle(options.junit)}) {
         if (!obstacle.empty()) {
-            throw Failure(Exit::environment, "{}; nothing was run", obstacle);
+            throw Failure(Exit::environment, "{}; nothing was run", one_line(obstacle));
         }
     }
 }
@@ -129,7 +131,7 @@ void require_writable_reports(const RunOptions &options)
 void require_log_of_its_own(const std::string &log, Beside beside)
 {
     const NamedFile file = log_file(log);
-    require_different({file, librarys_file()});
+    require_different({{"standard input", kStandardInput}, file, librarys_file()});
     struct stat output {
     };
     const bool is_regular = fstat(STDOUT_FILENO, &output) == 0 && S_ISREG(output.st_mode);

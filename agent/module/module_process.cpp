@@ -30,7 +30,6 @@ namespace fptest
 namespace
 {
 
-constexpr off_t kOutputKept = off_t{64} * 1024;
 constexpr off_t kRoomLeft = off_t{1024} * 1024;
 
 [[noreturn]] void fail(const char *what)
@@ -148,6 +147,11 @@ void LibraryProcess::kill_module() const
     if (pid_ > 0) {
         kill(pid_, SIGKILL);
     }
+}
+
+bool LibraryProcess::is_suspended() const
+{
+    return pid_ > 0 && state_of(pid_) == 'T';
 }
 
 // The library first, or it would start another item meanwhile.

@@ -74,6 +74,9 @@ class LibraryProcess
     // Ends the library's process, where that does not answer.
     void kill_module() const;
 
+    // Whether something has suspended it: suspend() or another process.
+    bool is_suspended() const;
+
     // Suspends the library and its items, and lets them go on.
     void suspend();
     void resume();
@@ -86,6 +89,8 @@ class LibraryProcess
 
     // The stored plan, as FPTEST_ExtractResultMsg gives it. Only between commands.
     std::string read_back();
+
+    static constexpr off_t kOutputKept = off_t{64} * 1024;
 
     // What was printed since the last call, up to now or up to where an event says,
     // or the last 64 KiB of it. Nothing while there are events to come first.

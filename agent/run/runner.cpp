@@ -26,14 +26,12 @@ namespace
 using namespace std::chrono_literals;
 using Seconds = std::chrono::duration<double>;
 
-constexpr auto kTurn = 25ms;
-constexpr std::size_t kOutputKept = std::size_t{64} * 1024;
-
 void append_output(std::string &output, const std::string &text)
 {
     output += text;
-    if (output.size() > kOutputKept) {
-        output.erase(0, output.size() - kOutputKept);
+    constexpr auto kKept = static_cast<std::size_t>(LibraryProcess::kOutputKept);
+    if (output.size() > kKept) {
+        output.erase(0, output.size() - kKept);
     }
 }
 
@@ -111,12 +109,14 @@ bool Runner::run(const Job &job)
     // the library may load it until it has come to the first item
     Descriptor plan = lock_stored_plan();
     host_.command("XMLNodePath::" + job.path, names);
+    heard_of_at_ = now();
 
     std::size_t next = 0;
     bool runs = true;
     while ((runs || !active_.empty()) && !broken_) {
         if (const auto event = host_.wait(kTurn, signals_.descriptor())) {
             plan = Descriptor(-1);
+            heard_of_at_ = now();
             handle(*event, job, next, runs);
         }
         watch(runs);
@@ -355,7 +355,8 @@ void Runner::finish(RunningItem &active, TimePoint end)
         active.stop = Outcome::timed_out; // over before that was seen
     }
     judge(active);
-    if (gathers(active) && active_.size() == 1 && !active.stop) {
+    // the library may be at the next item of its command already, which has not been left
+    if (gathers(active) && active_.size() == 1 && !active.stop && !more_to_come_) {
         result.left_running = note_left_running(active.target.element);
     }
     if (gathers(active) && !(result.report.progress == "100" && result.report.result)) {
@@ -440,7 +441,7 @@ std::string Runner::why_silent(const RunningItem &active)
     }
     if (active.overwritten) {
         return "a process with an old copy of the plan has written it over; what the plan says "
-               "now is of an earlier run";
+               "now is older";
     }
     if (active.undone) {
         return "a process with an old copy of the plan has written over what it had reported";

@@ -104,6 +104,7 @@ class Runner
     // The gatherer's command returns when the gatherer has been told; its report comes in
     // its own time.
     static constexpr std::chrono::duration<double> kForGathering{10};
+    static constexpr std::chrono::milliseconds kTurn{25}; // between two looks at the plan
     static constexpr std::size_t kNoElement = static_cast<std::size_t>(-1);
 
     // An item that has been judged, and may be reported still.
@@ -135,6 +136,7 @@ class Runner
     void try_stop(RunningItem &active, bool command_runs);
     void stop_gatherer(RunningItem &active, bool command_runs, SteadyClock::duration waited);
     void release_command();
+    bool is_stuck() const;
     bool starts_no_more() const;
     void note_stop(const LibraryProcess::Event &event);
     void cannot_stop(RunningItem &active);
@@ -169,7 +171,8 @@ class Runner
     TimePoint last_suspension_;
     SteadyClock::duration last_suspended_{};
     TimePoint began_ = now();
-    int vendor_ = run_.vendor; // which the library read for the item that it came to last
+    TimePoint heard_of_at_ = began_; // the library
+    int vendor_ = run_.vendor;       // which the library read for the item that it came to last
     int signal_ = 0;
     TimePoint signal_taken_at_;
     bool stop_asked_ = false;               // and not yet answered

@@ -129,7 +129,7 @@ void Runner::read_report(RunningItem &active, const Plan &plan)
     }
     active.overwritten = !bears_mark(plan, active.target);
     if (active.overwritten) {
-        return; // what it says is of an earlier run
+        return; // what it says is older
     }
     ItemRun &result = item(active.place);
     ItemReport report = plan.report(number);

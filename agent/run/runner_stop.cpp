@@ -25,10 +25,10 @@ namespace
 
 using namespace std::chrono_literals;
 
-constexpr auto kTurn = 25ms;
 constexpr auto kBetweenStops = 250ms;
 constexpr auto kBeforeRelease = 300ms;
 constexpr auto kBeforeGivingUp = 5s; // on what was killed: device/run waits for 10 s in all
+constexpr auto kForALongPlan = 60s;  // with the plan itself, between two items
 // What only takes a moment longer to end has not been left running.
 constexpr auto kEnding = 100ms;
 
@@ -114,8 +114,7 @@ void Runner::stop_what_is_due(bool command_runs)
     if (!active_.empty() && !active_.back().done && active_.back().stop) {
         try_stop(active_.back(), command_runs);
     }
-    if (active_.empty() && command_runs && signal_ != 0 &&
-        now() - signal_taken_at_ > limits_.grace + kBeforeGivingUp) {
+    if (active_.empty() && command_runs && is_stuck()) {
         host_.kill_module(); // it comes to no item, and does not return
     }
     // the library stops only what it started last: an earlier gatherer gets signals alone
@@ -124,6 +123,16 @@ void Runner::stop_what_is_due(bool command_runs)
             stop_gatherer(active, false, now() - active.stop_wanted_at);
         }
     }
+}
+
+// Between two items: an item may have suspended the library, or put something into the
+// plan's place that is never read to its end.
+bool Runner::is_stuck() const
+{
+    const auto silent = now() - heard_of_at_;
+    return (signal_ != 0 && now() - signal_taken_at_ > limits_.grace + kBeforeGivingUp) ||
+           (silent > kBeforeGivingUp && host_.is_suspended()) ||
+           (limits_.item && silent > *limits_.item + kForALongPlan);
 }
 
 // Through the library, again and again, as the item may only just be starting; and

@@ -59,6 +59,10 @@ device::Lines programs_run(const std::string &log = device::kLogFile);
 // The processes that it was told to stop.
 std::vector<pid_t> processes_stopped(const std::string &log = device::kLogFile);
 
+inline constexpr char kOnePasses[] = "<P><CmdGroup name=\"G\">"
+                                     "<Cmd name=\"Item\" args=\"report G 100 0 fine\"/>"
+                                     "</CmdGroup></P>";
+
 } // namespace fptest_runner
 
 // A device with a directory of the test's own and no items left running in it.

@@ -200,19 +200,21 @@ TEST_F(LongPlan, IsReadUpToSixteenMebibytes)
     EXPECT_EQ(ended.err, "fptest: -: " + why + "\n");
 }
 
-TEST_F(LongPlan, HasItsFirstThousandFindingsShown)
+TEST_F(LongPlan, HasAThousandFindingsShownAndNoWarningInAnErrorsPlace)
 {
     std::string items;
-    for (int number = 0; number < 1002; ++number) {
-        items += "<Cmd name=\"i" + std::to_string(number) + "\"/>";
+    for (int number = 0; number < 1001; ++number) {
+        items += "<Cmd name=\"i" + std::to_string(number) + "\" args=\"a; b\"/>";
     }
+    items += "<Cmd name=\"last\"/>";
     const Ended ended = run_fptest({"check", "--for", "file", "-"},
                                    "<P><CmdGroup name=\"G\">" + items + "</CmdGroup></P>");
     EXPECT_EQ(ended.status, 1);
     const Lines lines = lines_of(ended.out);
     ASSERT_THAT(lines, SizeIs(3002));
+    EXPECT_THAT(lines[2997], HasSubstr(": error: item 'last' "));
     EXPECT_EQ(lines[3000], "<stdin>: 2 more are not shown");
-    EXPECT_THAT(lines[3001], StartsWith("<stdin>: 1002 errors, 0 warnings (1 group, 1002 items, "));
+    EXPECT_THAT(lines[3001], StartsWith("<stdin>: 1 error, 1001 warnings (1 group, 1002 items, "));
 }
 
 } // namespace

@@ -24,10 +24,6 @@ using ::testing::StartsWith;
 namespace
 {
 
-constexpr char kPasses[] = "<P><CmdGroup name=\"G\">"
-                           "<Cmd name=\"Item\" args=\"report G 100 0 fine\"/>"
-                           "</CmdGroup></P>";
-
 class Rounds : public FptestTest
 {
   protected:
@@ -87,7 +83,7 @@ TEST_F(Rounds, EndWithTheFirstItemThatDoesNotPass)
 TEST_F(Rounds, EndAfterTheirNumberWhereNothingFails)
 {
     const Ended ended =
-        run_fptest({"run", "--until-fail", "--repeat", "2", "--plan", plan(kPasses), "P/G"});
+        run_fptest({"run", "--until-fail", "--repeat", "2", "--plan", plan(kOnePasses), "P/G"});
     EXPECT_EQ(ended.status, 0);
     EXPECT_THAT(ended.out, StartsWith("/tmp/scene/plan.xml: 1 item, vendor 0, at most 2 rounds "
                                       "until an item fails\n"));
@@ -118,7 +114,7 @@ TEST_F(Rounds, BeginNoneOnceTheTimeIsOverAndCompleteTheOneThatRuns)
 TEST_F(Rounds, EndAfterTheirNumberWhereThatComesBeforeTheTime)
 {
     const Ended ended =
-        run_fptest({"run", "--for", "1h", "--repeat", "2", "--plan", plan(kPasses), "P/G"});
+        run_fptest({"run", "--for", "1h", "--repeat", "2", "--plan", plan(kOnePasses), "P/G"});
     EXPECT_EQ(ended.status, 0);
     EXPECT_THAT(ended.out,
                 StartsWith("/tmp/scene/plan.xml: 1 item, vendor 0, at most 2 rounds for 1 h\n"));
@@ -143,7 +139,7 @@ TEST_F(Rounds, TakeNoTimeThatIsNone)
 TEST_F(Rounds, AreListedOnce)
 {
     const Ended ended =
-        run_fptest({"run", "--list", "--repeat", "1000000", "--plan", plan(kPasses), "P/G"});
+        run_fptest({"run", "--list", "--repeat", "1000000", "--plan", plan(kOnePasses), "P/G"});
     EXPECT_EQ(ended.status, 0);
     EXPECT_EQ(ended.out, "P/G/Item  /system/bin/Item report G 100 0 fine\n");
     EXPECT_LT(ended.seconds, 5);
@@ -153,7 +149,7 @@ TEST_F(Rounds, AreListedOnce)
 TEST_F(Rounds, TakeNothingWhileTheyHaveNotBegun)
 {
     FptestProcess fptest({"run", "--repeat", "1000000", "--json", work("json"), "--junit",
-                          work("junit"), "--tap", "--plan", plan(kPasses), "P/G"});
+                          work("junit"), "--tap", "--plan", plan(kOnePasses), "P/G"});
     ASSERT_TRUE(eventually(
         [&] { return fptest.out().find("ok 3 - G (round 3)") != std::string::npos; }, 20));
     const std::string most = device::status_field(fptest.pid(), "VmHWM");
@@ -203,7 +199,7 @@ TEST_F(Rounds, TakeNoMoreMemoryHoweverManyHaveBeenRun)
 TEST_F(Rounds, LookAtSignalsFromTheFirstMomentOn)
 {
     Start start;
-    start.arguments = {"run", "--repeat", "1000000", "--plan", plan(kPasses), "P/G"};
+    start.arguments = {"run", "--repeat", "1000000", "--plan", plan(kOnePasses), "P/G"};
     start.prepare = interrupted_before;
     const Ended ended = run_fptest(start);
     EXPECT_EQ(ended.status, 130);

@@ -75,6 +75,18 @@ TEST_F(RunGatherer, InterruptedInAGroupsCommandIsFollowedByNoOtherItem)
     EXPECT_FALSE(is_there("order"));
 }
 
+TEST_F(RunGatherer, LeavesNoItemRunningThatIsTheNextOneOfItsGroup)
+{
+    EXPECT_EQ(
+        run_group({{"SensorProbe", "--help"}, {"Item", "ignore-stop sleep 30"}, {"Other", kPasses}},
+                  {"--as-group", "--timeout", "1", "--grace", "0.3"})
+            .status,
+        1);
+    EXPECT_THAT(outcomes(),
+                ElementsAre("SensorProbe: no result", "Item: timed out", "Other: passed"));
+    EXPECT_EQ(end_of(0).at("left_running"), nlohmann::json::array());
+}
+
 TEST_F(RunGatherer, RunsTheNextItemOfAGroupWhileItGathers)
 {
     FptestProcess fptest(with_group(

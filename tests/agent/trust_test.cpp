@@ -30,11 +30,14 @@ class Trust : public Run
     {
         return end_of(item).at(name);
     }
+    // Of fptest with a file as its standard input.
+    static std::string errors_reading(const std::string &file, device::Lines arguments)
+    {
+        arguments.insert(arguments.begin(),
+                         {"sh", "-c", "exec \"$@\" <" + file, "-", FPTEST_PROGRAM});
+        return support::run({.arguments = std::move(arguments)}).err;
+    }
 };
-
-constexpr char kOnePasses[] = "<P><CmdGroup name=\"G\">"
-                              "<Cmd name=\"Item\" args=\"report G 100 0 fine\"/>"
-                              "</CmdGroup></P>";
 
 } // namespace
 
@@ -243,6 +246,14 @@ TEST_F(Trust, WritesNoTwoThingsIntoOneFile)
                    "fptest: --plan and --json both want the file " + plan_file +
                        ": give them files of their own",
                    {"run", "--plan", plan_file, "--json", plan_file, "P/G"});
+    const std::string want =
+        " both want the file " + plan_file + ": give them files of their own\n";
+    for (const std::string option : {"--json", "--junit", "--log"}) {
+        EXPECT_EQ(errors_reading(plan_file, {"run", "--plan", "-", option, plan_file, "P/G"}),
+                  "fptest: --plan and " + option + want);
+    }
+    EXPECT_EQ(errors_reading(plan_file, {"send", "-0", "--log", plan_file}),
+              "fptest: standard input and --log" + want);
     EXPECT_EQ(read_file(plan_file), kOnePasses);
     EXPECT_EQ(run_fptest({"run", "--plan", plan_file, "--json", "/dev/null", "--junit", "/dev/null",
                           "P/G"})
@@ -458,6 +469,17 @@ TEST_F(Trust, TakesNoFifoAndNoDirectoryForThePlan)
         }
     }
     std::filesystem::remove(kPlanFile);
+}
+
+TEST_F(Trust, GoesOnWhereTheLibraryIsSuspendedBetweenTwoItems)
+{
+    const std::string path =
+        plan("<P><CmdGroup name=\"G\"><Cmd name=\"Item\" args=\"report G 100 0 fine;"
+             " (sleep 0.02; kill -STOP $PPID) &amp;\"/><Cmd name=\"Other\" args=\"report G 100 0 "
+             "fine\"/>"
+             "</CmdGroup></P>");
+    EXPECT_THAT(run_fptest({"run", "--plan", path, "--timeout", "1", "P/G"}).out,
+                HasSubstr("2 passed"));
 }
 
 // --- the caller's ways -----------------------------------------------------------------

@@ -56,6 +56,12 @@ def test_the_environment_may_name_the_build():
                    "with --build DIR", env={"QUILLMARK_BUILD": "/nowhere"})
 
 
+@pytest.mark.usefixtures("device")
+@pytest.mark.parametrize("variable", ["POSIXLY_CORRECT=1", "SHELLOPTS=posix:errexit:noglob"])
+def test_the_environment_changes_nothing_of_its_shell(variable):
+    assert run("env", variable, DEVICE_RUN, "--", "echo", "on").out == "on\n"
+
+
 def test_without_a_build_named_it_is_the_release_build_of_its_own_tree(tmp_path):
     shutil.copytree(TREE / "device", tmp_path / "device")
 
