@@ -47,5 +47,5 @@ target_include_directories(vorlane PUBLIC "$<BUILD_INTERFACE:${VORLANE_INCLUDE_D
 target_link_libraries(vorlane PRIVATE MiniXml::MiniXml quillmark_warnings quillmark_plain)
 # a log beyond 2 GB, on 32-bit devices as well
 target_compile_definitions(vorlane PRIVATE _FILE_OFFSET_BITS=64)
-set_target_properties(vorlane PROPERTIES LINKER_LANGUAGE C)
+set_target_properties(vorlane PROPERTIES LINKER_LANGUAGE C UNITY_BUILD OFF)
 add_library(Vorlane::Vorlane ALIAS vorlane)

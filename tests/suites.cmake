@@ -4,9 +4,10 @@
 # add_suites(TARGET PREFIX LABEL)
 #
 # Makes one test of each suite of a GoogleTest program, PREFIX.SUITE: its tests share the
-# start of the virtual device, which takes longer than they do.
+# start of the program, or of the virtual device, which takes longer than they do.
 function(add_suites target prefix label)
   get_target_property(sources ${target} SOURCES)
+  list(FILTER sources INCLUDE REGEX "_test\\.cpp$")
   set(list)
   foreach(source IN LISTS sources)
     set_property(DIRECTORY APPEND PROPERTY CMAKE_CONFIGURE_DEPENDS ${source})

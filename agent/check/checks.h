@@ -7,12 +7,14 @@
 #include "check/findings.h"
 #include "plan/plan.h"
 
+#include <cstddef>
 #include <optional>
 #include <string>
 
 namespace fptest
 {
 
+inline constexpr std::size_t kNone = std::string::npos;
 inline constexpr char kDeclaration[] = "<?xml version=\"1.0\"?>";
 
 // What a command would cut off the text.

@@ -19,7 +19,6 @@ namespace fptest
 namespace
 {
 
-constexpr std::size_t kNone = std::string::npos;
 constexpr std::size_t kShownWhy = 160; // columns
 
 bool is_name(std::string_view name)

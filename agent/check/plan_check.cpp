@@ -22,7 +22,6 @@ namespace fptest
 namespace
 {
 
-constexpr std::size_t kNone = std::string::npos;
 constexpr std::size_t kShownEffects = 3;
 constexpr std::size_t kShownKinds = 5;
 constexpr std::array kVendors = {0, 1, 2};
@@ -44,12 +43,6 @@ std::optional<VendorName> vendor_name(std::string_view name)
         }
     }
     return std::nullopt;
-}
-
-std::optional<std::string> attribute(mxml_node_t *node, const char *name)
-{
-    const char *value = mxmlElementGetAttr(node, name);
-    return value != nullptr ? std::optional<std::string>(value) : std::nullopt;
 }
 
 bool is_element(mxml_node_t *node, std::string_view tag)

@@ -34,10 +34,10 @@ bool is_any(std::string_view word, std::initializer_list<std::string_view> words
     return std::ranges::find(words, word) != words.end();
 }
 
-class Scanner
+class LineScanner
 {
   public:
-    explicit Scanner(std::string_view line) : line_(line)
+    explicit LineScanner(std::string_view line) : line_(line)
     {
     }
 
@@ -554,7 +554,7 @@ class Scanner
 
 ShellReading read_shell_line(std::string_view line)
 {
-    return Scanner(line).read();
+    return LineScanner(line).read();
 }
 
 } // namespace fptest

@@ -14,8 +14,6 @@ namespace fptest
 namespace
 {
 
-constexpr std::size_t kNone = std::string::npos;
-
 class SizeChecker
 {
   public:

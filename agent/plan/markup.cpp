@@ -12,11 +12,11 @@ namespace fptest
 namespace
 {
 
-constexpr std::string_view kBlanks = " \t\r\n";
+constexpr std::string_view kXmlBlanks = " \t\r\n";
 
 bool is_blank(char c)
 {
-    return kBlanks.find(c) != std::string_view::npos;
+    return kXmlBlanks.find(c) != std::string_view::npos;
 }
 
 // Tags end where Mini-XML sees their end, so that its elements and these tags
@@ -63,7 +63,7 @@ class Scanner
 
     void skip_blanks()
     {
-        at_ = std::min(text_.find_first_not_of(kBlanks, at_), text_.size());
+        at_ = std::min(text_.find_first_not_of(kXmlBlanks, at_), text_.size());
     }
 
     // Passes over what comes before the first of these characters, and gives it.

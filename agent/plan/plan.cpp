@@ -23,8 +23,6 @@ namespace fptest
 namespace
 {
 
-constexpr char kBlanks[] = " \t\n\v\f\r";
-
 // The components that the library sees in the path of this group, or of this
 // item. A name that holds a '/' is two, an empty one is none.
 std::vector<std::string> components(const std::string &names)
@@ -120,12 +118,6 @@ bool is_lone_whitespace(mxml_node_t *node)
     }
     const char *text = mxmlGetText(node, nullptr);
     return text[std::strspn(text, kBlanks)] == '\0';
-}
-
-std::optional<std::string> attribute(mxml_node_t *node, const char *name)
-{
-    const char *value = mxmlElementGetAttr(node, name);
-    return value != nullptr ? std::optional<std::string>(value) : std::nullopt;
 }
 
 bool has_valueless(mxml_node_t *node, const char *name)
@@ -261,6 +253,12 @@ void Plan::note_positions()
             children_[parent].push_back(child);
         }
     }
+}
+
+std::optional<std::string> attribute(mxml_node_t *node, const char *name)
+{
+    const char *value = mxmlElementGetAttr(node, name);
+    return value != nullptr ? std::optional<std::string>(value) : std::nullopt;
 }
 
 std::string as_loaded(const std::string &value)

@@ -95,6 +95,9 @@ class Plan
     std::unordered_map<std::string, Numbers> items_named_;
 };
 
+// An attribute of an element; nothing where it has none.
+std::optional<std::string> attribute(mxml_node_t *node, const char *name);
+
 // An attribute's value as Mini-XML gives it back once it is saved: it drops
 // characters that it writes.
 std::string as_loaded(const std::string &value);

@@ -14,8 +14,6 @@ namespace fptest
 namespace
 {
 
-constexpr char kBlanks[] = " \t\n\v\f\r";
-
 // Copies a text, leaving out attributes with the blanks in front of them.
 class AttributeEraser
 {

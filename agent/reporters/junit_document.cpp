@@ -20,7 +20,7 @@ namespace
 
 // --- XML ---------------------------------------------------------------------
 
-std::string escaped(std::string_view text)
+std::string xml_escaped(std::string_view text)
 {
     static constexpr Replacement kEscapes[] = {
         {"&", "&amp;"},
@@ -39,7 +39,7 @@ std::string escaped(std::string_view text)
 std::string attribute(const char *name, std::string_view value)
 {
     static constexpr Replacement kEscapes[] = {{"\t", "&#9;"}, {"\n", "&#10;"}};
-    return fmt::format(" {}=\"{}\"", name, replaced(escaped(value), kEscapes));
+    return fmt::format(" {}=\"{}\"", name, replaced(xml_escaped(value), kEscapes));
 }
 
 std::string attribute(const char *name, std::size_t value)
@@ -164,7 +164,7 @@ std::string verdict(const Run &run, const ItemRun &item)
     return fmt::format("      <{0}{1}{2}>{3}</{0}>\n", has_failed ? "failure" : "error",
                        attribute("type", has_failed ? "result" : word(item.outcome)),
                        attribute("message", item.reason.empty() ? word(item.outcome) : item.reason),
-                       escaped(details(item)));
+                       xml_escaped(details(item)));
 }
 
 std::string test_case(const Run &run, const ItemRun &item)
@@ -184,7 +184,7 @@ std::string test_case(const Run &run, const ItemRun &item)
     const std::string output =
         item.output.empty()
             ? ""
-            : fmt::format("      <system-out>{}</system-out>\n", escaped(item.output));
+            : fmt::format("      <system-out>{}</system-out>\n", xml_escaped(item.output));
     return fmt::format(
         "    <testcase{}{}{}>\n{}{}{}    </testcase>\n", attribute("classname", item.group),
         attribute("name", item.name + of_round(run)), time_attribute(item.seconds.value_or(0)),

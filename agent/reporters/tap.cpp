@@ -24,7 +24,7 @@ namespace
 
 constexpr char kIndent[] = "    "; // of a subtest
 
-std::string escaped(std::string_view text)
+std::string tap_escaped(std::string_view text)
 {
     static constexpr Replacement kEscapes[] = {{"#", "\\#"}, {"\\", "\\\\"}};
     return replaced(one_line(text), kEscapes);
@@ -33,7 +33,7 @@ std::string escaped(std::string_view text)
 // A text between double quotes, as both YAML and JSON read it. YAML has no room
 // for some characters that a clean text may hold: they break a line there, or
 // are none at all.
-std::string quoted(std::string_view text)
+std::string yaml_quoted(std::string_view text)
 {
     static constexpr Replacement kEscapes[] = {
         {"\"", "\\\""},
@@ -51,7 +51,7 @@ std::string quoted(std::string_view text)
     constexpr std::size_t kLongest = 60000;
     constexpr std::size_t kKept = 10000;
     const std::string whole = '"' + replaced(sanitize_utf8(text), kEscapes) + '"';
-    return whole.size() <= kLongest ? whole : quoted(ellipsize(sanitize_utf8(text), kKept));
+    return whole.size() <= kLongest ? whole : yaml_quoted(ellipsize(sanitize_utf8(text), kKept));
 }
 
 std::string plan_line(std::size_t points)
@@ -61,14 +61,14 @@ std::string plan_line(std::size_t points)
 
 std::string point(bool ok, std::size_t number, const std::string &name)
 {
-    return fmt::format("{} {} - {}", ok ? "ok" : "not ok", number, escaped(name));
+    return fmt::format("{} {} - {}", ok ? "ok" : "not ok", number, tap_escaped(name));
 }
 
 std::string skipped(const Run &run, const ItemRun &item)
 {
     const std::string &why = why_not_all(run);
     const std::string &reason = item.reason.empty() ? why : item.reason;
-    return " # SKIP not run" + (reason.empty() ? "" : ": " + escaped(reason));
+    return " # SKIP not run" + (reason.empty() ? "" : ": " + tap_escaped(reason));
 }
 
 std::string entry(const char *name, const std::string &value)
@@ -78,7 +78,7 @@ std::string entry(const char *name, const std::string &value)
 
 std::string entry(const char *name, const std::optional<std::string> &text)
 {
-    return text ? entry(name, quoted(*text)) : "";
+    return text ? entry(name, yaml_quoted(*text)) : "";
 }
 
 // What is known of an item that has been run.
@@ -87,13 +87,13 @@ std::string diagnosis(const ItemRun &item)
     const ItemReport &report = item.report;
     const std::string left = left_running(item);
     std::string text = std::string(kIndent) + "  ---\n";
-    text += entry("outcome", quoted(word(item.outcome)));
+    text += entry("outcome", yaml_quoted(word(item.outcome)));
     if (!item.reason.empty()) {
-        text += entry("reason", quoted(item.reason));
+        text += entry("reason", yaml_quoted(item.reason));
     }
     text += entry("progress", report.progress);
-    text +=
-        report.result_without_value ? entry("result", quoted("")) : entry("result", report.result);
+    text += report.result_without_value ? entry("result", yaml_quoted(""))
+                                        : entry("result", report.result);
     text += entry("description", report.description);
     if (item.seconds) {
         text += entry("duration_ms", std::to_string(std::llround(*item.seconds * 1000)));
@@ -102,10 +102,10 @@ std::string diagnosis(const ItemRun &item)
         text += entry("exit_status", std::to_string(*item.exit_status));
     }
     if (item.signal != 0) {
-        text += entry("signal", quoted(name_of_signal(item.signal)));
+        text += entry("signal", yaml_quoted(name_of_signal(item.signal)));
     }
     if (!left.empty()) {
-        text += entry("left_running", quoted(left));
+        text += entry("left_running", yaml_quoted(left));
     }
     return text + kIndent + "  ...\n";
 }
@@ -231,7 +231,7 @@ class TapReport : public Listener
         while (suite_ < run.suites.size() && (all || suite_ < begun_)) {
             const Suite &suite = run.suites[suite_];
             if (!std::exchange(open_, true)) {
-                text += fmt::format("# Subtest: {}\n", escaped(title(run, suite)));
+                text += fmt::format("# Subtest: {}\n", tap_escaped(title(run, suite)));
                 text += kIndent + plan_line(suite.items.size());
             }
             for (; item_ < suite.items.size() && (all || ended_[suite_][item_]); ++item_) {

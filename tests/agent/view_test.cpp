@@ -20,22 +20,22 @@ namespace
 {
 
 constexpr char kFptest[] = QUILLMARK_BINARY_DIR "/agent/fptest";
-constexpr char kPlan[] = "/tmp/plan.xml";
+constexpr char kViewed[] = "/tmp/plan.xml";
 constexpr int kGreen = 2;
 constexpr int kRed = 1;
 constexpr int kYellow = 3;
 
 // Times differ from run to run.
-std::string without_times(const std::string &line)
+std::string masked(const std::string &line)
 {
     static const std::regex time(R"(\b\d+\.\d s)");
     return std::regex_replace(line, time, "T.T s");
 }
 
-std::vector<std::string> without_times(std::vector<std::string> lines)
+std::vector<std::string> masked(std::vector<std::string> lines)
 {
     for (std::string &line : lines) {
-        line = without_times(line);
+        line = masked(line);
     }
     return lines;
 }
@@ -53,12 +53,12 @@ class LiveView : public DeviceTest
 
     static void use_plan(const std::string &text)
     {
-        write_file(kPlan, text);
+        write_file(kViewed, text);
     }
 
     static std::vector<std::string> run(const std::vector<std::string> &arguments)
     {
-        std::vector<std::string> all = {kFptest, "run", "--plan", kPlan};
+        std::vector<std::string> all = {kFptest, "run", "--plan", kViewed};
         all.insert(all.end(), arguments.begin(), arguments.end());
         return all;
     }
@@ -88,7 +88,7 @@ class LiveView : public DeviceTest
     }
 };
 
-constexpr char kTwoItems[] =
+constexpr char kTwoThatReport[] =
     "<P><CmdGroup name=\"Bringup\">"
     "<Cmd name=\"Item\" args=\"report Bringup 50 -2 'half of it' await /tmp/go "
     "report Bringup 100 0 'all of it'\"/>"
@@ -99,13 +99,13 @@ constexpr char kTwoItems[] =
 
 TEST_F(LiveView, ShowsAnItemsBarTimeResultAndDescriptionWhileItRuns)
 {
-    use_plan(kTwoItems);
+    use_plan(kTwoThatReport);
     TerminalSession session(run({"P/Bringup"}), 80, 24);
     ASSERT_TRUE(session.wait_for([&] {
         return session.text().find("half of it") != std::string::npos &&
                session.all_lines().back().find("to go") != std::string::npos;
     })) << session.text();
-    EXPECT_THAT(without_times(session.all_lines()),
+    EXPECT_THAT(masked(session.all_lines()),
                 ElementsAre("/tmp/plan.xml: 2 items, vendor 0", //
                             "Bringup",                          //
                             "  Item     [####    ]  50%  T.T s  running   -2  half of it",
@@ -116,11 +116,11 @@ TEST_F(LiveView, ShowsAnItemsBarTimeResultAndDescriptionWhileItRuns)
 
 TEST_F(LiveView, LeavesALineForEachItemAndTheTotalBehind)
 {
-    use_plan(kTwoItems);
+    use_plan(kTwoThatReport);
     let_go();
     TerminalSession session(run({"P/Bringup"}), 80, 24);
     EXPECT_EQ(session.wait_for_end(), 1);
-    EXPECT_THAT(without_times(session.all_lines()),
+    EXPECT_THAT(masked(session.all_lines()),
                 ElementsAre("/tmp/plan.xml: 2 items, vendor 0", //
                             "Bringup",                          //
                             "  Item     [########] 100%  T.T s  passed     0  all of it",
@@ -131,7 +131,7 @@ TEST_F(LiveView, LeavesALineForEachItemAndTheTotalBehind)
 
 TEST_F(LiveView, CountsTheSecondsOfWhatRuns)
 {
-    use_plan(kTwoItems);
+    use_plan(kTwoThatReport);
     TerminalSession session(run({"P/Bringup"}), 80, 24);
     const auto shows = [&session](const char *time) {
         return [&session, shape = std::regex(std::string(time) + " s  running")] {
@@ -189,7 +189,7 @@ TEST_F(LiveView, FitsItsLinesIntoANarrowTerminal)
 
 TEST_F(LiveView, IsPlainWhereALineHasNoRoomForAResult)
 {
-    use_plan(kTwoItems);
+    use_plan(kTwoThatReport);
     let_go();
     for (const int columns : {39, 20, 3}) {
         SCOPED_TRACE(columns);
@@ -202,7 +202,7 @@ TEST_F(LiveView, IsPlainWhereALineHasNoRoomForAResult)
 
 TEST_F(LiveView, LeavesNothingAfterOnATerminalThatBecomesVeryNarrow)
 {
-    use_plan(kTwoItems);
+    use_plan(kTwoThatReport);
     TerminalSession session(run({"P/Bringup"}), 80, 24);
     ASSERT_TRUE(session.wait_for_text("half of it"));
     session.resize(10, 24);
@@ -217,7 +217,7 @@ TEST_F(LiveView, LeavesNothingAfterOnATerminalThatBecomesVeryNarrow)
 
 TEST_F(LiveView, UsesTheNewWidthOfAResizedTerminal)
 {
-    use_plan(kTwoItems);
+    use_plan(kTwoThatReport);
     TerminalSession session(run({"P/Bringup"}), 100, 24);
     ASSERT_TRUE(session.wait_for_text("half of it"));
     session.resize(50, 24);
@@ -261,7 +261,7 @@ TEST_F(LiveView, ColoursWhatBecameOfAnItem)
 
 TEST_F(LiveView, UsesNoColourWhereThatIsNotWanted)
 {
-    use_plan(kTwoItems);
+    use_plan(kTwoThatReport);
     let_go();
     TerminalSession session(run({"P/Bringup"}), 80, 24, {{"NO_COLOR", "1"}});
     EXPECT_EQ(session.wait_for_end(), 1);
@@ -273,7 +273,7 @@ TEST_F(LiveView, UsesNoColourWhereThatIsNotWanted)
 
 TEST_F(LiveView, IsColouredWhereNoColorIsSetToNothing)
 {
-    use_plan(kTwoItems);
+    use_plan(kTwoThatReport);
     let_go();
     TerminalSession session(run({"P/Bringup"}), 80, 24, {{"NO_COLOR", ""}});
     EXPECT_EQ(session.wait_for_end(), 1);
@@ -282,12 +282,12 @@ TEST_F(LiveView, IsColouredWhereNoColorIsSetToNothing)
 
 TEST_F(LiveView, IsPlainOnATerminalThatCannotMoveItsCursor)
 {
-    use_plan(kTwoItems);
+    use_plan(kTwoThatReport);
     let_go();
     TerminalSession session(run({"P/Bringup"}), 80, 24, {{"TERM", "dumb"}});
     EXPECT_EQ(session.wait_for_end(), 1);
     EXPECT_EQ(session.written().find('\x1b'), std::string::npos);
-    EXPECT_THAT(without_times(session.all_lines()),
+    EXPECT_THAT(masked(session.all_lines()),
                 ElementsAre("/tmp/plan.xml: 2 items, vendor 0",
                             "Bringup/Item: passed, result 0, T.T s: all of it",
                             "Bringup/Other: failed, result 1, T.T s: broken", "    | why-it-broke",
@@ -326,7 +326,7 @@ TEST_F(LiveView, CountsTheColumnsOfWideCharacters)
 
 TEST_F(LiveView, KeepsWhatItKnewWhileThePlanIsHalfWritten)
 {
-    use_plan(kTwoItems);
+    use_plan(kTwoThatReport);
     TerminalSession session(run({"P/Bringup"}), 80, 24);
     ASSERT_TRUE(session.wait_for_text("half of it"));
     const std::string plan = read_file(kPlanFile);

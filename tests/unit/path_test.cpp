@@ -104,19 +104,19 @@ Lines by_agent(const std::string &text, const std::string &path, bool by_item)
     return runs;
 }
 
-struct Case {
+struct PathCase {
     const char *what;
     std::string plan; // in shorthand
     std::string path; // after the root
     std::string runs; // names, or "-"; "x#2" is the second item of the plan
 };
 
-void PrintTo(const Case &one, std::ostream *out)
+void PrintTo(const PathCase &one, std::ostream *out)
 {
     *out << one.plan << ", " << one.path;
 }
 
-class Path : public LibraryTest, public ::testing::WithParamInterface<Case>
+class Path : public LibraryTest, public ::testing::WithParamInterface<PathCase>
 {
 };
 
@@ -143,7 +143,7 @@ const std::string k62(62, 'n');
 const std::string k63 = k62 + "n";
 const std::string k64 = k63 + "o";
 
-const Case kCases[] = {
+const PathCase kCases[] = {
     // what a group's path runs
     {"GroupRunsEveryItemInOrder", "A(x y) B(z)", "A", "x y"},
     {"SecondGroupRunsItsOwn", "A(x y) B(z)", "B", "z"},
