@@ -21,7 +21,7 @@ function(add_suites target prefix label)
   foreach(suite IN LISTS suites)
     string(APPEND list "
 add_test(${prefix}.${suite} \"$<TARGET_FILE:${target}>\" --gtest_filter=${suite}.*:*/${suite}.*)
-set_tests_properties(${prefix}.${suite} PROPERTIES LABELS ${label} TIMEOUT 120
+set_tests_properties(${prefix}.${suite} PROPERTIES LABELS ${label} TIMEOUT 300
   SKIP_RETURN_CODE 77 FAIL_REGULAR_EXPRESSION \"Running 0 tests\")
 list(APPEND ${target}_TESTS ${prefix}.${suite})")
   endforeach()

@@ -188,6 +188,9 @@ void FptestTest::SetUp()
 
 void FptestTest::TearDown()
 {
+    // the next test's would be refused beside it
+    EXPECT_TRUE(
+        device::eventually([] { return device::processes_named(FPTEST_PROGRAM).empty(); }, 20));
     fs::permissions(kData, fs::perms::owner_all);
     fs::remove_all(kWork);
     DeviceTest::TearDown();

@@ -13,12 +13,7 @@
 
 using namespace fptest_runner;
 using namespace device;
-using ::testing::Contains;
-using ::testing::IsSupersetOf;
-using ::testing::Not;
-using ::testing::SizeIs;
-using ::testing::StartsWith;
-using ::testing::UnorderedElementsAre;
+using namespace testing;
 
 namespace fs = std::filesystem;
 
@@ -27,9 +22,7 @@ namespace
 
 const Lines kCommands = {"run", "check", "show", "report", "send"};
 
-class Fptest : public FptestTest
-{
-};
+using Fptest = FptestTest;
 
 // The columns of a text in UTF-8 without wide characters.
 std::size_t display_width(const std::string &text)
@@ -447,72 +440,10 @@ TEST_F(Fptest, HasAManualPageOfThePlansFormat)
 
 // --- completion -------------------------------------------------------------------------
 
-// What bash offers for the last of these words.
-Lines completions(const Lines &words)
+TEST_F(Fptest, CompletesOnATerminalWithWhatThePlansHold)
 {
-    std::string array;
-    std::string line;
-    for (const std::string &word : words) {
-        array += " '" + word + "'";
-        line += (line.empty() ? "" : " ") + word;
-    }
-    const std::string script = "source /usr/share/bash-completion/bash_completion\n"
-                               "source \"$0\"\n"
-                               "compopt() { :; }\n" // there is no line that is being edited
-                               "function=$(complete -p fptest | sed 's/.*-F \\([^ ]*\\).*/\\1/')\n"
-                               "COMP_WORDS=(" +
-                               array + ") COMP_CWORD=" + std::to_string(words.size() - 1) + "\n" +
-                               "COMP_LINE='" + line +
-                               "' COMP_POINT=${#COMP_LINE} COMP_TYPE=9\n"
-                               "\"$function\" fptest '" +
-                               words.back() + "' '" + words.at(words.size() - 2) +
-                               "'\n"
-                               "printf '%s\\n' \"${COMPREPLY[@]}\"\n";
-    const Ended ended = run_program(
-        {"/usr/bin/bash", "--norc", "-c", script, QUILLMARK_SOURCE_DIR "/agent/completion/fptest"});
-    EXPECT_EQ(ended.status, 0) << ended.out;
-    Lines offered = lines_of(ended.out);
-    for (std::string &word : offered) {
-        word.erase(word.find_last_not_of(' ') + 1);
-    }
-    return offered;
-}
-
-TEST_F(Fptest, CompletesNodePathsOfTheStoredPlan)
-{
-    write_file(kPlanFile,
-               "<Plan name=\"demo\"><CmdGroup name=\"Bringup\"><Cmd name=\"SpiCheck\" args=\"\"/>"
-               "<Cmd name=\"DeadPixel\" args=\"\"/></CmdGroup><CmdGroup name=\"Endurance\">"
-               "<Cmd name=\"BurnIn\" args=\"\"/></CmdGroup></Plan>");
-    EXPECT_THAT(completions({"fptest", "run", "demo/B"}), Contains(StartsWith("demo/Bringup")));
-    EXPECT_THAT(completions({"fptest", "run", "demo/B"}), Not(Contains(HasSubstr("Endurance"))));
-    EXPECT_THAT(completions({"fptest", "run", "--tap", "demo/Bringup/S"}),
-                ElementsAre("demo/Bringup/SpiCheck"));
-    EXPECT_THAT(completions({"fptest", "run", "demo/Bringup/"}),
-                IsSupersetOf({"demo/Bringup/SpiCheck", "demo/Bringup/DeadPixel"}));
-}
-
-TEST_F(Fptest, CompletesNodePathsOfThePlanThatIsGiven)
-{
-    write_file(kPlanFile, plan_of({{"Stored", {{"Item", ""}}}}));
-    const std::string path = plan(plan_of({{"Given", {{"Other", ""}}}}));
-    EXPECT_THAT(completions({"fptest", "run", "--plan", path, "P/"}),
-                ::testing::AllOf(Contains(HasSubstr("Given")), Not(Contains(HasSubstr("Stored")))));
-}
-
-TEST_F(Fptest, CompletesWhatAReportIsAbout)
-{
-    write_file(kPlanFile, plan_of({{"Bringup", {{"SpiCheck", ""}, {"DeadPixel", ""}}},
-                                   {"Endurance", {{"BurnIn", ""}}}}));
-    EXPECT_THAT(completions({"fptest", "report", "Br"}), ElementsAre("Bringup"));
-    EXPECT_THAT(completions({"fptest", "report", "Bringup", ""}),
-                UnorderedElementsAre("SpiCheck", "DeadPixel"));
-    EXPECT_THAT(completions({"fptest", "report", "Bringup", "SpiCheck", "--result", ""}),
-                UnorderedElementsAre("0", "1", "-2"));
-}
-
-TEST_F(Fptest, CompletesOnATerminal)
-{
+    write_file(kPlanFile, plan_of({{"Stored", {{"SpiCheck", ""}, {"DeadPixel", ""}}}}));
+    plan(plan_of({{"Given", {{"Other", ""}}}}));
     TerminalSession session({"/usr/bin/bash", "--norc", "--noprofile", "-i"}, 80, 24,
                             {{"PS1", "ready> "},
                              {"PATH", "/system/bin:/usr/bin"},
@@ -523,6 +454,13 @@ TEST_F(Fptest, CompletesOnATerminal)
     ASSERT_TRUE(session.wait_for_text("soon-2")) << session.text();
     session.type("fptest rep\t");
     EXPECT_TRUE(session.wait_for_text("ready> fptest report")) << session.text();
+    session.type("St\tSpi\t");
+    EXPECT_TRUE(session.wait_for_text("report Stored SpiCheck")) << session.text();
+    for (const std::string plan : {"", "--plan /tmp/scene/plan.xml "}) {
+        session.type("\025fptest run " + plan + "P/\t"); // Ctrl-U: on an empty line
+        EXPECT_TRUE(session.wait_for_text("run " + plan + (plan.empty() ? "P/Stored" : "P/Given")))
+            << session.text();
+    }
 }
 
 } // namespace

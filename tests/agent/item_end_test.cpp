@@ -12,11 +12,7 @@
 
 using namespace fptest_runner;
 using namespace device;
-using ::testing::AllOf;
-using ::testing::Ge;
-using ::testing::Lt;
-using ::testing::Not;
-using ::testing::StartsWith;
+using namespace testing;
 
 namespace
 {

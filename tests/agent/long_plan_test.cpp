@@ -9,8 +9,7 @@
 
 using namespace fptest_runner;
 using namespace device;
-using ::testing::SizeIs;
-using ::testing::StartsWith;
+using namespace testing;
 
 namespace fs = std::filesystem;
 

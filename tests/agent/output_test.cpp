@@ -23,9 +23,7 @@
 using namespace fptest_runner;
 using namespace device;
 using namespace support;
-using ::testing::ElementsAre;
-using ::testing::HasSubstr;
-using ::testing::SizeIs;
+using namespace testing;
 
 namespace
 {

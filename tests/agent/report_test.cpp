@@ -11,9 +11,7 @@
 
 using namespace fptest_runner;
 using namespace device;
-using ::testing::EndsWith;
-using ::testing::SizeIs;
-using ::testing::StartsWith;
+using namespace testing;
 
 namespace fs = std::filesystem;
 

@@ -33,11 +33,7 @@ namespace reports_test
 using namespace fptest;
 using namespace playback;
 using namespace support;
-using ::testing::ElementsAre;
-using ::testing::EndsWith;
-using ::testing::HasSubstr;
-using ::testing::Not;
-using ::testing::StartsWith;
+using namespace testing;
 using Json = nlohmann::json;
 using support::Process;
 using Attributes = std::map<std::string, std::string>;
@@ -184,15 +180,9 @@ class Reports : public ::testing::Test
     TemporaryDirectory directory_;
 };
 
-class JsonReport : public Reports
-{
-};
-class JunitReport : public Reports
-{
-};
-class TapReport : public Reports
-{
-};
+using JsonReport = Reports;
+using JunitReport = Reports;
+using TapReport = Reports;
 
 // Its exit status, or minus the signal.
 inline int in_a_child(const std::function<void()> &what)

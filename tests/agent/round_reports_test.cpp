@@ -25,9 +25,7 @@
 using namespace playback;
 using namespace support;
 using namespace std::chrono_literals;
-using ::testing::ElementsAre;
-using ::testing::HasSubstr;
-using ::testing::Not;
+using namespace testing;
 using Json = nlohmann::json;
 
 namespace

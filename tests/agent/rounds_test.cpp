@@ -17,9 +17,7 @@
 using namespace fptest_runner;
 using namespace device;
 using namespace support;
-using ::testing::ElementsAre;
-using ::testing::HasSubstr;
-using ::testing::StartsWith;
+using namespace testing;
 
 namespace
 {

@@ -13,9 +13,7 @@
 using namespace fptest_runner;
 using namespace device;
 using namespace support;
-using ::testing::EndsWith;
-using ::testing::SizeIs;
-using ::testing::StartsWith;
+using namespace testing;
 
 namespace
 {

@@ -10,8 +10,7 @@
 using namespace fptest_runner;
 using namespace device;
 using namespace support;
-using ::testing::EndsWith;
-using ::testing::StartsWith;
+using namespace testing;
 
 namespace fs = std::filesystem;
 

@@ -14,9 +14,7 @@
 using namespace fptest_runner;
 using namespace device;
 using namespace support;
-using ::testing::Each;
-using ::testing::Not;
-using ::testing::SizeIs;
+using namespace testing;
 
 namespace fs = std::filesystem;
 

@@ -12,9 +12,7 @@
 using namespace fptest_runner;
 using namespace device;
 using namespace support;
-using ::testing::EndsWith;
-using ::testing::SizeIs;
-using ::testing::StartsWith;
+using namespace testing;
 
 namespace fs = std::filesystem;
 

@@ -14,16 +14,14 @@
 
 using namespace fptest_runner;
 using namespace device;
-using ::testing::Not;
+using namespace testing;
 
 namespace
 {
 
 using namespace std::string_literals;
 
-class Send : public FptestTest
-{
-};
+using Send = FptestTest;
 
 TEST_F(Send, PrintsALineForEachReply)
 {

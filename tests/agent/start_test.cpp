@@ -18,7 +18,7 @@
 using namespace fptest_runner;
 using namespace device;
 using namespace support;
-using ::testing::ElementsAre;
+using namespace testing;
 
 namespace
 {

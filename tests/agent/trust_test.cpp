@@ -14,10 +14,7 @@
 
 using namespace device;
 using namespace fptest_runner;
-using ::testing::ElementsAre;
-using ::testing::HasSubstr;
-using ::testing::Not;
-using ::testing::StartsWith;
+using namespace testing;
 
 namespace
 {

@@ -12,9 +12,7 @@
 #include <unistd.h>
 
 using namespace device;
-using ::testing::Contains;
-using ::testing::Not;
-using ::testing::SizeIs;
+using namespace testing;
 
 namespace
 {

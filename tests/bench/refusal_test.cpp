@@ -1,11 +1,9 @@
 // SPDX-FileCopyrightText: 2026 The Quillmark authors
 // SPDX-License-Identifier: Apache-2.0
 
-// What the benchmarks refuse: baselines that do not do the library's job, and wrong
-// command lines.
+// The benchmarks refuse baselines that do not do the library's job.
 #include "comparison.h"
 #include "quiet_vorlane.h"
-#include "support/process.h"
 
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
@@ -41,8 +39,7 @@ extern "C" void quiet_on_log(void (*new_listener)(const char *format, va_list ar
 namespace
 {
 
-using ::testing::StrEq;
-using ::testing::ThrowsMessage;
+using namespace testing;
 
 struct Baseline {
     const char *name;
@@ -111,51 +108,5 @@ INSTANTIATE_TEST_SUITE_P(
                                "the baseline leaves something else behind; make it do what the "
                                "library does"}),
     [](const auto &test) { return test.param.name; });
-
-struct Refusal {
-    const char *name;
-    const char *arguments;
-    const char *line;
-};
-
-void PrintTo(const Refusal &refusal, std::ostream *stream)
-{
-    *stream << refusal.arguments;
-}
-
-class BadCommandLine : public ::testing::TestWithParam<Refusal>
-{
-};
-
-TEST_P(BadCommandLine, GetsOneLineAndStatus2)
-{
-    const auto &[name, arguments, line] = GetParam();
-    const support::Ended ended =
-        support::run({.arguments = {"/bin/sh", "-c", std::string("exec \"$0\" ") + arguments,
-                                    QUILLMARK_SOURCE_DIR "/scripts/bench"},
-                      .is_one_stream = true});
-    EXPECT_EQ(ended.out, std::string("scripts/bench: ") + line + "\n");
-    EXPECT_EQ(ended.status, 2);
-}
-
-INSTANTIATE_TEST_SUITE_P(
-    Bench, BadCommandLine,
-    ::testing::Values(
-        Refusal{"Unknown", "--fast", "unknown argument '--fast'; see scripts/bench --help"},
-        Refusal{"FilterWithoutOne", "--filter",
-                "--filter wants an argument; see scripts/bench --help"},
-        Refusal{"EmptyFilter", "--filter ''",
-                "--filter wants an argument; see scripts/bench --help"},
-        Refusal{"NoFilter", "--filter '('", "--filter '(' is not a regular expression"},
-        Refusal{"JsonIntoADirectory", "--json /tmp",
-                "--json /tmp: this is a directory; name a file in it"},
-        Refusal{"JsonThatCannotBe", "--json /proc/figures",
-                "--json /proc/figures: this cannot be written"},
-        Refusal{"JsonWithoutDirectory", "--json /nowhere/figures.json",
-                "--json /nowhere/figures.json: there is no such directory"},
-        Refusal{"WriteOfSome", "--write --filter ping",
-                "--write keeps figures, and wants all of them: leave out the options that spare "
-                "some"}),
-    [](const auto &refusal) { return refusal.param.name; });
 
 } // namespace

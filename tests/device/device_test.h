@@ -106,6 +106,4 @@ class DeviceTest : public ::testing::Test
     void TearDown() override;
 };
 
-using ::testing::ElementsAre;
-using ::testing::HasSubstr;
-using ::testing::IsEmpty;
+using namespace testing;

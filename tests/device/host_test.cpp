@@ -12,9 +12,7 @@ using namespace device;
 namespace
 {
 
-class Host : public DeviceTest
-{
-};
+using Host = DeviceTest;
 
 const std::string kTests = QUILLMARK_BINARY_DIR "/tests/device";
 const std::string kHost = kTests + "/c_host";

@@ -13,9 +13,7 @@ using namespace device;
 namespace
 {
 
-class ItemRun : public DeviceTest
-{
-};
+using ItemRun = DeviceTest;
 
 TEST_F(ItemRun, OrdinaryItemHasEndedWhenTheCommandReturns)
 {

@@ -13,9 +13,7 @@ using namespace device;
 namespace
 {
 
-class Report : public DeviceTest
-{
-};
+using Report = DeviceTest;
 
 // What a process of its own, with a plan cache of its own, reports.
 void report_elsewhere(const std::string &arguments)

@@ -26,9 +26,7 @@ using namespace device;
 namespace
 {
 
-class Vorlane : public DeviceTest
-{
-};
+using Vorlane = DeviceTest;
 
 // Standard error as a socket that keeps every write apart.
 class WritesToStandardError

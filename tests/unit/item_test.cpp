@@ -13,9 +13,7 @@
 
 using namespace sequences;
 using namespace platform;
-using ::testing::Contains;
-using ::testing::Not;
-using ::testing::StartsWith;
+using namespace testing;
 
 namespace
 {

@@ -13,12 +13,7 @@
 #include <unistd.h>
 
 using namespace platform;
-using ::testing::AllOf;
-using ::testing::Contains;
-using ::testing::ExitedWithCode;
-using ::testing::HasSubstr;
-using ::testing::KilledBySignal;
-using ::testing::Not;
+using namespace testing;
 
 namespace
 {

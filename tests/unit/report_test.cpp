@@ -10,7 +10,7 @@
 
 using namespace sequences;
 using namespace platform;
-using ::testing::Contains;
+using namespace testing;
 
 namespace
 {

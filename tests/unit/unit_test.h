@@ -170,6 +170,4 @@ class LibraryTest : public ::testing::Test
 };
 
 // For lists of lines: reads as the list itself does.
-using ::testing::ElementsAre;
-using ::testing::ElementsAreArray;
-using ::testing::IsEmpty;
+using namespace testing;
