@@ -138,15 +138,20 @@ lay_out_container()
 # Waits for the supervisor, which is asked by every signal that comes here.
 wait_for_command()
 {
-	local pid=$1 signal status=0 gate
+	local pid=$1 signal status=0 gate asked=()
 
 	for signal in ${signals//,/ }; do
 		# shellcheck disable=SC2064
-		trap "kill -$signal $pid 2>/dev/null" "$signal"
+		trap "asked+=(-$signal)" "$signal"
 	done
 	# not by wait alone: interrupted again and again, it may lose the status
 	exec {gate}<> <(:)
 	while kill -0 "$pid" 2>/dev/null; do
+		# a bash that is not yet the supervisor may lose what it is sent
+		while [[ -n ${asked[0]-} && /proc/$pid/exe -ef $supervise ]]; do
+			kill "${asked[0]}" "$pid" 2>/dev/null || true
+			asked=("${asked[@]:1}")
+		done
 		read -r -t 0.01 -u "$gate" || true
 	done
 	wait "$pid" || status=$?

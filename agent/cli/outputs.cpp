@@ -115,6 +115,18 @@ void settle_outputs(RunOptions &options)
             report->assign(1, '-');
         }
     }
+    struct stat errors {
+    };
+    for (const NamedFile &report :
+         {NamedFile{"--json", options.json}, {"--junit", options.junit}}) {
+        if (fstat(STDERR_FILENO, &errors) == 0 && S_ISREG(errors.st_mode) &&
+            !report.second.empty() && report.second != "-" &&
+            are_same_file(report.second, "/proc/self/fd/2")) {
+            throw Failure(Exit::usage,
+                          "{} is standard error, and would be emptied: name another file",
+                          label(report));
+        }
+    }
 }
 
 void require_writable_reports(const RunOptions &options)

@@ -66,13 +66,15 @@ void choose_log(const std::string &option)
         return;
     }
     const std::string path = for_all_processes(file.second);
-    const Descriptor log(
+    Descriptor log(
         open(path.c_str(), O_WRONLY | O_CREAT | O_APPEND | O_NONBLOCK | O_CLOEXEC, 0644));
     // the library says nothing of what it cannot write
     if (!log.is_open() || write(log.get(), "", 0) < 0) {
         throw Failure(Exit::environment, "{} cannot be written: {}; name another file", label(file),
                       std::strerror(errno));
     }
+    static Descriptor held(-1); // or a FIFO's reader would see an end before the library begins
+    held = std::move(log);
     setenv(kLogVariable, path.c_str(), 1);
 }
 

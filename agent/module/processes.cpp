@@ -158,6 +158,16 @@ bool runs_below(pid_t ancestor, const std::vector<std::string> &items)
     return false;
 }
 
+std::optional<pid_t> met_by_stop(const std::string &item)
+{
+    for (const auto &[pid, process] : read_processes()) {
+        if (process.name.starts_with(item.substr(0, kStopLimit))) {
+            return pid;
+        }
+    }
+    return std::nullopt;
+}
+
 std::optional<std::pair<std::string, pid_t>>
 process_of_any(const std::vector<std::string> &programs)
 {

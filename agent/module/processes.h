@@ -25,6 +25,9 @@ struct Leftover {
 // asked for the first characters of it.
 bool runs_below(pid_t ancestor, const std::vector<std::string> &items);
 
+// The one that a stop of this item meets: the first that ps lists by that name.
+std::optional<pid_t> met_by_stop(const std::string &item);
+
 // One that was started as one of these programs, by its whole path. All processes
 // are read once, however many programs there are.
 std::optional<std::pair<std::string, pid_t>>

@@ -105,6 +105,8 @@ bool Runner::run(const Job &job)
             names.push_back(run_.suites[job.suite].items[target->item].name);
         }
     }
+    note_lost_module();
+    host_.restart(); // if something has ended it since the last job: that costs nothing
     // a process that reports, such as a gatherer, truncates the plan before it writes it:
     // the library may load it until it has come to the first item
     Descriptor plan = lock_stored_plan();
@@ -188,6 +190,16 @@ void Runner::handle(const LibraryProcess::Event &event, const Job &job, std::siz
         runs = false;
         lose_module(event);
         break;
+    }
+}
+
+// Its end between two jobs: what it has started comes to this process then.
+void Runner::note_lost_module()
+{
+    while (const auto event = host_.wait(0ms)) {
+        if (event->kind == LibraryProcess::Event::Kind::stopped) {
+            note_stop(*event);
+        }
     }
 }
 

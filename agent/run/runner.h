@@ -88,6 +88,7 @@ class Runner
         TimePoint moved_on_at;
         bool done = false;
         std::optional<Outcome> stop; // timed_out or stopped, once that is wanted
+        bool meets_other = false;    // the library's stop, not the item
         bool was_stopped = false;    // a stop has met it
         bool killed = false;
         bool overwritten = false; // its element bears another mark
@@ -122,6 +123,7 @@ class Runner
     void start_next(const Job &job, std::size_t &next, const LibraryProcess::Event &event);
     void end_item(const LibraryProcess::Event &event);
     void move_on(const LibraryProcess::Event &event);
+    void note_lost_module();
     void lose_module(const LibraryProcess::Event &event);
     void require_all_started(const Job &job, std::size_t next);
     void require_plan();
@@ -141,6 +143,7 @@ class Runner
     void note_stop(const LibraryProcess::Event &event);
     void cannot_stop(RunningItem &active);
     std::vector<Leftover> item_processes() const;
+    std::vector<Leftover> processes_of(const RunningItem &active) const;
     std::vector<Leftover> note_left_running(std::size_t element);
     void end_left_running();
     void end_gatherer();

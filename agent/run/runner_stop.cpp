@@ -155,6 +155,10 @@ void Runner::try_stop(RunningItem &active, bool command_runs)
     active.stop_tried_at = now();
     // once: another SIGTERM would start its clean-up anew
     if (!stop_asked_ && !active.was_stopped) {
+        const auto met = met_by_stop(item(active.place).name);
+        active.meets_other =
+            met && !std::ranges::any_of(processes_of(active),
+                                        [&](const auto &one) { return one.process == *met; });
         host_.stop(item(active.place).name);
         stop_asked_ = true;
     }
@@ -204,8 +208,8 @@ void Runner::stop_gatherer(RunningItem &active, bool command_runs, SteadyClock::
     }
 }
 
-// A stop that found nothing has met an item whose process has another name, as a
-// script's is its shell's.
+// A stop does not find an item whose process has another name, as a script's is its
+// shell's, and meets another process whose name begins as the item's.
 void Runner::note_stop(const LibraryProcess::Event &event)
 {
     stop_asked_ = false;
@@ -213,15 +217,12 @@ void Runner::note_stop(const LibraryProcess::Event &event)
         return;
     }
     RunningItem &active = active_.back();
-    if (event.value == 0) {
+    const std::vector<Leftover> processes = processes_of(active);
+    if (event.value == 0 && !active.meets_other) {
         active.was_stopped = true;
-    } else {
-        const std::vector<Leftover> processes =
-            gathers(active) ? host_.processes().of_gatherer() : item_processes();
-        if (signal_each(processes, SIGTERM)) {
-            signal_each(processes, SIGCONT); // one that is suspended would not see it
-            active.was_stopped = true;
-        }
+    } else if (signal_each(processes, SIGTERM)) {
+        signal_each(processes, SIGCONT); // one that is suspended would not see it
+        active.was_stopped = true;
     }
 }
 
@@ -245,6 +246,11 @@ std::vector<Leftover> Runner::item_processes() const
     return host_.processes().of_items(left_);
 }
 
+std::vector<Leftover> Runner::processes_of(const RunningItem &active) const
+{
+    return gathers(active) ? host_.processes().of_gatherer() : item_processes();
+}
+
 std::vector<Leftover> Runner::note_left_running(std::size_t element)
 {
     std::vector<Leftover> found = item_processes();
@@ -264,8 +270,12 @@ std::vector<Leftover> Runner::note_left_running(std::size_t element)
 template <typename Find> void Runner::end_all(const Find &find)
 {
     const auto begin = now();
+    const auto find_all = [&] {
+        note_lost_module();
+        return find();
+    };
     std::set<pid_t> asked;
-    for (auto left = find(); !left.empty(); left = find()) {
+    for (auto left = find_all(); !left.empty(); left = find_all()) {
         const auto waited = now() - begin;
         if (waited > limits_.grace + kBeforeGivingUp) {
             give_up(fmt::format("{} cannot be killed, and would report into the next round",

@@ -135,6 +135,21 @@ TEST_F(ItemEnd, InterruptionBetweenTwoRoundsBeginsNoOtherRound)
     EXPECT_EQ(events("finish").at(0).at("not_run"), 1);
 }
 
+TEST_F(ItemEnd, LibrarysProcessThatEndsBetweenTwoRoundsCostsNothing)
+{
+    FptestProcess fptest(
+        with_group({{"Item", "report G 100 0 fine; /system/bin/Third ignore-stop sleep 60 &amp;"}},
+                   {"--grace", "1.5", "--repeat", "2"}));
+    for (const std::size_t round : {1, 2}) {
+        ASSERT_TRUE(eventually([&] { return events("end").size() == round; }));
+        std::this_thread::sleep_for(std::chrono::milliseconds(500));
+        kill(fptest.module(), SIGKILL);
+    }
+    EXPECT_EQ(fptest.wait().status, 0);
+    EXPECT_THAT(outcomes(), ElementsAre("Item: passed", "Item: passed"));
+    EXPECT_THAT(running_items(), IsEmpty());
+}
+
 TEST_F(ItemEnd, StopComesOnceSoThatItsHandlerCanEnd)
 {
     const std::string cleans_up = "clean() { echo asked >>/tmp/scene/asked; sleep 0.6; exit 0; }; "

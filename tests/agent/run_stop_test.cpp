@@ -45,6 +45,15 @@ TEST_F(Run, StopsAnItemThatTakesTooLongThroughTheModule)
     EXPECT_THAT(running_items(), IsEmpty());
 }
 
+TEST_F(Run, AsksTheItemToStopWhereAnotherProcessHasItsName)
+{
+    run_group({{"Other", "report G 100 0 fine; /system/bin/Item ignore-stop sleep 60 &amp;"},
+               {"Item", kSleeps}},
+              {"--timeout", "1"});
+    EXPECT_THAT(reasons(), ElementsAre("", StartsWith("stopped after 1.")));
+    EXPECT_EQ(read_file(work("signal")), "SIGTERM\n");
+}
+
 TEST_F(Run, StopsItemsOfAGroupsCommandOneByOne)
 {
     const Ended ended =

@@ -493,6 +493,25 @@ TEST_F(Trust, KnowsHowItemsEndWhereItsCallerIgnoresTheEndsOfChildren)
     EXPECT_THAT(ended.out, HasSubstr("G/Item: failed, result 0, died by SIGSEGV"));
 }
 
+TEST_F(Trust, EmptiesNoFileThatStandardErrorIs)
+{
+    const std::string script = "exec 2>>/tmp/scene/errors; echo before >&2\n"
+                               "exec \"$0\" run --plan \"$1\" --json /dev/stderr P/G";
+    support::run({.arguments = {"sh", "-c", script, FPTEST_PROGRAM, plan(kOnePasses)}});
+    EXPECT_EQ(read_file(work("errors")), "before\nfptest: --json /dev/stderr is standard error, "
+                                         "and would be emptied: name another file\n");
+}
+
+TEST_F(Trust, LogsIntoAFifoThatAReaderWaitsAt)
+{
+    const std::string script = "mkfifo /tmp/scene/f; cat /tmp/scene/f >/tmp/scene/log & sleep 0.2\n"
+                               "\"$0\" run --plan \"$1\" --log /tmp/scene/f P/G; wait";
+    const Ended ended =
+        support::run({.arguments = {"sh", "-c", script, FPTEST_PROGRAM, plan(kOnePasses)}});
+    EXPECT_THAT(ended.out, HasSubstr("1 passed"));
+    EXPECT_THAT(read_file(work("log")), HasSubstr("fptest_ItemsTest"));
+}
+
 TEST_F(Trust, StoresNothingWhereAReportCannotBeWritten)
 {
     write_file(kPlanFile, kOnePasses);
