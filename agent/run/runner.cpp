@@ -199,6 +199,8 @@ void Runner::note_lost_module()
     while (const auto event = host_.wait(0ms)) {
         if (event->kind == LibraryProcess::Event::Kind::stopped) {
             note_stop(*event);
+        } else if (event->kind == LibraryProcess::Event::Kind::gone) {
+            stop_asked_ = false; // it answers no more
         }
     }
 }
