@@ -156,9 +156,9 @@ TEST_F(ItemEnd, StopComesOnceSoThatItsHandlerCanEnd)
                                   "trap clean TERM; while true; do sleep 0.1; done";
     run_group({{"Script", script(cleans_up)}}, {"--timeout", "0.5"});
     EXPECT_THAT(reason(0), StartsWith("stopped after "));
-    EXPECT_THAT(lines_of(read_file(work("asked"))), testing::SizeIs(1));
+    EXPECT_THAT(lines_of(read_file(work("asked"))), SizeIs(1));
     run_group({{"Script", script("(" + cleans_up + ") &amp; " + script_report("0", "fine"))}});
-    EXPECT_THAT(lines_of(read_file(work("asked"))), testing::SizeIs(2));
+    EXPECT_THAT(lines_of(read_file(work("asked"))), SizeIs(2));
 }
 
 TEST_F(ItemEnd, LeftoverThatDestroysThePlanAtTheEndIsTold)

@@ -70,7 +70,7 @@ TEST_F(LongPlan, OfAHundredAndFiftyItemsIsPlacedAndRun)
     EXPECT_EQ(lines[0], "/tmp/scene/plan.xml: 150 items, vendor 0");
     EXPECT_THAT(lines[1], StartsWith("G0/Item: passed, result 0, "));
     EXPECT_THAT(lines[24], StartsWith("G7/Third: failed, result 1, "));
-    EXPECT_THAT(lines[24], testing::EndsWith(": at7"));
+    EXPECT_THAT(lines[24], EndsWith(": at7"));
     EXPECT_THAT(lines[150], StartsWith("G49/Third: passed, result 0, "));
     EXPECT_THAT(lines[151], StartsWith("145 passed, 5 failed, "));
     const Lines table = lines_of(run_fptest({"show"}).out);

@@ -5,7 +5,6 @@
 #include "plan/markup.h"
 
 #include <gmock/gmock.h>
-#include <gtest/gtest.h>
 
 #include <array>
 #include <random>

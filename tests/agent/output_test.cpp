@@ -77,7 +77,7 @@ class Output : public FptestTest
             const fptest::Replacement names[] = {
                 {"{}", name}, {"{=}", name == "--log" ? "--log " : "VR_LOG_FILE="}};
             const Ended ended = run_fptest(start);
-            EXPECT_EQ(ended.status, status) << ::testing::PrintToString(arguments);
+            EXPECT_EQ(ended.status, status) << PrintToString(arguments);
             EXPECT_EQ(ended.err, "fptest: " + fptest::replaced(text, names) + "\n");
             EXPECT_EQ(read_file(work("out")), "");
         }
@@ -106,7 +106,7 @@ TEST_F(Output, TerminalThatIsStoppedHoldsUpNothing)
     EXPECT_TRUE(eventually(has_finished_in_json, 20));
     EXPECT_THAT(outcomes(read_file(work("json"))), ElementsAre("Item: timed out", "Other: passed"));
     EXPECT_LT(events_of(read_file(work("json")), "end").at(0).at("seconds"), 2.5);
-    EXPECT_THAT(session.text(), ::testing::Not(HasSubstr("timed out")));
+    EXPECT_THAT(session.text(), Not(HasSubstr("timed out")));
     session.type(kContinue);
     EXPECT_EQ(session.wait_for_end(), 1);
     device::Lines lines;
@@ -223,7 +223,7 @@ TEST_F(Output, StandardOutputMayHaveAnotherName)
         start.arguments.at(1) = "--json";
         EXPECT_EQ(run_fptest(start).status, 0);
         EXPECT_THAT(outcomes(read_file(work("out"))), ElementsAre("Third: passed"));
-        EXPECT_THAT(read_file(work("out")), ::testing::StartsWith("{\"event\":\"run\""));
+        EXPECT_THAT(read_file(work("out")), StartsWith("{\"event\":\"run\""));
     }
 }
 
@@ -435,7 +435,7 @@ TEST_F(Output, ShowsThatAnItemPastItsLimitIsStopping)
     file("go", "");
     EXPECT_EQ(session.wait_for_end(), 1);
     EXPECT_THAT(session.text(), HasSubstr("timed out  -  stopped after "));
-    EXPECT_THAT(session.text(), ::testing::Not(HasSubstr("stopping")));
+    EXPECT_THAT(session.text(), Not(HasSubstr("stopping")));
 }
 
 TEST_F(Output, ShowsWhatTheGathererSaysBeforeItReports)

@@ -7,7 +7,6 @@
 #include "plan/plan_text.h"
 
 #include <gmock/gmock.h>
-#include <gtest/gtest.h>
 
 #include <csignal>
 #include <cstring>

@@ -128,7 +128,7 @@ struct Text {
     bool is_replaced = false;
 };
 
-class ReportDescription : public Report, public ::testing::WithParamInterface<Text>
+class ReportDescription : public Report, public WithParamInterface<Text>
 {
 };
 
@@ -149,13 +149,12 @@ TEST_P(ReportDescription, IsReadBackAsItWasGiven)
 
 INSTANTIATE_TEST_SUITE_P(
     , ReportDescription,
-    ::testing::Values(Text{"Markup", "&<>\"' &amp; ]]> <!--", "&<>\"' &amp; ]]> <!--"},
-                      Text{"Blanks", "one\ntwo\tthree", "one␊two␉three"},
-                      Text{"Colon", "at 12:30", "at 12:30"}, Text{"Utf8", "指紋 µ", "指紋 µ"},
-                      Text{"ControlBytes", "a\x01\x1b[0m\x7f", "a␁␛[0m␡", true},
-                      Text{"NoUtf8", "a\xff\xfez", "a��z", true},
-                      Text{"TenThousandCharacters", std::string(10000, 'd'),
-                           std::string(10000, 'd')}),
+    Values(Text{"Markup", "&<>\"' &amp; ]]> <!--", "&<>\"' &amp; ]]> <!--"},
+           Text{"Blanks", "one\ntwo\tthree", "one␊two␉three"},
+           Text{"Colon", "at 12:30", "at 12:30"}, Text{"Utf8", "指紋 µ", "指紋 µ"},
+           Text{"ControlBytes", "a\x01\x1b[0m\x7f", "a␁␛[0m␡", true},
+           Text{"NoUtf8", "a\xff\xfez", "a��z", true},
+           Text{"TenThousandCharacters", std::string(10000, 'd'), std::string(10000, 'd')}),
     [](const auto &text) { return text.param.name; });
 
 TEST_F(Report, NamesTheNearestGroupAndAllThereAre)
@@ -191,7 +190,7 @@ TEST_F(Report, TakesNoOtherResults)
         EXPECT_EQ(read_file(kPlanFile), kPlan);
     }
     EXPECT_THAT(report({"Bringup", "SpiCheck", "--progress", "1", "--result", "7"}).err,
-                ::testing::AllOf(HasSubstr("7"), HasSubstr("0"), HasSubstr("1"), HasSubstr("-2")));
+                AllOf(HasSubstr("7"), HasSubstr("0"), HasSubstr("1"), HasSubstr("-2")));
 }
 
 TEST_F(Report, TakesNoProgressThatIsNoNumberOrTooLong)

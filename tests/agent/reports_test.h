@@ -11,7 +11,6 @@
 #include "support/temporary_directory.h"
 
 #include <gmock/gmock.h>
-#include <gtest/gtest.h>
 #include <nlohmann/json.hpp>
 
 #include <algorithm>

@@ -10,7 +10,6 @@
 #include "support/temporary_directory.h"
 
 #include <gmock/gmock.h>
-#include <gtest/gtest.h>
 #include <nlohmann/json.hpp>
 
 #include <array>
@@ -48,7 +47,7 @@ RunOfItems interrupted(RunOfItems run)
     return run;
 }
 
-class RoundReports : public ::testing::Test
+class RoundReports : public Test
 {
   protected:
     void SetUp() override
@@ -172,7 +171,7 @@ TEST_F(RoundReports, PlanAllRoundsInFrontWhereTapKnowsTheirNumber)
 {
     const std::string text = tap(two_items(2), play_two);
     const Tap read = parse_tap(text);
-    EXPECT_THAT(text, ::testing::StartsWith("TAP version 14\n1..4\n"));
+    EXPECT_THAT(text, StartsWith("TAP version 14\n1..4\n"));
     std::vector<std::string> names;
     for (const Point &point : read.points) {
         names.push_back(point.name);
@@ -189,7 +188,7 @@ TEST_F(RoundReports, PlanTheRoundsAtTheEndWhereTapDoesNotKnowTheirNumber)
     RunOfItems run = two_items(std::nullopt);
     run.time_limit = 3600;
     const std::string text = tap(run, play_two);
-    EXPECT_THAT(text, ::testing::StartsWith("TAP version 14\n# Subtest: G (round 1)\n"));
+    EXPECT_THAT(text, StartsWith("TAP version 14\n# Subtest: G (round 1)\n"));
     EXPECT_THAT(text, HasSubstr("not ok 4 - H (round 2)\n1..4\n# ITEM"));
     EXPECT_EQ(parse_tap(text).planned, 4U);
     // the version that prove knows
@@ -205,17 +204,16 @@ TEST_F(RoundReports, SkipTheRestOfABrokenRoundInTap)
         playback.end_as(interrupted(run));
         playback.finish();
     });
-    EXPECT_THAT(text,
-                ::testing::EndsWith("ok 5 - G (round 3)\n"
-                                    "# Subtest: H (round 3)\n"
-                                    "    1..1\n"
-                                    "    ok 1 - b # SKIP not run: interrupted by SIGTERM\n"
-                                    "ok 6 - H (round 3) # SKIP not run: interrupted by SIGTERM\n"
-                                    "# ITEM  PASSED    LEAST   MEDIAN  LONGEST\n"
-                                    "# G/a   3 of 3  0.301 s  0.301 s  0.301 s\n"
-                                    "# H/b   0 of 2  0.301 s  0.301 s  0.301 s\n"
-                                    "# 3 passed, 2 failed, 1999995 not run in 2.5 s\n"
-                                    "Bail out!  interrupted by SIGTERM\n"));
+    EXPECT_THAT(text, EndsWith("ok 5 - G (round 3)\n"
+                               "# Subtest: H (round 3)\n"
+                               "    1..1\n"
+                               "    ok 1 - b # SKIP not run: interrupted by SIGTERM\n"
+                               "ok 6 - H (round 3) # SKIP not run: interrupted by SIGTERM\n"
+                               "# ITEM  PASSED    LEAST   MEDIAN  LONGEST\n"
+                               "# G/a   3 of 3  0.301 s  0.301 s  0.301 s\n"
+                               "# H/b   0 of 2  0.301 s  0.301 s  0.301 s\n"
+                               "# 3 passed, 2 failed, 1999995 not run in 2.5 s\n"
+                               "Bail out!  interrupted by SIGTERM\n"));
 }
 
 // --- JUnit ----------------------------------------------------------------------
@@ -537,7 +535,7 @@ TEST_F(RoundReports, LeaveTheShellsLinesAloneAfterAPause)
     });
     const std::string frame = "  a        [        ]       0.0 s  running    -  \n"
                               "0 passed, 0 failed, 2 to go, 0.0 s";
-    EXPECT_THAT(text, ::testing::EndsWith("G\n" + frame + "\n[1]+  Stopped\n$ fg\n" + frame))
+    EXPECT_THAT(text, EndsWith("G\n" + frame + "\n[1]+  Stopped\n$ fg\n" + frame))
         << "what was drawn before the pause is not erased after it";
 }
 

@@ -166,7 +166,7 @@ TEST_F(Rounds, TakeNothingWhileTheyHaveNotBegun)
               1'000'000);
     EXPECT_EQ(verdicts().back(), "rounds " + std::to_string(rounds + 1) + " to 1000000: not run");
     EXPECT_THAT(ended.out, StartsWith("TAP version 14\n1..1000000\n"));
-    EXPECT_THAT(ended.out, ::testing::EndsWith("\nBail out!  interrupted by SIGTERM\n"));
+    EXPECT_THAT(ended.out, EndsWith("\nBail out!  interrupted by SIGTERM\n"));
 }
 
 TEST_F(Rounds, TakeNoMoreMemoryHoweverManyHaveBeenRun)

@@ -36,7 +36,7 @@ class Refusal : public Run
 
     static void expect(int status, const std::string &line, Lines arguments)
     {
-        SCOPED_TRACE(::testing::PrintToString(arguments));
+        SCOPED_TRACE(PrintToString(arguments));
         arguments.insert(arguments.begin(), "run");
         expect(status, line, Start{.arguments = arguments});
     }

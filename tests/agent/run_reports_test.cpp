@@ -92,7 +92,7 @@ const std::vector<Hostile> kHostile = {
     {"LinesOfTap", "one\nok 1 - faked\n1..7\nBail out!", "one\nok 1 - faked\n1..7\nBail out!"},
 };
 
-class HostileDescription : public Run, public ::testing::WithParamInterface<Hostile>
+class HostileDescription : public Run, public WithParamInterface<Hostile>
 {
 };
 
@@ -123,7 +123,7 @@ TEST_P(HostileDescription, IsTheSameInEveryReport)
     EXPECT_EQ(output(0), "#\n" + in_json + "\n");
 }
 
-INSTANTIATE_TEST_SUITE_P(, HostileDescription, ::testing::ValuesIn(kHostile),
+INSTANTIATE_TEST_SUITE_P(, HostileDescription, ValuesIn(kHostile),
                          [](const auto &hostile) { return hostile.param.name; });
 
 // --- what items print ------------------------------------------------------------------

@@ -111,7 +111,7 @@ TEST_F(Run, StopsAScriptAtItsLimitThatIsNotFoundByItsName)
 
 // --- interrupted ---------------------------------------------------------------------
 
-class Interrupted : public Run, public ::testing::WithParamInterface<int>
+class Interrupted : public Run, public WithParamInterface<int>
 {
 };
 
@@ -160,10 +160,9 @@ TEST_P(Interrupted, StopsTheItemAndMarksTheRest)
     }
 }
 
-INSTANTIATE_TEST_SUITE_P(, Interrupted, ::testing::Values(SIGINT, SIGTERM, SIGHUP),
-                         [](const auto &signal) {
-                             return std::string("BySIG") + sigabbrev_np(signal.param);
-                         });
+INSTANTIATE_TEST_SUITE_P(, Interrupted, Values(SIGINT, SIGTERM, SIGHUP), [](const auto &signal) {
+    return std::string("BySIG") + sigabbrev_np(signal.param);
+});
 
 TEST_F(Run, SaysInTheViewThatItWasInterrupted)
 {
@@ -272,7 +271,7 @@ struct CutOffCase {
     std::string way;
 };
 
-class CutOff : public Run, public ::testing::WithParamInterface<CutOffCase>
+class CutOff : public Run, public WithParamInterface<CutOffCase>
 {
 };
 
@@ -301,11 +300,10 @@ TEST_P(CutOff, LeavesWhatWasKnownAndNothingRunning)
 
 INSTANTIATE_TEST_SUITE_P(
     , CutOff,
-    ::testing::Values(CutOffCase{"Item", {"Other", "note /tmp/scene/begun sleep 60"}, "--quiet"},
-                      CutOffCase{"ItemOfAGroupsCommand",
-                                 {"Other", "note /tmp/scene/begun sleep 60"},
-                                 "--as-group"},
-                      CutOffCase{"Script", kScriptThatSleeps, "--quiet"}),
+    Values(CutOffCase{"Item", {"Other", "note /tmp/scene/begun sleep 60"}, "--quiet"},
+           CutOffCase{
+               "ItemOfAGroupsCommand", {"Other", "note /tmp/scene/begun sleep 60"}, "--as-group"},
+           CutOffCase{"Script", kScriptThatSleeps, "--quiet"}),
     [](const auto &one) { return "Of" + one.param.name; });
 
 TEST_F(Run, BeginsAfterOneThatWasKilledWhenItsItemsHaveEnded)

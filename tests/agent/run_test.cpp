@@ -205,7 +205,7 @@ const std::vector<PathCase> kPathCases = {
      {"Item: passed once", "Item: no result"}},
 };
 
-class RunPaths : public Run, public ::testing::WithParamInterface<PathCase>
+class RunPaths : public Run, public WithParamInterface<PathCase>
 {
 };
 
@@ -229,7 +229,7 @@ TEST_P(RunPaths, Runs)
     EXPECT_EQ(all, one.ended);
 }
 
-INSTANTIATE_TEST_SUITE_P(, RunPaths, ::testing::ValuesIn(kPathCases),
+INSTANTIATE_TEST_SUITE_P(, RunPaths, ValuesIn(kPathCases),
                          [](const auto &one) { return one.param.name; });
 
 TEST_F(Run, RunsNothingWhereAPathLeadsToNothing)

@@ -239,8 +239,8 @@ TEST_F(Send, WantsACommand)
     const Ended ended = run_fptest({"send"});
     EXPECT_EQ(ended.status, 2);
     EXPECT_EQ(ended.out, "");
-    EXPECT_THAT(lines_of(ended.err), ::testing::SizeIs(1));
-    EXPECT_THAT(ended.err, ::testing::StartsWith("fptest: "));
+    EXPECT_THAT(lines_of(ended.err), SizeIs(1));
+    EXPECT_THAT(ended.err, StartsWith("fptest: "));
     EXPECT_THAT(ended.err, HasSubstr("COMMAND"));
 }
 
@@ -249,7 +249,7 @@ TEST_F(Send, WantsCommandsFromOneSideOnly)
     const Ended ended = run_fptest({"send", "-0", "pingtest"}, "pingtest");
     EXPECT_EQ(ended.status, 2);
     EXPECT_EQ(ended.out, "");
-    EXPECT_THAT(lines_of(ended.err), ::testing::SizeIs(1));
+    EXPECT_THAT(lines_of(ended.err), SizeIs(1));
     EXPECT_THAT(ended.err, HasSubstr("-0"));
 }
 

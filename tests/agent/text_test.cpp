@@ -5,7 +5,6 @@
 #include "util/text.h"
 
 #include <gmock/gmock.h>
-#include <gtest/gtest.h>
 
 #include <array>
 #include <chrono>

@@ -417,7 +417,7 @@ TEST_F(Trust, KillsAGathererThatIgnoresTheStopInAGroupAsWell)
               {"--as-group", "--timeout", "1", "--grace", "0.5"});
     EXPECT_THAT(outcomes(), ElementsAre("SensorProbe: timed out", "Item: timed out"));
     EXPECT_THAT(reasons().at(0), StartsWith("killed after 1."));
-    EXPECT_THAT(device::processes_named("/system/bin/Stubborn"), ::testing::IsEmpty());
+    EXPECT_THAT(device::processes_named("/system/bin/Stubborn"), IsEmpty());
 }
 
 TEST_F(Trust, NamesWhatAGathererLeavesRunning)
@@ -444,8 +444,8 @@ TEST_F(Trust, GoesOnWhereAReportIsTooLongForTheLimitOfFiles)
     start.environment = {{"VR_LOG_FILE", std::nullopt}}; // items write to it
     const Ended ended = support::run(start);
     EXPECT_EQ(ended.status, 3);
-    EXPECT_THAT(ended.err, testing::EndsWith("fptest: /tmp/scene/json: File too large; the run "
-                                             "went on without it\n"));
+    EXPECT_THAT(ended.err, EndsWith("fptest: /tmp/scene/json: File too large; the run "
+                                    "went on without it\n"));
 }
 
 TEST_F(Trust, TakesNoFifoAndNoDirectoryForThePlan)

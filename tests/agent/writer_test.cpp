@@ -9,7 +9,6 @@
 #include "support/wait.h"
 
 #include <gmock/gmock.h>
-#include <gtest/gtest.h>
 
 #include <array>
 #include <chrono>

@@ -6,7 +6,6 @@
 #include "quiet_vorlane.h"
 
 #include <gmock/gmock.h>
-#include <gtest/gtest.h>
 
 #include <cstdarg>
 #include <ostream>
@@ -53,7 +52,7 @@ void PrintTo(const Baseline &baseline, std::ostream *stream)
     *stream << baseline.name;
 }
 
-class PairedRun : public ::testing::TestWithParam<Baseline>
+class PairedRun : public TestWithParam<Baseline>
 {
 };
 
@@ -97,16 +96,16 @@ TEST_P(PairedRun, IsOfSidesThatDoTheSame)
 
 INSTANTIATE_TEST_SUITE_P(
     Bench, PairedRun,
-    ::testing::Values(Baseline{"Same", "said it", "word", ""},
-                      Baseline{"AnotherLog", "said nothing", "word",
-                               "log line 1 is 'said it', its baseline's is 'said nothing'; make "
-                               "the baseline log what the library logs"},
-                      Baseline{"LessLog", "", "word",
-                               "log line 1 is 'said it', its baseline's is '(none)'; make the "
-                               "baseline log what the library logs"},
-                      Baseline{"LessDone", "said it", "",
-                               "the baseline leaves something else behind; make it do what the "
-                               "library does"}),
+    Values(Baseline{"Same", "said it", "word", ""},
+           Baseline{"AnotherLog", "said nothing", "word",
+                    "log line 1 is 'said it', its baseline's is 'said nothing'; make "
+                    "the baseline log what the library logs"},
+           Baseline{"LessLog", "", "word",
+                    "log line 1 is 'said it', its baseline's is '(none)'; make the "
+                    "baseline log what the library logs"},
+           Baseline{"LessDone", "said it", "",
+                    "the baseline leaves something else behind; make it do what the "
+                    "library does"}),
     [](const auto &test) { return test.param.name; });
 
 } // namespace

@@ -10,7 +10,6 @@
 #include "support/wait.h"
 
 #include <gmock/gmock.h>
-#include <gtest/gtest.h>
 
 #include <cstddef>
 #include <string>

@@ -5,7 +5,6 @@
 
 #include <expat.h>
 #include <gmock/gmock.h>
-#include <gtest/gtest.h>
 #include <nlohmann/json.hpp>
 
 #include <algorithm>

@@ -59,7 +59,7 @@ void PrintTo(const Run &run, std::ostream *out)
     *out << run.what;
 }
 
-class ItemRun : public Item, public ::testing::WithParamInterface<Run>
+class ItemRun : public Item, public WithParamInterface<Run>
 {
   protected:
     static constexpr int kProgramRoom = 1024;
@@ -214,7 +214,7 @@ std::vector<Run> runs()
     return all;
 }
 
-INSTANTIATE_TEST_SUITE_P(Every, ItemRun, ::testing::ValuesIn(runs()), [](const auto &run) {
+INSTANTIATE_TEST_SUITE_P(Every, ItemRun, ValuesIn(runs()), [](const auto &run) {
     return run.param.what + std::to_string(run.index);
 });
 

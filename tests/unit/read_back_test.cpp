@@ -100,10 +100,10 @@ class ReadBackAssertion : public ReadBack
     }
     static auto asserted()
     {
-        return AllOf(HasSubstr("FPTEST_ExtractResultMsg| offset = "),
-                     ::testing::ContainsRegex(
-                         "quillmark.cpp:[0-9]+: .*FPTEST_ExtractResultMsg.*Assertion `0' failed"),
-                     Not(HasSubstr("unfinish")), Not(HasSubstr("reach the end")));
+        return AllOf(
+            HasSubstr("FPTEST_ExtractResultMsg| offset = "),
+            ContainsRegex("quillmark.cpp:[0-9]+: .*FPTEST_ExtractResultMsg.*Assertion `0' failed"),
+            Not(HasSubstr("unfinish")), Not(HasSubstr("reach the end")));
     }
 };
 
@@ -120,7 +120,7 @@ void PrintTo(const Reading &reading, std::ostream *out)
     *out << reading.what;
 }
 
-class ReadBackOf : public ReadBack, public ::testing::WithParamInterface<Reading>
+class ReadBackOf : public ReadBack, public WithParamInterface<Reading>
 {
 };
 
@@ -174,7 +174,7 @@ std::vector<Reading> readings()
     };
 }
 
-INSTANTIATE_TEST_SUITE_P(Every, ReadBackOf, ::testing::ValuesIn(readings()),
+INSTANTIATE_TEST_SUITE_P(Every, ReadBackOf, ValuesIn(readings()),
                          [](const auto &one) { return std::string(one.param.what); });
 
 TEST_F(ReadBack, OffsetsAreOnlyLogged)
@@ -260,9 +260,8 @@ TEST_F(ReadBack, PieceIsComparedWithTheWholeCapacity)
     plan_steps("read", {limit(60), gives(80), gives(0)});
     read_back(100);
     EXPECT_THAT(platform::log_lines(),
-                ::testing::IsSupersetOf(
-                    {"FPTEST_ExtractResultMsg| read file unfinish, continue... n = 80 \n",
-                     "FPTEST_ExtractResultMsg| read byte count = 140\n"}));
+                IsSupersetOf({"FPTEST_ExtractResultMsg| read file unfinish, continue... n = 80 \n",
+                              "FPTEST_ExtractResultMsg| read byte count = 140\n"}));
 }
 
 TEST_F(ReadBack, NegativeCapacityReadsAnEmptyFileAsAnyOther)

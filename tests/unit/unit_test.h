@@ -9,7 +9,6 @@
 #include "quillmark.h"
 
 #include <gmock/gmock.h>
-#include <gtest/gtest.h>
 
 #include <cstddef>
 #include <cstdio>
