@@ -4,28 +4,30 @@
 #include "check/check.h"
 
 #include "check/checks.h"
-#include "plan/plan.h"
 
 #include <algorithm>
+#include <utility>
 
 namespace fptest
 {
 
-std::vector<Finding> check(const std::string &text, PlanSource use)
+CheckedPlan check(std::string name, std::string text, PlanSource use)
 {
+    CheckedPlan read{std::move(name), std::move(text), use, "", {}, {}, "", {}};
+    read.stored = use == PlanSource::stored ? read.text : as_stored(read.text);
+    read.plan = Plan::load_as_library(read.stored, &read.why);
     Findings findings;
-    if (text.starts_with("\xFF\xFE") || text.starts_with("\xFE\xFF")) {
+    if (read.text.starts_with("\xFF\xFE") || read.text.starts_with("\xFE\xFF")) {
         findings.error(0, "the plan is UTF-16: save it as UTF-8");
-        return findings.take();
+    } else {
+        read.tags = scan(read.text);
+        if (use != PlanSource::stored) {
+            check_size(read, findings);
+        }
+        check_form(read, findings);
     }
-    if (use != PlanSource::stored) {
-        check_size(text, use, findings);
-    }
-    const std::string stored = use == PlanSource::stored ? text : as_stored(text);
-    if (const std::optional<Plan> plan = check_form(text, stored, findings)) {
-        check_plan(text, *plan, findings);
-    }
-    return findings.take();
+    read.findings = findings.take();
+    return read;
 }
 
 bool has_errors(const std::vector<Finding> &findings)

@@ -5,7 +5,11 @@
 // author meant.
 #pragma once
 
+#include "plan/markup.h"
+#include "plan/plan.h"
+
 #include <cstddef>
+#include <optional>
 #include <string>
 #include <vector>
 
@@ -26,8 +30,19 @@ enum class PlanSource {
     stored,  // it stands in its place already
 };
 
-// The findings in a plan's text, in its order.
-std::vector<Finding> check(const std::string &text, PlanSource use);
+// A plan that was read, and what is known of it.
+struct CheckedPlan {
+    std::string name; // of the file, for people
+    std::string text;
+    PlanSource use;
+    std::string stored;            // what of the text the library gets
+    std::vector<Tag> tags;         // of the text
+    std::optional<Plan> plan;      // what the library loads; nothing where it does not
+    std::string why;               // that is so, in Mini-XML's words
+    std::vector<Finding> findings; // in the order of the text
+};
+
+CheckedPlan check(std::string name, std::string text, PlanSource use);
 
 bool has_errors(const std::vector<Finding> &findings);
 

@@ -8,7 +8,6 @@
 #include "plan/plan.h"
 
 #include <cstddef>
-#include <optional>
 #include <string>
 
 namespace fptest
@@ -18,14 +17,12 @@ inline constexpr std::size_t kNone = std::string::npos;
 inline constexpr char kDeclaration[] = "<?xml version=\"1.0\"?>";
 
 // What a command would cut off the text.
-void check_size(const std::string &text, PlanSource use, Findings &findings);
+void check_size(const CheckedPlan &read, Findings &findings);
 
-// Loads the text, after saying what is wrong with its form. Stored is what of it the
-// library would get. Nothing where there is no use in looking at what the plan says.
-std::optional<Plan> check_form(const std::string &text, const std::string &stored,
-                               Findings &findings);
+// What is wrong with its form, and with what it says where there is any use in looking.
+void check_form(const CheckedPlan &read, Findings &findings);
 
-// What the library would make of the plan.
-void check_plan(const std::string &text, const Plan &plan, Findings &findings);
+// What the library would make of this plan, which is that of the whole text.
+void check_plan(const CheckedPlan &read, const Plan &plan, Findings &findings);
 
 } // namespace fptest

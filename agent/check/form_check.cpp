@@ -47,36 +47,37 @@ std::string open_at(const std::vector<Tag> &tags, std::size_t offset)
     return open.empty() ? "" : ellipsize(one_line(*open.back()), kShownName);
 }
 
-// Loads the text, after saying what of its form is wrong.
 class FormChecker
 {
   public:
-    // stored: what of the text the library would get.
-    FormChecker(const std::string &text, const std::string &stored, Findings &findings)
-        : text_(text), stored_(stored), tags_(scan(text)), findings_(findings)
+    FormChecker(const CheckedPlan &read, Findings &findings)
+        : read_(read), text_(read.text), tags_(read.tags), findings_(findings)
     {
     }
 
-    // Nothing where there is no use in looking at what the plan says.
-    std::optional<Plan> check()
+    void check()
     {
         give_values();
         if (const std::optional<Flaw> flaw = find_flaw(repaired_)) {
             report_values(original(flaw->offset));
             report(*flaw);
-            return std::nullopt;
+            return;
         }
         report_values(text_.size());
         report_encoding();
         report_dropped_character();
         report_cut_declaration();
         const bool endless = report_endless_comments();
-        std::string why;
-        std::optional<Plan> plan = Plan::load_as_library(repaired_, &why);
-        if (!plan && !endless) {
+        std::string why = read_.why;
+        std::optional<Plan> other;
+        if (repaired_ != read_.stored) {
+            other = Plan::load_as_library(repaired_, &why);
+        }
+        if (const auto &plan = repaired_ != read_.stored ? other : read_.plan) {
+            check_plan(read_, *plan, findings_);
+        } else if (!endless) {
             report_refusal(why);
         }
-        return plan;
     }
 
   private:
@@ -129,13 +130,12 @@ class FormChecker
             findings_.error(offset,
                             "an entity is declared here: the library would not {}; write its text "
                             "where it is used",
-                            Plan::load_as_library(stored_) ? "know it" : "load the plan");
+                            read_.plan ? "know it" : "load the plan");
             return;
         }
         findings_.error(
             offset, "not well-formed, {}: the library would {}; {}", reason(flaw.error, offset),
-            Plan::load_as_library(stored_) ? "load it all the same, and run what it took from it"
-                                           : "not load it",
+            read_.plan ? "load it all the same, and run what it took from it" : "not load it",
             advice(flaw.error, offset));
     }
 
@@ -337,9 +337,9 @@ class FormChecker
 
     static constexpr std::string_view kValue = "=\"\"";
 
+    const CheckedPlan &read_;
     const std::string &text_;
-    const std::string &stored_;
-    std::vector<Tag> tags_;
+    const std::vector<Tag> &tags_;
     std::string repaired_;
     std::vector<const Attribute *> given_;
     Findings &findings_;
@@ -347,10 +347,9 @@ class FormChecker
 
 } // namespace
 
-std::optional<Plan> check_form(const std::string &text, const std::string &stored,
-                               Findings &findings)
+void check_form(const CheckedPlan &read, Findings &findings)
 {
-    return FormChecker(text, stored, findings).check();
+    FormChecker(read, findings).check();
 }
 
 } // namespace fptest

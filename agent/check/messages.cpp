@@ -101,19 +101,19 @@ std::string Messages::of(const Finding &finding)
                        display_width(before) + 1);
 }
 
-void print(std::FILE *stream, const std::string &file, std::string_view text,
-           const std::vector<Finding> &findings)
+void print(std::FILE *stream, const CheckedPlan &plan)
 {
     constexpr std::size_t kShown = 1000;
     const auto is_error = [](const Finding &one) {
         return one.severity == Finding::Severity::error;
     };
-    Messages messages(file, text);
+    Messages messages(plan.name, plan.text);
     // no warning in an error's place
-    std::size_t errors = std::min<std::size_t>(std::ranges::count_if(findings, is_error), kShown);
+    std::size_t errors =
+        std::min<std::size_t>(std::ranges::count_if(plan.findings, is_error), kShown);
     std::size_t warnings = kShown - errors;
     std::size_t hidden = 0;
-    for (const Finding &finding : findings) {
+    for (const Finding &finding : plan.findings) {
         if (std::size_t &left = is_error(finding) ? errors : warnings; left > 0) {
             --left;
             std::fputs(messages.of(finding).c_str(), stream);
@@ -122,7 +122,7 @@ void print(std::FILE *stream, const std::string &file, std::string_view text,
         }
     }
     if (hidden > 0) {
-        print_to(stream, "{}: {} more are not shown\n", one_line(file), hidden);
+        print_to(stream, "{}: {} more are not shown\n", one_line(plan.name), hidden);
     }
 }
 

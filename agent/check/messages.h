@@ -33,8 +33,7 @@ class Messages
     Positions positions_;
 };
 
-// Prints the messages of a file's findings, the first thousand of them.
-void print(std::FILE *stream, const std::string &file, std::string_view text,
-           const std::vector<Finding> &findings);
+// Prints the messages of a plan's findings, the first thousand of them.
+void print(std::FILE *stream, const CheckedPlan &plan);
 
 } // namespace fptest

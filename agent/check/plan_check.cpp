@@ -66,8 +66,9 @@ std::string kind_of(mxml_node_t *node)
 class PlanChecker
 {
   public:
-    PlanChecker(const std::string &text, const Plan &plan, Findings &findings)
-        : plan_(plan), places_(text, plan), findings_(findings), shell_checker_(findings)
+    PlanChecker(const CheckedPlan &read, const Plan &plan, Findings &findings)
+        : plan_(plan), places_(read.text, read.tags, plan), findings_(findings),
+          shell_checker_(findings)
     {
     }
 
@@ -519,9 +520,9 @@ class PlanChecker
 
 } // namespace
 
-void check_plan(const std::string &text, const Plan &plan, Findings &findings)
+void check_plan(const CheckedPlan &read, const Plan &plan, Findings &findings)
 {
-    PlanChecker(text, plan, findings).check();
+    PlanChecker(read, plan, findings).check();
 }
 
 } // namespace fptest

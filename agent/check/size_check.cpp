@@ -17,14 +17,13 @@ namespace
 class SizeChecker
 {
   public:
-    SizeChecker(const std::string &text, PlanSource use, Findings &findings)
-        : stored_(as_stored(text)), command_(text.substr(0, text.find('\0'))), use_(use),
-          findings_(findings)
+    SizeChecker(const CheckedPlan &read, Findings &findings)
+        : read_(read), command_(read.text.substr(0, read.text.find('\0'))), findings_(findings)
     {
         const std::size_t begin = std::min(command_.find_first_not_of(':'), command_.size());
         colon_ = command_.find(':', begin);
         // in UTF-8 it is no XML either, which is said elsewhere
-        zero_ = command_.size() < text.size() && !find_flaw(text);
+        zero_ = command_.size() < read.text.size() && !find_flaw(read.text);
     }
 
     void check()
@@ -40,15 +39,15 @@ class SizeChecker
             findings_.error(command_.size(),
                             "a command takes a plan up to its first zero byte, so {} would be "
                             "stored, and the library would {}; save it as UTF-8",
-                            plural(stored_.size(), "byte"), fate("them"));
+                            plural(read_.stored.size(), "byte"), fate("them"));
         }
     }
 
   private:
     [[nodiscard]] std::string fate(const char *what) const
     {
-        return Plan::load_as_library(stored_) ? fmt::format("load {} without the rest", what)
-                                              : fmt::format("not load {}", what);
+        return read_.plan ? fmt::format("load {} without the rest", what)
+                          : fmt::format("not load {}", what);
     }
 
     // Whether a character reference may stand there: not in comments and the like.
@@ -57,10 +56,9 @@ class SizeChecker
         const auto holds = [offset](const Attribute &attribute) {
             return offset >= attribute.value_begin && offset < attribute.value_end;
         };
-        const std::vector<Tag> tags = scan(command_);
         const auto tag =
-            std::ranges::find_if(tags, [offset](const Tag &one) { return offset < one.end; });
-        return tag != tags.end() &&
+            std::ranges::find_if(read_.tags, [offset](const Tag &one) { return offset < one.end; });
+        return tag != read_.tags.end() &&
                (tag->kind == Tag::Kind::text || std::ranges::any_of(tag->attributes, holds));
     }
 
@@ -72,7 +70,7 @@ class SizeChecker
         const std::string effect =
             colon_ < kPlanLimit
                 ? fmt::format("so {} of {} would be stored, and the library would {}",
-                              stored_.size(), plural(command_.size(), "byte"), fate("them"))
+                              read_.stored.size(), plural(command_.size(), "byte"), fate("them"))
                 : fmt::format("which is after the {} bytes that it takes anyway", kPlanLimit);
         findings_.error(colon_, "a command takes a plan up to its first ':', {}; {}{}", effect,
                         takes_references(colon_) ? "write &#58; in its place" : "leave it out",
@@ -87,13 +85,13 @@ class SizeChecker
                         command_.size(), command_.size() - kPlanLimit, kPlanLimit,
                         colon_ < kPlanLimit ? "were it not cut at a ':' before"
                                             : "and the library would " + fate("it"),
-                        use_ == PlanSource::as_sent ? "leave --as-sent out"
-                                                    : "have fptest run --plan place it as a file");
+                        read_.use == PlanSource::as_sent
+                            ? "leave --as-sent out"
+                            : "have fptest run --plan place it as a file");
     }
 
-    std::string stored_;
+    const CheckedPlan &read_;
     std::string command_;
-    PlanSource use_;
     Findings &findings_;
     std::size_t colon_;
     bool zero_;
@@ -101,9 +99,9 @@ class SizeChecker
 
 } // namespace
 
-void check_size(const std::string &text, PlanSource use, Findings &findings)
+void check_size(const CheckedPlan &read, Findings &findings)
 {
-    SizeChecker(text, use, findings).check();
+    SizeChecker(read, findings).check();
 }
 
 } // namespace fptest

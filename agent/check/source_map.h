@@ -21,11 +21,11 @@ namespace fptest
 class SourceMap
 {
   public:
-    SourceMap(const std::string &text, const Plan &plan)
-        : text_(text), tags_(element_tags(plan, text))
+    SourceMap(const std::string &text, const std::vector<Tag> &tags, const Plan &plan)
+        : text_(text), tags_(element_tags(plan, tags))
     {
         if (!tags_.empty()) {
-            note_texts(scan(text));
+            note_texts(tags);
         }
         for (std::size_t at = text.find('\n'); at != std::string::npos;
              at = text.find('\n', at + 1)) {

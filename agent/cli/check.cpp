@@ -29,12 +29,16 @@ struct CheckOptions {
 };
 
 // What it holds is known of a plan that loads.
-std::string size_of(const std::string &text, PlanSource use)
+std::string size_of(const CheckedPlan &read)
 {
-    std::string size = use == PlanSource::stored
-                           ? plural(text.size(), "byte")
-                           : fmt::format("{} of {} bytes", text.size(), kPlanLimit);
-    if (const auto plan = Plan::load_as_library(text)) {
+    std::string size = read.use == PlanSource::stored
+                           ? plural(read.text.size(), "byte")
+                           : fmt::format("{} of {} bytes", read.text.size(), kPlanLimit);
+    std::optional<Plan> whole;
+    if (read.text != read.stored) {
+        whole = Plan::load_as_library(read.text);
+    }
+    if (const auto &plan = read.text != read.stored ? whole : read.plan) {
         std::size_t items = 0;
         const auto groups = plan->groups();
         for (const Plan::Group &group : groups) {
@@ -49,14 +53,13 @@ std::string size_of(const std::string &text, PlanSource use)
 // False where the plan has errors.
 bool check_file(const std::string &file, const std::string &text, PlanSource use)
 {
-    const std::string name = file == "-" ? "<stdin>" : one_line(file);
-    const auto findings = check(text, use);
-    print(stdout, name, text, findings);
+    const CheckedPlan read = check(file == "-" ? "<stdin>" : one_line(file), text, use);
+    print(stdout, read);
     const auto errors = static_cast<std::size_t>(
-        std::ranges::count(findings, Finding::Severity::error, &Finding::severity));
-    const std::size_t warnings = findings.size() - errors;
-    print_to(stdout, "{}: {}, {} ({})\n", name, plural(errors, "error"),
-             plural(warnings, "warning"), size_of(text, use));
+        std::ranges::count(read.findings, Finding::Severity::error, &Finding::severity));
+    const std::size_t warnings = read.findings.size() - errors;
+    print_to(stdout, "{}: {}, {} ({})\n", read.name, plural(errors, "error"),
+             plural(warnings, "warning"), size_of(read));
     return errors == 0;
 }
 

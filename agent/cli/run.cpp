@@ -42,14 +42,6 @@ constexpr char kRunExamples[] =
     "  fptest run --plan plans/demo.xml --list\n"
     "  prove --exec 'fptest run --tap' demo/Bringup";
 
-// What is to be run: the plan's text and what the library makes of it.
-struct Source {
-    std::string name; // of the file, for people
-    std::string text;
-    Plan plan;
-    PlanSource use;
-};
-
 // --- the plan -----------------------------------------------------------------
 
 std::string read_plan(const std::string &file)
@@ -74,30 +66,29 @@ PlanSource use_of(const RunOptions &options, const std::string &text)
                                        : PlanSource::stored;
 }
 
-Source open_plan(const RunOptions &options)
+// One that the library loads.
+CheckedPlan open_plan(const RunOptions &options)
 {
-    const std::string name = options.plan.empty()  ? std::string(kStoredPlan)
-                             : options.plan == "-" ? std::string("<stdin>")
-                                                   : options.plan;
     const std::string text = read_plan(options.plan);
-    const PlanSource use = use_of(options, text);
-    const auto findings = check(text, use);
-    if (has_errors(findings) && !options.force) {
-        print(stderr, name, text, findings);
+    CheckedPlan read = check(options.plan.empty()  ? kStoredPlan
+                             : options.plan == "-" ? "<stdin>"
+                                                   : options.plan,
+                             text, use_of(options, text));
+    const bool has_error = has_errors(read.findings);
+    if (has_error && !options.force) {
+        print(stderr, read);
         throw Failure(Exit::usage, "nothing was run, because the plan has errors; fix them, or "
                                    "run it as it is with --force");
     }
-    if (!findings.empty() && !options.quiet) {
-        say("the plan has {}: see fptest check {}{}", has_errors(findings) ? "errors" : "warnings",
-            use == PlanSource::stored ? "--for file " : "", one_line(name));
+    if (!read.findings.empty() && !options.quiet) {
+        say("the plan has {}: see fptest check {}{}", has_error ? "errors" : "warnings",
+            read.use == PlanSource::stored ? "--for file " : "", one_line(read.name));
     }
-    std::string why;
-    auto plan = Plan::load_as_library(use == PlanSource::stored ? text : as_stored(text), &why);
-    if (!plan) {
-        throw Failure(Exit::usage, "{}: the library cannot load this plan: {}", one_line(name),
-                      one_line(why));
+    if (!read.plan) {
+        throw Failure(Exit::usage, "{}: the library cannot load this plan: {}", one_line(read.name),
+                      one_line(read.why));
     }
-    return {name, text, std::move(*plan), use};
+    return read;
 }
 
 // --- before the run -----------------------------------------------------------
@@ -170,10 +161,10 @@ void require_programs(const Work &work, int vendor, bool force)
     }
 }
 
-void store(LibraryProcess &host, const std::string &text)
+void store(LibraryProcess &host, const CheckedPlan &read)
 {
-    send_and_wait(host, "XMLFile::" + text);
-    require_stored(host.read_back(), as_stored(text));
+    send_and_wait(host, "XMLFile::" + read.text);
+    require_stored(host.read_back(), read.stored);
 }
 
 // For a plan that is longer than what a command stores.
@@ -227,15 +218,16 @@ Exit run(RunOptions options)
             {{"--json", options.json}, {"--junit", options.junit}, {"--log", options.log}});
     }
     const Descriptor lock = options.list ? Descriptor(-1) : ready_device();
-    const Source source = open_plan(options);
+    const CheckedPlan read = open_plan(options);
+    const Plan &plan = *read.plan;
     std::vector<Path> paths;
     for (const std::string &text : options.paths) {
-        paths.push_back(parse_path(text, source.plan, source.name, options.force));
+        paths.push_back(parse_path(text, plan, read.name, options.force));
     }
     if (paths.empty() && !options.list) {
         throw Failure(Exit::usage,
                       "no PATH given: say what to run, as root/group or root/group/item{}",
-                      known_groups(source.plan));
+                      known_groups(plan));
     }
     require_writable_reports(options);
     choose_log(options.log);
@@ -243,36 +235,36 @@ Exit run(RunOptions options)
     std::optional<LibraryProcess> host(std::in_place);
     const int vendor = ask_vendor(*host);
     if (options.list) {
-        list_items(paths.empty() ? all_paths(source.plan) : paths, source.plan,
+        list_items(paths.empty() ? all_paths(plan) : paths, plan,
                    vendor_suffix(vendor).value_or(""));
         return Exit::success;
     }
 
-    const Work work = work_of(paths, source.plan, options.as_group);
+    const Work work = work_of(paths, plan, options.as_group);
     require_programs(work, vendor, options.force);
     if (!options.quiet) {
-        tell_of_running_gatherer(work, source.plan, vendor_suffix(vendor).value_or(""));
+        tell_of_running_gatherer(work, plan, vendor_suffix(vendor).value_or(""));
     }
-    const bool is_sent = source.use != PlanSource::stored;
+    const bool is_sent = read.use != PlanSource::stored;
     const bool is_placed = !is_sent && !options.plan.empty();
     if (is_sent || is_placed) {
-        require_room(is_sent ? as_stored(source.text).size() : source.text.size());
+        require_room(is_sent ? read.stored.size() : read.text.size());
     }
     if (is_placed && !options.quiet) {
         say("{}: its {} bytes are more than the {} that a command stores, so it is placed as the "
             "file {}",
-            one_line(source.name), source.text.size(), kPlanLimit, kStoredPlan);
+            one_line(read.name), read.text.size(), kPlanLimit, kStoredPlan);
     }
     const auto store_plan = [&] {
         if (is_sent) {
-            store(*host, source.text);
+            store(*host, read);
         } else if (is_placed) {
-            place(source.text);
+            place(read.text);
             host.emplace(); // the one before keeps the plan that was there when it was asked
         }
     };
     Run run;
-    run.plan = source.name;
+    run.plan = read.name;
     run.rounds = options.repeat;
     if (!run.rounds && !options.time_limit && !options.until_fail) {
         run.rounds = 1;

@@ -284,7 +284,7 @@ std::optional<Plan> Plan::parse_annotated(std::string_view text)
         return std::nullopt;
     }
     // as the library has them in its tree: these two it leaves without a value
-    const std::vector<Tag> places = element_tags(*plan, cleaned);
+    const std::vector<Tag> places = element_tags(*plan, tags);
     for (std::size_t number = 0; number < places.size(); ++number) {
         for (const Attribute &place : places[number].attributes) {
             if (!place.has_value && (place.name == "result" || place.name == "description")) {
@@ -422,9 +422,8 @@ std::optional<Plan::Element> Plan::run_item(const std::string &group, const std:
                : std::nullopt;
 }
 
-std::vector<Tag> element_tags(const Plan &plan, std::string_view text)
+std::vector<Tag> element_tags(const Plan &plan, std::vector<Tag> tags)
 {
-    std::vector<Tag> tags = scan(text);
     std::erase_if(tags, [](const Tag &tag) { return !makes_element(tag); });
     const auto &elements = plan.elements();
     return std::equal(tags.begin(), tags.end(), elements.begin(), elements.end(), belongs)

@@ -102,8 +102,8 @@ std::optional<std::string> attribute(mxml_node_t *node, const char *name);
 // characters that it writes.
 std::string as_loaded(const std::string &value);
 
-// The tags that a plan's elements were read from, in the same order; none where
-// the text has others than Mini-XML has seen.
-std::vector<Tag> element_tags(const Plan &plan, std::string_view text);
+// Those of a text's tags that a plan's elements were read from, in the same order; none
+// where the text has others than Mini-XML has seen.
+std::vector<Tag> element_tags(const Plan &plan, std::vector<Tag> tags);
 
 } // namespace fptest

@@ -48,7 +48,7 @@ class AttributeEraser
 std::optional<std::vector<Tag>> whole_tags(const std::string &text)
 {
     const std::optional<Plan> plan = Plan::parse_annotated(text);
-    return plan ? std::optional(element_tags(*plan, text)) : std::nullopt;
+    return plan ? std::optional(element_tags(*plan, scan(text))) : std::nullopt;
 }
 
 } // namespace

@@ -33,9 +33,9 @@ bool has_error(const std::string &args)
     for (const char c : args) {
         escaped += c == '<' ? "&lt;" : c == '&' ? "&amp;" : c == '"' ? "&quot;" : std::string(1, c);
     }
-    return fptest::has_errors(
-        check("<P><CmdGroup name=\"A\"><Cmd name=\"X\" args=\"" + escaped + "\"/></CmdGroup></P>",
-              PlanSource::stored));
+    const std::string plan =
+        "<P><CmdGroup name=\"A\"><Cmd name=\"X\" args=\"" + escaped + "\"/></CmdGroup></P>";
+    return fptest::has_errors(fptest::check("plan", plan, PlanSource::stored).findings);
 }
 
 // Whether the shell does run a line with these args.
@@ -130,7 +130,9 @@ TEST(CheckedGrammar, IsAskedOfTheShellForFiveSecondsInAll)
     }
     const auto begin = std::chrono::steady_clock::now();
     const auto findings =
-        check("<P>\n<CmdGroup name=\"A\">\n" + items + "</CmdGroup>\n</P>\n", PlanSource::stored);
+        fptest::check("plan", "<P>\n<CmdGroup name=\"A\">\n" + items + "</CmdGroup>\n</P>\n",
+                      PlanSource::stored)
+            .findings;
     EXPECT_LT(std::chrono::steady_clock::now() - begin, std::chrono::seconds(12));
     EXPECT_EQ(std::ranges::count(findings,
                                  "the device's shell has been asked for as long as fptest waits "

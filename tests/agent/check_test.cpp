@@ -35,10 +35,15 @@ using namespace std::string_literals;
 namespace
 {
 
+std::vector<Finding> findings_in(const std::string &text, PlanSource use)
+{
+    return fptest::check("p.xml", text, use).findings;
+}
+
 std::string messages(const std::string &text, PlanSource use)
 {
     std::string all;
-    for (const Finding &finding : check(text, use)) {
+    for (const Finding &finding : findings_in(text, use)) {
         all += fptest::Messages("p.xml", text).of(finding);
     }
     return all;
@@ -194,9 +199,10 @@ TEST(Findings, AreErrorsOrWarnings)
 {
     const std::string empty = group("A", "");
     EXPECT_FALSE(fptest::has_errors({}));
-    EXPECT_FALSE(fptest::has_errors(check("<P>" + empty + "</P>", PlanSource::stored)));
-    EXPECT_TRUE(fptest::has_errors(check("", PlanSource::stored)));
-    EXPECT_TRUE(fptest::has_errors(check("<P>" + empty + "<CmdGroup/></P>", PlanSource::stored)));
+    EXPECT_FALSE(fptest::has_errors(findings_in("<P>" + empty + "</P>", PlanSource::stored)));
+    EXPECT_TRUE(fptest::has_errors(findings_in("", PlanSource::stored)));
+    EXPECT_TRUE(
+        fptest::has_errors(findings_in("<P>" + empty + "<CmdGroup/></P>", PlanSource::stored)));
 }
 
 // --- any plan, any bytes -------------------------------------------------------------
@@ -224,7 +230,7 @@ void expect_sound(const std::string &text)
 {
     for (const PlanSource use : {PlanSource::to_send, PlanSource::stored}) {
         std::size_t before = 0;
-        for (const Finding &finding : check(text, use)) {
+        for (const Finding &finding : findings_in(text, use)) {
             ASSERT_LE(before, finding.offset) << text;
             ASSERT_LE(finding.offset, text.size()) << text;
             before = finding.offset;
@@ -234,7 +240,7 @@ void expect_sound(const std::string &text)
             ASSERT_LE(finding.text.size(), 2000U) << text;
         }
     }
-    if (fptest::has_errors(check(text, PlanSource::stored))) {
+    if (fptest::has_errors(findings_in(text, PlanSource::stored))) {
         return;
     }
     const auto plan = Plan::load_as_library(text);
@@ -303,7 +309,7 @@ TEST(CheckedPlan, WithoutErrorsRunsWhatItSays)
         }
         text += "</P>";
         ASSERT_NO_FATAL_FAILURE(expect_sound(text));
-        sound += fptest::has_errors(check(text, PlanSource::stored)) ? 0 : 1;
+        sound += fptest::has_errors(findings_in(text, PlanSource::stored)) ? 0 : 1;
     }
     EXPECT_GT(sound, 500U); // else little has been tried
 }
@@ -366,7 +372,7 @@ TEST(CheckedPlan, OfTenThousandItemsTakesNoTime)
     for (const std::string &content : {group("A", comments), group("A", nested), groups,
                                        group("A", others) + group("B", others)}) {
         const auto start = std::chrono::steady_clock::now();
-        EXPECT_NE(check("<P>" + content + "</P>", PlanSource::stored).size(), 0U);
+        EXPECT_NE(findings_in("<P>" + content + "</P>", PlanSource::stored).size(), 0U);
         EXPECT_LT(std::chrono::steady_clock::now() - start, std::chrono::seconds(2));
     }
 }

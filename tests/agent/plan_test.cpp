@@ -461,7 +461,7 @@ TEST(ElementTags, BelongToTheElementsOneByOne)
     const std::string text = "<?xml version=\"1.0\"?><!DOCTYPE P><P><!-- c -->text<![CDATA[d]]>"
                              "<?e f?><Cmd /></P>";
     std::vector<std::string> places;
-    for (const Tag &tag : fptest::element_tags(loaded(text), text)) {
+    for (const Tag &tag : fptest::element_tags(loaded(text), fptest::scan(text))) {
         places.push_back(text.substr(tag.begin, tag.end - tag.begin));
     }
     EXPECT_THAT(places, ElementsAre("<?xml version=\"1.0\"?>", "<!DOCTYPE P>", "<P>", "<!-- c -->",
@@ -471,7 +471,7 @@ TEST(ElementTags, BelongToTheElementsOneByOne)
 TEST(ElementTags, AreNoneWhereTheTextHasOthers)
 {
     const std::string plan = "<P><a/><b/></P>";
-    EXPECT_THAT(fptest::element_tags(loaded(plan), plan), testing::SizeIs(3));
+    EXPECT_THAT(fptest::element_tags(loaded(plan), fptest::scan(plan)), testing::SizeIs(3));
     for (const auto &[text, other] : std::initializer_list<std::pair<std::string, std::string>>{
              {plan, "<P><a/><c/></P>"},
              {plan, "<P><a/></P>"},
@@ -482,7 +482,7 @@ TEST(ElementTags, AreNoneWhereTheTextHasOthers)
              {"<P><!-- b --></P>", "<P><![CDATA[b]]></P>"},
              {"<P><?b?></P>", "<P><!b></P>"},
          }) {
-        EXPECT_THAT(fptest::element_tags(loaded(text), other), IsEmpty()) << other;
+        EXPECT_THAT(fptest::element_tags(loaded(text), fptest::scan(other)), IsEmpty()) << other;
     }
 }
 
@@ -493,7 +493,8 @@ TEST(ElementTags, FollowTheLibraryThroughItsOddities)
           "<P><!-- a ---> b --><c/></P>", "<P><a b='<c>'/><c d=\"/>\"/></P>",
           "<?xml?><P/><P/><!-- c -->"}) {
         const Plan plan = loaded(text);
-        EXPECT_EQ(fptest::element_tags(plan, text).size(), plan.elements().size()) << text;
+        EXPECT_EQ(fptest::element_tags(plan, fptest::scan(text)).size(), plan.elements().size())
+            << text;
     }
 }
 
