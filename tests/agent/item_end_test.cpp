@@ -464,12 +464,12 @@ TEST_F(ItemEnd, GathererThatEndsWithoutAReportIsNotWaitedFor)
 
 TEST_F(ItemEnd, GathererThatDidNotReportInTimeReportsIntoNothingLater)
 {
-    const Items items = {{"SensorProbe", "--group G --seconds 2"},
-                         {"Item", "sleep 3 report G 100 0 fine"}};
+    const Items items = {{"SensorProbe", "--group G --seconds 1"},
+                         {"Item", "sleep 2 report G 100 0 fine"}};
     for (const std::string way : {"--quiet", "--as-group"}) {
         SCOPED_TRACE(way);
         run_group(items,
-                  {way, "--timeout", "1", "--grace", "0.5", "P/G/SensorProbe", "--repeat", "2"});
+                  {way, "--timeout", "0.5", "--grace", "0.3", "P/G/SensorProbe", "--repeat", "2"});
         for (const Json &end : events("end")) {
             EXPECT_EQ(end.at("outcome"), "timed out");
         }

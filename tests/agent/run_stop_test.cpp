@@ -70,11 +70,11 @@ TEST_F(Run, LeavesAnItemAloneThatIsWithinItsTime)
 {
     // a limit for each item and not for all of them
     for (const std::string way : {"--quiet", "--as-group"}) {
-        EXPECT_EQ(run_group({{"Item", "sleep 1.5 report G 100 0 a"},
-                             {"Other", "sleep 1.5 report G 100 0 b"}},
-                            {way, "--timeout", "2.9"})
-                      .status,
-                  0);
+        EXPECT_EQ(
+            run_group({{"Item", "sleep 1 report G 100 0 a"}, {"Other", "sleep 1 report G 100 0 b"}},
+                      {way, "--timeout", "1.9"})
+                .status,
+            0);
         EXPECT_THAT(processes_stopped(), IsEmpty());
     }
 }
