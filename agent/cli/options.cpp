@@ -32,6 +32,7 @@ template <typename Number> CLI::Validator number_in(Number least, Number most)
                 const bool is_number = error == std::errc{} && stop == end;
                 // said so that what is not a number at all is in no range
                 if (is_number && number >= least && number <= most) {
+                    text = fmt::format("{}", number); // CLI11 reads 010 as octal
                     return std::string();
                 }
                 return refused(text, fmt::format("is no number from {} to {}", least, most));

@@ -144,7 +144,7 @@ void add_report(CLI::App &app, Action &chosen)
     command.add_option("--progress", options->progress, "a number, 100 for the end")
         ->type_name("N")
         ->required()
-        ->check(range(-99999999, 999999999));
+        ->transform(range(-99999999, 999999999));
     command.add_option("--result", options->result, "0, 1 or -2")
         ->type_name("R")
         ->required()

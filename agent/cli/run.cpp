@@ -304,17 +304,17 @@ void add_run(CLI::App &app, Action &chosen)
                      "item");
     command.add_option("--timeout", options->timeout, "stop an item that takes longer")
         ->type_name("SECONDS")
-        ->check(range(0.001, 1000000.0));
+        ->transform(range(0.001, 1000000.0));
     command.add_option("--grace", options->grace, "then kill it after so long")
         ->type_name("SECONDS")
         ->capture_default_str()
-        ->check(range(0.0, 1000000.0));
+        ->transform(range(0.0, 1000000.0));
     command.add_flag("--exit-status", options->exit_status,
                      "an item that ends with a status other than\n"
                      "0 has failed");
     command.add_option("--repeat", options->repeat, "run everything N times")
         ->type_name("N")
-        ->check(range(1, 1000000));
+        ->transform(range(1, 1000000));
     command
         .add_option("--for", options->time_limit,
                     "begin another round of everything for so\n"

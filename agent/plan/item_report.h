@@ -20,4 +20,9 @@ struct ItemReport {
     bool operator==(const ItemReport &) const = default;
 };
 
+inline bool has_result(const ItemReport &report)
+{
+    return report.result || report.result_without_value;
+}
+
 } // namespace fptest

@@ -263,14 +263,17 @@ class JunitReport : public Listener
         const std::string aside = aside_of(target_);
         const int flags = O_WRONLY | O_CREAT | O_TRUNC | O_NOFOLLOW | O_CLOEXEC;
         const Descriptor file(open(aside.c_str(), flags, 0666));
+        if (!file.is_open()) {
+            return false;
+        }
         struct stat old {
         };
         if (stat(target_.c_str(), &old) == 0) {
             static_cast<void>(fchmod(file.get(), old.st_mode & 07777));
         }
-        const bool is_written = file.is_open() && write(run, [&file](std::string_view text) {
-                                    return write_text(file.get(), text) == text.size();
-                                });
+        const bool is_written = write(run, [&file](std::string_view text) {
+            return write_text(file.get(), text) == text.size();
+        });
         if (is_written && std::rename(aside.c_str(), target_.c_str()) == 0) {
             return true;
         }

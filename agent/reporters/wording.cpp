@@ -101,9 +101,7 @@ std::string result_of(const ItemReport &report)
 
 std::string reported_result(const ItemReport &report)
 {
-    return report.result || report.result_without_value
-               ? fmt::format(", result {}", result_of(report))
-               : "";
+    return has_result(report) ? fmt::format(", result {}", result_of(report)) : "";
 }
 
 std::string remark(const ItemRun &item)
@@ -122,8 +120,7 @@ std::string remark(const ItemRun &item)
 
 std::string late_report(const ItemRun &item, const ItemReport &report)
 {
-    const bool has_result = report.result || report.result_without_value;
-    const std::string progress = !has_result && report.progress
+    const std::string progress = !has_result(report) && report.progress
                                      ? fmt::format(", progress {}", one_line(*report.progress))
                                      : "";
     const std::string said = one_line(report.description.value_or(""));

@@ -35,6 +35,9 @@ void append_output(std::string &output, const std::string &text)
     }
 }
 
+constexpr char kOverwrittenAfter[] =
+    "; a process with an old copy of the plan has written it over meanwhile";
+
 std::string reported(const ItemReport &report)
 {
     return report.result_without_value
@@ -113,18 +116,19 @@ bool Runner::run(const Job &job)
     host_.command("XMLNodePath::" + job.path, names);
     heard_of_at_ = now();
 
-    std::size_t next = 0;
+    job_ = job;
+    next_ = 0;
     bool runs = true;
     while ((runs || !active_.empty()) && !broken_) {
         if (const auto event = host_.wait(kTurn, signals_.descriptor())) {
             plan = Descriptor(-1);
             heard_of_at_ = now();
-            handle(*event, job, next, runs);
+            handle(*event, runs);
         }
         watch(runs);
     }
     if (!broken_) {
-        require_all_started(job, next);
+        require_all_started();
         require_plan();
     }
     notify_ended();
@@ -133,13 +137,13 @@ bool Runner::run(const Job &job)
 
 // A command that returns without having come to its items has run nothing, for
 // whatever cause: that is no success.
-void Runner::require_all_started(const Job &job, std::size_t next)
+void Runner::require_all_started()
 {
-    for (; next < job.targets.size() && signal_ == 0; ++next) {
-        if (!job.targets[next]) {
+    for (; next_ < job_.targets.size() && signal_ == 0; ++next_) {
+        if (!job_.targets[next_]) {
             continue;
         }
-        const Place place{job.suite, job.targets[next]->item};
+        const Place place{job_.suite, job_.targets[next_]->item};
         ItemRun &result = item(place);
         result.start = std::chrono::system_clock::now();
         for (Listener *listener : listeners_) {
@@ -168,13 +172,12 @@ void Runner::require_plan()
     broken_ = true;
 }
 
-void Runner::handle(const LibraryProcess::Event &event, const Job &job, std::size_t &next,
-                    bool &runs)
+void Runner::handle(const LibraryProcess::Event &event, bool &runs)
 {
     switch (event.kind) {
     case LibraryProcess::Event::Kind::item:
         move_on(event);
-        start_next(job, next, event);
+        start_next(event);
         break;
     case LibraryProcess::Event::Kind::ended:
         end_item(event);
@@ -266,21 +269,23 @@ bool Runner::gathers(const RunningItem &active) const
 
 // --- an item's start and end --------------------------------------------------
 
-void Runner::start_next(const Job &job, std::size_t &next, const LibraryProcess::Event &event)
+void Runner::start_next(const LibraryProcess::Event &event)
 {
     vendor_ = event.value;
-    const std::size_t at = next++;
-    more_to_come_ = next < job.targets.size();
-    if (at >= job.targets.size() || !job.targets[at]) {
+    const std::size_t at = next_++;
+    if (at >= job_.targets.size() || !job_.targets[at]) {
         return;
     }
     RunningItem active;
-    active.place = {job.suite, job.targets[at]->item};
-    active.target = *job.targets[at];
+    active.place = {job_.suite, job_.targets[at]->item};
+    active.target = *job_.targets[at];
     active.start = on_run_clock(event.time);
     if (signal_ != 0) {
         active.stop = Outcome::stopped;
         active.stop_wanted_at = now();
+    }
+    if (gathers(active)) {
+        clear_early_report(active);
     }
     active_.push_back(active);
     item(active.place).start = std::chrono::system_clock::now() -
@@ -370,7 +375,7 @@ void Runner::finish(RunningItem &active, TimePoint end)
     }
     judge(active);
     // the library may be at the next item of its command already, which has not been left
-    if (gathers(active) && active_.size() == 1 && !active.stop && !more_to_come_) {
+    if (gathers(active) && active_.size() == 1 && !active.stop && next_ >= job_.targets.size()) {
         result.left_running = note_left_running(active.target.element);
     }
     if (gathers(active) && !(result.report.progress == "100" && result.report.result)) {
@@ -386,7 +391,7 @@ void Runner::judge(const RunningItem &active)
 {
     ItemRun &result = item(active.place);
     const ItemReport &report = result.report;
-    const bool has_reported = report.result || report.result_without_value;
+    const bool has_reported = has_result(report);
     if (active.stop == Outcome::timed_out ||
         (active.stop == Outcome::stopped && active.was_stopped)) {
         result.outcome = *active.stop;
@@ -402,10 +407,13 @@ void Runner::judge(const RunningItem &active)
     } else if (!has_reported || active.report_lost) {
         result.outcome = Outcome::no_result;
         result.reason = why_silent(active);
-    } else if (!active.gatherer_end.empty() && report.progress != "100") {
+    } else if (gathers(active) && report.progress != "100") {
         result.outcome = Outcome::failed;
-        result.reason = fmt::format("the gatherer ended at progress {}, though it {}",
-                                    report.progress.value_or("0"), reported(report));
+        result.reason = fmt::format(
+            "the gatherer {} at progress {}{}, though it {}",
+            active.gatherer_end.empty() ? "was" : "ended", report.progress.value_or("0"),
+            active.gatherer_end.empty() ? " after " + fine_duration(kForGathering.count()) : "",
+            reported(report));
         result.overruled = true;
     } else if (limits_.exit_status && result.exit_status.value_or(0) != 0) {
         result.outcome = Outcome::failed;
@@ -416,6 +424,9 @@ void Runner::judge(const RunningItem &active)
     } else {
         result.outcome = Outcome::failed;
         result.reason = reported(report);
+        if (active.overwritten) {
+            result.reason += kOverwrittenAfter;
+        }
     }
 }
 
@@ -433,7 +444,8 @@ std::string Runner::why_stopped(const RunningItem &active)
     const bool is_interrupted = active.stop == Outcome::stopped;
     if (!active.killed) {
         return is_interrupted ? fmt::format("stopped by {}", signal_name(signal_))
-                              : fmt::format("stopped after {}", duration(seconds));
+                              : fmt::format("stopped after {}{}", duration(seconds),
+                                            active.overwritten ? kOverwrittenAfter : "");
     }
     return fmt::format("killed after {}, as it did not end when it was asked to",
                        is_interrupted ? "the run was interrupted by " + signal_name(signal_)
@@ -454,8 +466,10 @@ std::string Runner::why_silent(const RunningItem &active)
         return active.gatherer_end;
     }
     if (active.overwritten) {
-        return "a process with an old copy of the plan has written it over; what the plan says "
-               "now is older";
+        return gathers(active) ? "a process with an old copy of the plan has written it over, "
+                                 "perhaps the gatherer: let it report by a new process each time"
+                               : "a process with an old copy of the plan has written it over, and "
+                                 "nothing was reported after that";
     }
     if (active.undone) {
         return "a process with an old copy of the plan has written over what it had reported";

@@ -91,7 +91,7 @@ class Runner
         bool meets_other = false;    // the library's stop, not the item
         bool was_stopped = false;    // a stop has met it
         bool killed = false;
-        bool overwritten = false; // its element bears another mark
+        bool overwritten = false; // by an old copy of the plan, and not reported since
         bool report_lost = false; // with the stored plan
         bool undone = false;      // its result was there, and is not any more
         TimePoint stop_wanted_at;
@@ -119,18 +119,22 @@ class Runner
     TimePoint on_run_clock(TimePoint time) const; // of a moment on the steady clock
 
     void watch(bool command_runs);
-    void handle(const LibraryProcess::Event &event, const Job &job, std::size_t &next, bool &runs);
-    void start_next(const Job &job, std::size_t &next, const LibraryProcess::Event &event);
+    void handle(const LibraryProcess::Event &event, bool &runs);
+    void start_next(const LibraryProcess::Event &event);
     void end_item(const LibraryProcess::Event &event);
     void move_on(const LibraryProcess::Event &event);
     void note_lost_module();
     void lose_module(const LibraryProcess::Event &event);
-    void require_all_started(const Job &job, std::size_t next);
+    void require_all_started();
     void require_plan();
     void poll_reports();
     void read_reports(const std::string &text);
     void read_report(RunningItem &active, const Plan &plan);
     void read_late_report(Judged &judged, const Plan &plan);
+    bool is_older(RunningItem &active, const Plan &plan, const ItemReport &report);
+    void mark_again();
+    void clear_early_report(const RunningItem &active);
+    static void clear_and_mark(const std::vector<std::size_t> &numbers, const std::string &mark);
     void poll_gatherer(RunningItem &active);
     void read_signals();
     void suspend();
@@ -164,8 +168,12 @@ class Runner
     Run &run_;
     const std::vector<Listener *> &listeners_;
     Limits limits_;
+    Job job_;              // the one that runs
+    std::size_t next_ = 0; // of its targets
     std::deque<RunningItem> active_;
-    std::vector<Judged> judged_;             // of this round
+    std::vector<Judged> judged_;             // of this round, and gatherers
+    ItemReport gathered_before_;             // what the plan said when the job began
+    bool marks_are_gone_ = false;            // from items' elements
     std::vector<Leftover> left_;             // by items of this round
     std::vector<std::size_t> left_elements_; // the items' elements
     struct stat plan_status_ {
@@ -179,7 +187,6 @@ class Runner
     int signal_ = 0;
     TimePoint signal_taken_at_;
     bool stop_asked_ = false;               // and not yet answered
-    bool more_to_come_ = false;             // in the command that runs, after this item
     bool gatherer_may_report_late_ = false; // it may still report what it was told in vain
     std::string module_gone_;               // why, in the job in which its process ended
     bool broken_ = false;

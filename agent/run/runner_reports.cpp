@@ -7,6 +7,7 @@
 
 #include "module/stored_plan.h"
 #include "plan/plan_text.h"
+#include "util/failure.h"
 
 #include <algorithm>
 #include <sys/stat.h>
@@ -119,6 +120,73 @@ void Runner::read_reports(const std::string &text)
     for (Judged &judged : judged_) {
         read_late_report(judged, *plan);
     }
+    if (std::exchange(marks_are_gone_, false)) {
+        mark_again();
+    }
+}
+
+// What a process with an old copy of the plan says of items is older than they are. A
+// gatherer's own copy is always old: what is new in it is what it has to report.
+bool Runner::is_older(RunningItem &active, const Plan &plan, const ItemReport &report)
+{
+    if (bears_mark(plan, active.target)) {
+        return false;
+    }
+    marks_are_gone_ = true;
+    return !gathers(active) || !has_result(report) ||
+           as_made_loadable(gathered_before_) == as_made_loadable(report);
+}
+
+// So that what is reported from now on counts again. What is there is cleared.
+void Runner::mark_again()
+{
+    std::vector<std::size_t> numbers;
+    std::string mark;
+    for (RunningItem &active : active_) {
+        if (active.overwritten) {
+            numbers.push_back(active.target.element);
+            mark = active.target.mark;
+        }
+    }
+    for (std::size_t at = next_; at < job_.targets.size(); ++at) {
+        if (const auto &target = job_.targets[at]) {
+            numbers.push_back(target->element);
+            mark = target->mark;
+        }
+    }
+    if (!numbers.empty()) {
+        clear_and_mark(numbers, mark);
+    }
+}
+
+// A gatherer goes on after its end, so that what is there when it is told to gather is of
+// an earlier time.
+void Runner::clear_early_report(const RunningItem &active)
+{
+    const auto plan = Plan::parse_annotated(whole_stored_plan());
+    if (!plan || !is_item(*plan, active.target.element, item(active.place).name)) {
+        return;
+    }
+    const ItemReport report = plan->report(active.target.element);
+    if (!has_result(report)) {
+        return;
+    }
+    for (Listener *listener : listeners_) {
+        listener->late(run_, active.place, report);
+    }
+    clear_and_mark({active.target.element}, active.target.mark);
+}
+
+void Runner::clear_and_mark(const std::vector<std::size_t> &numbers, const std::string &mark)
+{
+    const Descriptor lock = lock_stored_plan();
+    try {
+        if (const auto cleared = without_reports(whole_stored_plan(), numbers, mark)) {
+            replace_stored_plan(*cleared);
+        }
+    } catch (const Failure &) {
+        return; // the disk is full
+    }
 }
 
 void Runner::read_report(RunningItem &active, const Plan &plan)
@@ -127,19 +195,21 @@ void Runner::read_report(RunningItem &active, const Plan &plan)
     if (active.done || !is_item(plan, number, item(active.place).name)) {
         return;
     }
-    active.overwritten = !bears_mark(plan, active.target);
-    if (active.overwritten) {
-        return; // what it says is older
-    }
     ItemRun &result = item(active.place);
     ItemReport report = plan.report(number);
     if (report.result == "") { // it has been made loadable already
         report.result.reset();
         report.result_without_value = true;
     }
-    if (as_made_loadable(report) == as_made_loadable(result.report)) {
+    if (is_older(active, plan, report)) {
+        active.overwritten = true;
         return;
     }
+    if (as_made_loadable(report) == as_made_loadable(result.report) ||
+        (active.overwritten && !has_result(report))) { // as it was cleared
+        return;
+    }
+    active.overwritten = false;
     active.undone = result.report.result && !report.result;
     if (active.seen.size() == kSeen) {
         active.seen.erase(active.seen.begin());
@@ -164,11 +234,10 @@ void Runner::read_late_report(Judged &judged, const Plan &plan)
         return;
     }
     const ItemReport report = plan.report(number);
-    const bool has_reported = report.result || report.result_without_value;
     const auto is_report = [&](const ItemReport &one) {
         return as_made_loadable(one) == as_made_loadable(report);
     };
-    if (!has_reported || std::ranges::any_of(judged.seen, is_report)) {
+    if (!has_result(report) || std::ranges::any_of(judged.seen, is_report)) {
         return;
     }
     judged.seen.push_back(report);

@@ -6,6 +6,7 @@
 #include "run/runner.h"
 
 #include "module/preflight.h"
+#include "module/stored_plan.h"
 #include "run/trigger.h"
 #include "util/text.h"
 
@@ -184,7 +185,7 @@ void Runner::release_command()
 // end of the library's process keeps it from them.
 bool Runner::starts_no_more() const
 {
-    return signal_ != 0 && more_to_come_;
+    return signal_ != 0 && next_ < job_.targets.size();
 }
 
 void Runner::stop_gatherer(RunningItem &active, bool command_runs, SteadyClock::duration waited)
@@ -309,7 +310,11 @@ void Runner::make_way_for(const Job &job)
     const auto is_gatherers = [&](const auto &target) {
         return target && is_gatherer(run_.suites[job.suite].items[target->item].name, vendor_);
     };
-    if (std::ranges::any_of(job.targets, is_gatherers)) {
+    const auto gatherer = std::ranges::find_if(job.targets, is_gatherers);
+    if (gatherer != job.targets.end()) {
+        if (const auto plan = Plan::parse_annotated(read_stored_plan().value_or(""))) {
+            gathered_before_ = plan->report((*gatherer)->element);
+        }
         // the library does not find one that is a script, and would start another beside it
         const std::vector<Leftover> running = host_.processes().of_gatherer();
         const bool is_found = std::ranges::any_of(
@@ -333,7 +338,9 @@ void Runner::end_round()
         end_gatherer();
     }
     poll_reports();
-    judged_.clear();
+    // the gatherer goes on
+    std::erase_if(judged_,
+                  [&](const Judged &one) { return !is_gatherer(item(one.place).name, vendor_); });
 }
 
 void Runner::end_left_running()

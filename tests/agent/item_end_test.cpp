@@ -17,12 +17,6 @@ using namespace testing;
 namespace
 {
 
-std::string script_report(const std::string &result, const std::string &description)
-{
-    return "fptest report G Script --progress 100 --result " + result + " --description &quot;" +
-           description + "&quot;";
-}
-
 bool is_suspended(pid_t process)
 {
     return device::status_field(process, "State").starts_with('T');

@@ -325,6 +325,16 @@ TEST_F(JunitReport, DoesNotReplaceAFileThatIsSomebodysOutput)
     EXPECT_THAT(directory_.names(), ElementsAre("out"));
 }
 
+TEST_F(JunitReport, SaysWhyItCannotBeReplaced)
+{
+    const auto report = junit_report(path("xml"));
+    Playback playback(*report, mixed_run());
+    playback.begin();
+    std::filesystem::create_directory(path("xml." + std::to_string(getpid()) + ".tmp"));
+    playback.finish();
+    EXPECT_EQ(report->failure(), path("xml") + ": Is a directory");
+}
+
 // No device of /dev is named here: a report that replaced what it should write
 // into would take it from the machine.
 TEST_F(JunitReport, SaysThatWhatItWritesIntoHasNoRoom)

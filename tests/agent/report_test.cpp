@@ -114,10 +114,17 @@ TEST_F(Report, ReplacesTheReportBefore)
 
 TEST_F(Report, TakesAnyNumberThatThePlanCanHold)
 {
-    for (const std::string progress : {"-99999999", "999999999", "0"}) {
+    const std::pair<std::string, std::string> numbers[] = {
+        {"-99999999", "-99999999"},
+        {"999999999", "999999999"},
+        {"0", "0"},
+        {"010", "10"},
+        {"08", "8"},
+    };
+    for (const auto &[progress, stored] : numbers) {
         EXPECT_EQ(report({"Bringup", "SpiCheck", "--progress", progress, "--result", "0"}).status,
                   0);
-        EXPECT_EQ(row("SpiCheck"), "Bringup SpiCheck " + progress + " 0");
+        EXPECT_EQ(row("SpiCheck"), "Bringup SpiCheck " + stored + " 0");
     }
 }
 

@@ -32,6 +32,17 @@ class RunGatherer : public Run
         const Lines all = device::listeners();
         return std::ranges::find(all, "00000000:8888") != all.end();
     }
+    // One of the test's own that is running already.
+    static support::Start gatherer_that_does(const Lines &words)
+    {
+        support::Start start{.arguments = {kProbe}, .program = "/system/bin/Item"};
+        start.arguments.insert(start.arguments.end(), words.begin(), words.end());
+        return start;
+    }
+    static void wait_for_gatherer()
+    {
+        ASSERT_TRUE(eventually([] { return !processes_named(kProbe).empty(); }));
+    }
     static void signal_gatherer(int number)
     {
         for (const device::Process &process : processes_named(kProbe)) {
@@ -128,12 +139,10 @@ TEST_F(RunGatherer, GoesOnWhereARunningOneHangs)
 
 TEST_F(RunGatherer, TakesNoStepOfItForItsEnd)
 {
-    // one of the test's own that is running already
     support::Process gatherer(
-        {.arguments = {kProbe, "gather", "report", "G", "50", "0", "half", "note", work("half"),
-                       "await", work("go"), "report", "G", "100", "1", "whole"},
-         .program = "/system/bin/Item"});
-    EXPECT_TRUE(eventually([] { return !processes_named(kProbe).empty(); }));
+        gatherer_that_does({"gather", "report", "G", "50", "0", "half", "note", work("half"),
+                            "await", work("go"), "report", "G", "100", "1", "whole"}));
+    wait_for_gatherer();
     FptestProcess fptest(with_group({{"SensorProbe", ""}, {"Item", "note /tmp/scene/next"}}));
     ASSERT_TRUE(wait_for_events("progress", 1));
     EXPECT_THAT(events("end"), IsEmpty());
@@ -152,6 +161,67 @@ TEST_F(RunGatherer, WaitsOnlySoLongForItsReport)
     EXPECT_LT(ended.seconds, 25);
     EXPECT_THAT(outcomes(), ElementsAre("SensorProbe: no result"));
     EXPECT_THAT(reasons().at(0), StartsWith("no result was reported within "));
+}
+
+TEST_F(RunGatherer, FailsWhereItIsNotDoneInTimeWhateverItHasReported)
+{
+    support::Process gatherer(
+        gatherer_that_does({"gather", "report", "G", "50", "0", "half", "sleep", "60"}));
+    wait_for_gatherer();
+    EXPECT_EQ(run_group({{"SensorProbe", ""}}).status, 1);
+    EXPECT_THAT(outcomes(), ElementsAre("SensorProbe: failed"));
+    EXPECT_EQ(reasons().at(0),
+              "the gatherer was at progress 50 after 10.0 s, though it reported the result 0");
+    gatherer.wait();
+}
+
+TEST_F(RunGatherer, MayReportFromACopyOfThePlanThatItKeeps)
+{
+    for (const std::string way : {"--quiet", "--as-group"}) {
+        SCOPED_TRACE(way);
+        Lines words;
+        for (const std::string text : {"one", "two", "three"}) {
+            words.insert(words.end(),
+                         {"gather", "report-here", "G", "SensorProbe", "100", "0", text});
+        }
+        words.insert(words.end(), {"sleep", "60"});
+        support::Process gatherer(gatherer_that_does(words));
+        wait_for_gatherer();
+        run_group({{"SensorProbe", ""}, {"Item", "sleep 0.3 report G 100 0 fine"}},
+                  {way, "--repeat", "3"});
+        EXPECT_THAT(outcomes(), Each(EndsWith(": passed")));
+        EXPECT_THAT(outcomes(), SizeIs(6));
+        signal_gatherer(SIGKILL);
+        gatherer.wait();
+    }
+}
+
+TEST_F(RunGatherer, HasNoReportOfAnEarlierGatheringTakenForItsOwn)
+{
+    for (const std::string way : {"--quiet", "--as-group"}) {
+        SCOPED_TRACE(way);
+        support::Process gatherer(gatherer_that_does(
+            {"gather",       "report", "G",      "100", "0",   "one",         "await",
+             work("second"), "report", "G",      "100", "0",   "one, stored", "note",
+             work("stored"), "gather", "report", "G",   "100", "1",           "two",
+             "sleep",        "60"}));
+        wait_for_gatherer();
+        run_group({{"Script", script("if test -e /tmp/scene/first; then touch /tmp/scene/second; "
+                                     "while ! test -e /tmp/scene/stored; do sleep 0.02; done; fi; "
+                                     "touch /tmp/scene/first; " +
+                                     script_report("0", "fine"))},
+                   {"SensorProbe", ""}},
+                  {way, "--repeat", "2"});
+        EXPECT_THAT(outcomes(), ElementsAre("Script: passed", "SensorProbe: passed",
+                                            "Script: passed", "SensorProbe: failed"));
+        ASSERT_THAT(events("late"), SizeIs(1));
+        EXPECT_EQ(events("late")[0].at("description"), "one, stored");
+        signal_gatherer(SIGKILL);
+        gatherer.wait();
+        for (const char *name : {"first", "second", "stored"}) {
+            unlink(work(name).c_str());
+        }
+    }
 }
 
 TEST_F(RunGatherer, IsInterruptedWhileItWaitsForIt)

@@ -25,6 +25,12 @@ inline std::string script(const std::string &text)
     return "'" + text + "'";
 }
 
+inline std::string script_report(const std::string &result, const std::string &description)
+{
+    return "fptest report G Script --progress 100 --result " + result + " --description &quot;" +
+           description + "&quot;";
+}
+
 // Notes its name in the order of the items, and reports.
 inline std::string notes(const std::string &description, const std::string &result = "0")
 {

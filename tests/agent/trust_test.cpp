@@ -73,10 +73,26 @@ TEST_F(Trust, TakesNoResultThatAProcessWithAnOldCopyOfThePlanWritesBack)
                    "60"});
     ASSERT_TRUE(wait_for_file("loaded"));
     const Ended ended = run_fptest({"run", "--json", work("json"), "P/G"});
-    EXPECT_THAT(read_file(kPlanFile), HasSubstr("description=\"fine\"")); // as it was before
+    EXPECT_THAT(read_file(kPlanFile), HasSubstr("the copy again"));
+    EXPECT_THAT(read_file(kPlanFile), Not(HasSubstr("description=\"fine\"")));
     EXPECT_EQ(ended.status, 1);
     EXPECT_THAT(outcomes(), ElementsAre("Item: no result"));
     EXPECT_THAT(ended.out, HasSubstr("a process with an old copy of the plan has written it over"));
+}
+
+TEST_F(Trust, TakesWhatIsReportedAfterAnOldCopyOfThePlanWasWritten)
+{
+    const std::string writes_old_copy = "fptest report G Script --progress 0 --result -2; "
+                                        "sleep 0.1; cat /tmp/scene/old "
+                                        "&gt;/data/vorlane/src1.xml; sleep 0.3; "
+                                        "fptest report G Script --progress 100 --result 0";
+    for (const std::string way : {"--quiet", "--as-group"}) {
+        SCOPED_TRACE(way);
+        const Items items = {{"Script", script(writes_old_copy)}, {"Item", kPasses}};
+        file("old", device::plan_of({{"G", {{"Script", ""}, {"Item", ""}}}}));
+        EXPECT_EQ(run_group(items, {way}).status, 0);
+        EXPECT_THAT(outcomes(), ElementsAre("Script: passed", "Item: passed"));
+    }
 }
 
 TEST_F(Trust, TakesNoResultOfAnEarlierRunThoughThePlanIsGivenAnew)
