@@ -5,6 +5,7 @@
 
 #include <algorithm>
 #include <charconv>
+#include <utf8.h>
 
 namespace fptest
 {
@@ -206,22 +207,16 @@ class Scanner
     std::vector<Tag> tags_;
 };
 
-bool is_continuation(char byte)
+// Bytes of the text's first character; 1 for what is no UTF-8.
+std::size_t character_length(std::string_view text)
 {
-    return (static_cast<unsigned char>(byte) & 0xC0) == 0x80;
-}
-
-// Bytes of the character there; 1 for what is no UTF-8.
-std::size_t character_length(std::string_view text, std::size_t at)
-{
-    const auto lead = static_cast<unsigned char>(text[at]);
-    const std::size_t length = lead >= 0xF0 ? 4 : lead >= 0xE0 ? 3 : lead >= 0xC2 ? 2 : 1;
-    for (std::size_t i = 1; i < length; ++i) {
-        if (at + i >= text.size() || !is_continuation(text[at + i])) {
-            return 1;
-        }
+    text = text.substr(0, 4);
+    const char *next = text.data();
+    if (utf8::find_invalid(text.begin(), text.end()) == text.begin()) {
+        return 1;
     }
-    return length;
+    utf8::unchecked::next(next);
+    return static_cast<std::size_t>(next - text.data());
 }
 
 // Bytes of UTF-8 that an entity stands for, from its '&' to its ';'.
@@ -279,7 +274,7 @@ Position Positions::of(std::size_t offset)
         *this = Positions(text_);
     }
     while (last_.begin < offset) {
-        const std::size_t end = last_.begin + character_length(text_, last_.begin);
+        const std::size_t end = last_.begin + character_length(text_.substr(last_.begin));
         if (end > offset) {
             break;
         }
