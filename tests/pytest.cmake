@@ -14,7 +14,7 @@ function(add_pytest file label)
   if(NOT arg_TIMEOUT)
     set(arg_TIMEOUT 300)
   endif()
-  string(REGEX REPLACE "_test\\.py$" "" name ${arg_PREFIX}.${file})
+  string(REGEX REPLACE "^(.*/)?([^/]*)_test\\.py$" "${arg_PREFIX}.\\2" name ${file})
   set(script ${CMAKE_CURRENT_BINARY_DIR}/${name}.cmake)
   file(CONFIGURE OUTPUT ${script} @ONLY CONTENT [[
 add_test(@name@ /usr/bin/python3 -B -m pytest "@CMAKE_CURRENT_SOURCE_DIR@/@file@")
