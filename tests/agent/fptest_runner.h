@@ -89,3 +89,6 @@ class FptestTest : public DeviceTest
     static void fill_disk();
     static bool is_in_place();
 };
+
+using namespace fptest_runner;
+using namespace support;

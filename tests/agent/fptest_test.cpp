@@ -11,10 +11,6 @@
 #include <regex>
 #include <set>
 
-using namespace fptest_runner;
-using namespace device;
-using namespace testing;
-
 namespace fs = std::filesystem;
 
 namespace

@@ -10,10 +10,6 @@
 #include <thread>
 #include <unistd.h>
 
-using namespace fptest_runner;
-using namespace device;
-using namespace testing;
-
 namespace
 {
 

@@ -7,10 +7,6 @@
 
 #include <filesystem>
 
-using namespace fptest_runner;
-using namespace device;
-using namespace testing;
-
 namespace fs = std::filesystem;
 
 namespace

@@ -20,11 +20,6 @@
 #include <unistd.h>
 #include <utility>
 
-using namespace fptest_runner;
-using namespace device;
-using namespace support;
-using namespace testing;
-
 namespace
 {
 

@@ -9,10 +9,6 @@
 #include <regex>
 #include <sys/stat.h>
 
-using namespace fptest_runner;
-using namespace device;
-using namespace testing;
-
 namespace fs = std::filesystem;
 
 namespace

@@ -14,11 +14,6 @@
 #include <string>
 #include <unistd.h>
 
-using namespace fptest_runner;
-using namespace device;
-using namespace support;
-using namespace testing;
-
 namespace
 {
 

@@ -10,11 +10,6 @@
 #include <map>
 #include <sys/types.h>
 
-using namespace fptest_runner;
-using namespace device;
-using namespace support;
-using namespace testing;
-
 namespace
 {
 

@@ -7,11 +7,6 @@
 
 #include <filesystem>
 
-using namespace fptest_runner;
-using namespace device;
-using namespace support;
-using namespace testing;
-
 namespace fs = std::filesystem;
 
 namespace

@@ -10,11 +10,6 @@
 #include <sys/stat.h>
 #include <unistd.h>
 
-using namespace fptest_runner;
-using namespace device;
-using namespace support;
-using namespace testing;
-
 namespace fs = std::filesystem;
 
 namespace

@@ -11,11 +11,6 @@
 #include <filesystem>
 #include <utility>
 
-using namespace fptest_runner;
-using namespace device;
-using namespace support;
-using namespace testing;
-
 namespace fs = std::filesystem;
 
 namespace

@@ -9,11 +9,6 @@
 #include <ostream>
 #include <unistd.h>
 
-using namespace fptest_runner;
-using namespace device;
-using namespace support;
-using namespace testing;
-
 namespace fs = std::filesystem;
 
 namespace

@@ -15,11 +15,6 @@
 #include <sys/file.h>
 #include <unistd.h>
 
-using namespace fptest_runner;
-using namespace device;
-using namespace support;
-using namespace testing;
-
 namespace
 {
 

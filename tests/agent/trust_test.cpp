@@ -12,10 +12,6 @@
 #include <sys/stat.h>
 #include <unistd.h>
 
-using namespace device;
-using namespace fptest_runner;
-using namespace testing;
-
 namespace
 {
 

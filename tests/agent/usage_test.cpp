@@ -9,7 +9,6 @@
 #include <utility>
 #include <vector>
 
-using namespace fptest_runner;
 using device::Lines;
 
 namespace

@@ -11,9 +11,6 @@
 #include <regex>
 #include <unistd.h>
 
-using namespace device;
-using namespace testing;
-
 namespace
 {
 

@@ -8,8 +8,6 @@
 #include <set>
 #include <unistd.h>
 
-using namespace device;
-
 namespace
 {
 

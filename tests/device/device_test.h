@@ -105,4 +105,5 @@ class DeviceTest : public ::testing::Test
     void TearDown() override;
 };
 
+using namespace device;
 using namespace testing;

@@ -13,8 +13,6 @@
 #include <thread>
 #include <unistd.h>
 
-using namespace device;
-
 namespace
 {
 

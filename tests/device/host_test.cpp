@@ -7,8 +7,6 @@
 
 #include <array>
 
-using namespace device;
-
 namespace
 {
 

@@ -8,8 +8,6 @@
 #include <chrono>
 #include <unistd.h>
 
-using namespace device;
-
 namespace
 {
 

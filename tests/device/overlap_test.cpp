@@ -14,8 +14,6 @@
 #include <thread>
 #include <unistd.h>
 
-using namespace device;
-
 namespace
 {
 

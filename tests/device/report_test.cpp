@@ -8,8 +8,6 @@
 #include <cstdlib>
 #include <unistd.h>
 
-using namespace device;
-
 namespace
 {
 

@@ -12,8 +12,6 @@
 #include <thread>
 #include <unistd.h>
 
-using namespace device;
-
 namespace
 {
 

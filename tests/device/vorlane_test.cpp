@@ -21,8 +21,6 @@
 #include <thread>
 #include <unistd.h>
 
-using namespace device;
-
 namespace
 {
 

@@ -43,14 +43,12 @@
 #include <ucontext.h>
 #include <unistd.h>
 
-using faults::cycle;
-using faults::Step;
-using platform::gives;
-using platform::limit;
-using Kind = faults::Step::Kind;
-
 namespace
 {
+
+using faults::cycle;
+using faults::Step;
+using Kind = faults::Step::Kind;
 
 constexpr unsigned kSeconds = 10; // a cycle takes milliseconds
 constexpr std::size_t kCut = 5;

@@ -9,9 +9,6 @@
 #include <cstddef>
 #include <cstring>
 
-using namespace platform;
-using namespace sequences;
-
 namespace
 {
 

@@ -11,10 +11,6 @@
 #include <optional>
 #include <ostream>
 
-using namespace sequences;
-using namespace platform;
-using namespace testing;
-
 namespace
 {
 

@@ -6,9 +6,6 @@
 
 #include <cerrno>
 
-using namespace platform;
-using namespace sequences;
-
 namespace
 {
 

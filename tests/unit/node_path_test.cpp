@@ -9,9 +9,6 @@
 #include <cerrno>
 #include <utility>
 
-using namespace sequences;
-using namespace platform;
-
 namespace
 {
 

@@ -8,9 +8,6 @@
 #include <cstring>
 #include <memory>
 
-using namespace platform;
-using namespace sequences;
-
 namespace
 {
 

@@ -8,9 +8,6 @@
 #include <climits>
 #include <memory>
 
-using namespace sequences;
-using namespace platform;
-
 namespace
 {
 

@@ -13,7 +13,6 @@
 #include <unistd.h>
 
 using namespace platform;
-using namespace testing;
 
 namespace
 {

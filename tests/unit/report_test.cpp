@@ -8,10 +8,6 @@
 #include <climits>
 #include <cstring>
 
-using namespace sequences;
-using namespace platform;
-using namespace testing;
-
 namespace
 {
 

@@ -256,3 +256,6 @@ inline Lines trigger(int count = 1)
 }
 
 } // namespace sequences
+
+using namespace platform;
+using namespace sequences;

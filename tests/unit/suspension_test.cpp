@@ -8,9 +8,6 @@
 #include <algorithm>
 #include <cerrno>
 
-using namespace platform;
-using namespace sequences;
-
 namespace
 {
 

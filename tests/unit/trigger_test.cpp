@@ -6,9 +6,6 @@
 
 #include <cerrno>
 
-using namespace sequences;
-using namespace platform;
-
 namespace
 {
 

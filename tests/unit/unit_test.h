@@ -168,5 +168,4 @@ class LibraryTest : public ::testing::Test
     }
 };
 
-// For lists of lines: reads as the list itself does.
 using namespace testing;
