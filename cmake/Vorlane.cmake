@@ -44,7 +44,7 @@ add_library(vorlane SHARED
   vorlane/linux/sysparm.cpp
   vorlane/linux/vr_log.cpp)
 target_include_directories(vorlane PUBLIC "$<BUILD_INTERFACE:${VORLANE_INCLUDE_DIR}>")
-target_link_libraries(vorlane PRIVATE MiniXml::MiniXml quillmark_warnings quillmark_plain)
+target_link_libraries(vorlane PRIVATE MiniXml::MiniXml quillmark_warnings quillmark_no_cxx_runtime)
 # a log beyond 2 GB, on 32-bit devices as well
 target_compile_definitions(vorlane PRIVATE _FILE_OFFSET_BITS=64)
 set_target_properties(vorlane PROPERTIES LINKER_LANGUAGE C UNITY_BUILD OFF)

@@ -77,17 +77,17 @@ struct Target {
 
 // --- what a child tells its parent -------------------------------------------
 
-struct Told {
+struct ChildReport {
     bool met;         // the fault
     bool lacking;     // Mini-XML has lost something without a word
     char step[64];    // the last one begun
     char died_in[64]; // the function of Mini-XML
 };
 
-Told *told()
+ChildReport *child_report()
 {
-    static auto *const shared = static_cast<Told *>(
-        mmap(nullptr, sizeof(Told), PROT_READ | PROT_WRITE, MAP_SHARED | MAP_ANONYMOUS, -1, 0));
+    static auto *const shared = static_cast<ChildReport *>(mmap(
+        nullptr, sizeof(ChildReport), PROT_READ | PROT_WRITE, MAP_SHARED | MAP_ANONYMOUS, -1, 0));
     return shared;
 }
 
@@ -119,12 +119,12 @@ void on_death(int signal, siginfo_t * /*info*/, void *context)
 {
     Frames frames{};
     const std::size_t count = frames_of(*static_cast<const ucontext_t *>(context), frames);
-    for (std::size_t at = 0; at < count && told()->died_in[0] == '\0'; ++at) {
+    for (std::size_t at = 0; at < count && child_report()->died_in[0] == '\0'; ++at) {
         Dl_info place{};
         const bool known = dladdr(frames[at], &place) != 0 && place.dli_sname != nullptr;
         const std::string name = known ? place.dli_sname : "";
         if (name.starts_with("mxml") || name.starts_with("_mxml")) {
-            tell(told()->died_in, name.substr(0, name.find('.')));
+            tell(child_report()->died_in, name.substr(0, name.find('.')));
         }
     }
     std::signal(signal, SIG_DFL);
@@ -223,7 +223,7 @@ std::string answer(const Step &step, const Lines &events, const State &state)
 // Plays the step, and checks what holds with and without a fault.
 Shown play(const Step &step, Lines &before_fault)
 {
-    tell(told()->step, step.name);
+    tell(child_report()->step, step.name);
     const State before = state_now();
     Lines left = platform::left_open();
     platform::plan_output({step.output});
@@ -312,7 +312,7 @@ class Run
     // Called when Mini-XML's call fails.
     void meet()
     {
-        told()->met = true;
+        child_report()->met = true;
         before_fault_ = platform::events();
         place_ = before_fault_.size();
     }
@@ -325,10 +325,10 @@ class Run
         for (std::size_t at = 0; at < cycle().size(); ++at) {
             const Shown &clean = reference()[0][at];
             SCOPED_TRACE(cycle()[at].name);
-            const bool met = told()->met;
+            const bool met = child_report()->met;
             find_fault(clean.events);
             const Shown shown = play_step(at);
-            if (told()->met && !met) {
+            if (child_report()->met && !met) {
                 at_fault(cycle()[at], clean, shown);
             } else if (same && !(met && in_memory)) {
                 expect(shown, clean);
@@ -337,7 +337,7 @@ class Run
             }
             same = shown.state == clean.state;
         }
-        for (std::size_t at = 0; told()->met && at < cycle().size(); ++at) {
+        for (std::size_t at = 0; child_report()->met && at < cycle().size(); ++at) {
             play_again(at);
         }
     }
@@ -357,7 +357,7 @@ class Run
     {
         Shown shown = ::play(cycle()[at], before_fault_);
         if (!target_.in_mini_xml() && !platform::steps_left(target_.function)) {
-            told()->met = true;
+            child_report()->met = true;
         }
         return shown;
     }
@@ -410,7 +410,7 @@ class Run
         }
         if (uses_plan && shown.state.loaded && target_.function == mini_xml::kMemory &&
             events != wanted) {
-            told()->lacking = true;
+            child_report()->lacking = true;
             faults::check_ends(shown.events);
         } else {
             expect(events, wanted);
@@ -524,18 +524,18 @@ struct Outcome {
 
 void judge(int status, const Target &target, const std::string &name, Outcome &outcome)
 {
-    const std::string died_in = told()->died_in;
+    const std::string died_in = child_report()->died_in;
     const bool in_memory = target.function == mini_xml::kMemory;
     if (WIFSIGNALED(status)) {
         if (in_memory && WTERMSIG(status) == SIGSEGV && kCrashes.contains(died_in)) {
             ++outcome.known["ends the process in " + died_in];
         } else {
-            outcome.findings.push_back(name + ": ended in \"" + told()->step + "\" by " +
+            outcome.findings.push_back(name + ": ended in \"" + child_report()->step + "\" by " +
                                        strsignal(WTERMSIG(status)) + " " + died_in);
         }
     } else if (WEXITSTATUS(status) != 0) {
         outcome.findings.push_back(name + ": see above");
-    } else if (told()->lacking) {
+    } else if (child_report()->lacking) {
         ++outcome.known["loses something without a word"];
     }
 }
@@ -543,7 +543,7 @@ void judge(int status, const Target &target, const std::string &name, Outcome &o
 // Whether the cycle still had such a call.
 bool inject(const Target &target, long number, Outcome &outcome)
 {
-    *told() = {};
+    *child_report() = {};
     std::fflush(stdout);
     const pid_t pid = fork();
     if (pid == 0) {
@@ -552,7 +552,7 @@ bool inject(const Target &target, long number, Outcome &outcome)
     int status = 0;
     waitpid(pid, &status, 0);
     judge(status, target, target.function + ", call " + std::to_string(number), outcome);
-    return told()->met;
+    return child_report()->met;
 }
 
 TEST(Faults, EachCallOfThePlatformFailsOnce)
