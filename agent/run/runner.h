@@ -131,7 +131,7 @@ class Runner
     void read_reports(const std::string &text);
     void read_report(RunningItem &active, const Plan &plan);
     void read_late_report(Judged &judged, const Plan &plan);
-    bool is_older(RunningItem &active, const Plan &plan, const ItemReport &report);
+    bool is_older(const RunningItem &active, const Plan &plan, const ItemReport &report);
     void mark_again();
     void clear_early_report(const RunningItem &active);
     static void clear_and_mark(const std::vector<std::size_t> &numbers, const std::string &mark);

@@ -127,7 +127,7 @@ void Runner::read_reports(const std::string &text)
 
 // What a process with an old copy of the plan says of items is older than they are. A
 // gatherer's own copy is always old: what is new in it is what it has to report.
-bool Runner::is_older(RunningItem &active, const Plan &plan, const ItemReport &report)
+bool Runner::is_older(const RunningItem &active, const Plan &plan, const ItemReport &report)
 {
     if (bears_mark(plan, active.target)) {
         return false;
