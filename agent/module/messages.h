@@ -14,14 +14,15 @@ enum class MessageKind : char {
     command = 'c',   // the command and the names of its items, a zero byte between each
     stop = 's',      // the item's name
     read_back = 'b', // nothing
-    hold = 'h',      // nothing: from here on the library is held at each item's end
-    go_on = 'g',     // nothing: it may go on after the item that has ended
+    hold = 'h',      // nothing: from here on the library is held at the two below that say so
+    go_on = 'g',     // nothing: it may go on
     // from it
-    item = 'i',     // "MOMENT VENDOR": the command has come to an item
-    ended = 'e',    // "MOMENT STATUS LEFT": its process has; whether any others are left
-    returned = 'r', // "MOMENT REPLY"
-    stopped = 'd',  // what the stop returned
-    plan = 'p',     // the stored plan
+    item = 'i',      // "MOMENT VENDOR": the command has come to an item
+    ended = 'e',     // "MOMENT STATUS LEFT": its process has; whether any are left; held
+    connected = 'n', // "MOMENT": the gatherer has, and is told when the library goes on; held
+    returned = 'r',  // "MOMENT REPLY"
+    stopped = 'd',   // what the stop returned
+    plan = 'p',      // the stored plan
 };
 
 struct Message {

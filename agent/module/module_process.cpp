@@ -222,6 +222,9 @@ void LibraryProcess::read_control()
         event.left_running = std::strtol(end, nullptr, 10) != 0;
         break;
     }
+    case MessageKind::connected:
+        event = with_moment(Event::Kind::connected, message.text);
+        break;
     case MessageKind::returned:
         event = with_moment(Event::Kind::returned, message.text);
         break;

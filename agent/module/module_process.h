@@ -27,11 +27,12 @@ class LibraryProcess
   public:
     struct Event {
         enum class Kind {
-            item,     // the command has come to an item; value is the vendor
-            ended,    // that item's process has ended; value is its wait status
-            returned, // the command has returned; text is its reply
-            stopped,  // a stop has returned; value is what it returned, or kNothingToStop
-            gone,     // the process has ended; text says how
+            item,      // the command has come to an item; value is the vendor
+            ended,     // that item's process has ended; value is its wait status
+            connected, // the gatherer has, and is told to gather once go_on() is called
+            returned,  // the command has returned; text is its reply
+            stopped,   // a stop has returned; value is what it returned, or kNothingToStop
+            gone,      // the process has ended; text says how
         };
         Kind kind;
         int value = 0;
@@ -60,8 +61,9 @@ class LibraryProcess
     // stop the first process of the system.
     void stop(const std::string &item);
 
-    // Holds the library at the end of each item, from here on, until go_on() is called:
-    // what it left can be looked at before anything else starts.
+    // Holds the library at the end of each item, and before it tells a gatherer to
+    // gather, from here on, until go_on() is called: what has been reported and left
+    // can be looked at before anything else starts.
     void hold_at_ends();
     void go_on();
 

@@ -13,18 +13,22 @@
 
 #include <array>
 #include <atomic>
+#include <cerrno>
 #include <chrono>
 #include <condition_variable>
 #include <csignal>
 #include <cstdio>
 #include <cstdlib>
+#include <dlfcn.h>
 #include <fcntl.h>
 #include <fmt/core.h>
+#include <functional>
 #include <mutex>
 #include <sstream>
 #include <string>
 #include <sys/prctl.h>
 #include <sys/resource.h>
+#include <sys/socket.h>
 #include <sys/stat.h>
 #include <sys/wait.h>
 #include <thread>
@@ -39,6 +43,8 @@ namespace
 constexpr std::size_t kReplyRoom = 1025;
 constexpr std::chrono::seconds kGrace{2}; // for items to end when the agent has gone
 
+std::function<void()> connection_told;
+
 class Server
 {
   public:
@@ -46,6 +52,7 @@ class Server
     {
         print_to(*this);
         tell_item_status([this](int status) { tell_ended(status); });
+        connection_told = [this] { tell_connected(); };
     }
 
     // Ends with the agent, whatever has become of it; an item that is running
@@ -65,7 +72,7 @@ class Server
                 holds_ = true;
                 break;
             case MessageKind::go_on:
-                leave_item();
+                release();
                 break;
             default:
                 answer({MessageKind::plan, read_back()});
@@ -138,18 +145,30 @@ class Server
     // reported, and looked for what it has left running.
     void tell_ended(int status)
     {
-        std::unique_lock lock(mutex_);
-        at_end_ = holds_;
-        send_message(socket_, {MessageKind::ended,
-                               moment() + std::to_string(status) + (has_children() ? " 1" : " 0")});
-        left_.wait(lock, [this] { return !at_end_; });
+        hold_after({MessageKind::ended,
+                    moment() + std::to_string(status) + (has_children() ? " 1" : " 0")});
     }
 
-    void leave_item()
+    void tell_connected()
+    {
+        if (holds_) {
+            hold_after({MessageKind::connected, moment()});
+        }
+    }
+
+    void hold_after(const Message &message)
+    {
+        std::unique_lock lock(mutex_);
+        held_ = holds_;
+        send_message(socket_, message);
+        released_.wait(lock, [this] { return !held_; });
+    }
+
+    void release()
     {
         const std::lock_guard lock(mutex_);
-        at_end_ = false;
-        left_.notify_all();
+        held_ = false;
+        released_.notify_all();
     }
 
     // What an item has left running is this process's own by now. The finished ones
@@ -251,8 +270,8 @@ class Server
 
     int socket_;
     std::mutex mutex_;
-    std::condition_variable left_;
-    bool at_end_ = false; // of an item, and held there
+    std::condition_variable released_;
+    bool held_ = false; // the library
     std::atomic<bool> holds_ = false;
     std::thread command_;
     std::vector<std::string> items_;
@@ -311,3 +330,17 @@ void serve_module(int socket, int output)
 }
 
 } // namespace fptest
+
+// The library's call comes here, ahead of the platform's: nobody else knows when the
+// gatherer is about to be told.
+extern "C" int Accept(int descriptor, struct sockaddr *address, socklen_t *length)
+{
+    static const auto platforms = reinterpret_cast<decltype(&Accept)>(dlsym(RTLD_NEXT, "Accept"));
+    const int connection = platforms(descriptor, address, length);
+    const int error = errno;
+    if (connection >= 0 && fptest::connection_told) {
+        fptest::connection_told();
+    }
+    errno = error;
+    return connection;
+}

@@ -163,8 +163,8 @@ class JunitReport : public Listener
 
     void late(const Run &run, Place place, const ItemReport &report) override
     {
-        late_.push_back({place.suite, late_report(item_at(run, place), report)});
-        change(run);
+        late_.push_back({place.suite, late_report(run, place, report)});
+        changed_ = !direct_;
     }
 
     void tick(const Run &run) override

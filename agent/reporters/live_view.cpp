@@ -155,7 +155,7 @@ class LiveView : public Listener
 
     void late(const Run &run, Place place, const ItemReport &report) override
     {
-        keep_text(late_report(item_at(run, place), report), Colour::yellow);
+        keep_text(late_report(run, place, report), Colour::yellow);
         draw(run);
     }
 

@@ -92,7 +92,7 @@ class PlainView : public Listener
 
     void late(const Run &run, Place place, const ItemReport &report) override
     {
-        print(late_report(item_at(run, place), report));
+        print(late_report(run, place, report));
     }
 
     void finish(const Run &run) override

@@ -168,7 +168,7 @@ class TapReport : public Listener
 
     void late(const Run &run, Place place, const ItemReport &report) override
     {
-        write((open_ ? kIndent : "") + comment(late_report(item_at(run, place), report)));
+        write((open_ ? kIndent : "") + comment(late_report(run, place, report)));
     }
 
     void round_over(const Run &run) override

@@ -118,14 +118,15 @@ std::string remark(const ItemRun &item)
     return text;
 }
 
-std::string late_report(const ItemRun &item, const ItemReport &report)
+std::string late_report(const Run &run, Place place, const ItemReport &report)
 {
+    const ItemRun &item = item_at(run, place);
     const std::string progress = !has_result(report) && report.progress
                                      ? fmt::format(", progress {}", one_line(*report.progress))
                                      : "";
     const std::string said = one_line(report.description.value_or(""));
-    return fmt::format("{}/{}: late report{}{}{}; it changes nothing", one_line(item.group),
-                       one_line(item.name), reported_result(report), progress,
+    return fmt::format("{}/{}{}: late report{}{}{}; it changes nothing", one_line(item.group),
+                       one_line(item.name), of_round(run), reported_result(report), progress,
                        said.empty() ? "" : ": " + said);
 }
 

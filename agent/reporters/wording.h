@@ -37,7 +37,7 @@ std::string reported_result(const ItemReport &report);
 std::string remark(const ItemRun &item);
 
 // "G/X: late report, result 0: TEXT; it changes nothing"
-std::string late_report(const ItemRun &item, const ItemReport &report);
+std::string late_report(const Run &run, Place place, const ItemReport &report);
 
 // The last lines that an item printed, none of them longer than is sensible.
 std::vector<std::string> last_lines(std::string_view output);

@@ -271,12 +271,14 @@ Exit run_rounds(const std::vector<Listener *> &listeners, const Runner::Limits &
     run.suites = work.suites;
     run.start = std::chrono::system_clock::now();
     begin(run, listeners, signals);
+    const std::string earlier_plan = read_stored_plan().value_or("");
     try {
         store();
     } catch (const Failure &failure) {
         run_nothing(failure.what(), run, listeners, signals);
     }
     Runner runner(host, signals, run, listeners, limits);
+    runner.note_earlier_plan(earlier_plan);
     bool broken = false;
     try {
         run.finished = Rounds(runner, run, listeners, work).run_all();

@@ -182,6 +182,9 @@ void Runner::handle(const LibraryProcess::Event &event, bool &runs)
     case LibraryProcess::Event::Kind::ended:
         end_item(event);
         break;
+    case LibraryProcess::Event::Kind::connected:
+        begin_gathering();
+        break;
     case LibraryProcess::Event::Kind::returned:
         runs = false;
         move_on(event);
@@ -284,9 +287,6 @@ void Runner::start_next(const LibraryProcess::Event &event)
         active.stop = Outcome::stopped;
         active.stop_wanted_at = now();
     }
-    if (gathers(active)) {
-        clear_early_report(active);
-    }
     active_.push_back(active);
     item(active.place).start = std::chrono::system_clock::now() -
                                std::chrono::duration_cast<std::chrono::system_clock::duration>(
@@ -353,6 +353,7 @@ void Runner::move_on(const LibraryProcess::Event &event)
     }
     active.moved_on = true;
     active.moved_on_at = on_run_clock(event.time);
+    active.told = true;
     read_reports(event.kind == LibraryProcess::Event::Kind::returned ? host_.read_back()
                                                                      : whole_stored_plan());
     if (!gathers(active) || !active.gatherer_end.empty()) {
@@ -378,11 +379,15 @@ void Runner::finish(RunningItem &active, TimePoint end)
     if (gathers(active) && active_.size() == 1 && !active.stop && next_ >= job_.targets.size()) {
         result.left_running = note_left_running(active.target.element);
     }
-    if (gathers(active) && !(result.report.progress == "100" && result.report.result)) {
+    if (gathers(active)) {
+        note_gathered(result.report);
+        gathered_in_ = run_.round;
+    }
+    if (gathers(active) && !(result.report.progress == "100" && has_result(result.report))) {
         gatherer_may_report_late_ = true;
         signal_each(host_.processes().of_gatherer(), SIGTERM);
     }
-    judged_.push_back({active.place, active.target, std::move(active.seen)});
+    judged_.push_back({active.place, active.target, run_.round, std::move(active.seen)});
     judged_.back().seen.push_back(result.report);
     mend_stored_plan();
 }
@@ -470,6 +475,9 @@ std::string Runner::why_silent(const RunningItem &active)
                                  "perhaps the gatherer: let it report by a new process each time"
                                : "a process with an old copy of the plan has written it over, and "
                                  "nothing was reported after that";
+    }
+    if (active.in_another_plan) {
+        return "the stored plan is another one by now: a process that knows that one has saved it";
     }
     if (active.undone) {
         return "a process with an old copy of the plan has written over what it had reported";

@@ -47,6 +47,9 @@ class Runner
     Runner(LibraryProcess &host, Signals &signals, Run &run,
            const std::vector<Listener *> &listeners, const Limits &limits);
 
+    // The stored plan before the run: a gatherer may have kept a copy of it.
+    void note_earlier_plan(const std::string &text);
+
     // Runs one job after another and fills in the run. False where the run has
     // come to its end: the run then says why.
     bool run(const Job &job);
@@ -94,6 +97,9 @@ class Runner
         bool overwritten = false; // by an old copy of the plan, and not reported since
         bool report_lost = false; // with the stored plan
         bool undone = false;      // its result was there, and is not any more
+        bool in_another_plan = false;
+        bool told = false;       // the gatherer, to gather
+        bool keeps_copy = false; // of the plan: what it reports has no mark
         TimePoint stop_wanted_at;
         TimePoint stop_tried_at;
         TimePoint gatherer_looked_for;
@@ -112,6 +118,7 @@ class Runner
     struct Judged {
         Place place;
         Job::Target target;
+        int round = 0;
         std::vector<ItemReport> seen; // an old copy of the plan may bring one of them back
     };
 
@@ -131,9 +138,12 @@ class Runner
     void read_reports(const std::string &text);
     void read_report(RunningItem &active, const Plan &plan);
     void read_late_report(Judged &judged, const Plan &plan);
-    bool is_older(const RunningItem &active, const Plan &plan, const ItemReport &report);
+    bool is_older(RunningItem &active, const Plan &plan, const ItemReport &report);
     void mark_again();
-    void clear_early_report(const RunningItem &active);
+    void begin_gathering();
+    void tell_late(const Place &place, int round, const ItemReport &report);
+    void note_gathered(const ItemReport &report);
+    bool was_gathered(const ItemReport &report) const;
     static void clear_and_mark(const std::vector<std::size_t> &numbers, const std::string &mark);
     void poll_gatherer(RunningItem &active);
     void read_signals();
@@ -172,7 +182,8 @@ class Runner
     std::size_t next_ = 0; // of its targets
     std::deque<RunningItem> active_;
     std::vector<Judged> judged_;             // of this round, and gatherers
-    ItemReport gathered_before_;             // what the plan said when the job began
+    std::vector<ItemReport> gathered_;       // what an old copy may say of the gatherer
+    int gathered_in_ = 0;                    // the round of the last gathering
     bool marks_are_gone_ = false;            // from items' elements
     std::vector<Leftover> left_;             // by items of this round
     std::vector<std::size_t> left_elements_; // the items' elements

@@ -79,7 +79,7 @@ void Runner::poll_reports()
     for (RunningItem &active : active_) {
         poll_gatherer(active);
         const ItemReport &report = item(active.place).report;
-        const bool has_ended = report.progress == "100" && report.result;
+        const bool has_ended = report.progress == "100" && has_result(report);
         if (active.moved_on && !active.done &&
             (has_ended || !active.gatherer_end.empty() ||
              (!limits_.item && now() - active.moved_on_at > kForGathering))) {
@@ -127,14 +127,20 @@ void Runner::read_reports(const std::string &text)
 
 // What a process with an old copy of the plan says of items is older than they are. A
 // gatherer's own copy is always old: what is new in it is what it has to report.
-bool Runner::is_older(const RunningItem &active, const Plan &plan, const ItemReport &report)
+bool Runner::is_older(RunningItem &active, const Plan &plan, const ItemReport &report)
 {
     if (bears_mark(plan, active.target)) {
         return false;
     }
     marks_are_gone_ = true;
-    return !gathers(active) || !has_result(report) ||
-           as_made_loadable(gathered_before_) == as_made_loadable(report);
+    if (!gathers(active) || !has_result(report)) {
+        return true;
+    }
+    if (gathered_.empty()) { // it may say anything
+        note_gathered(report);
+    }
+    active.keeps_copy = active.keeps_copy || !was_gathered(report);
+    return !active.keeps_copy;
 }
 
 // So that what is reported from now on counts again. What is there is cleared.
@@ -159,22 +165,61 @@ void Runner::mark_again()
     }
 }
 
-// A gatherer goes on after its end, so that what is there when it is told to gather is of
-// an earlier time.
-void Runner::clear_early_report(const RunningItem &active)
+// The gatherer is about to be told: what is there is of an earlier gathering.
+void Runner::begin_gathering()
 {
-    const auto plan = Plan::parse_annotated(whole_stored_plan());
-    if (!plan || !is_item(*plan, active.target.element, item(active.place).name)) {
-        return;
+    if (!active_.empty() && gathers(active_.back())) {
+        RunningItem &active = active_.back();
+        active.told = true;
+        const std::size_t number = active.target.element;
+        const auto plan = Plan::parse_annotated(whole_stored_plan());
+        if (plan && is_item(*plan, number, item(active.place).name) &&
+            has_result(plan->report(number))) {
+            const ItemReport report = plan->report(number);
+            if (!was_gathered(report)) {
+                tell_late(active.place, gathered_in_ != 0 ? gathered_in_ : run_.round, report);
+            }
+            clear_and_mark({number}, active.target.mark);
+        }
     }
-    const ItemReport report = plan->report(active.target.element);
-    if (!has_result(report)) {
-        return;
-    }
+    host_.go_on();
+}
+
+// As of the round of its item.
+void Runner::tell_late(const Place &place, int round, const ItemReport &report)
+{
+    const int now = std::exchange(run_.round, round);
     for (Listener *listener : listeners_) {
-        listener->late(run_, active.place, report);
+        listener->late(run_, place, report);
     }
-    clear_and_mark({active.target.element}, active.target.mark);
+    run_.round = now;
+    if (is_gatherer(item(place).name, vendor_)) {
+        note_gathered(report);
+    }
+}
+
+void Runner::note_earlier_plan(const std::string &text)
+{
+    const auto plan = Plan::parse_annotated(text);
+    for (std::size_t number = 0; plan && number < plan->elements().size(); ++number) {
+        const char *name = mxmlElementGetAttr(plan->elements()[number], "name");
+        if (name != nullptr && is_gatherer(name, vendor_)) {
+            note_gathered(plan->report(number));
+        }
+    }
+}
+
+void Runner::note_gathered(const ItemReport &report)
+{
+    if (has_result(report)) {
+        std::erase(gathered_, as_made_loadable(report));
+        gathered_.push_back(as_made_loadable(report));
+    }
+}
+
+bool Runner::was_gathered(const ItemReport &report) const
+{
+    return std::ranges::find(gathered_, as_made_loadable(report)) != gathered_.end();
 }
 
 void Runner::clear_and_mark(const std::vector<std::size_t> &numbers, const std::string &mark)
@@ -192,7 +237,8 @@ void Runner::clear_and_mark(const std::vector<std::size_t> &numbers, const std::
 void Runner::read_report(RunningItem &active, const Plan &plan)
 {
     const std::size_t number = active.target.element;
-    if (active.done || !is_item(plan, number, item(active.place).name)) {
+    active.in_another_plan = !is_item(plan, number, item(active.place).name);
+    if (active.done || active.in_another_plan || (gathers(active) && !active.told)) {
         return;
     }
     ItemRun &result = item(active.place);
@@ -223,7 +269,7 @@ void Runner::read_report(RunningItem &active, const Plan &plan)
 void Runner::read_late_report(Judged &judged, const Plan &plan)
 {
     const std::size_t number = judged.target.element;
-    if (!is_item(plan, number, item(judged.place).name) || !bears_mark(plan, judged.target)) {
+    if (!is_item(plan, number, item(judged.place).name)) {
         return;
     }
     const auto is_same = [&](const RunningItem &active) {
@@ -234,6 +280,10 @@ void Runner::read_late_report(Judged &judged, const Plan &plan)
         return;
     }
     const ItemReport report = plan.report(number);
+    const bool keeps_copy = is_gatherer(item(judged.place).name, vendor_) && !was_gathered(report);
+    if (!bears_mark(plan, judged.target) && !keeps_copy) {
+        return;
+    }
     const auto is_report = [&](const ItemReport &one) {
         return as_made_loadable(one) == as_made_loadable(report);
     };
@@ -241,9 +291,7 @@ void Runner::read_late_report(Judged &judged, const Plan &plan)
         return;
     }
     judged.seen.push_back(report);
-    for (Listener *listener : listeners_) {
-        listener->late(run_, judged.place, report);
-    }
+    tell_late(judged.place, judged.round, report);
 }
 
 } // namespace fptest

@@ -313,7 +313,7 @@ void Runner::make_way_for(const Job &job)
     const auto gatherer = std::ranges::find_if(job.targets, is_gatherers);
     if (gatherer != job.targets.end()) {
         if (const auto plan = Plan::parse_annotated(read_stored_plan().value_or(""))) {
-            gathered_before_ = plan->report((*gatherer)->element);
+            note_gathered(plan->report((*gatherer)->element));
         }
         // the library does not find one that is a script, and would start another beside it
         const std::vector<Leftover> running = host_.processes().of_gatherer();
@@ -338,7 +338,8 @@ void Runner::end_round()
         end_gatherer();
     }
     poll_reports();
-    // the gatherer goes on
+    // the gatherer goes on: its copy of the plan has its last report
+    gathered_.erase(gathered_.begin(), gathered_.end() - (gathered_.empty() ? 0 : 1));
     std::erase_if(judged_,
                   [&](const Judged &one) { return !is_gatherer(item(one.place).name, vendor_); });
 }

@@ -460,11 +460,12 @@ TEST_F(RoundReports, TellALateReportOnALineOfItsOwn)
 
 TEST_F(RoundReports, TellWhatIsKnownOfALateReport)
 {
-    const ItemRun one = suite("G", {passed("a")}).items.at(0);
-    EXPECT_EQ(late_report(one, {"50", std::nullopt, false, std::nullopt}),
+    RunOfItems run = two_items(1);
+    EXPECT_EQ(late_report(run, {0, 0}, {"50", std::nullopt, false, std::nullopt}),
               "G/a: late report, progress 50; it changes nothing");
-    EXPECT_EQ(late_report(one, {"50", std::nullopt, true, std::nullopt}),
-              "G/a: late report, result ?; it changes nothing");
+    run.rounds = 2;
+    EXPECT_EQ(late_report(run, {0, 0}, {"50", std::nullopt, true, std::nullopt}),
+              "G/a (round 1): late report, result ?; it changes nothing");
 }
 
 // --- views ------------------------------------------------------------------------

@@ -219,6 +219,85 @@ TEST_F(RunGatherer, HasNoReportOfAnEarlierGatheringTakenForItsOwn)
     }
 }
 
+TEST_F(RunGatherer, HasNoResultFromWhatItsCopyOfThePlanSaysOfAnEarlierRun)
+{
+    support::Process gatherer(gatherer_that_does(
+        {"gather",      "report-here", "G",           "SensorProbe", "100",         "0",
+         "one",         "gather",      "report-here", "G",           "Item",        "0",
+         "-2",          "by it",       "sleep",       "0.2",         "report-here", "G",
+         "SensorProbe", "100",         "1",           "two",         "sleep",       "60"}));
+    wait_for_gatherer();
+    const Items items = {{"SensorProbe", ""}, {"Item", kPasses}};
+    run_group(items);
+    EXPECT_THAT(outcomes(), ElementsAre("SensorProbe: passed", "Item: passed"));
+    run_group(items);
+    EXPECT_THAT(outcomes(), ElementsAre("SensorProbe: failed", "Item: passed"));
+    signal_gatherer(SIGKILL);
+    gatherer.wait();
+}
+
+TEST_F(RunGatherer, HasNoReportCountedThatItMakesBeforeItIsTold)
+{
+    for (const std::string way : {"--quiet", "--as-group"}) {
+        SCOPED_TRACE(way);
+        support::Process gatherer(
+            gatherer_that_does({"gather", "report", "G",   "100", "0",   "one",         "sleep",
+                                "0.5",    "report", "G",   "100", "0",   "one, stored", "gather",
+                                "report", "G",      "100", "1",   "two", "sleep",       "60"}));
+        wait_for_gatherer();
+        run_group({{"SensorProbe", ""}}, {way, "--repeat", "2"});
+        EXPECT_THAT(outcomes(), ElementsAre("SensorProbe: passed", "SensorProbe: failed"));
+        ASSERT_THAT(events("late"), SizeIs(1));
+        EXPECT_EQ(events("late")[0].at("description"), "one, stored");
+        EXPECT_EQ(events("late")[0].at("round"), 1);
+        signal_gatherer(SIGKILL);
+        gatherer.wait();
+    }
+}
+
+TEST_F(RunGatherer, LosesNoReportThatComesAtOnce)
+{
+    constexpr int kTimes = 40;
+    Lines words;
+    for (int time = 0; time < kTimes; ++time) {
+        words.insert(words.end(), {"gather", "report", "G", "100", "0", "at once"});
+    }
+    support::Process gatherer(gatherer_that_does(words));
+    wait_for_gatherer();
+    EXPECT_EQ(run_group({{"SensorProbe", ""}}, {"--repeat", std::to_string(kTimes)}).status, 0);
+    EXPECT_THAT(events("late"), IsEmpty());
+    gatherer.wait();
+}
+
+TEST_F(RunGatherer, IsWaitedForNoLongerOnceItHasReportedAResultThatThePlanHasNoTextFor)
+{
+    support::Process gatherer(
+        gatherer_that_does({"gather", "report", "G", "100", "7", "seven", "sleep", "60"}));
+    wait_for_gatherer();
+    const Ended ended = run_group({{"SensorProbe", ""}});
+    EXPECT_THAT(outcomes(), ElementsAre("SensorProbe: failed"));
+    EXPECT_LT(ended.seconds, 8);
+    signal_gatherer(SIGKILL);
+    gatherer.wait();
+}
+
+TEST_F(RunGatherer, HasTheLateReportsShownOfEachRound)
+{
+    support::Process gatherer(gatherer_that_does(
+        {"gather",      "report-here", "G",           "SensorProbe", "100",         "0",
+         "one",         "gather",      "report-here", "G",           "SensorProbe", "100",
+         "0",           "two",         "sleep",       "0.3",         "report-here", "G",
+         "SensorProbe", "100",         "1",           "two, later",  "sleep",       "60"}));
+    wait_for_gatherer();
+    run_group({{"SensorProbe", ""}, {"Item", "sleep 0.8 report G 100 0 fine"}}, {"--repeat", "2"});
+    EXPECT_THAT(outcomes(), Each(EndsWith(": passed")));
+    ASSERT_THAT(events("late"), SizeIs(1));
+    EXPECT_EQ(events("late")[0].at("description"), "two, later");
+    EXPECT_EQ(events("late")[0].at("round"), 2);
+    signal_gatherer(SIGKILL);
+    gatherer.wait();
+}
+
 TEST_F(RunGatherer, IsInterruptedWhileItWaitsForIt)
 {
     FptestProcess fptest(with_group(kGathererThatNeverComes));

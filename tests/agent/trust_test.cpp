@@ -104,6 +104,14 @@ TEST_F(Trust, TakesNoResultOfAnEarlierRunThoughThePlanIsGivenAnew)
                 StartsWith("a process with an old copy of the plan has written it over"));
 }
 
+TEST_F(Trust, TellsThatAnotherPlanHasBeenStoredMeanwhile)
+{
+    file("other", device::plan_of({{"Q", {{"Other", ""}}}}));
+    run_group({{"Script", "'cat /tmp/scene/other >/data/vorlane/src1.xml; sleep 0.2'"}});
+    EXPECT_EQ(of_end(0, "reason"), "the stored plan is another one by now: a process that knows "
+                                   "that one has saved it");
+}
+
 TEST_F(Trust, TellsAReportThatIsWrittenOverFromNone)
 {
     run_group(
