@@ -413,23 +413,14 @@ TEST(Message, SetsTheCaretUnderTheCharacter)
     // of two columns, and of none
     EXPECT_EQ(shown("\u65E5\u65E5/", 6), "f:1:3: warning: t\n\u65E5\u65E5/\n    ^\n");
     EXPECT_EQ(shown("e\u0301/", 3), "f:1:3: warning: t\ne\u0301/\n ^\n");
-}
-
-TEST(Message, SetsTheCaretUnderAByteThatIsNoUtf8)
-{
+    // under each byte that is no UTF-8
     EXPECT_EQ(shown("a\x80\x80\x80\x80/", 4),
               "f:1:5: warning: t\na\uFFFD\uFFFD\uFFFD\uFFFD/\n    ^\n");
     EXPECT_EQ(shown("\xE2\x82/", 1), "f:1:2: warning: t\n\uFFFD\uFFFD/\n ^\n");
-}
-
-TEST(Message, DoesNotShowAByteOrderMark)
-{
+    // a byte order mark is not shown
     EXPECT_EQ(shown("\xEF\xBB\xBF<a>", 4), "f:1:2: warning: t\n<a>\n ^\n");
     EXPECT_EQ(shown("\xEF\xBB\xBF<a>", 0), "f:1:1: warning: t\n<a>\n^\n");
-}
-
-TEST(Message, OfThePlaceAfterTheEnd)
-{
+    // after the end
     EXPECT_EQ(shown("ab\n", 3), "f:2:1: warning: t\n\n^\n");
     EXPECT_EQ(shown("ab", 2), "f:1:3: warning: t\nab\n  ^\n");
     EXPECT_EQ(shown("ab", 99), "f:1:3: warning: t\nab\n  ^\n");

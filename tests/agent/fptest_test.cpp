@@ -307,14 +307,14 @@ TEST_F(Fptest, ChecksSeveralFilesAndStandardInput)
     const std::string sound = file("sound.xml", plan_of({{"G", {{"Item", ""}}}}));
     const std::string broken = file("broken.xml", "<P><CmdGroup></P>");
     EXPECT_EQ(run_fptest({"check", sound, sound}).status, 0);
-    Ended ended = run_fptest({"check", broken, sound, "-"}, "<P/>");
+    const Ended ended = run_fptest({"check", broken, "-", sound}, "<P/>");
     EXPECT_EQ(ended.status, 1);
     Lines summaries = lines_of(ended.out);
     std::erase_if(summaries,
                   [](const std::string &line) { return line.find("warning") == line.npos; });
     EXPECT_THAT(summaries, ElementsAre(StartsWith("/tmp/scene/broken.xml: 1 error, 0 warnings ("),
-                                       StartsWith("/tmp/scene/sound.xml: 0 errors, 0 warnings ("),
-                                       StartsWith("<stdin>: 1 error, 0 warnings (")));
+                                       StartsWith("<stdin>: 1 error, 0 warnings ("),
+                                       StartsWith("/tmp/scene/sound.xml: 0 errors, 0 warnings (")));
     EXPECT_EQ(run_fptest({"check", "-"}, plan_of({{"G", {{"Item", ""}}}})).status, 0);
 }
 

@@ -167,19 +167,11 @@ TEST(ScannedAttributes, MayLackTheirValue)
     EXPECT_THAT(attributes("<Cmd result/>"), ElementsAre("result|result"));
 }
 
-TEST(ScannedAttributes, MayHaveAValueWithoutQuotes)
+TEST(ScannedAttributes, MayHaveQuotesElsewhereOrNone)
 {
     EXPECT_THAT(attributes("<a b=c d= e/>"), ElementsAre("b|b=c|c", "d|d= e|e"));
     EXPECT_THAT(attributes("<a b==c>"), ElementsAre("b|b==c|=c"));
-}
-
-TEST(ScannedAttributes, MayHaveAQuotedName)
-{
     EXPECT_THAT(attributes("<a 'b c'=\"d\" \"e>"), ElementsAre("'b c'|'b c'=\"d\"|d", "\"e>|\"e>"));
-}
-
-TEST(ScannedAttributes, GoToTheEndWhereTheirQuoteIsMissing)
-{
     EXPECT_THAT(attributes("<a b=\"c d='e'/>"), ElementsAre("b|b=\"c d='e'/>|c d='e'/>"));
     EXPECT_THAT(attributes("<a b="), ElementsAre("b|b=|"));
 }
@@ -229,27 +221,17 @@ TEST(Scan, CoversWhateverItIsGiven)
 
 // --- positions ------------------------------------------------------------------
 
-TEST(PositionInText, CountsLinesAndColumnsFromOne)
+TEST(PositionInText, CountsLinesAndCharactersFromOne)
 {
     EXPECT_EQ(places(""), "1:1 1:1");
     EXPECT_EQ(places("abc"), "1:1 1:2 1:3 1:4 1:4");
     EXPECT_EQ(places("a\nbc\n\nd"), "1:1 1:2 2:1 2:2 2:3 3:1 4:1 4:2 4:2");
     EXPECT_EQ(places("a\n"), "1:1 1:2 2:1 2:1");
-}
-
-TEST(PositionInText, IsThatOfTheCharacterThatItStandsIn)
-{
     EXPECT_EQ(places("\u00E9\u20AC\U0001F600x"), "1:1 1:1 1:2 1:2 1:2 1:3 1:3 1:3 1:3 1:4 1:5 1:5");
-}
-
-TEST(PositionInText, CountsBytesThatAreNoUtf8OneByOne)
-{
+    // bytes that are no UTF-8, one by one
     EXPECT_EQ(places("\xFF\xA9\xC3x\xE2\x82"), "1:1 1:2 1:3 1:4 1:5 1:6 1:7 1:7");
     EXPECT_EQ(places("\xC1\x80\xC2\x80"), "1:1 1:2 1:3 1:3 1:4 1:4");
-}
-
-TEST(PositionInText, DoesNotCountAByteOrderMark)
-{
+    // no byte order mark at the beginning
     EXPECT_EQ(places("\uFEFF<\n\uFEFFx"), "1:1 1:1 1:1 1:1 1:2 2:1 2:1 2:1 2:2 2:3 2:3");
 }
 

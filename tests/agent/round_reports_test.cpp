@@ -546,6 +546,9 @@ TEST_F(RoundReports, CutALineOfOutputThatIsTooLong)
     loud.output = std::string(60'000, 'x') + "\nshort\n";
     const std::string text = plain(run_of({suite("G", {loud})}), play_one);
     EXPECT_THAT(text, HasSubstr("\n    | " + std::string(197, 'x') + "...\n    | short\n"));
+    const std::string ten = "1\n2\n3\n4\n5\n6\n7\n8\n9\n10\n";
+    EXPECT_THAT(last_lines(ten), SizeIs(10));
+    EXPECT_EQ(last_lines("0\n" + ten).at(0), "(1 line before)");
 }
 
 } // namespace

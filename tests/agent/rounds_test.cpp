@@ -81,6 +81,11 @@ TEST_F(Rounds, EndAfterTheirNumberWhereNothingFails)
     EXPECT_THAT(ended.out, StartsWith("/tmp/scene/plan.xml: 1 item, vendor 0, at most 2 rounds "
                                       "until an item fails\n"));
     EXPECT_THAT(without_times(ended.out), HasSubstr("\n2 passed, 0 failed, T s\n"));
+    // one that reports nothing has failed as well
+    const std::string silent =
+        "<P><CmdGroup name=\"G\"><Cmd name=\"Item\" args=\"\"/></CmdGroup></P>";
+    EXPECT_THAT(run_fptest({"run", "--until-fail", "--plan", plan(silent), "P/G"}).out,
+                HasSubstr("\nended: G/Item"));
 }
 
 TEST_F(Rounds, BeginNoneOnceTheTimeIsOverAndCompleteTheOneThatRuns)
@@ -116,7 +121,7 @@ TEST_F(Rounds, EndAfterTheirNumberWhereThatComesBeforeTheTime)
 
 TEST_F(Rounds, TakeNoTimeThatIsNone)
 {
-    for (const std::string wrong : {"0", "-1", "x", "1w", "1 h", "h", "nan", "0.0001"}) {
+    for (const std::string wrong : {"0", "-1", "x", "1w", "10mm", "1 h", "h", "nan", "0.0001"}) {
         expect_refusal(2,
                        "fptest: --for: '" + wrong +
                            "' is no time as 90, 90s, 10m, 2h or 1d; see fptest run --help",

@@ -19,6 +19,19 @@ constexpr char kProbe[] = "/system/bin/SensorProbe";
 const Items kGathererThatNeverComes = {{"SensorProbe", "--help; exec sleep 30"},
                                        {"Other", kPasses}};
 
+// One of the test's own that is running already, until it goes out of scope.
+struct Gatherer : support::Process {
+    explicit Gatherer(const Lines &words)
+        : Process([&words] {
+              support::Start start{.arguments = words, .program = "/system/bin/Item"};
+              start.arguments.insert(start.arguments.begin(), kProbe);
+              return start;
+          }())
+    {
+        EXPECT_TRUE(eventually([] { return !processes_named(kProbe).empty(); }));
+    }
+};
+
 class RunGatherer : public Run
 {
   protected:
@@ -26,17 +39,6 @@ class RunGatherer : public Run
     {
         const Lines all = device::listeners();
         return std::ranges::find(all, "00000000:8888") != all.end();
-    }
-    // One of the test's own that is running already.
-    static support::Start gatherer_that_does(const Lines &words)
-    {
-        support::Start start{.arguments = {kProbe}, .program = "/system/bin/Item"};
-        start.arguments.insert(start.arguments.end(), words.begin(), words.end());
-        return start;
-    }
-    static void wait_for_gatherer()
-    {
-        ASSERT_TRUE(eventually([] { return !processes_named(kProbe).empty(); }));
     }
     static void signal_gatherer(int number)
     {
@@ -134,10 +136,8 @@ TEST_F(RunGatherer, GoesOnWhereARunningOneHangs)
 
 TEST_F(RunGatherer, TakesNoStepOfItForItsEnd)
 {
-    support::Process gatherer(
-        gatherer_that_does({"gather", "report", "G", "50", "0", "half", "note", work("half"),
-                            "await", work("go"), "report", "G", "100", "1", "whole"}));
-    wait_for_gatherer();
+    const Gatherer gatherer({"gather", "report", "G", "50", "0", "half", "note", work("half"),
+                             "await", work("go"), "report", "G", "100", "1", "whole"});
     FptestProcess fptest(with_group({{"SensorProbe", ""}, {"Item", "note /tmp/scene/next"}}));
     ASSERT_TRUE(wait_for_events("progress", 1));
     EXPECT_THAT(events("end"), IsEmpty());
@@ -145,7 +145,6 @@ TEST_F(RunGatherer, TakesNoStepOfItForItsEnd)
     EXPECT_EQ(fptest.wait().status, 1);
     EXPECT_THAT(outcomes(), ElementsAre("SensorProbe: failed", "Item: no result"));
     EXPECT_EQ(description(0), "whole");
-    gatherer.wait(); // a stop would take what is left of it for an item
 }
 
 TEST_F(RunGatherer, WaitsOnlySoLongForItsReport)
@@ -160,14 +159,11 @@ TEST_F(RunGatherer, WaitsOnlySoLongForItsReport)
 
 TEST_F(RunGatherer, FailsWhereItIsNotDoneInTimeWhateverItHasReported)
 {
-    support::Process gatherer(
-        gatherer_that_does({"gather", "report", "G", "50", "0", "half", "sleep", "60"}));
-    wait_for_gatherer();
+    const Gatherer gatherer({"gather", "report", "G", "50", "0", "half", "sleep", "60"});
     EXPECT_EQ(run_group({{"SensorProbe", ""}}).status, 1);
     EXPECT_THAT(outcomes(), ElementsAre("SensorProbe: failed"));
     EXPECT_EQ(reasons().at(0),
               "the gatherer was at progress 50 after 10.0 s, though it reported the result 0");
-    gatherer.wait();
 }
 
 TEST_F(RunGatherer, MayReportFromACopyOfThePlanThatItKeeps)
@@ -180,14 +176,11 @@ TEST_F(RunGatherer, MayReportFromACopyOfThePlanThatItKeeps)
                          {"gather", "report-here", "G", "SensorProbe", "100", "0", text});
         }
         words.insert(words.end(), {"sleep", "60"});
-        support::Process gatherer(gatherer_that_does(words));
-        wait_for_gatherer();
+        const Gatherer gatherer(words);
         run_group({{"SensorProbe", ""}, {"Item", "sleep 0.3 report G 100 0 fine"}},
                   {way, "--repeat", "3"});
         EXPECT_THAT(outcomes(), Each(EndsWith(": passed")));
         EXPECT_THAT(outcomes(), SizeIs(6));
-        signal_gatherer(SIGKILL);
-        gatherer.wait();
     }
 }
 
@@ -195,12 +188,11 @@ TEST_F(RunGatherer, HasNoReportOfAnEarlierGatheringTakenForItsOwn)
 {
     for (const std::string way : {"--quiet", "--as-group"}) {
         SCOPED_TRACE(way);
-        support::Process gatherer(gatherer_that_does(
+        const Gatherer gatherer(
             {"gather",       "report", "G",      "100", "0",   "one",         "await",
              work("second"), "report", "G",      "100", "0",   "one, stored", "note",
              work("stored"), "gather", "report", "G",   "100", "1",           "two",
-             "sleep",        "60"}));
-        wait_for_gatherer();
+             "sleep",        "60"});
         run_group({{"Script", script("if test -e /tmp/scene/first; then touch /tmp/scene/second; "
                                      "while ! test -e /tmp/scene/stored; do sleep 0.02; done; fi; "
                                      "touch /tmp/scene/first; " +
@@ -211,8 +203,6 @@ TEST_F(RunGatherer, HasNoReportOfAnEarlierGatheringTakenForItsOwn)
                                             "Script: passed", "SensorProbe: failed"));
         ASSERT_THAT(events("late"), SizeIs(1));
         EXPECT_EQ(events("late")[0].at("description"), "one, stored");
-        signal_gatherer(SIGKILL);
-        gatherer.wait();
         for (const char *name : {"first", "second", "stored"}) {
             unlink(work(name).c_str());
         }
@@ -221,81 +211,53 @@ TEST_F(RunGatherer, HasNoReportOfAnEarlierGatheringTakenForItsOwn)
 
 TEST_F(RunGatherer, HasNoResultFromWhatItsCopyOfThePlanSaysOfAnEarlierRun)
 {
-    support::Process gatherer(gatherer_that_does(
-        {"gather",      "report-here", "G",           "SensorProbe", "100",         "0",
-         "one",         "gather",      "report-here", "G",           "Item",        "0",
-         "-2",          "by it",       "sleep",       "0.2",         "report-here", "G",
-         "SensorProbe", "100",         "1",           "two",         "sleep",       "60"}));
-    wait_for_gatherer();
+    const Gatherer gatherer({"gather", "report-here", "G",      "SensorProbe", "100",
+                             "0",      "one",         "gather", "report-here", "G",
+                             "Item",   "0",           "-2",     "by it",       "sleep",
+                             "0.2",    "report-here", "G",      "SensorProbe", "100",
+                             "1",      "two",         "sleep",  "60"});
     const Items items = {{"SensorProbe", ""}, {"Item", kPasses}};
     run_group(items);
     EXPECT_THAT(outcomes(), ElementsAre("SensorProbe: passed", "Item: passed"));
     run_group(items);
     EXPECT_THAT(outcomes(), ElementsAre("SensorProbe: failed", "Item: passed"));
-    signal_gatherer(SIGKILL);
-    gatherer.wait();
 }
 
 TEST_F(RunGatherer, HasNoReportCountedThatItMakesBeforeItIsTold)
 {
     for (const std::string way : {"--quiet", "--as-group"}) {
         SCOPED_TRACE(way);
-        support::Process gatherer(
-            gatherer_that_does({"gather", "report", "G",   "100", "0",   "one",         "sleep",
-                                "0.5",    "report", "G",   "100", "0",   "one, stored", "gather",
-                                "report", "G",      "100", "1",   "two", "sleep",       "60"}));
-        wait_for_gatherer();
+        const Gatherer gatherer({"gather", "report", "G",   "100", "0",   "one",         "sleep",
+                                 "0.5",    "report", "G",   "100", "0",   "one, stored", "gather",
+                                 "report", "G",      "100", "1",   "two", "sleep",       "60"});
         run_group({{"SensorProbe", ""}}, {way, "--repeat", "2"});
         EXPECT_THAT(outcomes(), ElementsAre("SensorProbe: passed", "SensorProbe: failed"));
         ASSERT_THAT(events("late"), SizeIs(1));
         EXPECT_EQ(events("late")[0].at("description"), "one, stored");
         EXPECT_EQ(events("late")[0].at("round"), 1);
-        signal_gatherer(SIGKILL);
-        gatherer.wait();
     }
-}
-
-TEST_F(RunGatherer, LosesNoReportThatComesAtOnce)
-{
-    constexpr int kTimes = 40;
-    Lines words;
-    for (int time = 0; time < kTimes; ++time) {
-        words.insert(words.end(), {"gather", "report", "G", "100", "0", "at once"});
-    }
-    support::Process gatherer(gatherer_that_does(words));
-    wait_for_gatherer();
-    EXPECT_EQ(run_group({{"SensorProbe", ""}}, {"--repeat", std::to_string(kTimes)}).status, 0);
-    EXPECT_THAT(events("late"), IsEmpty());
-    gatherer.wait();
 }
 
 TEST_F(RunGatherer, IsWaitedForNoLongerOnceItHasReportedAResultThatThePlanHasNoTextFor)
 {
-    support::Process gatherer(
-        gatherer_that_does({"gather", "report", "G", "100", "7", "seven", "sleep", "60"}));
-    wait_for_gatherer();
+    const Gatherer gatherer({"gather", "report", "G", "100", "7", "seven", "sleep", "60"});
     const Ended ended = run_group({{"SensorProbe", ""}});
     EXPECT_THAT(outcomes(), ElementsAre("SensorProbe: failed"));
     EXPECT_LT(ended.seconds, 8);
-    signal_gatherer(SIGKILL);
-    gatherer.wait();
 }
 
 TEST_F(RunGatherer, HasTheLateReportsShownOfEachRound)
 {
-    support::Process gatherer(gatherer_that_does(
-        {"gather",      "report-here", "G",           "SensorProbe", "100",         "0",
-         "one",         "gather",      "report-here", "G",           "SensorProbe", "100",
-         "0",           "two",         "sleep",       "0.3",         "report-here", "G",
-         "SensorProbe", "100",         "1",           "two, later",  "sleep",       "60"}));
-    wait_for_gatherer();
+    const Gatherer gatherer({"gather",      "report-here", "G",      "SensorProbe", "100",
+                             "0",           "one",         "gather", "report-here", "G",
+                             "SensorProbe", "100",         "0",      "two",         "sleep",
+                             "0.3",         "report-here", "G",      "SensorProbe", "100",
+                             "1",           "two, later",  "sleep",  "60"});
     run_group({{"SensorProbe", ""}, {"Item", "sleep 0.8 report G 100 0 fine"}}, {"--repeat", "2"});
     EXPECT_THAT(outcomes(), Each(EndsWith(": passed")));
     ASSERT_THAT(events("late"), SizeIs(1));
     EXPECT_EQ(events("late")[0].at("description"), "two, later");
     EXPECT_EQ(events("late")[0].at("round"), 2);
-    signal_gatherer(SIGKILL);
-    gatherer.wait();
 }
 
 TEST_F(RunGatherer, IsInterruptedWhileItWaitsForIt)

@@ -74,18 +74,6 @@ TEST_F(ItemRun, GroupOfFortyItemsRunsThemAll)
     EXPECT_EQ(ran(), expected);
 }
 
-TEST_F(ItemRun, CommentInAGroupIsOneMoreRunThatFindsNothing)
-{
-    store("<P><CmdGroup name=\"G\"><!-- c --><Cmd name=\"Note\" args=\"1\"/>"
-          "<Cmd name=\"Note\" args=\"2\"/></CmdGroup></P>");
-    log_lines();
-    run_path("P/G");
-
-    // the first Cmd is position 0 for the run, and there is none at position 2
-    EXPECT_THAT(ran(), ElementsAre("/system/bin/Note|1", "/system/bin/Note|2"));
-    EXPECT_THAT(log_lines(), ::testing::Contains("SingleItemExecute| get node by Index fail!"));
-}
-
 TEST_F(ItemRun, ProgramThatIsMissingIsNoReasonToStop)
 {
     store(plan_of({{"G", {{"NoSuchProgram", ""}, {"Note", "after"}}}}));
@@ -94,9 +82,8 @@ TEST_F(ItemRun, ProgramThatIsMissingIsNoReasonToStop)
 
     EXPECT_THAT(ran(), ElementsAre("/system/bin/Note|after"));
     EXPECT_THAT(log_lines(),
-                ::testing::IsSupersetOf({"SingleItemExecute| tpCmd:/system/bin/NoSuchProgram ",
-                                         "SingleItemExecute| leave... !",
-                                         "SingleItemExecute| leave... !"}));
+                IsSupersetOf({"SingleItemExecute| tpCmd:/system/bin/NoSuchProgram ",
+                              "SingleItemExecute| leave... !", "SingleItemExecute| leave... !"}));
 }
 
 TEST_F(ItemRun, ShellRefusesAnItemWithoutArguments)
@@ -104,34 +91,26 @@ TEST_F(ItemRun, ShellRefusesAnItemWithoutArguments)
     store("<P><CmdGroup name=\"G\"><Cmd name=\"Note\"/><Cmd name=\"Note\" args=\"\"/>"
           "</CmdGroup></P>");
     log_lines();
-    ::testing::internal::CaptureStderr();
+    testing::internal::CaptureStderr();
     run_path("P/G");
 
-    EXPECT_THAT(::testing::internal::GetCapturedStderr(), HasSubstr("syntax error"));
+    EXPECT_THAT(testing::internal::GetCapturedStderr(), HasSubstr("syntax error"));
     EXPECT_THAT(ran(), ElementsAre("/system/bin/Note"));
-    EXPECT_THAT(log_lines(), ::testing::IsSupersetOf(
-                                 {"SingleItemExecute| mxmlElementGetAttr name=Note- args=(null)",
-                                  "SingleItemExecute| tpCmd:/system/bin/Note (null)"}));
-}
-
-TEST_F(ItemRun, NameIsCutAtItsFirstTab)
-{
-    store("<P><CmdGroup name=\"G\"><Cmd name=\"ab&#9;cd\" args=\"x\"/></CmdGroup></P>");
-    run_path("P/G");
-
-    EXPECT_THAT(ran(), ElementsAre("/system/bin/ab|x"));
+    EXPECT_THAT(log_lines(),
+                IsSupersetOf({"SingleItemExecute| mxmlElementGetAttr name=Note- args=(null)",
+                              "SingleItemExecute| tpCmd:/system/bin/Note (null)"}));
 }
 
 TEST_F(ItemRun, NameThatTheCutLeavesEmptyStillRuns)
 {
     store("<P><CmdGroup name=\"G\"><Cmd name=\"&#9;cd\" args=\"x\"/></CmdGroup></P>");
     log_lines();
-    ::testing::internal::CaptureStderr();
+    testing::internal::CaptureStderr();
     run_path("P/G");
 
-    EXPECT_NE(::testing::internal::GetCapturedStderr(), "") << "the shell cannot run a directory";
-    EXPECT_THAT(log_lines(), ::testing::IsSupersetOf({"SingleItemExecute| tpCmd:/system/bin/ x",
-                                                      "SingleItemExecute| leave... !"}));
+    EXPECT_NE(testing::internal::GetCapturedStderr(), "") << "the shell cannot run a directory";
+    EXPECT_THAT(log_lines(), IsSupersetOf({"SingleItemExecute| tpCmd:/system/bin/ x",
+                                           "SingleItemExecute| leave... !"}));
     EXPECT_THAT(ran(), IsEmpty());
 }
 
@@ -153,45 +132,6 @@ TEST_F(ItemRun, CommandLineIsCutTo1024Characters)
     EXPECT_THAT(ran(), ElementsAre("/system/bin/Note|" + std::string(1024 - start.size(), 'x')));
 }
 
-TEST_F(ItemRun, ElementOfAnotherNameWithANameAttributeIsRun)
-{
-    store("<P><CmdGroup name=\"G\"><Cmd name=\"Note\" args=\"1\"/>"
-          "<Tool name=\"ab\" args=\"2\"/></CmdGroup></P>");
-    run_path("P/G");
-
-    EXPECT_THAT(ran(), ElementsAre("/system/bin/Note|1", "/system/bin/ab|2"));
-}
-
-TEST_F(ItemRun, WordsBetweenItemsAreNotRun)
-{
-    store("<P><CmdGroup name=\"G\"><Cmd name=\"Note\" args=\"1\"/>word"
-          "<Cmd name=\"Note\" args=\"2\"/></CmdGroup></P>");
-    log_lines();
-    run_path("P/G");
-
-    EXPECT_THAT(ran(), ElementsAre("/system/bin/Note|1", "/system/bin/Note|2"));
-    EXPECT_THAT(log_lines(), ::testing::Contains("SingleItemExecute| current node is null !"));
-}
-
-TEST_F(ItemRun, UnknownGroupRunsNothing)
-{
-    store(plan_of({{"G", {{"Note", "x"}}}}));
-    run_path("P/H");
-    run_path("P/H/Note");
-    run_path("P");
-
-    EXPECT_THAT(ran(), IsEmpty());
-}
-
-TEST_F(ItemRun, ItemOfALaterGroupIsLookedUpThereAndCountedInTheNamedGroup)
-{
-    store(plan_of({{"G", {{"Note", "first"}, {"Note", "second"}}},
-                   {"H", {{"Note", "other"}, {"ab", "found"}}}}));
-    run_path("P/G/ab");
-
-    EXPECT_THAT(ran(), ElementsAre("/system/bin/Note|second"));
-}
-
 TEST_F(ItemRun, VendorOneAppendsItsSuffix)
 {
     set_vendor("1");
@@ -200,9 +140,8 @@ TEST_F(ItemRun, VendorOneAppendsItsSuffix)
     run_path("P/G");
 
     EXPECT_THAT(ran(), ElementsAre("/system/bin/Note_ca|x", "/system/bin/SensorProbe_ca_ca|y"));
-    EXPECT_THAT(log_lines(),
-                ::testing::IsSupersetOf({"SingleItemExecute| tLine:Note_ca",
-                                         "SingleItemExecute| tpCmd:/system/bin/Note_ca x"}));
+    EXPECT_THAT(log_lines(), IsSupersetOf({"SingleItemExecute| tLine:Note_ca",
+                                           "SingleItemExecute| tpCmd:/system/bin/Note_ca x"}));
 }
 
 TEST_F(ItemRun, VendorTwoAppendsItsSuffix)
@@ -213,7 +152,7 @@ TEST_F(ItemRun, VendorTwoAppendsItsSuffix)
     run_path("P/G");
 
     EXPECT_THAT(ran(), ElementsAre("/system/bin/Note_ca_qsee|x"));
-    EXPECT_THAT(log_lines(), ::testing::Contains("SingleItemExecute| tLine:Note_ca_qsee"));
+    EXPECT_THAT(log_lines(), Contains("SingleItemExecute| tLine:Note_ca_qsee"));
 }
 
 TEST_F(ItemRun, VendorMayHaveABlankBeforeAndLettersAfter)
@@ -251,12 +190,12 @@ TEST_F(ItemRun, VendorIsReadAfreshForEveryItemOfAGroup)
 TEST_F(ItemRun, StandardOutputCarriesTheVendorLineAndNothingElse)
 {
     store(plan_of({{"G", {{"Note", "x"}, {"Note", "--vendor 1"}, {"ab", "y"}}}}));
-    ::testing::internal::CaptureStdout();
+    testing::internal::CaptureStdout();
     FPTEST_RunTestCmd("XMLNodePath::P/G", nullptr, 0);
     FPTEST_RunTestCmd("XMLNodePath::P/G/NoSuchItem", nullptr, 0);
     FPTEST_RunTestCmd("XMLNodePath::P", nullptr, 0);
 
-    EXPECT_EQ(::testing::internal::GetCapturedStdout(),
+    EXPECT_EQ(testing::internal::GetCapturedStdout(),
               "vendor = 0\nvendor = 0\nvendor = 1\nvendor = 1\n");
 }
 
