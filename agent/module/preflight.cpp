@@ -10,6 +10,7 @@
 #include "util/text.h"
 
 #include <cerrno>
+#include <chrono>
 #include <cstdlib>
 #include <cstring>
 #include <fcntl.h>
@@ -20,6 +21,7 @@
 #include <sys/socket.h>
 #include <sys/stat.h>
 #include <sys/statvfs.h>
+#include <thread>
 
 namespace fptest
 {
@@ -125,10 +127,15 @@ void require_stored(const std::string &found, const std::string &wanted)
 Descriptor lock_device()
 {
     Descriptor directory(open(kDataDirectory, O_RDONLY | O_DIRECTORY | O_CLOEXEC));
-    if (directory.is_open() && flock(directory.get(), LOCK_EX | LOCK_NB) != 0 &&
-        errno == EWOULDBLOCK) {
-        throw Failure(Exit::environment, "another fptest is running a plan on this device: "
-                                         "wait for its end, or stop it");
+    // one that has only just been killed has it for a moment still
+    for (int tries = 0; directory.is_open() && flock(directory.get(), LOCK_EX | LOCK_NB) != 0 &&
+                        errno == EWOULDBLOCK;
+         ++tries) {
+        if (tries == 25) {
+            throw Failure(Exit::environment, "another fptest is running a plan on this device: "
+                                             "wait for its end, or stop it");
+        }
+        std::this_thread::sleep_for(std::chrono::milliseconds(20));
     }
     return directory;
 }
