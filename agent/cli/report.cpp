@@ -13,6 +13,7 @@
 
 #include <algorithm>
 #include <csignal>
+#include <cstring>
 #include <fmt/core.h>
 #include <memory>
 #include <string>
@@ -104,7 +105,10 @@ Exit report(const ReportOptions &options)
     if (description != options.description) {
         say("bytes of the description that no plan can hold are replaced");
     }
-    require_room(text.size() + kAttributes + kLongestEntity * description.size());
+    const auto entities = std::ranges::count_if(
+        description, [](char c) { return std::strchr("&<>\"", c) != nullptr; });
+    require_room(text.size() + kAttributes + description.size() +
+                 static_cast<std::size_t>(entities) * kLongestEntity);
     // a stop that came into the middle of it would cut the plan
     sigset_t stops;
     sigset_t before;

@@ -302,7 +302,7 @@ Exit run_rounds(const std::vector<Listener *> &listeners, const Runner::Limits &
     if (!failure.empty() && (broken || runner.broken())) {
         say_at_end(failure);
     } else if (!failure.empty()) {
-        throw Failure(Exit::environment, "{}; the run went on without it", failure);
+        throw Failure(Exit::environment, "{}; the run went on all the same", failure);
     }
     if (broken || runner.broken()) {
         throw Failure(Exit::environment, "{}", run.why_unfinished);

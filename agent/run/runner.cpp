@@ -467,9 +467,6 @@ std::string Runner::why_silent(const RunningItem &active)
     if (is_plain_name(item(active.place).name) && access(program.c_str(), X_OK) != 0) {
         return fmt::format("there is no program {}", one_line(program));
     }
-    if (!active.gatherer_end.empty()) {
-        return active.gatherer_end;
-    }
     if (active.overwritten) {
         return gathers(active) ? "a process with an old copy of the plan has written it over, "
                                  "perhaps the gatherer: let it report by a new process each time"
@@ -481,6 +478,9 @@ std::string Runner::why_silent(const RunningItem &active)
     }
     if (active.undone) {
         return "a process with an old copy of the plan has written over what it had reported";
+    }
+    if (!active.gatherer_end.empty()) {
+        return active.gatherer_end;
     }
     if (active.report_lost) {
         return "what it reported is lost: the stored plan is gone, or not whole any more";

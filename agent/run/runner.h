@@ -144,7 +144,6 @@ class Runner
     void tell_late(const Place &place, int round, const ItemReport &report);
     void note_gathered(const ItemReport &report);
     bool was_gathered(const ItemReport &report) const;
-    static void clear_and_mark(const std::vector<std::size_t> &numbers, const std::string &mark);
     void poll_gatherer(RunningItem &active);
     void read_signals();
     void suspend();

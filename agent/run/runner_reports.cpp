@@ -136,9 +136,6 @@ bool Runner::is_older(RunningItem &active, const Plan &plan, const ItemReport &r
     if (!gathers(active) || !has_result(report)) {
         return true;
     }
-    if (gathered_.empty()) { // it may say anything
-        note_gathered(report);
-    }
     active.keeps_copy = active.keeps_copy || !was_gathered(report);
     return !active.keeps_copy;
 }
@@ -160,8 +157,16 @@ void Runner::mark_again()
             mark = target->mark;
         }
     }
-    if (!numbers.empty()) {
-        clear_and_mark(numbers, mark);
+    if (numbers.empty()) {
+        return;
+    }
+    const Descriptor lock = lock_stored_plan();
+    try {
+        if (const auto marked = without_reports(whole_stored_plan(), numbers, mark)) {
+            replace_stored_plan(*marked);
+        }
+    } catch (const Failure &) {
+        return; // the disk is full
     }
 }
 
@@ -173,13 +178,16 @@ void Runner::begin_gathering()
         active.told = true;
         const std::size_t number = active.target.element;
         const auto plan = Plan::parse_annotated(whole_stored_plan());
-        if (plan && is_item(*plan, number, item(active.place).name) &&
-            has_result(plan->report(number))) {
+        if (plan && is_item(*plan, number, item(active.place).name)) {
             const ItemReport report = plan->report(number);
-            if (!was_gathered(report)) {
+            if (has_result(report) && !was_gathered(report)) {
                 tell_late(active.place, gathered_in_ != 0 ? gathered_in_ : run_.round, report);
             }
-            clear_and_mark({number}, active.target.mark);
+            active.overwritten = has_result(report);
+            if (active.overwritten || !bears_mark(*plan, active.target)) {
+                mark_again();
+            }
+            active.overwritten = false;
         }
     }
     host_.go_on();
@@ -220,18 +228,6 @@ void Runner::note_gathered(const ItemReport &report)
 bool Runner::was_gathered(const ItemReport &report) const
 {
     return std::ranges::find(gathered_, as_made_loadable(report)) != gathered_.end();
-}
-
-void Runner::clear_and_mark(const std::vector<std::size_t> &numbers, const std::string &mark)
-{
-    const Descriptor lock = lock_stored_plan();
-    try {
-        if (const auto cleared = without_reports(whole_stored_plan(), numbers, mark)) {
-            replace_stored_plan(*cleared);
-        }
-    } catch (const Failure &) {
-        return; // the disk is full
-    }
 }
 
 void Runner::read_report(RunningItem &active, const Plan &plan)

@@ -184,6 +184,43 @@ TEST_F(RunGatherer, MayReportFromACopyOfThePlanThatItKeeps)
     }
 }
 
+TEST_F(RunGatherer, MayKeepItsCopyWhileThePlanIsStoredAnew)
+{
+    const Gatherer gatherer({"gather", "report-here", "G", "SensorProbe", "100", "0", "one",
+                             "gather", "report-here", "G", "SensorProbe", "100", "0", "two",
+                             "sleep", "60"});
+    const Lines group = with_group({{"SensorProbe", ""}, {"Item", kPasses}});
+    EXPECT_EQ(run_fptest(group).status, 0);
+    EXPECT_EQ(run({"--plan", work("plan.xml"), "P/G/Item"}).status, 0);
+    EXPECT_EQ(run_fptest(group).status, 0);
+}
+
+TEST_F(RunGatherer, CostsTheItemsAfterItNothingByALateReportFromItsCopy)
+{
+    const Gatherer gatherer({"gather", "report-here", "G",     "SensorProbe", "100",
+                             "0",      "one",         "sleep", "0.6",         "report-here",
+                             "G",      "SensorProbe", "0",     "-2",          "idle",
+                             "gather", "report-here", "G",     "SensorProbe", "100",
+                             "0",      "two",         "sleep", "60"});
+    const std::string keeps_copy =
+        "report-here G Item 0 -2 begun sleep 0.2 report-here G Item 100 0 fine";
+    run_group({{"SensorProbe", ""}, {"Item", keeps_copy}}, {"--as-group", "P/G"});
+    EXPECT_THAT(outcomes(), Each(EndsWith(": passed")));
+    EXPECT_THAT(outcomes(), SizeIs(4));
+}
+
+TEST_F(RunGatherer, IsToldFromOneWithoutAReportWhereAnItemsCopyTookThatAway)
+{
+    const Gatherer gatherer(
+        {"gather", "sleep", "0.1", "report", "G", "50", "0", "half", "sleep", "0.2"});
+    run_group({{"SensorProbe", ""},
+               {"Item", "report-here G Item 0 -2 begun sleep 0.25 report-here G Item 100 0 fine"}},
+              {"--as-group"});
+    EXPECT_THAT(outcomes(), ElementsAre("SensorProbe: no result", "Item: passed"));
+    EXPECT_EQ(reasons().at(0),
+              "a process with an old copy of the plan has written over what it had reported");
+}
+
 TEST_F(RunGatherer, HasNoReportOfAnEarlierGatheringTakenForItsOwn)
 {
     for (const std::string way : {"--quiet", "--as-group"}) {
