@@ -345,9 +345,7 @@ TEST_F(Fptest, SaysThatStandardOutputCannotBeWritten)
     const std::string broken = file("broken.xml", "<P><CmdGroup></P>");
     for (const Lines &arguments : {Lines{"show"}, Lines{"check", kPlanFile}, Lines{"check", broken},
                                    Lines{"--help"}, Lines{"run", "--list"}}) {
-        Start start;
-        start.arguments = arguments;
-        start.output = "/dev/full";
+        const Start start{.arguments = arguments, .output = "/dev/full"};
         const Ended ended = run_fptest(start);
         EXPECT_EQ(ended.status, 3) << arguments[0];
         EXPECT_EQ(ended.err, "fptest: standard output cannot be written\n") << arguments[0];

@@ -485,10 +485,10 @@ TEST_F(ItemEnd, GathererThatIsSuspendedIsKilled)
 
 TEST_F(ItemEnd, SuspendedRunSuspendsItsItemsAndNoTimePasses)
 {
-    Start start;
-    start.arguments = with_group({{"Item", "note /tmp/scene/begun sleep 1.5 report G 100 0 fine"}},
-                                 {"--timeout", "2.5"});
-    start.prepare = in_own_group;
+    const Start start{
+        .arguments = with_group({{"Item", "note /tmp/scene/begun sleep 1.5 report G 100 0 fine"}},
+                                {"--timeout", "2.5"}),
+        .prepare = in_own_group};
     FptestProcess fptest(start);
     ASSERT_TRUE(wait_for_file("begun"));
     fptest.signal(SIGTSTP);
@@ -504,9 +504,9 @@ TEST_F(ItemEnd, SuspendedRunSuspendsItsItemsAndNoTimePasses)
 
 TEST_F(ItemEnd, SuspendedRunSuspendsTheGatherer)
 {
-    Start start;
-    start.arguments = with_group({{"SensorProbe", "--group G --seconds 1.5"}}, {"--timeout", "10"});
-    start.prepare = in_own_group;
+    const Start start{
+        .arguments = with_group({{"SensorProbe", "--group G --seconds 1.5"}}, {"--timeout", "10"}),
+        .prepare = in_own_group};
     FptestProcess fptest(start);
     ASSERT_TRUE(
         eventually([] { return processes_named("/system/bin/SensorProbe").size() == 1; }, 20));
@@ -521,9 +521,9 @@ TEST_F(ItemEnd, SuspendedRunSuspendsTheGatherer)
 
 TEST_F(ItemEnd, RunThatNobodyCouldResumeIsNotSuspended)
 {
-    Start start;
-    start.arguments = with_group({{"Item", "note /tmp/scene/begun sleep 1 report G 100 0 fine"}});
-    start.prepare = in_own_session;
+    const Start start{
+        .arguments = with_group({{"Item", "note /tmp/scene/begun sleep 1 report G 100 0 fine"}}),
+        .prepare = in_own_session};
     FptestProcess fptest(start);
     ASSERT_TRUE(wait_for_file("begun"));
     fptest.signal(SIGTSTP);
@@ -533,9 +533,8 @@ TEST_F(ItemEnd, RunThatNobodyCouldResumeIsNotSuspended)
 
 TEST_F(ItemEnd, RunThatIsKilledWhileSuspendedLeavesNoItem)
 {
-    Start start;
-    start.arguments = with_group({{"Item", "note /tmp/scene/begun sleep 60"}});
-    start.prepare = in_own_group;
+    const Start start{.arguments = with_group({{"Item", "note /tmp/scene/begun sleep 60"}}),
+                      .prepare = in_own_group};
     FptestProcess fptest(start);
     ASSERT_TRUE(wait_for_file("begun"));
     fptest.signal(SIGTSTP);

@@ -61,9 +61,7 @@ class Output : public FptestTest
                                    const std::string &log, const std::string &text)
     {
         for (const std::string name : {"--log", "VR_LOG_FILE"}) {
-            Start start;
-            start.arguments = arguments;
-            start.output = work("out");
+            Start start{.arguments = arguments, .output = work("out")};
             if (name == "--log") {
                 start.arguments.insert(start.arguments.begin() + 1, {name, log});
             } else {
@@ -208,9 +206,8 @@ TEST_F(Output, StandardOutputMayHaveAnotherName)
     for (const std::string name :
          {"/dev/stdout", "/proc/self/fd/1", "/dev/fd/1", "/tmp/scene/out"}) {
         SCOPED_TRACE(name);
-        Start start;
-        start.arguments = {"run", "--junit", name, "--plan", plan(kLoud), "P/G/Third"};
-        start.output = work("out");
+        Start start{.arguments = {"run", "--junit", name, "--plan", plan(kLoud), "P/G/Third"},
+                    .output = work("out")};
         Ended ended = run_fptest(start);
         EXPECT_EQ(ended.status, 0);
         EXPECT_EQ(ended.err, "");
@@ -225,9 +222,9 @@ TEST_F(Output, StandardOutputMayHaveAnotherName)
 TEST_F(Output, OneReportAtMostGoesToStandardOutputByWhateverName)
 {
     for (const std::string name : {"/dev/stdout", "/proc/self/fd/1", "/tmp/scene/out"}) {
-        Start start;
-        start.arguments = {"run", "--tap", "--json", name, "--plan", plan(kLoud), "P/G/Third"};
-        start.output = work("out");
+        const Start start{
+            .arguments = {"run", "--tap", "--json", name, "--plan", plan(kLoud), "P/G/Third"},
+            .output = work("out")};
         const Ended ended = run_fptest(start);
         EXPECT_EQ(ended.status, 2);
         EXPECT_EQ(ended.err, "fptest: --tap and --json " + name +
@@ -238,10 +235,9 @@ TEST_F(Output, OneReportAtMostGoesToStandardOutputByWhateverName)
 
 TEST_F(Output, WhatSwallowsEverythingMayBeNamedForAll)
 {
-    Start start;
-    start.arguments = {"run",         "--tap",  "--json",    "/dev/null", "--junit",
-                       "/dev/stdout", "--plan", plan(kLoud), "P/G/Third"};
-    start.output = "/dev/null";
+    const Start start{.arguments = {"run", "--tap", "--json", "/dev/null", "--junit", "/dev/stdout",
+                                    "--plan", plan(kLoud), "P/G/Third"},
+                      .output = "/dev/null"};
     const Ended ended = run_fptest(start);
     EXPECT_EQ(ended.status, 0);
     EXPECT_EQ(ended.err, "");
@@ -369,9 +365,8 @@ TEST_F(Output, ReportThatCannotBeBegunCostsNoOther)
                    {"run", "--json", work("json"), "--junit", "/nowhere/x", "P/G"});
     expect_refusal(3, "fptest: /nowhere/x: No such file or directory; nothing was run",
                    {"run", "--junit", work("junit"), "--json", "/nowhere/x", "P/G"});
-    Start start;
-    start.arguments = {"run", "--json", work("json"), "--junit", work("junit"), "P/G"};
-    start.output = "/dev/full";
+    const Start start{.arguments = {"run", "--json", work("json"), "--junit", work("junit"), "P/G"},
+                      .output = "/dev/full"};
     const Ended ended = run_fptest(start);
     EXPECT_EQ(ended.status, 3);
     EXPECT_EQ(ended.err, "fptest: standard output: No space left on device; nothing was run\n");

@@ -245,9 +245,9 @@ TEST_F(Report, WantsAPlanThatLoads)
 TEST_F(Report, SaysThatThePlanIsNotWritable)
 {
     fs::permissions(kPlanFile, fs::perms::owner_read);
-    Start start;
-    start.prepare = as_plain_user;
-    start.arguments = {"report", "Bringup", "SpiCheck", "--progress", "1", "--result", "0"};
+    const Start start{
+        .arguments = {"report", "Bringup", "SpiCheck", "--progress", "1", "--result", "0"},
+        .prepare = as_plain_user};
     const Ended ended = run_fptest(start);
     EXPECT_EQ(ended.status, 3);
     EXPECT_EQ(ended.err, "fptest: the report is not in /data/vorlane/src1.xml: is it writable? "

@@ -196,9 +196,9 @@ TEST_F(Rounds, TakeNoMoreMemoryHoweverManyHaveBeenRun)
 // The signal has come before anything was run.
 TEST_F(Rounds, LookAtSignalsFromTheFirstMomentOn)
 {
-    Start start;
-    start.arguments = {"run", "--repeat", "1000000", "--plan", plan(kOnePasses), "P/G"};
-    start.prepare = interrupted_before;
+    const Start start{
+        .arguments = {"run", "--repeat", "1000000", "--plan", plan(kOnePasses), "P/G"},
+        .prepare = interrupted_before};
     const Ended ended = run_fptest(start);
     EXPECT_EQ(ended.status, 130);
     EXPECT_EQ(without_times(ended.out), "/tmp/scene/plan.xml: 1 item, vendor 0, 1000000 rounds\n"

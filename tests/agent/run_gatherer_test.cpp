@@ -21,12 +21,9 @@ const Items kGathererThatNeverComes = {{"SensorProbe", "--help; exec sleep 30"},
 
 // One of the test's own that is running already, until it goes out of scope.
 struct Gatherer : support::Process {
-    explicit Gatherer(const Lines &words)
-        : Process([&words] {
-              support::Start start{.arguments = words, .program = "/system/bin/Item"};
-              start.arguments.insert(start.arguments.begin(), kProbe);
-              return start;
-          }())
+    explicit Gatherer(const std::string &words)
+        : Process({.arguments = {"sh", "-c",
+                                 "exec -a " + std::string(kProbe) + " /system/bin/Item " + words}})
     {
         EXPECT_TRUE(eventually([] { return !processes_named(kProbe).empty(); }));
     }
@@ -136,8 +133,8 @@ TEST_F(RunGatherer, GoesOnWhereARunningOneHangs)
 
 TEST_F(RunGatherer, TakesNoStepOfItForItsEnd)
 {
-    const Gatherer gatherer({"gather", "report", "G", "50", "0", "half", "note", work("half"),
-                             "await", work("go"), "report", "G", "100", "1", "whole"});
+    const Gatherer gatherer(
+        "gather report G 50 0 half note /tmp/scene/half await /tmp/scene/go report G 100 1 whole");
     FptestProcess fptest(with_group({{"SensorProbe", ""}, {"Item", "note /tmp/scene/next"}}));
     ASSERT_TRUE(wait_for_events("progress", 1));
     EXPECT_THAT(events("end"), IsEmpty());
@@ -159,7 +156,7 @@ TEST_F(RunGatherer, WaitsOnlySoLongForItsReport)
 
 TEST_F(RunGatherer, FailsWhereItIsNotDoneInTimeWhateverItHasReported)
 {
-    const Gatherer gatherer({"gather", "report", "G", "50", "0", "half", "sleep", "60"});
+    const Gatherer gatherer("gather report G 50 0 half sleep 60");
     EXPECT_EQ(run_group({{"SensorProbe", ""}}).status, 1);
     EXPECT_THAT(outcomes(), ElementsAre("SensorProbe: failed"));
     EXPECT_EQ(reasons().at(0),
@@ -170,13 +167,8 @@ TEST_F(RunGatherer, MayReportFromACopyOfThePlanThatItKeeps)
 {
     for (const std::string way : {"--quiet", "--as-group"}) {
         SCOPED_TRACE(way);
-        Lines words;
-        for (const std::string text : {"one", "two", "three"}) {
-            words.insert(words.end(),
-                         {"gather", "report-here", "G", "SensorProbe", "100", "0", text});
-        }
-        words.insert(words.end(), {"sleep", "60"});
-        const Gatherer gatherer(words);
+        const std::string reports = "gather report-here G SensorProbe 100 0 ";
+        const Gatherer gatherer(reports + "one " + reports + "two " + reports + "three sleep 60");
         run_group({{"SensorProbe", ""}, {"Item", "sleep 0.3 report G 100 0 fine"}},
                   {way, "--repeat", "3"});
         EXPECT_THAT(outcomes(), Each(EndsWith(": passed")));
@@ -186,9 +178,8 @@ TEST_F(RunGatherer, MayReportFromACopyOfThePlanThatItKeeps)
 
 TEST_F(RunGatherer, MayKeepItsCopyWhileThePlanIsStoredAnew)
 {
-    const Gatherer gatherer({"gather", "report-here", "G", "SensorProbe", "100", "0", "one",
-                             "gather", "report-here", "G", "SensorProbe", "100", "0", "two",
-                             "sleep", "60"});
+    const Gatherer gatherer("gather report-here G SensorProbe 100 0 one gather report-here G "
+                            "SensorProbe 100 0 two sleep 60");
     const Lines group = with_group({{"SensorProbe", ""}, {"Item", kPasses}});
     EXPECT_EQ(run_fptest(group).status, 0);
     EXPECT_EQ(run({"--plan", work("plan.xml"), "P/G/Item"}).status, 0);
@@ -197,11 +188,9 @@ TEST_F(RunGatherer, MayKeepItsCopyWhileThePlanIsStoredAnew)
 
 TEST_F(RunGatherer, CostsTheItemsAfterItNothingByALateReportFromItsCopy)
 {
-    const Gatherer gatherer({"gather", "report-here", "G",     "SensorProbe", "100",
-                             "0",      "one",         "sleep", "0.6",         "report-here",
-                             "G",      "SensorProbe", "0",     "-2",          "idle",
-                             "gather", "report-here", "G",     "SensorProbe", "100",
-                             "0",      "two",         "sleep", "60"});
+    const Gatherer gatherer(
+        "gather report-here G SensorProbe 100 0 one sleep 0.6 report-here G SensorProbe 0 -2 idle "
+        "gather report-here G SensorProbe 100 0 two sleep 60");
     const std::string keeps_copy =
         "report-here G Item 0 -2 begun sleep 0.2 report-here G Item 100 0 fine";
     run_group({{"SensorProbe", ""}, {"Item", keeps_copy}}, {"--as-group", "P/G"});
@@ -211,8 +200,7 @@ TEST_F(RunGatherer, CostsTheItemsAfterItNothingByALateReportFromItsCopy)
 
 TEST_F(RunGatherer, IsToldFromOneWithoutAReportWhereAnItemsCopyTookThatAway)
 {
-    const Gatherer gatherer(
-        {"gather", "sleep", "0.1", "report", "G", "50", "0", "half", "sleep", "0.2"});
+    const Gatherer gatherer("gather sleep 0.1 report G 50 0 half sleep 0.2");
     run_group({{"SensorProbe", ""},
                {"Item", "report-here G Item 0 -2 begun sleep 0.25 report-here G Item 100 0 fine"}},
               {"--as-group"});
@@ -226,10 +214,8 @@ TEST_F(RunGatherer, HasNoReportOfAnEarlierGatheringTakenForItsOwn)
     for (const std::string way : {"--quiet", "--as-group"}) {
         SCOPED_TRACE(way);
         const Gatherer gatherer(
-            {"gather",       "report", "G",      "100", "0",   "one",         "await",
-             work("second"), "report", "G",      "100", "0",   "one, stored", "note",
-             work("stored"), "gather", "report", "G",   "100", "1",           "two",
-             "sleep",        "60"});
+            "gather report G 100 0 one await /tmp/scene/second report G 100 0 'one, stored' note "
+            "/tmp/scene/stored gather report G 100 1 two sleep 60");
         run_group({{"Script", script("if test -e /tmp/scene/first; then touch /tmp/scene/second; "
                                      "while ! test -e /tmp/scene/stored; do sleep 0.02; done; fi; "
                                      "touch /tmp/scene/first; " +
@@ -248,11 +234,8 @@ TEST_F(RunGatherer, HasNoReportOfAnEarlierGatheringTakenForItsOwn)
 
 TEST_F(RunGatherer, HasNoResultFromWhatItsCopyOfThePlanSaysOfAnEarlierRun)
 {
-    const Gatherer gatherer({"gather", "report-here", "G",      "SensorProbe", "100",
-                             "0",      "one",         "gather", "report-here", "G",
-                             "Item",   "0",           "-2",     "by it",       "sleep",
-                             "0.2",    "report-here", "G",      "SensorProbe", "100",
-                             "1",      "two",         "sleep",  "60"});
+    const Gatherer gatherer("gather report-here G SensorProbe 100 0 one gather report-here G Item "
+                            "0 -2 'by it' sleep 0.2 report-here G SensorProbe 100 1 two sleep 60");
     const Items items = {{"SensorProbe", ""}, {"Item", kPasses}};
     run_group(items);
     EXPECT_THAT(outcomes(), ElementsAre("SensorProbe: passed", "Item: passed"));
@@ -264,9 +247,8 @@ TEST_F(RunGatherer, HasNoReportCountedThatItMakesBeforeItIsTold)
 {
     for (const std::string way : {"--quiet", "--as-group"}) {
         SCOPED_TRACE(way);
-        const Gatherer gatherer({"gather", "report", "G",   "100", "0",   "one",         "sleep",
-                                 "0.5",    "report", "G",   "100", "0",   "one, stored", "gather",
-                                 "report", "G",      "100", "1",   "two", "sleep",       "60"});
+        const Gatherer gatherer("gather report G 100 0 one sleep 0.5 report G 100 0 'one, stored' "
+                                "gather report G 100 1 two sleep 60");
         run_group({{"SensorProbe", ""}}, {way, "--repeat", "2"});
         EXPECT_THAT(outcomes(), ElementsAre("SensorProbe: passed", "SensorProbe: failed"));
         ASSERT_THAT(events("late"), SizeIs(1));
@@ -277,7 +259,7 @@ TEST_F(RunGatherer, HasNoReportCountedThatItMakesBeforeItIsTold)
 
 TEST_F(RunGatherer, IsWaitedForNoLongerOnceItHasReportedAResultThatThePlanHasNoTextFor)
 {
-    const Gatherer gatherer({"gather", "report", "G", "100", "7", "seven", "sleep", "60"});
+    const Gatherer gatherer("gather report G 100 7 seven sleep 60");
     const Ended ended = run_group({{"SensorProbe", ""}});
     EXPECT_THAT(outcomes(), ElementsAre("SensorProbe: failed"));
     EXPECT_LT(ended.seconds, 8);
@@ -285,11 +267,9 @@ TEST_F(RunGatherer, IsWaitedForNoLongerOnceItHasReportedAResultThatThePlanHasNoT
 
 TEST_F(RunGatherer, HasTheLateReportsShownOfEachRound)
 {
-    const Gatherer gatherer({"gather",      "report-here", "G",      "SensorProbe", "100",
-                             "0",           "one",         "gather", "report-here", "G",
-                             "SensorProbe", "100",         "0",      "two",         "sleep",
-                             "0.3",         "report-here", "G",      "SensorProbe", "100",
-                             "1",           "two, later",  "sleep",  "60"});
+    const Gatherer gatherer(
+        "gather report-here G SensorProbe 100 0 one gather report-here G SensorProbe 100 0 two "
+        "sleep 0.3 report-here G SensorProbe 100 1 'two, later' sleep 60");
     run_group({{"SensorProbe", ""}, {"Item", "sleep 0.8 report G 100 0 fine"}}, {"--repeat", "2"});
     EXPECT_THAT(outcomes(), Each(EndsWith(": passed")));
     ASSERT_THAT(events("late"), SizeIs(1));

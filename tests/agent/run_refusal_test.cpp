@@ -149,9 +149,8 @@ TEST_F(Refusal, OfOneFifoForTwoReports)
 TEST_F(Refusal, WhereThePlansDirectoryIsNotWritable)
 {
     fs::permissions("/data/vorlane", fs::perms::owner_read | fs::perms::owner_exec);
-    Start start;
-    start.prepare = as_plain_user;
-    start.arguments = {"run", "--plan", plan(kTwoGroups), "P/Bringup"};
+    const Start start{.arguments = {"run", "--plan", plan(kTwoGroups), "P/Bringup"},
+                      .prepare = as_plain_user};
     expect(3,
            "fptest: /data/vorlane is not writable: Permission denied; make it, or run this as "
            "another user",
@@ -164,9 +163,8 @@ TEST_F(Refusal, OutsideOfADevice)
     if (is_in_place()) {
         GTEST_SKIP() << "in place, /system/bin cannot be hidden from one program";
     }
-    Start start;
-    start.prepare = without_device;
-    start.arguments = {"run", "--plan", plan(kTwoGroups), "P/Bringup"};
+    const Start start{.arguments = {"run", "--plan", plan(kTwoGroups), "P/Bringup"},
+                      .prepare = without_device};
     expect(3,
            "fptest: this machine is no device: there is no /system/bin/sh; on a desk, run it as: "
            "device/run -- fptest ...",

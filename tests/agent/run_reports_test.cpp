@@ -231,9 +231,9 @@ TEST_F(Run, StartsItemsAsAnyProgramIsStarted)
 
 TEST_F(Run, RunsNothingWhereItsTapCannotBeWritten)
 {
-    Start start;
-    start.arguments = {"run", "--tap", "--plan", plan(group_of({{"Item", kPasses}})), "P/G"};
-    start.output = "/dev/full";
+    const Start start{
+        .arguments = {"run", "--tap", "--plan", plan(group_of({{"Item", kPasses}})), "P/G"},
+        .output = "/dev/full"};
     const Ended ended = run_fptest(start);
     EXPECT_EQ(ended.status, 3);
     EXPECT_EQ(ended.err, "fptest: the TAP output: No space left on device; nothing was run\n");

@@ -175,9 +175,7 @@ TEST_F(Run, SaysInTheViewThatItWasInterrupted)
 
 TEST_F(Run, RunsNothingWhereItIsInterruptedBefore)
 {
-    Start start;
-    start.prepare = interrupted_before;
-    start.arguments = with_group(kThreeThatNote);
+    const Start start{.arguments = with_group(kThreeThatNote), .prepare = interrupted_before};
     EXPECT_EQ(run_fptest(start).status, 130);
     EXPECT_THAT(paths_run(), IsEmpty());
     EXPECT_THAT(outcomes(), ElementsAre("Item: not run", "Other: not run", "Third: not run"));

@@ -221,9 +221,7 @@ TEST_F(Send, SaysThatTheModulesProcessEnded)
 
 TEST_F(Send, SaysThatRepliesCannotBeWritten)
 {
-    Start start;
-    start.arguments = {"send", "pingtest", "XMLFile::<P/>"};
-    start.output = "/dev/full";
+    const Start start{.arguments = {"send", "pingtest", "XMLFile::<P/>"}, .output = "/dev/full"};
     const Ended ended = run_fptest(start);
     EXPECT_EQ(ended.status, 3);
     EXPECT_EQ(ended.err, "fptest: replies cannot be written to standard output\n");
@@ -254,9 +252,7 @@ TEST_F(Send, WantsADevice)
     if (is_in_place()) {
         GTEST_SKIP() << "in place, /system/bin cannot be hidden from one program";
     }
-    Start start;
-    start.prepare = without_device;
-    start.arguments = {"send", "XMLFile::<P/>"};
+    const Start start{.arguments = {"send", "XMLFile::<P/>"}, .prepare = without_device};
     const Ended ended = run_fptest(start);
     EXPECT_EQ(ended.status, 3);
     EXPECT_EQ(ended.err,

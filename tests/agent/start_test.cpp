@@ -27,10 +27,9 @@ class Started : public FptestTest
   protected:
     static Start start_of_run(const std::string &path)
     {
-        Start start;
-        start.arguments = {"run",         "--json", work("json"), "--junit",
-                           work("junit"), "--plan", path,         "P/G"};
-        start.prepare = in_own_session;
+        const Start start{.arguments = {"run", "--json", work("json"), "--junit", work("junit"),
+                                        "--plan", path, "P/G"},
+                          .prepare = in_own_session};
         return start;
     }
 
