@@ -190,7 +190,7 @@ TEST_F(RunGatherer, CostsTheItemsAfterItNothingByALateReportFromItsCopy)
 {
     const Gatherer gatherer(
         "gather report-here G SensorProbe 100 0 one sleep 0.6 report-here G SensorProbe 0 -2 idle "
-        "gather report-here G SensorProbe 100 0 two sleep 60");
+        "gather sleep 0.1 report-here G SensorProbe 100 0 two sleep 60");
     const std::string keeps_copy =
         "report-here G Item 0 -2 begun sleep 0.2 report-here G Item 100 0 fine";
     run_group({{"SensorProbe", ""}, {"Item", keeps_copy}}, {"--as-group", "P/G"});
