@@ -183,8 +183,8 @@ void Runner::begin_gathering()
             if (has_result(report) && !was_gathered(report)) {
                 tell_late(active.place, gathered_in_ != 0 ? gathered_in_ : run_.round, report);
             }
-            active.overwritten = has_result(report);
-            if (active.overwritten || !bears_mark(*plan, active.target)) {
+            active.overwritten = has_result(report) || !bears_mark(*plan, active.target);
+            if (active.overwritten) {
                 mark_again();
             }
             active.overwritten = false;
