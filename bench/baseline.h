@@ -1,7 +1,7 @@
 // SPDX-FileCopyrightText: 2026 The Quillmark authors
 // SPDX-License-Identifier: Apache-2.0
 
-// How a baseline logs: as the library does, behind a prefix of the same form.
+// How a baseline logs: as the library does, after a prefix of the same form.
 #pragma once
 
 #include "vr_log.h"

@@ -2,7 +2,7 @@
 // SPDX-License-Identifier: Apache-2.0
 
 /*
- * The maker's library as it is for measuring: the log drops what it gets, and
+ * The platform's library as it is for measuring: the log drops what it gets, and
  * what the bench wants to hear of can be listened to. The rest is as shipped.
  */
 #ifndef BENCH_QUIET_VORLANE_H

@@ -1,14 +1,14 @@
 # SPDX-FileCopyrightText: 2026 The Quillmark authors
 # SPDX-License-Identifier: Apache-2.0
 
-# The maker's libraries: Vorlane::Vorlane, and a directory with their headers.
+# The platform's libraries: Vorlane::Vorlane, and a directory with their headers.
 #
 # VORLANE_LIBRARIES lists a device's own; without it their Linux implementations
 # are built, as the target vorlane. VORLANE_INCLUDE_DIR names the headers that
 # come with them.
 
-set(VORLANE_LIBRARIES "" CACHE FILEPATH "The maker's libraries; empty builds those for Linux")
-set(VORLANE_INCLUDE_DIR "${PROJECT_SOURCE_DIR}/vorlane" CACHE PATH "The maker's headers")
+set(VORLANE_LIBRARIES "" CACHE FILEPATH "The platform's libraries; empty builds those for Linux")
+set(VORLANE_INCLUDE_DIR "${PROJECT_SOURCE_DIR}/vorlane" CACHE PATH "The platform's headers")
 
 set(VORLANE_HEADERS mxml_whitespace.h sockwrap.h sysparm.h vr_log.h)
 foreach(header ${VORLANE_HEADERS})
@@ -28,7 +28,7 @@ if(VORLANE_LIBRARIES)
     message(FATAL_ERROR "The tests are those of the Linux implementations: "
       "set QUILLMARK_BUILD_TESTS to OFF, or VORLANE_LIBRARIES to nothing")
   endif()
-  message(STATUS "Maker's libraries: ${VORLANE_LIBRARIES}")
+  message(STATUS "The platform's libraries: ${VORLANE_LIBRARIES}")
   add_library(vorlane_given INTERFACE)
   target_include_directories(vorlane_given INTERFACE "${VORLANE_INCLUDE_DIR}")
   target_link_libraries(vorlane_given INTERFACE ${VORLANE_LIBRARIES})
@@ -37,7 +37,7 @@ if(VORLANE_LIBRARIES)
 endif()
 
 # A library of its own, so that a device or a test puts its own in its place at
-# load time; without a version in its name, because the maker's has none.
+# load time; without a version in its name, because the platform's has none.
 add_library(vorlane SHARED
   vorlane/linux/mxml_whitespace.cpp
   vorlane/linux/sockwrap.cpp

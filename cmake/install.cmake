@@ -17,7 +17,7 @@ install(TARGETS quillmark EXPORT quillmark
     NAMELINK_COMPONENT development)
 
 if(TARGET vorlane)
-  # Not beside the library, so that it stands in nobody's way: the maker's has the
+  # Not beside the library, so that it stands in nobody's way: the platform's has the
   # same name.
   set(vorlane_directory ${CMAKE_INSTALL_LIBDIR}/quillmark)
   if(ANDROID)

@@ -85,7 +85,7 @@ set(CPACK_DEBIAN_RUNTIME_DESCRIPTION "test library for fingerprint-sensor stacks
 ${about}
 .
 This package holds the shared library, and the Linux implementation of the
-interfaces that a device's maker provides.")
+interfaces that a device's platform provides.")
 
 set(CPACK_DEBIAN_DEVELOPMENT_PACKAGE_NAME libquillmark-dev)
 set(CPACK_DEBIAN_DEVELOPMENT_PACKAGE_SECTION libdevel)
@@ -94,7 +94,7 @@ set(CPACK_DEBIAN_DEVELOPMENT_DESCRIPTION "test library for fingerprint-sensor st
 ${about}
 .
 This package holds what agents and test items are built with: the header,
-those of the maker's interfaces, and files for CMake and pkg-config.")
+those of the platform's interfaces, and files for CMake and pkg-config.")
 
 set(CPACK_DEBIAN_FPTEST_PACKAGE_NAME fptest)
 set(CPACK_DEBIAN_FPTEST_PACKAGE_SECTION utils)

@@ -11,7 +11,7 @@
 //
 // CALLER is the process to which this one belongs, and 0 where it need not be there.
 // SIGNALS are the numbers, comma-separated, of those that the caller does not ignore.
-// They are blocked in all that stands in between, so that one that comes before COMMAND
+// They are blocked in all that is in between, so that one that comes before COMMAND
 // is begun meets what was to become COMMAND.
 //
 // These are two processes. The front one has device/run's id: it hands on the signals

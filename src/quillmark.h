@@ -18,7 +18,7 @@
  * a call runs. The one exception is FPTEST_SuspendItemExecute, which another
  * thread may call while FPTEST_RunTestCmd is blocked running an item.
  *
- * No function returns what became of its job: that is written to the maker's
+ * No function returns what became of its job: that is written to the platform's
  * log (vr_log_printf, tag "VRCODE"), a line for each step. On Linux it goes to
  * standard error, or into the file that the variable VR_LOG_FILE names. The only
  * line on standard output is "vendor = N", once for each item run.
@@ -74,7 +74,7 @@ extern QUILLMARK_API mxml_node_t *g_TestCmdTree;
  *                reply.
  *   XMLNodePath  NAME is root/group (run every item of the group, in order) or
  *                root/group/item (run that one); anything shorter runs nothing,
- *                and what stands after the item or a tab or line feed is
+ *                and what is after the item or a tab or line feed is
  *                ignored. Names hold at most 63 characters; the root is not
  *                compared. An item that the group lacks is looked for in the
  *                groups after it, and its position there is run here. Replies

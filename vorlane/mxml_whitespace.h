@@ -3,7 +3,7 @@
  * SPDX-License-Identifier: Apache-2.0
  */
 
-/* The maker's addition to Mini-XML. */
+/* The platform's addition to Mini-XML. */
 #ifndef VORLANE_MXML_WHITESPACE_H
 #define VORLANE_MXML_WHITESPACE_H
 

@@ -3,7 +3,7 @@
  * SPDX-License-Identifier: Apache-2.0
  */
 
-/* The maker's socket wrappers. */
+/* The platform's socket wrappers. */
 #ifndef VORLANE_SOCKWRAP_H
 #define VORLANE_SOCKWRAP_H
 

@@ -3,7 +3,7 @@
  * SPDX-License-Identifier: Apache-2.0
  */
 
-/* The maker's reader of parameter files. */
+/* The platform's reader of parameter files. */
 #ifndef VORLANE_SYSPARM_H
 #define VORLANE_SYSPARM_H
 

@@ -3,7 +3,7 @@
  * SPDX-License-Identifier: Apache-2.0
  */
 
-/* The maker's log call. */
+/* The platform's log call. */
 #ifndef VORLANE_VR_LOG_H
 #define VORLANE_VR_LOG_H
 

@@ -27,7 +27,7 @@ struct Finding {
 enum class PlanSource {
     to_send, // it is stored by a command: what the command cuts off matters
     as_sent, // the same, where --as-sent asks for that
-    stored,  // it stands in its place already
+    stored,  // it is in its place already
 };
 
 // A plan that was read, and what is known of it.

@@ -316,7 +316,7 @@ class FormChecker
                         ellipsize(one_line(why), kShownWhy));
     }
 
-    // What stands beside the root element, where Mini-XML takes that for a
+    // What is beside the root element, where Mini-XML takes that for a
     // second root.
     [[nodiscard]] std::size_t beside_root() const
     {

@@ -48,7 +48,7 @@ std::string shown(std::string_view source)
     return one_line(text);
 }
 
-// The line that the place is in: what stands before it, and the rest; of a long one
+// The line that the place is in: what is before it, and the rest; of a long one
 // what is near it, which is more than is shown.
 std::pair<std::string, std::string> source_line(std::string_view text, std::size_t offset)
 {

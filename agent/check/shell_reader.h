@@ -20,7 +20,7 @@ struct ShellReading {
         enum class Kind { no_end, unexpected, nothing_after };
         Kind kind = Kind::no_end;
         std::size_t at = 0;
-        std::string mark; // the characters that stand there
+        std::string mark; // the characters that are there
     };
     // What the shell does besides starting the line's first command.
     struct Effect {

@@ -50,7 +50,7 @@ class SizeChecker
                           : fmt::format("not load {}", what);
     }
 
-    // Whether a character reference may stand there: not in comments and the like.
+    // Whether a character reference may be there: not in comments and the like.
     [[nodiscard]] bool takes_references(std::size_t offset) const
     {
         const auto holds = [offset](const Attribute &attribute) {

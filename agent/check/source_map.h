@@ -54,7 +54,7 @@ class SourceMap
                                                     : of(element);
     }
 
-    // Where the first text stands that is directly in the element.
+    // Of the first text directly in the element.
     [[nodiscard]] std::size_t of_text(std::size_t element) const
     {
         const auto found = texts_.find(element);

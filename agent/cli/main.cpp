@@ -1,7 +1,7 @@
 // SPDX-FileCopyrightText: 2026 The Quillmark authors
 // SPDX-License-Identifier: Apache-2.0
 
-// fptest: the command line, up to the sub-command that it names.
+// fptest: the command line, up to the subcommand that it names.
 #include "cli/subcommands.h"
 #include "cli/usage.h"
 #include "util/files.h"

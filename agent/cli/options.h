@@ -1,7 +1,7 @@
 // SPDX-FileCopyrightText: 2026 The Quillmark authors
 // SPDX-License-Identifier: Apache-2.0
 
-// What the sub-commands' options have in common.
+// What the subcommands' options have in common.
 #pragma once
 
 #include "cli/subcommands.h"
@@ -12,7 +12,7 @@
 namespace fptest
 {
 
-// Adds a sub-command. Where the command line names it, the action is the chosen one.
+// Adds a subcommand. Where the command line names it, the action is the chosen one.
 CLI::App &add_subcommand(CLI::App &app, const char *name, const char *purpose, const char *examples,
                          Action &chosen, Action action);
 

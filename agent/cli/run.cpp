@@ -6,7 +6,7 @@
 #include "cli/options.h"
 #include "cli/outputs.h"
 #include "cli/run_options.h"
-#include "module/module_process.h"
+#include "module/library_process.h"
 #include "module/preflight.h"
 #include "module/stored_plan.h"
 #include "plan/plan.h"
@@ -44,17 +44,6 @@ constexpr char kRunExamples[] =
 
 // --- the plan -----------------------------------------------------------------
 
-std::string read_plan(const std::string &file)
-{
-    if (file.empty()) {
-        return require_stored_plan(": give one with --plan FILE");
-    }
-    if (auto text = read_file(file)) {
-        return *text;
-    }
-    throw Failure(Exit::usage, "{}: {}", one_line(file), why_unread());
-}
-
 // A plan that a command cannot hold is put into its place as a file.
 PlanSource use_of(const RunOptions &options, const std::string &text)
 {
@@ -69,7 +58,9 @@ PlanSource use_of(const RunOptions &options, const std::string &text)
 // One that the library loads.
 CheckedPlan open_plan(const RunOptions &options)
 {
-    const std::string text = read_plan(options.plan);
+    const std::string text = options.plan.empty()
+                                 ? require_stored_plan(": give one with --plan FILE")
+                                 : require_file(options.plan);
     CheckedPlan read = check(options.plan.empty()  ? kStoredPlan
                              : options.plan == "-" ? "<stdin>"
                                                    : options.plan,
@@ -161,10 +152,10 @@ void require_programs(const Work &work, int vendor, bool force)
     }
 }
 
-void store(LibraryProcess &host, const CheckedPlan &read)
+void store(LibraryProcess &library, const CheckedPlan &read)
 {
-    send_and_wait(host, "XMLFile::" + read.text);
-    require_stored(host.read_back(), read.stored);
+    send_and_wait(library, "XMLFile::" + read.text);
+    require_stored(library.read_back(), read.stored);
 }
 
 // For a plan that is longer than what a command stores.
@@ -232,8 +223,8 @@ Exit run(RunOptions options)
     require_writable_reports(options);
     choose_log(options.log);
     Signals signals;
-    std::optional<LibraryProcess> host(std::in_place);
-    const int vendor = ask_vendor(*host);
+    std::optional<LibraryProcess> library(std::in_place);
+    const int vendor = ask_vendor(*library);
     if (options.list) {
         list_items(paths.empty() ? all_paths(plan) : paths, plan,
                    vendor_suffix(vendor).value_or(""));
@@ -257,10 +248,10 @@ Exit run(RunOptions options)
     }
     const auto store_plan = [&] {
         if (is_sent) {
-            store(*host, read);
+            store(*library, read);
         } else if (is_placed) {
             place(read.text);
-            host.emplace(); // the one before keeps the plan that was there when it was asked
+            library.emplace(); // the one before keeps the plan that was there when it was asked
         }
     };
     Run run;
@@ -278,7 +269,7 @@ Exit run(RunOptions options)
     for (const auto &listener : owned) {
         listeners.push_back(listener.get());
     }
-    return run_rounds(listeners, limits_of(options), *host, signals, run, work, store_plan);
+    return run_rounds(listeners, limits_of(options), *library, signals, run, work, store_plan);
 }
 
 } // namespace

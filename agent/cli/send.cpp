@@ -3,7 +3,7 @@
 
 #include "cli/options.h"
 #include "cli/outputs.h"
-#include "module/module_process.h"
+#include "module/library_process.h"
 #include "module/preflight.h"
 #include "module/stored_plan.h"
 #include "plan/plan.h"
@@ -107,17 +107,17 @@ class Sender
         Descriptor plan =
             head_of(command).starts_with("XMLNodePath") ? lock_stored_plan() : Descriptor(-1);
         const auto items = items_of(command);
-        host_.command(command, items);
+        library_.command(command, items);
         for (;;) {
-            const auto event = host_.wait(100ms, signals_.descriptor());
+            const auto event = library_.wait(100ms, signals_.descriptor());
             if (event) {
                 plan = Descriptor(-1); // it is loaded before the first item is told
-                host_.pass_output(stderr, event->output);
+                library_.pass_output(stderr, event->output);
             }
             if (event && event->kind == LibraryProcess::Event::Kind::item) {
                 print_to(stderr, "vendor = {}\n", event->value);
             }
-            host_.pass_output(stderr);
+            library_.pass_output(stderr);
             if (event && event->kind == LibraryProcess::Event::Kind::gone) {
                 throw Failure(Exit::environment, "{}", gone_text(*event));
             }
@@ -126,14 +126,14 @@ class Sender
             }
             interrupted_ = interrupted_ || signals_.take() != 0;
             if (interrupted_) {
-                return std::nullopt; // with the host's end its item is stopped
+                return std::nullopt; // with the library's process its item is stopped
             }
         }
     }
 
   private:
     Signals signals_;
-    LibraryProcess host_;
+    LibraryProcess library_;
     bool interrupted_ = false;
 };
 

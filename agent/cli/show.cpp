@@ -62,10 +62,7 @@ std::string read_shown(const std::string &file)
         require_stored_plan(": run one with fptest run --plan FILE, or name a file to show");
         return whole_stored_plan();
     }
-    if (auto text = read_file(file)) {
-        return *text;
-    }
-    throw Failure(Exit::usage, "{}: {}", one_line(file), why_unread());
+    return require_file(file);
 }
 
 Exit show(const std::string &file)

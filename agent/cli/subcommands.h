@@ -1,7 +1,7 @@
 // SPDX-FileCopyrightText: 2026 The Quillmark authors
 // SPDX-License-Identifier: Apache-2.0
 
-// What fptest does, a file for each sub-command: each function adds one, with its
+// What fptest does, a file for each subcommand: each function adds one, with its
 // options, help and examples.
 #pragma once
 

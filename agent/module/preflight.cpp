@@ -162,12 +162,12 @@ std::string gone_text(const LibraryProcess::Event &event)
     return fmt::format("the library's process ended {}; --log FILE keeps what it says", event.text);
 }
 
-int send_and_wait(LibraryProcess &host, const std::string &command)
+int send_and_wait(LibraryProcess &library, const std::string &command)
 {
     int vendor = 0;
-    host.command(command);
+    library.command(command);
     for (;;) {
-        const auto event = host.wait(std::chrono::seconds(1));
+        const auto event = library.wait(std::chrono::seconds(1));
         if (event && event->kind == LibraryProcess::Event::Kind::item) {
             vendor = event->value;
         }
@@ -190,10 +190,10 @@ void require_no_leftovers(const std::vector<std::string> &programs)
     }
 }
 
-int ask_vendor(LibraryProcess &host)
+int ask_vendor(LibraryProcess &library)
 {
     // a path that leads nowhere: the selector is read and told before that shows
-    const int vendor = send_and_wait(host, "XMLNodePath::-/fptest asks for the vendor/-");
+    const int vendor = send_and_wait(library, "XMLNodePath::-/fptest asks for the vendor/-");
     if (!vendor_suffix(vendor)) {
         throw Failure(Exit::environment,
                       "the vendor selector is {}, and the library runs nothing then: set "

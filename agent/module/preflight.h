@@ -1,12 +1,12 @@
 // SPDX-FileCopyrightText: 2026 The Quillmark authors
 // SPDX-License-Identifier: Apache-2.0
 
-// What a device must have before something is run on it. Each function throws a
-// Failure that says what to do where it has not.
+// What a device must have before something is run on it. What is called require_...()
+// throws a Failure that says what to do.
 #pragma once
 
 #include "common/descriptor.h"
-#include "module/module_process.h"
+#include "module/library_process.h"
 
 #include <cstddef>
 #include <string>
@@ -44,11 +44,11 @@ Descriptor lock_device();
 void require_trigger_port();
 
 // The vendor that the library reads; nothing is run to learn it.
-int ask_vendor(LibraryProcess &host);
+int ask_vendor(LibraryProcess &library);
 
 // Sends a command that runs nothing, and waits for its end. Gives the vendor that
 // the library read for it; 0 where it read none.
-int send_and_wait(LibraryProcess &host, const std::string &command);
+int send_and_wait(LibraryProcess &library, const std::string &command);
 
 // Says that the library's process has ended, and what to do.
 std::string gone_text(const LibraryProcess::Event &event);

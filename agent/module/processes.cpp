@@ -184,7 +184,7 @@ std::vector<Leftover> ChildProcesses::of_items(const std::vector<Leftover> &left
     std::vector<Leftover> all;
     const Processes processes = read_processes();
     for (const auto &[pid, process] : processes) {
-        if (lives(process) && pid != module_ && process.group != module_ &&
+        if (lives(process) && pid != library_ && process.group != library_ &&
             is_below(processes, pid, ancestor_) && !comes_of_gatherer(processes, pid) &&
             !comes_of_any(processes, pid, left_out)) {
             all.push_back({process.name, pid, process.group});
@@ -197,7 +197,7 @@ void ChildProcesses::signal_all(int signal) const
 {
     const Processes processes = read_processes();
     for (const auto &[pid, process] : processes) {
-        if (lives(process) && pid != module_ &&
+        if (lives(process) && pid != library_ &&
             (is_below(processes, pid, ancestor_) || comes_of_gatherer(processes, pid))) {
             kill(pid, signal);
         }
@@ -223,9 +223,9 @@ std::vector<Leftover> ChildProcesses::of_gatherer() const
     std::vector<Leftover> all;
     const Processes processes = read_processes();
     for (const auto &[pid, process] : processes) {
-        if (lives(process) && pid != module_ &&
+        if (lives(process) && pid != library_ &&
             (comes_of_gatherer(processes, pid) ||
-             (process.group == module_ && is_below(processes, pid, ancestor_)))) {
+             (process.group == library_ && is_below(processes, pid, ancestor_)))) {
             all.push_back({process.name, pid, process.group});
         }
     }

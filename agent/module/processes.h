@@ -39,7 +39,7 @@ class ChildProcesses
   public:
     // The library's process, which leads its own process group, and the one that
     // inherits what it leaves behind when it dies; they may be the same.
-    ChildProcesses(pid_t module, pid_t ancestor) : module_(module), ancestor_(ancestor)
+    ChildProcesses(pid_t library, pid_t ancestor) : library_(library), ancestor_(ancestor)
     {
     }
 
@@ -59,7 +59,7 @@ class ChildProcesses
     std::vector<Leftover> of_gatherer() const;
 
   private:
-    pid_t module_;
+    pid_t library_;
     pid_t ancestor_;
 };
 

@@ -5,8 +5,8 @@
 
 #include "common/descriptor.h"
 #include "module/item_shell.h"
+#include "module/library_process.h"
 #include "module/messages.h"
-#include "module/module_process.h"
 #include "module/processes.h"
 #include "plan/plan.h"
 #include "quillmark.h"
@@ -314,7 +314,7 @@ void raise_descriptor_limit()
 
 } // namespace
 
-void serve_module(int socket, int output)
+void serve_library(int socket, int output)
 {
     setsid(); // first: what a terminal sends to the agent is still blocked
     reset_signals();

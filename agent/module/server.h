@@ -10,6 +10,6 @@ namespace fptest
 // Turns this process, which was just made, into the library's: it calls the library
 // as the messages on the socket say, until their sender is gone. What the library
 // starts prints into the output and gets no input.
-[[noreturn]] void serve_module(int socket, int output);
+[[noreturn]] void serve_library(int socket, int output);
 
 } // namespace fptest

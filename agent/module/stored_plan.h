@@ -42,7 +42,7 @@ template <typename Make> auto made_of_stored_plan(std::string &text, const Make 
     }
 }
 
-// Its text, whole where that comes to be; else as it is.
+// Its text. One that is not whole is read again for half a second.
 std::string whole_stored_plan();
 
 // Makes one load again that a report has spoiled, so that the next items can
@@ -52,8 +52,8 @@ std::string whole_stored_plan();
 void mend_stored_plan();
 
 // The lock that those who report take on the stored plan, so that none writes
-// what another has just overwritten. Waits for it, 10 seconds at most. A plan that
-// is not there needs none.
+// what another has just overwritten. Waits for it, 10 seconds at most, and goes on without
+// it then. A plan that is not there needs none.
 Descriptor lock_stored_plan();
 
 // Puts another text in the stored plan's place, whole or not at all. Throws a

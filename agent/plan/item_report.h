@@ -9,7 +9,7 @@
 namespace fptest
 {
 
-// What an item has reported, as it stands in the test plan.
+// What an item has reported, as the test plan has it.
 struct ItemReport {
     std::optional<std::string> progress;
     // An attribute without a value is a result that is none of 0, 1 and -2.

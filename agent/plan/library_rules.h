@@ -35,7 +35,7 @@ bool is_gatherer(std::string_view name, int vendor);
 // The program of an item: the library cuts its name at a tab or line feed.
 std::string program_of(std::string_view name, std::string_view suffix);
 
-// Whether the shell takes the name as it stands; else the program is another one.
+// Whether the shell takes the name as it is; else the program is another one.
 bool is_plain_name(std::string_view name);
 
 // The command line that the library runs for an item, whole; it runs the first

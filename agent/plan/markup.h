@@ -1,7 +1,7 @@
 // SPDX-FileCopyrightText: 2026 The Quillmark authors
 // SPDX-License-Identifier: Apache-2.0
 
-// Where things stand in a test plan's text. The scanner takes what comes, a
+// Where things are in a test plan's text. The scanner takes what comes, a
 // document that is half written or breaks off included, and judges nothing.
 #pragma once
 
@@ -36,7 +36,7 @@ struct Tag {
 // The tags of a text in order; white space alone is no text.
 std::vector<Tag> scan(std::string_view text);
 
-// Where the byte of an attribute's value stands that is that many after its first
+// Where the byte of an attribute's value is that comes that many after its first
 // one as Mini-XML reads it; for its end, after its last.
 std::size_t place_in_value(std::string_view text, const Attribute &attribute, std::size_t byte);
 

@@ -24,7 +24,7 @@ namespace
 {
 
 // The components that the library sees in the path of this group, or of this
-// item. A name that holds a '/' is two, an empty one is none.
+// item. A name that holds a '/' is two; an empty one is no component.
 std::vector<std::string> components(const std::string &names)
 {
     std::string path = ("root/" + names).substr(0, kPathLimit);

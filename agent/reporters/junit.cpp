@@ -108,8 +108,8 @@ std::string filled_in(const std::string &text, const std::string &how_it_stands)
 {
     std::string whole;
     std::size_t at = 0;
-    for (std::size_t mark = text.find(kHowItStands); mark != std::string::npos;
-         mark = text.find(kHowItStands, at)) {
+    for (std::size_t mark = text.find(kStateGoesHere); mark != std::string::npos;
+         mark = text.find(kStateGoesHere, at)) {
         whole.append(text, at, mark - at).append(how_it_stands);
         at = mark + 1;
     }
@@ -287,7 +287,7 @@ class JunitReport : public Listener
     bool write(const Run &run, const Sink &sink) const
     {
         const off_t end = spool_.size(); // the sink may be the spool itself
-        const std::string how = junit_how_it_stands(run);
+        const std::string how = junit_state(run);
         if (!sink(junit_head(run, before_))) {
             return false;
         }

@@ -222,7 +222,7 @@ std::string test_suite(const Run &run, std::size_t number, const std::vector<Lat
     std::string inside = property(indent, "plan", run.plan) +
                          property(indent, "vendor", std::to_string(run.vendor)) +
                          property(indent, "pass_code", std::to_string(run.pass_code)) +
-                         kHowItStands;
+                         kStateGoesHere;
     for (const Late &one : late) {
         if (one.suite == number) {
             inside += property(indent, "late_report", one.text);
@@ -304,7 +304,7 @@ std::string junit_round(const Run &run, const std::vector<Late> &late)
     return text;
 }
 
-std::string junit_how_it_stands(const Run &run)
+std::string junit_state(const Run &run)
 {
     const std::string indent(6, ' ');
     std::string text = property(indent, "finished", run.finished ? "true" : "false");

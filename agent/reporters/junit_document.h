@@ -35,10 +35,10 @@ Tests tests_of_round(const Run &run);
 std::string junit_head(const Run &run, const Tests &before);
 
 // The suites of the round. In each, this character is in the place of what
-// junit_how_it_stands() gives when the document is written.
+// junit_state() gives when the document is written.
 std::string junit_round(const Run &run, const std::vector<Late> &late);
-constexpr char kHowItStands = '\0';
-std::string junit_how_it_stands(const Run &run);
+constexpr char kStateGoesHere = '\0';
+std::string junit_state(const Run &run);
 
 // From after the last suite of the round: an error for the rounds that are to come.
 std::string junit_tail(const Run &run);

@@ -173,7 +173,7 @@ class LiveView : public Listener
         }
     }
 
-    // What stands there now is the shell's.
+    // What is there now is the shell's.
     void resumed(const Run &run) override
     {
         drawn_.clear();

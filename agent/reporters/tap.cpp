@@ -223,7 +223,7 @@ class TapReport : public Listener
         suite_ = 0;
     }
 
-    // The lines that are due. Points stand in the order of the plan, or a harness
+    // The lines that are due. Points come in the order of the plan, or a harness
     // complains: one that has ended early waits for those before it.
     std::string next_lines(const Run &run, bool all)
     {

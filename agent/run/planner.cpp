@@ -126,8 +126,8 @@ std::vector<std::optional<Plan::Element>> resolve(const Path &path, const Plan &
 }
 
 // Whether every item of the group is what a path with its name runs.
-bool is_addressable(const Plan &plan, const std::string &group,
-                    const std::vector<std::optional<Plan::Element>> &items)
+bool run_by_their_own_paths(const Plan &plan, const std::string &group,
+                            const std::vector<std::optional<Plan::Element>> &items)
 {
     return std::ranges::all_of(items, [&](const auto &item) {
         if (!item || !item->name || item->name->find_first_of("/:\t\n") != std::string::npos) {
@@ -148,7 +148,7 @@ class WorkPlanner
     void add(const Path &path)
     {
         const auto items = resolve(path, plan_);
-        if (as_group_ || !path.item.empty() || !is_addressable(plan_, path.group, items)) {
+        if (as_group_ || !path.item.empty() || !run_by_their_own_paths(plan_, path.group, items)) {
             add_job(path.text, path.group, items);
             return;
         }

@@ -107,10 +107,10 @@ struct Place {
 const ItemRun &item_at(const Run &run, Place place);
 
 Counts count(const std::vector<ItemRun> &items);
-// Of all rounds. To go is what is left of this round, and of those to come.
+// Of all rounds. What is left of this round, and those to come, are not run.
 Counts count(const Run &run);
 
-// Whether it is over, and why what has not been run has not.
+// Whether the run is over. The second says why some of its items were not run.
 bool has_ended(const Run &run);
 const std::string &why_not_all(const Run &run);
 
@@ -140,7 +140,7 @@ std::string title(const Run &run, const Suite &suite);
 // Gets told what happens, in this order: begin, then for each item started, any
 // number of progressed, ended; round_over between one round and the next; then
 // finish, also where items were not run. What is told is already in the run. None
-// of them waits for who reads.
+// may wait for its reader.
 class Listener
 {
   public:

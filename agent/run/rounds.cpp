@@ -185,7 +185,7 @@ std::string failures(const std::vector<Listener *> &listeners)
     return join_and(all);
 }
 
-// For who has interrupted the run, unless that is nobody any more.
+// Nothing where standard error has no reader any more.
 void say_at_end(const std::string &text)
 {
     pollfd errors{STDERR_FILENO, POLLOUT, 0};
@@ -265,7 +265,7 @@ void begin(Run &run, const std::vector<Listener *> &listeners, Signals &signals)
 } // namespace
 
 Exit run_rounds(const std::vector<Listener *> &listeners, const Runner::Limits &limits,
-                LibraryProcess &host, Signals &signals, Run &run, const Work &work,
+                LibraryProcess &library, Signals &signals, Run &run, const Work &work,
                 const std::function<void()> &store)
 {
     run.suites = work.suites;
@@ -277,7 +277,7 @@ Exit run_rounds(const std::vector<Listener *> &listeners, const Runner::Limits &
     } catch (const Failure &failure) {
         run_nothing(failure.what(), run, listeners, signals);
     }
-    Runner runner(host, signals, run, listeners, limits);
+    Runner runner(library, signals, run, listeners, limits);
     runner.note_earlier_plan(earlier_plan);
     bool broken = false;
     try {

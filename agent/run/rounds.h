@@ -4,7 +4,7 @@
 // Runs the rounds of a run, and tells of them.
 #pragma once
 
-#include "module/module_process.h"
+#include "module/library_process.h"
 #include "run/planner.h"
 #include "run/runner.h"
 #include "util/failure.h"
@@ -19,7 +19,7 @@ namespace fptest
 // not be carried through. The plan is stored once each report has been begun; where that
 // throws a Failure, they are ended.
 Exit run_rounds(const std::vector<Listener *> &listeners, const Runner::Limits &limits,
-                LibraryProcess &host, Signals &signals, Run &run, const Work &work,
+                LibraryProcess &library, Signals &signals, Run &run, const Work &work,
                 const std::function<void()> &store);
 
 } // namespace fptest

@@ -64,12 +64,12 @@ int signal_of(int status)
 
 // --- a job --------------------------------------------------------------------
 
-Runner::Runner(LibraryProcess &host, Signals &signals, Run &run,
+Runner::Runner(LibraryProcess &library, Signals &signals, Run &run,
                const std::vector<Listener *> &listeners, const Limits &limits)
-    : host_(host), signals_(signals), run_(run), listeners_(listeners), limits_(limits)
+    : library_(library), signals_(signals), run_(run), listeners_(listeners), limits_(limits)
 {
     signals_.take_suspensions();
-    host_.hold_at_ends();
+    library_.hold_at_ends();
 }
 
 Runner::TimePoint Runner::now() const
@@ -101,26 +101,26 @@ bool Runner::run(const Job &job)
     if (!goes_on()) {
         return false;
     }
-    module_gone_.clear();
+    library_gone_.clear();
     std::vector<std::string> names;
     for (const auto &target : job.targets) {
         if (target) {
             names.push_back(run_.suites[job.suite].items[target->item].name);
         }
     }
-    note_lost_module();
-    host_.restart(); // if something has ended it since the last job: that costs nothing
+    note_lost_library();
+    library_.restart(); // if something has ended it since the last job: that costs nothing
     // a process that reports, such as a gatherer, truncates the plan before it writes it:
     // the library may load it until it has come to the first item
     Descriptor plan = lock_stored_plan();
-    host_.command("XMLNodePath::" + job.path, names);
+    library_.command("XMLNodePath::" + job.path, names);
     heard_of_at_ = now();
 
     job_ = job;
     next_ = 0;
     bool runs = true;
     while ((runs || !active_.empty()) && !broken_) {
-        if (const auto event = host_.wait(kTurn, signals_.descriptor())) {
+        if (const auto event = library_.wait(kTurn, signals_.descriptor())) {
             plan = Descriptor(-1);
             heard_of_at_ = now();
             handle(*event, runs);
@@ -151,9 +151,9 @@ void Runner::require_all_started()
         }
         result.seconds = 0;
         result.outcome = Outcome::no_result;
-        result.reason = module_gone_.empty()
+        result.reason = library_gone_.empty()
                             ? "the library never reached it; run with --log FILE to see why"
-                            : fmt::format("the library never reached it: {}", module_gone_);
+                            : fmt::format("the library never reached it: {}", library_gone_);
         for (Listener *listener : listeners_) {
             listener->ended(run_, place);
         }
@@ -194,15 +194,15 @@ void Runner::handle(const LibraryProcess::Event &event, bool &runs)
         break;
     case LibraryProcess::Event::Kind::gone:
         runs = false;
-        lose_module(event);
+        lose_library(event);
         break;
     }
 }
 
 // Its end between two jobs: what it has started comes to this process then.
-void Runner::note_lost_module()
+void Runner::note_lost_library()
 {
-    while (const auto event = host_.wait(0ms)) {
+    while (const auto event = library_.wait(0ms)) {
         if (event->kind == LibraryProcess::Event::Kind::stopped) {
             note_stop(*event);
         } else if (event->kind == LibraryProcess::Event::Kind::gone) {
@@ -212,21 +212,21 @@ void Runner::note_lost_module()
 }
 
 // It costs the items that it was running; the next ones get another.
-void Runner::lose_module(const LibraryProcess::Event &event)
+void Runner::lose_library(const LibraryProcess::Event &event)
 {
-    module_gone_ = gone_text(event);
+    library_gone_ = gone_text(event);
     stop_asked_ = false;
     if (!active_.empty()) {
-        append_output(item(active_.back().place).output, host_.take_output(event.output));
+        append_output(item(active_.back().place).output, library_.take_output(event.output));
     }
-    read_reports(whole_stored_plan());
+    read_reports(Plan::parse_annotated(whole_stored_plan()));
     for (RunningItem &active : active_) {
         finish(active, on_run_clock(event.time));
     }
     notify_ended();
     end_left_running();
     if (!broken_) {
-        host_.restart();
+        library_.restart();
     }
 }
 
@@ -242,7 +242,7 @@ void Runner::watch(bool command_runs)
 void Runner::tick()
 {
     run_.seconds = Seconds(now() - began_).count();
-    const std::string output = host_.take_output();
+    const std::string output = library_.take_output();
     if (!active_.empty()) {
         append_output(item(active_.back().place).output, output);
     }
@@ -300,16 +300,16 @@ void Runner::start_next(const LibraryProcess::Event &event)
     }
 }
 
-// The item's process has ended, and the library waits: what stands in the plan now is
+// The item's process has ended, and the library waits: what is in the plan now is
 // what the item has reported.
 void Runner::end_item(const LibraryProcess::Event &event)
 {
-    const std::string output = host_.take_output(event.output);
+    const std::string output = library_.take_output(event.output);
     const bool is_watched = !active_.empty() && !active_.back().moved_on;
     if (is_watched) {
-        const std::string plan = whole_stored_plan();
+        const auto plan = Plan::parse_annotated(whole_stored_plan());
         read_reports(plan); // before what it has left can report again
-        active_.back().report_lost = !Plan::parse_annotated(plan);
+        active_.back().report_lost = !plan;
     }
     const std::vector<Leftover> left =
         event.left_running
@@ -332,9 +332,9 @@ void Runner::end_item(const LibraryProcess::Event &event)
         notify_ended();
     }
     if (starts_no_more()) {
-        host_.kill_module();
+        library_.kill_library();
     } else {
-        host_.go_on();
+        library_.go_on();
     }
 }
 
@@ -342,7 +342,7 @@ void Runner::end_item(const LibraryProcess::Event &event)
 // gatherer, or with an item that it could not start.
 void Runner::move_on(const LibraryProcess::Event &event)
 {
-    const std::string output = host_.take_output(event.output);
+    const std::string output = library_.take_output(event.output);
     if (active_.empty()) {
         return;
     }
@@ -354,8 +354,9 @@ void Runner::move_on(const LibraryProcess::Event &event)
     active.moved_on = true;
     active.moved_on_at = on_run_clock(event.time);
     active.told = true;
-    read_reports(event.kind == LibraryProcess::Event::Kind::returned ? host_.read_back()
-                                                                     : whole_stored_plan());
+    read_reports(Plan::parse_annotated(event.kind == LibraryProcess::Event::Kind::returned
+                                           ? library_.read_back()
+                                           : whole_stored_plan()));
     if (!gathers(active) || !active.gatherer_end.empty()) {
         finish(active, active.moved_on_at);
         notify_ended();
@@ -385,7 +386,7 @@ void Runner::finish(RunningItem &active, TimePoint end)
     }
     if (gathers(active) && !(result.report.progress == "100" && has_result(result.report))) {
         gatherer_may_report_late_ = true;
-        signal_each(host_.processes().of_gatherer(), SIGTERM);
+        signal_each(library_.processes().of_gatherer(), SIGTERM);
     }
     judged_.push_back({active.place, active.target, run_.round, std::move(active.seen)});
     judged_.back().seen.push_back(result.report);
@@ -401,9 +402,9 @@ void Runner::judge(const RunningItem &active)
         (active.stop == Outcome::stopped && active.was_stopped)) {
         result.outcome = *active.stop;
         result.reason = why_stopped(active);
-    } else if (!module_gone_.empty()) {
+    } else if (!library_gone_.empty()) {
         result.outcome = has_reported ? Outcome::failed : Outcome::no_result;
-        result.reason = module_gone_;
+        result.reason = library_gone_;
         result.overruled = has_reported;
     } else if (result.signal != 0) {
         result.outcome = Outcome::failed;
@@ -437,9 +438,9 @@ void Runner::judge(const RunningItem &active)
 
 std::string Runner::why_stopped(const RunningItem &active)
 {
-    if (!active.was_stopped && !module_gone_.empty()) {
+    if (!active.was_stopped && !library_gone_.empty()) {
         return fmt::format("past the limit of {}: {}", fine_duration(limits_.item->count()),
-                           module_gone_);
+                           library_gone_);
     }
     const double seconds = *item(active.place).seconds;
     if (!active.was_stopped) {

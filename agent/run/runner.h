@@ -4,7 +4,7 @@
 // Runs what is to be run, watches it, stops it.
 #pragma once
 
-#include "module/module_process.h"
+#include "module/library_process.h"
 #include "plan/plan.h"
 #include "run/results.h"
 #include "run/signals.h"
@@ -44,14 +44,14 @@ class Runner
     };
 
     // All of them outlive the runner.
-    Runner(LibraryProcess &host, Signals &signals, Run &run,
+    Runner(LibraryProcess &library, Signals &signals, Run &run,
            const std::vector<Listener *> &listeners, const Limits &limits);
 
     // The stored plan before the run: a gatherer may have kept a copy of it.
     void note_earlier_plan(const std::string &text);
 
-    // Runs one job after another and fills in the run. False where the run has
-    // come to its end: the run then says why.
+    // Runs a job and fills in its items. False where the run has come to its end: the run
+    // then says why.
     bool run(const Job &job);
 
     // Whether the run goes on: no signal has come, and nothing has ended it.
@@ -82,7 +82,9 @@ class Runner
     // The time of the run: it stands still while the run is suspended.
     using TimePoint = SteadyClock::time_point;
 
-    // An item from its start until its end has been told.
+    // An item from its start until its end has been told. It runs; the library moves on, so
+    // that only a gatherer is still at work; it is done; its end is told, in the order of
+    // the starts. The last one is the library's current item, those before it are gatherers.
     struct RunningItem {
         Place place;
         Job::Target target;
@@ -130,12 +132,12 @@ class Runner
     void start_next(const LibraryProcess::Event &event);
     void end_item(const LibraryProcess::Event &event);
     void move_on(const LibraryProcess::Event &event);
-    void note_lost_module();
-    void lose_module(const LibraryProcess::Event &event);
+    void note_lost_library();
+    void lose_library(const LibraryProcess::Event &event);
     void require_all_started();
     void require_plan();
     void poll_reports();
-    void read_reports(const std::string &text);
+    void read_reports(const std::optional<Plan> &plan);
     void read_report(RunningItem &active, const Plan &plan);
     void read_late_report(Judged &judged, const Plan &plan);
     bool is_older(RunningItem &active, const Plan &plan, const ItemReport &report);
@@ -172,7 +174,7 @@ class Runner
     const ItemRun &item(const Place &place) const;
     bool gathers(const RunningItem &active) const;
 
-    LibraryProcess &host_;
+    LibraryProcess &library_;
     Signals &signals_;
     Run &run_;
     const std::vector<Listener *> &listeners_;
@@ -198,7 +200,7 @@ class Runner
     TimePoint signal_taken_at_;
     bool stop_asked_ = false;               // and not yet answered
     bool gatherer_may_report_late_ = false; // it may still report what it was told in vain
-    std::string module_gone_;               // why, in the job in which its process ended
+    std::string library_gone_;              // why, in the job in which its process ended
     bool broken_ = false;
 };
 

@@ -67,11 +67,11 @@ void Runner::poll_reports()
         (status.st_mtim.tv_sec != plan_status_.st_mtim.tv_sec ||
          status.st_mtim.tv_nsec != plan_status_.st_mtim.tv_nsec ||
          status.st_size != plan_status_.st_size || status.st_ino != plan_status_.st_ino)) {
-        const auto text = read_stored_plan();
-        if (text && Plan::parse_annotated(*text)) {
+        const std::string text = read_stored_plan().value_or("");
+        if (const auto plan = Plan::parse_annotated(text)) {
             plan_status_ = status;
-            read_reports(*text);
-            if (!Plan::load_as_library(*text)) {
+            read_reports(plan);
+            if (!Plan::load_as_library(text)) {
                 mend_stored_plan(); // or who reports next could not
             }
         }
@@ -97,7 +97,7 @@ void Runner::poll_gatherer(RunningItem &active)
         return;
     }
     active.gatherer_looked_for = now();
-    active.gatherer_missed = host_.processes().has_gatherer() ? 0 : active.gatherer_missed + 1;
+    active.gatherer_missed = library_.processes().has_gatherer() ? 0 : active.gatherer_missed + 1;
     if (active.gatherer_missed < 2 || now() - active.start < kBeforeMissed) {
         return;
     }
@@ -108,9 +108,8 @@ void Runner::poll_gatherer(RunningItem &active)
     }
 }
 
-void Runner::read_reports(const std::string &text)
+void Runner::read_reports(const std::optional<Plan> &plan)
 {
-    const auto plan = Plan::parse_annotated(text);
     if (!plan) {
         return;
     }
@@ -190,7 +189,7 @@ void Runner::begin_gathering()
             active.overwritten = false;
         }
     }
-    host_.go_on();
+    library_.go_on();
 }
 
 // As of the round of its item.

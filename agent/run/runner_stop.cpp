@@ -14,6 +14,7 @@
 #include <csignal>
 #include <cstdio>
 #include <fmt/core.h>
+#include <iterator>
 #include <poll.h>
 #include <set>
 #include <thread>
@@ -29,7 +30,7 @@ using namespace std::chrono_literals;
 constexpr auto kBetweenStops = 250ms;
 constexpr auto kBeforeRelease = 300ms;
 constexpr auto kBeforeGivingUp = 5s; // on what was killed: device/run waits for 10 s in all
-constexpr auto kForALongPlan = 60s;  // with the plan itself, between two items
+constexpr auto kForALongPlan = 60s;  // to load and save a large plan, between two items
 // What only takes a moment longer to end has not been left running.
 constexpr auto kEnding = 100ms;
 
@@ -62,7 +63,7 @@ void Runner::read_signals()
             continue; // a shell that is left sends a job that it had stopped both
         }
         if (signal_ != 0) {
-            // the reports are as far as they were written; the host's process
+            // the reports are as far as they were written; the library's process
             // sees that this one is gone and stops what runs
             pollfd errors{STDERR_FILENO, POLLOUT, 0};
             if (poll(&errors, 1, 0) > 0) { // a terminal may be stopped
@@ -91,9 +92,9 @@ void Runner::suspend()
         listener->paused(run_);
     }
     const auto begin = SteadyClock::now();
-    host_.suspend();
+    library_.suspend();
     Signals::suspend();
-    host_.resume();
+    library_.resume();
     last_suspension_ = begin;
     last_suspended_ = SteadyClock::now() - begin;
     suspended_ += last_suspended_;
@@ -116,7 +117,7 @@ void Runner::stop_what_is_due(bool command_runs)
         try_stop(active_.back(), command_runs);
     }
     if (active_.empty() && command_runs && is_stuck()) {
-        host_.kill_module(); // it comes to no item, and does not return
+        library_.kill_library(); // it comes to no item, and does not return
     }
     // the library stops only what it started last: an earlier gatherer gets signals alone
     for (RunningItem &active : active_) {
@@ -132,7 +133,7 @@ bool Runner::is_stuck() const
 {
     const auto silent = now() - heard_of_at_;
     return (signal_ != 0 && now() - signal_taken_at_ > limits_.grace + kBeforeGivingUp) ||
-           (silent > kBeforeGivingUp && host_.is_suspended()) ||
+           (silent > kBeforeGivingUp && library_.is_suspended()) ||
            (limits_.item && silent > *limits_.item + kForALongPlan);
 }
 
@@ -144,7 +145,7 @@ void Runner::try_stop(RunningItem &active, bool command_runs)
     const bool gatherer = gathers(active);
     if ((!gatherer || !active.moved_on) && waited > limits_.grace + kBeforeGivingUp) {
         if (gatherer || item_processes().empty()) {
-            host_.kill_module(); // it is that which does not go on
+            library_.kill_library(); // it is that which does not go on
         } else {
             cannot_stop(active);
         }
@@ -160,7 +161,7 @@ void Runner::try_stop(RunningItem &active, bool command_runs)
         active.meets_other =
             met && !std::ranges::any_of(processes_of(active),
                                         [&](const auto &one) { return one.process == *met; });
-        host_.stop(item(active.place).name);
+        library_.stop(item(active.place).name);
         stop_asked_ = true;
     }
     if (gatherer) {
@@ -175,7 +176,7 @@ void Runner::try_stop(RunningItem &active, bool command_runs)
 void Runner::release_command()
 {
     if (starts_no_more()) {
-        host_.kill_module();
+        library_.kill_library();
     } else {
         release_trigger();
     }
@@ -194,7 +195,7 @@ void Runner::stop_gatherer(RunningItem &active, bool command_runs, SteadyClock::
         active.was_stopped = true;
         release_command();
     }
-    const std::vector<Leftover> left = host_.processes().of_gatherer();
+    const std::vector<Leftover> left = library_.processes().of_gatherer();
     if (&active != &active_.back() && !active.was_stopped && signal_each(left, SIGTERM)) {
         signal_each(left, SIGCONT); // one that is suspended would not see it
         active.was_stopped = true;
@@ -244,12 +245,12 @@ void Runner::cannot_stop(RunningItem &active)
 // Those of the item that runs, and of no other that has left some.
 std::vector<Leftover> Runner::item_processes() const
 {
-    return host_.processes().of_items(left_);
+    return library_.processes().of_items(left_);
 }
 
 std::vector<Leftover> Runner::processes_of(const RunningItem &active) const
 {
-    return gathers(active) ? host_.processes().of_gatherer() : item_processes();
+    return gathers(active) ? library_.processes().of_gatherer() : item_processes();
 }
 
 std::vector<Leftover> Runner::note_left_running(std::size_t element)
@@ -272,7 +273,7 @@ template <typename Find> void Runner::end_all(const Find &find)
 {
     const auto begin = now();
     const auto find_all = [&] {
-        note_lost_module();
+        note_lost_library();
         return find();
     };
     std::set<pid_t> asked;
@@ -316,7 +317,7 @@ void Runner::make_way_for(const Job &job)
             note_gathered(plan->report((*gatherer)->element));
         }
         // the library does not find one that is a script, and would start another beside it
-        const std::vector<Leftover> running = host_.processes().of_gatherer();
+        const std::vector<Leftover> running = library_.processes().of_gatherer();
         const bool is_found = std::ranges::any_of(
             running, [](const Leftover &one) { return one.name.starts_with(kGatherer); });
         if (gatherer_may_report_late_ || (!running.empty() && !is_found)) {
@@ -339,21 +340,23 @@ void Runner::end_round()
     }
     poll_reports();
     // the gatherer goes on: its copy of the plan has its last report
-    gathered_.erase(gathered_.begin(), gathered_.end() - (gathered_.empty() ? 0 : 1));
+    if (gathered_.size() > 1) {
+        gathered_.erase(gathered_.begin(), std::prev(gathered_.end()));
+    }
     std::erase_if(judged_,
                   [&](const Judged &one) { return !is_gatherer(item(one.place).name, vendor_); });
 }
 
 void Runner::end_left_running()
 {
-    end_all([this] { return host_.processes().of_items(); });
+    end_all([this] { return library_.processes().of_items(); });
     left_.clear();
     left_elements_.clear();
 }
 
 void Runner::end_gatherer()
 {
-    end_all([this] { return host_.processes().of_gatherer(); });
+    end_all([this] { return library_.processes().of_gatherer(); });
     gatherer_may_report_late_ = false;
 }
 

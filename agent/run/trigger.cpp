@@ -17,12 +17,12 @@ namespace fptest
 void release_trigger()
 {
     const Descriptor connection(socket(AF_INET, SOCK_STREAM | SOCK_NONBLOCK | SOCK_CLOEXEC, 0));
-    sockaddr_in module{};
-    module.sin_family = AF_INET;
-    module.sin_port = htons(kTriggerPort);
-    module.sin_addr.s_addr = htonl(INADDR_LOOPBACK);
+    sockaddr_in address{};
+    address.sin_family = AF_INET;
+    address.sin_port = htons(kTriggerPort);
+    address.sin_addr.s_addr = htonl(INADDR_LOOPBACK);
     static_cast<void>(
-        connect(connection.get(), reinterpret_cast<const sockaddr *>(&module), sizeof module));
+        connect(connection.get(), reinterpret_cast<const sockaddr *>(&address), sizeof address));
     // long enough to be accepted; nothing depends on what is read
     std::this_thread::sleep_for(std::chrono::milliseconds(25));
 }

@@ -5,6 +5,7 @@
 
 #include "common/descriptor.h"
 #include "util/failure.h"
+#include "util/text.h"
 
 #include <array>
 #include <cerrno>
@@ -74,6 +75,14 @@ std::string why_unread()
     return errno != EFBIG
                ? std::strerror(errno)
                : fmt::format("longer than the {} MiB that fptest reads", kFileLimit >> 20U);
+}
+
+std::string require_file(const std::string &path)
+{
+    if (auto text = read_file(path)) {
+        return *text;
+    }
+    throw Failure(Exit::usage, "{}: {}", one_line(path), why_unread());
 }
 
 std::string end_of_links(const std::string &path)

@@ -24,6 +24,9 @@ std::optional<std::string> read_file(const std::string &path, int flags = 0);
 // Why read_file() has just failed, for people.
 std::string why_unread();
 
+// As read_file(), but throws a Failure where it cannot be read.
+std::string require_file(const std::string &path);
+
 // Where a path leads through symbolic links, also to a file that is not there yet.
 std::string end_of_links(const std::string &path);
 

@@ -20,7 +20,7 @@ namespace fptest
 // controls and bytes that are no UTF-8 as U+FFFD.
 std::string sanitize_utf8(std::string_view bytes);
 
-// As clean(), and on one line: tabs and line ends are pictures, too, and what
+// As sanitize_utf8(), and on one line: tabs and line ends are pictures, too, and what
 // turns the direction of a text (overrides, embeddings, isolates) is U+FFFD.
 std::string one_line(std::string_view bytes);
 

@@ -97,14 +97,14 @@ std::size_t count_input()
 
 void wait_for_word_to_gather()
 {
-    sockaddr_in module{};
-    module.sin_family = AF_INET;
-    module.sin_port = htons(34952);
-    module.sin_addr.s_addr = htonl(INADDR_LOOPBACK);
+    sockaddr_in address{};
+    address.sin_family = AF_INET;
+    address.sin_port = htons(34952);
+    address.sin_addr.s_addr = htonl(INADDR_LOOPBACK);
     for (std::size_t got = 0; got == 0;) {
         const int connection = socket(AF_INET, SOCK_STREAM, 0);
         char byte = 0;
-        if (connect(connection, reinterpret_cast<sockaddr *>(&module), sizeof module) == 0) {
+        if (connect(connection, reinterpret_cast<sockaddr *>(&address), sizeof address) == 0) {
             got = read(connection, &byte, 1) == 1 ? 1 : 0;
         }
         close(connection);

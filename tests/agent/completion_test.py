@@ -74,7 +74,7 @@ def test_every_option_is_offered_that_the_help_tells(offered, command):
     ("show plans/", ["plans/demo.xml", "plans/other plan.xml"]),
     ("run --plan =", ["fptest", "list", "plans"]),
     ("show plans/demo.xml pl", []),
-    # codes that the module knows
+    # codes that the library knows
     ("run --pass-code ''", ["-2", "0", "1"]),
     ("report G I --result -", ["-2"]),
     # numbers, words

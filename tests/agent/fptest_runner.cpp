@@ -64,18 +64,18 @@ FptestProcess::FptestProcess(const std::vector<std::string> &arguments)
 {
 }
 
-pid_t FptestProcess::module() const
+pid_t FptestProcess::library() const
 {
-    pid_t module = 0;
+    pid_t library = 0;
     EXPECT_TRUE(device::eventually([&] {
         for (const device::Process &process : device::processes()) {
             if (process.parent == pid() && process.state != 'Z') {
-                module = process.pid;
+                library = process.pid;
             }
         }
-        return module != 0;
+        return library != 0;
     }));
-    return module;
+    return library;
 }
 
 // Whatever is missing here makes the test fail by what the program then does.

@@ -27,7 +27,7 @@ class FptestProcess : public support::Process
     explicit FptestProcess(const std::vector<std::string> &arguments);
 
     // Its process that runs the library, waited for.
-    pid_t module() const;
+    pid_t library() const;
 };
 
 // How it may be started: each is a Start's prepare.

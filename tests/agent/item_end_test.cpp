@@ -133,7 +133,7 @@ TEST_F(ItemEnd, LibrarysProcessThatEndsBetweenTwoRoundsCostsNothing)
     for (const std::size_t round : {1, 2}) {
         ASSERT_TRUE(eventually([&] { return events("end").size() == round; }));
         std::this_thread::sleep_for(std::chrono::milliseconds(500));
-        kill(fptest.module(), SIGKILL);
+        kill(fptest.library(), SIGKILL);
     }
     EXPECT_EQ(fptest.wait().status, 0);
     EXPECT_THAT(outcomes(), ElementsAre("Item: passed", "Item: passed"));
@@ -405,7 +405,7 @@ TEST_F(ItemEnd, FifoInThePlansPlaceEndsTheRun)
     EXPECT_THAT(outcomes(), ElementsAre("Script: no result", "Item: not run"));
 }
 
-TEST_F(ItemEnd, ReportBeforeTheModulesProcessDiedIsRead)
+TEST_F(ItemEnd, ReportBeforeTheLibrarysProcessDiedIsRead)
 {
     run_group({{"Script", script(script_report("0", "fine") + "; kill -KILL $PPID; sleep 60")},
                {"Item", kPasses}});
@@ -413,7 +413,7 @@ TEST_F(ItemEnd, ReportBeforeTheModulesProcessDiedIsRead)
     EXPECT_EQ(end_of(0).at("description"), "fine");
 }
 
-TEST_F(ItemEnd, ModulesProcessThatIsSuspendedIsReplaced)
+TEST_F(ItemEnd, LibrarysProcessThatIsSuspendedIsReplaced)
 {
     const Ended ended = run_group({{"Script", script("kill -STOP $PPID")}, {"Item", kPasses}},
                                   {"--timeout", "0.3", "--grace", "0.3"});

@@ -22,7 +22,7 @@ using namespace std::string_view_literals;
 namespace
 {
 
-// "KIND NAME|what stands there", with " ..." after what is not complete.
+// "KIND NAME|what is there", with " ..." after what is not complete.
 std::vector<std::string> scanned(std::string_view text)
 {
     constexpr std::array<const char *, 8> kKinds = {
@@ -37,7 +37,7 @@ std::vector<std::string> scanned(std::string_view text)
     return tags;
 }
 
-// "NAME|what stands there|its value" for the attributes of the first tag.
+// "NAME|what is there|its value" for the attributes of the first tag.
 std::vector<std::string> attributes(std::string_view text)
 {
     std::vector<std::string> list;

@@ -297,13 +297,15 @@ TEST_F(Output, LogIsAFileOfItsOwnWhoeverNamesIt)
     EXPECT_EQ(read_file(work("file")), kLoud);
 }
 
+const std::vector<device::Lines> kWithLog = {
+    {"run", "P/G"},
+    {"send", "pingtest"},
+    {"report", "G", "Item", "--progress", "1", "--result", "0"}};
+
 TEST_F(Output, LogIsNeverTheStoredPlan)
 {
     device::write_file(device::kPlanFile, kLoud);
-    for (const device::Lines &arguments :
-         {device::Lines{"run", "P/G"},
-          {"send", "pingtest"},
-          {"report", "G", "Item", "--progress", "1", "--result", "0"}}) {
+    for (const device::Lines &arguments : kWithLog) {
         expect_log_refusal(2, arguments, device::kPlanFile,
                            "{} and the library both want the file /data/vorlane/src1.xml: give "
                            "them files of their own");
@@ -314,10 +316,7 @@ TEST_F(Output, LogIsNeverTheStoredPlan)
 TEST_F(Output, LogThatCannotBeWrittenIsRefusedWhoeverNamesIt)
 {
     device::write_file(device::kPlanFile, kLoud);
-    for (const device::Lines &arguments :
-         {device::Lines{"run", "P/G"},
-          {"send", "pingtest"},
-          {"report", "G", "Item", "--progress", "1", "--result", "0"}}) {
+    for (const device::Lines &arguments : kWithLog) {
         expect_log_refusal(3, arguments, "/nowhere/log",
                            "{=}/nowhere/log cannot be written: No such file or directory; name "
                            "another file");
@@ -329,10 +328,7 @@ TEST_F(Output, LogIsNotStandardOutput)
     device::write_file(device::kPlanFile, kLoud);
     const std::string why = " is standard output, which is not for the library's log: name a file "
                             "for that";
-    for (const device::Lines &arguments :
-         {device::Lines{"run", "P/G"},
-          {"send", "pingtest"},
-          {"report", "G", "Item", "--progress", "1", "--result", "0"}}) {
+    for (const device::Lines &arguments : kWithLog) {
         expect_log_refusal(2, arguments, "-", "{=}-" + why);
     }
     for (const device::Lines &arguments :

@@ -270,14 +270,14 @@ TEST_F(Report, SaysThatTheDiskIsFull)
                               "bytes; the stored plan is as it was\n")))
         << ended.err;
     EXPECT_EQ(read_file(kPlanFile), kPlan);
-    // it has room where the old text stood, for no more than it takes
+    // it has room where the old text was, for no more than it takes
     EXPECT_EQ(report({"Bringup", "SpiCheck", "--progress", "1", "--result", "0", "--description",
                       std::string(2000, 'd')})
                   .status,
               0);
 }
 
-TEST_F(Report, WritesTheModulesLogWhereItIsTold)
+TEST_F(Report, WritesTheLibrarysLogWhereItIsTold)
 {
     EXPECT_EQ(
         report({"Bringup", "SpiCheck", "--progress", "1", "--result", "0", "--log", work("log")})

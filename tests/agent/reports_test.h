@@ -100,7 +100,7 @@ inline std::vector<Text> hostile_texts_for_json()
     return texts;
 }
 
-// A failed item with that text wherever one can stand.
+// A failed item with that text wherever one can be.
 inline RunOfItems run_with(const std::string &text)
 {
     ItemRun one = item(text, Outcome::failed, text);

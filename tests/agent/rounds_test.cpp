@@ -119,7 +119,7 @@ TEST_F(Rounds, EndAfterTheirNumberWhereThatComesBeforeTheTime)
     EXPECT_THAT(without_times(ended.out), HasSubstr("\n2 passed, 0 failed, T s\n"));
 }
 
-TEST_F(Rounds, TakeNoTimeThatIsNone)
+TEST_F(Rounds, RefuseWhatIsNotATime)
 {
     for (const std::string wrong : {"0", "-1", "x", "1w", "10mm", "1 h", "h", "nan", "0.0001"}) {
         expect_refusal(2,
@@ -175,7 +175,7 @@ TEST_F(Rounds, TakeNoMoreMemoryHoweverManyHaveBeenRun)
                           plan("<P><CmdGroup name=\"G\"><Cmd name=\"Item\" args=\"await "
                                "/tmp/scene/plan.xml\"/></CmdGroup></P>"),
                           "P/G"});
-    const pid_t module = fptest.module();
+    const pid_t library = fptest.library();
     const auto held_in = [&](int round) {
         EXPECT_TRUE(eventually(
             [&] {
@@ -184,12 +184,12 @@ TEST_F(Rounds, TakeNoMoreMemoryHoweverManyHaveBeenRun)
             },
             60));
         return std::pair(std::stol(device::status_field(fptest.pid(), "VmHWM")),
-                         std::stol(device::status_field(module, "VmRSS")));
+                         std::stol(device::status_field(library, "VmRSS")));
     };
-    const auto [early, early_module] = held_in(50);
-    const auto [late, late_module] = held_in(490);
+    const auto [early, early_library] = held_in(50);
+    const auto [late, late_library] = held_in(490);
     EXPECT_LT(late, early + 512) << "KiB";
-    EXPECT_LT(late_module, early_module + 512) << "KiB";
+    EXPECT_LT(late_library, early_library + 512) << "KiB";
     EXPECT_EQ(fptest.wait().status, 1);
 }
 

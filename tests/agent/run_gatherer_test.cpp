@@ -32,7 +32,7 @@ struct Gatherer : support::Process {
 class RunGatherer : public Run
 {
   protected:
-    static bool module_waits_for_gatherer()
+    static bool library_waits_for_gatherer()
     {
         const Lines all = device::listeners();
         return std::ranges::find(all, "00000000:8888") != all.end();
@@ -71,7 +71,7 @@ TEST_F(RunGatherer, InterruptedInAGroupsCommandIsFollowedByNoOtherItem)
 {
     FptestProcess fptest(with_group(
         {{"SensorProbe", "--help; exec sleep 30"}, {"Other", notes("x")}}, {"--as-group"}));
-    EXPECT_TRUE(eventually([] { return module_waits_for_gatherer(); }, 30));
+    EXPECT_TRUE(eventually([] { return library_waits_for_gatherer(); }, 30));
     fptest.signal(SIGINT);
     EXPECT_EQ(fptest.wait().status, 130);
     EXPECT_THAT(outcomes(), ElementsAre("SensorProbe: stopped", "Other: not run"));
@@ -131,7 +131,7 @@ TEST_F(RunGatherer, GoesOnWhereARunningOneHangs)
     signal_gatherer(SIGCONT);
 }
 
-TEST_F(RunGatherer, TakesNoStepOfItForItsEnd)
+TEST_F(RunGatherer, IsNotOverBeforeProgress100)
 {
     const Gatherer gatherer(
         "gather report G 50 0 half note /tmp/scene/half await /tmp/scene/go report G 100 1 whole");
@@ -171,8 +171,7 @@ TEST_F(RunGatherer, MayReportFromACopyOfThePlanThatItKeeps)
         const Gatherer gatherer(reports + "one " + reports + "two " + reports + "three sleep 60");
         run_group({{"SensorProbe", ""}, {"Item", "sleep 0.3 report G 100 0 fine"}},
                   {way, "--repeat", "3"});
-        EXPECT_THAT(outcomes(), Each(EndsWith(": passed")));
-        EXPECT_THAT(outcomes(), SizeIs(6));
+        EXPECT_THAT(outcomes(), AllOf(SizeIs(6), Each(EndsWith(": passed"))));
     }
 }
 
@@ -194,11 +193,10 @@ TEST_F(RunGatherer, CostsTheItemsAfterItNothingByALateReportFromItsCopy)
     const std::string keeps_copy =
         "report-here G Item 0 -2 begun sleep 0.2 report-here G Item 100 0 fine";
     run_group({{"SensorProbe", ""}, {"Item", keeps_copy}}, {"--as-group", "P/G"});
-    EXPECT_THAT(outcomes(), Each(EndsWith(": passed")));
-    EXPECT_THAT(outcomes(), SizeIs(4));
+    EXPECT_THAT(outcomes(), AllOf(SizeIs(4), Each(EndsWith(": passed"))));
 }
 
-TEST_F(RunGatherer, IsToldFromOneWithoutAReportWhereAnItemsCopyTookThatAway)
+TEST_F(RunGatherer, ReasonSaysThatAnItemsOldCopyErasedItsReport)
 {
     const Gatherer gatherer("gather sleep 0.1 report G 50 0 half sleep 0.2");
     run_group({{"SensorProbe", ""},
@@ -243,7 +241,7 @@ TEST_F(RunGatherer, HasNoResultFromWhatItsCopyOfThePlanSaysOfAnEarlierRun)
     EXPECT_THAT(outcomes(), ElementsAre("SensorProbe: failed", "Item: passed"));
 }
 
-TEST_F(RunGatherer, HasNoReportCountedThatItMakesBeforeItIsTold)
+TEST_F(RunGatherer, ReportsInVainBeforeItIsTold)
 {
     for (const std::string way : {"--quiet", "--as-group"}) {
         SCOPED_TRACE(way);
@@ -280,7 +278,7 @@ TEST_F(RunGatherer, HasTheLateReportsShownOfEachRound)
 TEST_F(RunGatherer, IsInterruptedWhileItWaitsForIt)
 {
     FptestProcess fptest(with_group(kGathererThatNeverComes));
-    EXPECT_TRUE(eventually([] { return module_waits_for_gatherer(); }, 30));
+    EXPECT_TRUE(eventually([] { return library_waits_for_gatherer(); }, 30));
     fptest.signal(SIGINT);
     const Ended ended = fptest.wait();
     EXPECT_EQ(ended.status, 130);
@@ -291,9 +289,9 @@ TEST_F(RunGatherer, IsInterruptedWhileItWaitsForIt)
 TEST_F(RunGatherer, LetsItsPortGoWhenItIsKilled)
 {
     FptestProcess fptest(with_group(kGathererThatNeverComes));
-    ASSERT_TRUE(eventually([] { return module_waits_for_gatherer(); }, 30));
+    ASSERT_TRUE(eventually([] { return library_waits_for_gatherer(); }, 30));
     fptest.signal(SIGKILL);
-    EXPECT_TRUE(eventually([] { return !module_waits_for_gatherer(); }, 20));
+    EXPECT_TRUE(eventually([] { return !library_waits_for_gatherer(); }, 20));
     EXPECT_TRUE(eventually([] { return processes_named(FPTEST_PROGRAM).empty(); }, 20));
 }
 

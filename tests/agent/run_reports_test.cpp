@@ -188,7 +188,7 @@ TEST_F(Run, HoldsNoMoreOfAnOutputThanItTells)
     FptestProcess fptest(with_group(
         {{"Item", "flood 60000000 say end note /tmp/scene/printed await /tmp/scene/go"}}));
     ASSERT_TRUE(wait_for_file("printed"));
-    const std::string held = "/proc/" + std::to_string(fptest.module()) + "/fd/1";
+    const std::string held = "/proc/" + std::to_string(fptest.library()) + "/fd/1";
     EXPECT_TRUE(eventually([&] { return memory_behind(held) < 1000000; })) << memory_behind(held);
     const std::string highest = device::status_field(fptest.pid(), "VmHWM");
     EXPECT_LT(std::stol(highest), 50000) << highest;

@@ -24,7 +24,7 @@ const device::PlanItem kScriptThatSleeps = {
 
 // --- items that take too long --------------------------------------------------------
 
-TEST_F(Run, StopsAnItemThatTakesTooLongThroughTheModule)
+TEST_F(Run, StopsAnItemThatTakesTooLongThroughTheLibrary)
 {
     const Ended ended = run_group({{"Item", kSleeps}, {"Other", kPasses}}, {"--timeout", "1"});
     EXPECT_EQ(ended.status, 1);
@@ -314,13 +314,13 @@ TEST_F(Run, BeginsAfterOneThatWasKilledWhenItsItemsHaveEnded)
     EXPECT_THAT(outcomes(), ElementsAre("SensorProbe: passed"));
 }
 
-TEST_F(Run, LosesTheItemInWhichTheModulesProcessEndedAndNoOther)
+TEST_F(Run, LosesTheItemInWhichTheLibrarysProcessEndedAndNoOther)
 {
     FptestProcess fptest(with_group(
         {{"Item", kPasses}, {"Other", "note /tmp/scene/begun sleep 60"}, {"Third", kPasses}},
         {"--tap", "--junit", work("junit")}));
     ASSERT_TRUE(wait_for_file("begun"));
-    kill(fptest.module(), SIGKILL);
+    kill(fptest.library(), SIGKILL);
     const Ended ended = fptest.wait();
     EXPECT_EQ(ended.status, 1);
     EXPECT_EQ(ended.err, "");
@@ -333,12 +333,12 @@ TEST_F(Run, LosesTheItemInWhichTheModulesProcessEndedAndNoOther)
     EXPECT_THAT(running_items(), IsEmpty());
 }
 
-TEST_F(Run, LosesWhatTheModulesProcessWouldHaveComeToInAGroupsCommand)
+TEST_F(Run, LosesWhatTheLibrarysProcessWouldHaveComeToInAGroupsCommand)
 {
     FptestProcess fptest(with_group(
         {{"Item", "note /tmp/scene/begun sleep 60"}, {"Other", kPasses}}, {"--as-group"}));
     ASSERT_TRUE(wait_for_file("begun"));
-    kill(fptest.module(), SIGKILL);
+    kill(fptest.library(), SIGKILL);
     EXPECT_EQ(fptest.wait().status, 1);
     EXPECT_THAT(outcomes(), ElementsAre("Item: no result", "Other: no result"));
     EXPECT_EQ(reasons().at(1), "the library never reached it: the library's process ended by "

@@ -246,7 +246,7 @@ TEST_F(Run, RunsNothingWhereAPathLeadsToNothing)
     EXPECT_FALSE(is_there("order"));
 }
 
-TEST_F(Run, WritesTheModulesLogWhereItIsToldOrNowhere)
+TEST_F(Run, WritesTheLibrarysLogWhereItIsToldOrNowhere)
 {
     Start start;
     start.environment["VR_LOG_FILE"] = std::nullopt;
@@ -306,7 +306,7 @@ TEST_F(Run, KnowsEachItemsStartAndDuration)
     }
 }
 
-TEST_F(Run, ShowsProgressAndAsksTheModuleForNothingWhileACommandRuns)
+TEST_F(Run, ShowsProgressAndAsksTheLibraryForNothingWhileACommandRuns)
 {
     FptestProcess fptest(
         with_group({{"Item", "report G 30 -2 begun sleep 0.1 report G 60 -2 b sleep 0.1 "

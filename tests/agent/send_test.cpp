@@ -134,7 +134,7 @@ TEST_F(Send, GivesItemsNoInput)
                 HasSubstr("0 bytes of input\n"));
 }
 
-TEST_F(Send, WritesTheModulesLogWhereItIsTold)
+TEST_F(Send, WritesTheLibrarysLogWhereItIsTold)
 {
     EXPECT_EQ(run_fptest({"send", "--log", work("log"), "XMLNodePath::one/path"}).status, 0);
     EXPECT_EQ(run_fptest({"send", "--log", work("log"), "XMLNodePath::other/path"}).status, 0);
@@ -206,12 +206,12 @@ TEST_F(Send, StopsAScriptAsWell)
     expect_items_to_end();
 }
 
-TEST_F(Send, SaysThatTheModulesProcessEnded)
+TEST_F(Send, SaysThatTheLibrarysProcessEnded)
 {
     write_file(kPlanFile, plan_of({{"G", {{"Item", "note /tmp/scene/begun sleep 60"}}}}));
     FptestProcess fptest({"send", "XMLNodePath::P/G", "pingtest"});
     ASSERT_TRUE(wait_for_file("begun"));
-    kill(fptest.module(), SIGKILL);
+    kill(fptest.library(), SIGKILL);
     const Ended ended = fptest.wait();
     EXPECT_EQ(ended.status, 3);
     EXPECT_EQ(ended.out, "");

@@ -55,7 +55,7 @@ class Started : public FptestTest
     }
 };
 
-TEST_F(Started, SignalToItsGroupEndsTheRunAndNotTheModulesProcess)
+TEST_F(Started, SignalToItsGroupEndsTheRunAndNotTheLibrarysProcess)
 {
     for (std::size_t turn = 0; turn < 60; ++turn) {
         const int signal = std::array{SIGINT, SIGTERM, SIGHUP}.at(turn % 3);
@@ -84,7 +84,7 @@ TEST_F(Started, TerminalThatClosesIsAnInterruption)
     Start start = start_of_run(plan(kOneSleeps + std::string(3000, '\n')));
     start.output = name.data();
     FptestProcess fptest(start);
-    ASSERT_NE(fptest.module(), 0);
+    ASSERT_NE(fptest.library(), 0);
     close(terminal);
     close(master);
     flock(lock.get(), LOCK_UN);

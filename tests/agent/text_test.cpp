@@ -45,7 +45,7 @@ constexpr char kSmile[] = "\U0001F600"; // 4 bytes, 2 columns
 
 // --- what is valid -----------------------------------------------------------
 
-TEST(Clean, LeavesPlainTextAndTheFirstAndTheLastCharacterOfEverySizeAlone)
+TEST(VisibleText, LeavesPlainTextAndTheFirstAndTheLastCharacterOfEverySizeAlone)
 {
     for (const char *text : {"", "3 dead pixels, limit 2 ~", "\u00A0", "\u07FF", "\u0800", "\uD7FF",
                              "\uE000", "\uFDD0", "\uFEFF", "\uFFFD", "\uFFFE", "\uFFFF",
@@ -56,7 +56,7 @@ TEST(Clean, LeavesPlainTextAndTheFirstAndTheLastCharacterOfEverySizeAlone)
     }
 }
 
-TEST(Clean, ShowsEveryControlCharacterButTabsAndLineEndsByItsPicture)
+TEST(VisibleText, ShowsEveryControlCharacterButTabsAndLineEndsByItsPicture)
 {
     for (int code = 0; code < 0x20; ++code) {
         const std::string picture = {'\xE2', '\x90', static_cast<char>(0x80 + code)};
@@ -69,7 +69,7 @@ TEST(Clean, ShowsEveryControlCharacterButTabsAndLineEndsByItsPicture)
     EXPECT_EQ(sanitize_utf8("\x1B[31m\0red"s), "\u241B[31m\u2400red");
 }
 
-TEST(Clean, ReplacesTheControlCharactersAboveAscii)
+TEST(VisibleText, ReplacesTheControlCharactersAboveAscii)
 {
     for (int code = 0x80; code < 0xA0; ++code) {
         const std::string text = {'a', '\xC2', static_cast<char>(code), 'b'};
@@ -78,7 +78,7 @@ TEST(Clean, ReplacesTheControlCharactersAboveAscii)
     }
 }
 
-TEST(Clean, ReplacesEachByteThatIsNoUtf8)
+TEST(VisibleText, ReplacesEachByteThatIsNoUtf8)
 {
     // goes on with nothing, an overlong form, half a pair, beyond the last, broken off
     for (const std::string bytes :
@@ -174,7 +174,7 @@ TEST(ColumnsDeathTest, AreOneForEachCharacterWhereNoLocaleTells)
         ::testing::ExitedWithCode(0), "");
 }
 
-TEST(Fit, PadsWhatIsCut)
+TEST(Ellipsized, PadsWhatIsCut)
 {
     const std::string three = "\u65E5\u672C\u8A9E";
     struct Fitted {
@@ -215,7 +215,7 @@ TEST(Fit, PadsWhatIsCut)
     }
 }
 
-TEST(Fit, AlwaysTakesExactlyThatManyColumns)
+TEST(Ellipsized, AlwaysTakesExactlyThatManyColumns)
 {
     const std::vector<std::string> parts = {"a", kWide, kAccent, kSmile, "\u00E9", "\uFFFD"};
     unsigned state = 1;
@@ -283,7 +283,7 @@ TEST(Advice, IsASentenceOfItsOwnAfterAQuestion)
               "no Scan; did you mean 'Scam'? It has Scam");
 }
 
-TEST(Listing, ReadsLikeASentence)
+TEST(JoinAnd, ReadsLikeASentence)
 {
     EXPECT_EQ(join_and({}), "");
     EXPECT_EQ(join_and({"a"}), "a");

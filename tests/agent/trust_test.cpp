@@ -232,7 +232,7 @@ TEST_F(Trust, DoesNotBeginBesideAnItemOfAnEarlierRun)
     EXPECT_NE(access(kPlanFile, F_OK), 0);
 }
 
-TEST_F(Trust, RefusesAPathThatTheModuleWouldCut)
+TEST_F(Trust, RefusesAPathThatTheLibraryWouldCut)
 {
     const std::string path = std::string(2100, 'r') + "/G/Item";
     expect_refusal(2, "fptest: a path of 2107 bytes is cut at 2047: name the root with less",

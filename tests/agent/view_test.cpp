@@ -63,7 +63,7 @@ class LiveView : public DeviceTest
         write_file("/tmp/go", "");
     }
 
-    // The row in which a text stands.
+    // The row of a text.
     static int row_of(const TerminalSession &session, const std::string &text)
     {
         const auto lines = session.lines();
@@ -174,7 +174,7 @@ TEST_F(LiveView, FitsItsLinesIntoANarrowTerminal)
         TerminalSession session(run({"P/G"}), columns, 24);
         EXPECT_EQ(session.wait_for_end(), 0);
         const auto lines = session.all_lines();
-        // wrapped lines would stand on more rows
+        // wrapped lines would take more rows
         EXPECT_THAT(lines, SizeIs(5)) << session.text();
         EXPECT_EQ(lines[2].find("  Item"), 0U) << session.text();
         EXPECT_EQ(lines[3].find("      a descri"), 0U) << session.text();
@@ -339,7 +339,7 @@ TEST_F(LiveView, KeepsWhatItKnewWhileThePlanIsHalfWritten)
 
 // --- Ctrl-C -------------------------------------------------------------------
 
-TEST_F(LiveView, CtrlCStopsTheItemThroughTheModule)
+TEST_F(LiveView, CtrlCStopsTheItemThroughTheLibrary)
 {
     use_plan("<P><CmdGroup name=\"G\">"
              "<Cmd name=\"Item\" args=\"tell-signal /tmp/signal report G 10 -2 begun sleep 60\"/>"

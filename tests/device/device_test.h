@@ -82,7 +82,7 @@ std::vector<Process> processes();
 // Those of them with exactly that name.
 std::vector<Process> processes_named(const std::string &name);
 
-// A field of /proc/PID/status, as it stands there.
+// A field of /proc/PID/status, as it is there.
 std::string status_field(pid_t pid, const std::string &field);
 
 // Descriptors of this process with what they refer to; the log's is left out.

@@ -45,7 +45,7 @@ class FailingGatherer : public DeviceTest
         EXPECT_EQ(host.wait().status, 0);
     }
 
-    // Connects and leaves with a reset while the host stands still, so that it
+    // Connects and leaves with a reset while the host is suspended, so that it
     // finds the connection already reset.
     static void connect_and_reset(const OtherHost &host, bool says_goodbye)
     {
@@ -63,7 +63,7 @@ class FailingGatherer : public DeviceTest
         kill(host.pid(), SIGCONT);
     }
 
-    // The lines since the last call that stand after the presence check's.
+    // The lines since the last call after the presence check's.
     static Lines trigger_lines()
     {
         const Lines lines = log_lines();

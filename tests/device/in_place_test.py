@@ -125,7 +125,7 @@ def test_a_tree_may_lie_in_any_directory(parent):
 # ---- the gatherer's own port -------------------------------------------------
 
 # Every connection is made from the library's port, so that it finds itself.
-def test_a_gatherer_connected_to_itself_does_not_hold_the_modules_port():
+def test_a_gatherer_connected_to_itself_does_not_hold_the_librarys_port():
     gatherer = shlex.quote(str(BUILD / "device/bin/SensorProbe"))
 
     outcome = on_machine(f"""
@@ -236,10 +236,10 @@ IN_PLACE = {
     "it sets the three variables": (
         "\"$1\" -- sh -c 'echo $QUILLMARK_DEVICE $PATH $TMPDIR ${KSH_VERSION%% R*}'",
         "in-place /system/bin /tmp @(#)MIRBSD KSH\n"),
-    "it runs the module's shell as mksh": (
+    "it runs the library's shell as mksh": (
         """ "$1" -- /system/bin/sh -c 'echo $0 ${KSH_VERSION%% R*}' """,
         "sh @(#)MIRBSD KSH\n"),
-    "it leaves the arguments of the module's shell unchanged": (
+    "it leaves the arguments of the library's shell unchanged": (
         """ "$1" -- /system/bin/sh -c 'echo $0 "$@"' a 'b  c' """, "a b  c\n"),
     "it runs every other command while a process nine is alive": (
         SLEEP_AS_PROCESS_9 + """

@@ -1,7 +1,7 @@
 // SPDX-FileCopyrightText: 2026 The Quillmark authors
 // SPDX-License-Identifier: Apache-2.0
 
-// Another maker's log and parameter reader, to be put in the place of ours.
+// Another platform's log and parameter reader, to be put in the place of ours.
 #include "sysparm.h"
 #include "vr_log.h"
 

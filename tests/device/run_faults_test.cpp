@@ -89,7 +89,7 @@ class MissingShell : public PrivateMounts
 
 using Codes = std::multiset<int>;
 
-TEST_F(MissingShell, OfTheLibcLetsNoItemRun)
+TEST_F(MissingShell, InBinLetsNoItemRun)
 {
     hide_the_libcs();
     store(kPlan);
@@ -103,7 +103,7 @@ TEST_F(MissingShell, OfTheLibcLetsNoItemRun)
     EXPECT_EQ(exit_codes(), Codes());
 }
 
-TEST_F(MissingShell, OfTheLibcLetsTheGathererRun)
+TEST_F(MissingShell, InBinLetsTheGathererRun)
 {
     hide_the_libcs();
     store(plan_of({{"G", {{"SensorProbe", "--group G"}}}}));

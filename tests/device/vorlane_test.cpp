@@ -1,7 +1,7 @@
 // SPDX-FileCopyrightText: 2026 The Quillmark authors
 // SPDX-License-Identifier: Apache-2.0
 
-// The maker's interfaces as they are implemented on Linux.
+// The platform's interfaces as they are implemented on Linux.
 #include "device_test.h"
 
 #include "sockwrap.h"

@@ -1,6 +1,6 @@
 # SPDX-FileCopyrightText: 2026 The Quillmark authors
 # SPDX-License-Identifier: Apache-2.0
-"""What is installed of the library alone, with a Mini-XML and maker's headers that are
+"""What is installed of the library alone, with a Mini-XML and the platform's headers that are
 named."""
 import shutil
 

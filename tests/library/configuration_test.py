@@ -1,6 +1,6 @@
 # SPDX-FileCopyrightText: 2026 The Quillmark authors
 # SPDX-License-Identifier: Apache-2.0
-"""What the configuration takes and what it refuses: the Mini-XML, the maker's libraries
+"""What the configuration takes and what it refuses: the Mini-XML, the platform's libraries
 and the NDK that are named."""
 import os
 

@@ -1,6 +1,6 @@
 # SPDX-FileCopyrightText: 2026 The Quillmark authors
 # SPDX-License-Identifier: Apache-2.0
-"""What shared libraries say of themselves, and libraries of another maker."""
+"""What shared libraries say of themselves, and libraries of another platform."""
 import re
 
 from support.outside import TREE, output_of

@@ -143,7 +143,7 @@ Lines reasons(const std::string &text)
 namespace
 {
 
-// What stands after the number of a point.
+// What is after the number of a point.
 struct PointText {
     std::string name;
     std::optional<std::string> directive;

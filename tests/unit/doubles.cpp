@@ -472,7 +472,7 @@ char *qm_strdup(const char *text)
     return ::strdup(text);
 }
 
-// --- the maker's interfaces ----------------------------------------------
+// --- the platform's interfaces ----------------------------------------------
 
 int vr_log_printf(int priority, const char *tag, const char *format, ...)
 {

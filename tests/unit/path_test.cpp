@@ -20,7 +20,7 @@ namespace
 
 // A plan in shorthand, its parts separated by blanks: "A(" a group and ")" its end,
 // "x" an item, "?" one without a name, "!c" a comment, "'w'" words; tags, references
-// and white space other than blanks stand as they are. Items get numbers, from 1, for
+// and white space other than blanks are as they are. Items get numbers, from 1, for
 // their arguments.
 std::string plan_from(std::string_view shorthand)
 {

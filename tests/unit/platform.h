@@ -2,7 +2,7 @@
 // SPDX-License-Identifier: Apache-2.0
 
 // Recording doubles for everything that the library calls outside itself: the
-// platform, whose calls are redirected here at link time, and the maker's
+// platform, whose calls are redirected here at link time, and the platform's
 // interfaces. Files are real ones in a directory of the test's own; nothing is
 // started, signalled, listened on or slept for.
 #pragma once

@@ -17,7 +17,7 @@ class Report : public LibraryTest
 {
   protected:
     // A plan as the library saves it: items "a" and "b" in the group "first", "b"
-    // and "c" in the group "second", with what stands after the names of a, of
+    // and "c" in the group "second", with what is after the names of a, of
     // the first b, and of c.
     static std::string plan(const std::string &a = "", const std::string &b = "",
                             const std::string &c = "")

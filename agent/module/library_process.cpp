@@ -1,7 +1,7 @@
 // SPDX-FileCopyrightText: 2026 The Quillmark authors
 // SPDX-License-Identifier: Apache-2.0
 
-#include "module/module_process.h"
+#include "module/library_process.h"
 
 #include "module/messages.h"
 #include "module/processes.h"
@@ -87,7 +87,7 @@ void LibraryProcess::start()
     leader_ = pid_;
     if (pid_ == 0) {
         close(control_.get());
-        serve_module(their_control.get(), output_.get());
+        serve_library(their_control.get(), output_.get());
     }
 }
 
@@ -142,7 +142,7 @@ void LibraryProcess::restart()
     }
 }
 
-void LibraryProcess::kill_module() const
+void LibraryProcess::kill_library() const
 {
     if (pid_ > 0) {
         kill(pid_, SIGKILL);

@@ -74,7 +74,7 @@ class LibraryProcess
     void restart();
 
     // Ends the library's process, where that does not answer.
-    void kill_module() const;
+    void kill_library() const;
 
     // Whether something has suspended it: suspend() or another process.
     bool is_suspended() const;
