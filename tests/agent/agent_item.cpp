@@ -104,7 +104,12 @@ void wait_for_word_to_gather()
     for (std::size_t got = 0; got == 0;) {
         const int connection = socket(AF_INET, SOCK_STREAM, 0);
         char byte = 0;
-        if (connect(connection, reinterpret_cast<sockaddr *>(&address), sizeof address) == 0) {
+        sockaddr_in own{};
+        socklen_t size = sizeof own;
+        // while nobody listens, it may get that port and meet itself
+        if (connect(connection, reinterpret_cast<sockaddr *>(&address), sizeof address) == 0 &&
+            getsockname(connection, reinterpret_cast<sockaddr *>(&own), &size) == 0 &&
+            own.sin_port != address.sin_port) {
             got = read(connection, &byte, 1) == 1 ? 1 : 0;
         }
         close(connection);
