@@ -6,9 +6,6 @@
 #include "check/findings.h"
 #include "util/text.h"
 
-#include <array>
-#include <utility>
-
 namespace fptest
 {
 
@@ -41,25 +38,6 @@ std::string names_of(const Resolution &resolution)
     return count == 0   ? "nothing"
            : count == 1 ? first
                         : fmt::format("{} and {} more", first, count - 1);
-}
-
-std::string path_damage(std::string_view name)
-{
-    constexpr std::array<std::pair<char, const char *>, 4> kDamages = {
-        std::pair{'/', "is split at '/'"}, std::pair{':', "is cut at ':'"},
-        std::pair{'\t', "is cut at a tab"}, std::pair{'\n', "is cut at a line feed"}};
-    std::vector<std::string> damages;
-    for (const auto &[character, damage] : kDamages) {
-        if (name.find(character) != name.npos) {
-            damages.emplace_back(damage);
-        }
-    }
-    return join_and(damages);
-}
-
-bool is_addressable(std::string_view name)
-{
-    return !name.empty() && name.size() <= kNameLimit && path_damage(name).empty();
 }
 
 } // namespace fptest

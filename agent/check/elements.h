@@ -43,11 +43,4 @@ std::string path_of(const std::string &group, const std::string &item);
 // What would be run, by name.
 std::string names_of(const Resolution &resolution);
 
-// What a node path does to a name with these characters: "is split at '/'";
-// empty for a name without.
-std::string path_damage(std::string_view name);
-
-// Whether a path can lead to it: it has a name that no path splits or cuts.
-bool is_addressable(std::string_view name);
-
 } // namespace fptest

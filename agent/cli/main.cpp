@@ -91,11 +91,8 @@ class CommandLine
         if (word.starts_with('-')) {
             throw fptest::Failure(Exit::usage, "{}", fptest::unknown_option(word, app_));
         }
-        const std::string text = fmt::format("there is no command {}{}", fptest::in_quotes(word),
-                                             fptest::did_you_mean(fptest::nearest(word, names)));
-        throw fptest::Failure(
-            Exit::usage, "{}",
-            fptest::with_advice(text, fmt::format("the commands are {}", fptest::join_and(names))));
+        throw fptest::Failure(Exit::usage, "there is no command {}{}", fptest::in_quotes(word),
+                              fptest::known_names(word, names, "the commands are"));
     }
 
     CLI::App app_{"Runs test plans of a fingerprint-sensor stack through the Quillmark library.",

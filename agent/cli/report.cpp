@@ -59,11 +59,8 @@ Plan load_stored(const std::string &text)
 [[noreturn]] void unknown(const std::string &where, const std::string &what,
                           const std::string &name, const std::vector<std::string> &names)
 {
-    const std::string known =
-        names.empty() ? "it has none at all" : fmt::format("it has {}", one_line(join_and(names)));
-    const std::string text = fmt::format("{} has no {} {}{}", where, what, in_quotes(name),
-                                         did_you_mean(nearest(name, names)));
-    throw Failure(Exit::usage, "{}", with_advice(text, known));
+    throw Failure(Exit::usage, "{} has no {} {}{}", where, what, in_quotes(name),
+                  names.empty() ? "; it has none at all" : known_names(name, names, "it has"));
 }
 
 // The item's number in the plan. Only its own group is looked at: the library

@@ -3,9 +3,14 @@
 
 #include "plan/library_rules.h"
 
+#include "util/text.h"
+
 #include <algorithm>
+#include <array>
 #include <cctype>
 #include <cstring>
+#include <utility>
+#include <vector>
 
 namespace fptest
 {
@@ -45,6 +50,25 @@ std::optional<std::string> vendor_suffix(int vendor)
     default:
         return std::nullopt;
     }
+}
+
+std::string path_damage(std::string_view name)
+{
+    constexpr std::array<std::pair<char, const char *>, 4> kDamages = {
+        std::pair{'/', "is split at '/'"}, std::pair{':', "is cut at ':'"},
+        std::pair{'\t', "is cut at a tab"}, std::pair{'\n', "is cut at a line feed"}};
+    std::vector<std::string> damages;
+    for (const auto &[character, damage] : kDamages) {
+        if (name.find(character) != name.npos) {
+            damages.emplace_back(damage);
+        }
+    }
+    return join_and(damages);
+}
+
+bool is_addressable(std::string_view name)
+{
+    return !name.empty() && name.size() <= kNameLimit && path_damage(name).empty();
 }
 
 bool is_gatherer(std::string_view name, int vendor)

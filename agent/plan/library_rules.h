@@ -29,6 +29,13 @@ std::string as_stored(std::string_view text);
 // "", "_ca" or "_ca_qsee"; nothing for a vendor that runs no item.
 std::optional<std::string> vendor_suffix(int vendor);
 
+// What a node path does to a name with these characters: "is split at '/'";
+// empty for a name without.
+std::string path_damage(std::string_view name);
+
+// Whether a path can lead to it: it has a name that no path splits or cuts.
+bool is_addressable(std::string_view name);
+
 // Whether the item of that name is started in the background and triggered.
 bool is_gatherer(std::string_view name, int vendor);
 

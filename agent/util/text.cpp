@@ -289,6 +289,13 @@ std::string did_you_mean(const std::string &near)
     return near.empty() ? "" : fmt::format("; did you mean {}?", in_quotes(near));
 }
 
+std::string known_names(const std::string &word, const std::vector<std::string> &names,
+                        const std::string &introduction)
+{
+    return with_advice(did_you_mean(nearest(word, names)),
+                       fmt::format("{} {}", introduction, one_line(join_and(names))));
+}
+
 std::string with_advice(const std::string &text, std::string advice)
 {
     if (!text.ends_with('?')) {

@@ -55,6 +55,11 @@ std::string nearest(std::string_view word, const std::vector<std::string> &candi
 // "; did you mean 'near'?"; empty where none is near.
 std::string did_you_mean(const std::string &near);
 
+// "; did you mean 'x'? The groups are x, y and z", where "the groups are" introduces the
+// names of which none is the word.
+std::string known_names(const std::string &word, const std::vector<std::string> &names,
+                        const std::string &introduction);
+
 // "text; advice", or "text? Advice".
 std::string with_advice(const std::string &text, std::string advice);
 
