@@ -60,7 +60,7 @@ std::string read_shown(const std::string &file)
 {
     if (file.empty()) {
         require_stored_plan(": run one with fptest run --plan FILE, or name a file to show");
-        return whole_stored_plan();
+        return whole_stored_plan().text;
     }
     return require_file(file);
 }

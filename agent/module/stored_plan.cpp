@@ -3,7 +3,6 @@
 
 #include "module/stored_plan.h"
 
-#include "plan/plan.h"
 #include "plan/plan_text.h"
 #include "util/failure.h"
 #include "util/files.h"
@@ -48,13 +47,14 @@ void require_regular_plan()
     }
 }
 
-std::string whole_stored_plan()
+StoredPlan whole_stored_plan()
 {
-    std::string text;
-    made_of_stored_plan(text, [](const std::string &plan) {
-        return Plan::parse_annotated(plan) || Plan::load_as_library(plan);
+    StoredPlan read;
+    made_of_stored_plan(read.text, [&read](const std::string &text) {
+        read.annotated = Plan::parse_annotated(text);
+        return read.annotated || Plan::load_as_library(text);
     });
-    return text;
+    return read;
 }
 
 void mend_stored_plan()
@@ -63,7 +63,7 @@ void mend_stored_plan()
         return;
     }
     const Descriptor lock = lock_stored_plan();
-    if (const auto text = made_loadable(whole_stored_plan())) {
+    if (const auto text = made_loadable(whole_stored_plan().text)) {
         replace_stored_plan(*text);
     }
 }

@@ -5,6 +5,7 @@
 #pragma once
 
 #include "common/descriptor.h"
+#include "plan/plan.h"
 
 #include <chrono>
 #include <optional>
@@ -42,8 +43,13 @@ template <typename Make> auto made_of_stored_plan(std::string &text, const Make 
     }
 }
 
-// Its text. One that is not whole is read again for half a second.
-std::string whole_stored_plan();
+struct StoredPlan {
+    std::string text;
+    std::optional<Plan> annotated; // nothing where it is not whole
+};
+
+// One that is not whole, and does not load, is read again for half a second.
+StoredPlan whole_stored_plan();
 
 // Makes one load again that a report has spoiled, so that the next items can
 // report: a result that the library has no text for, or a null description, is left

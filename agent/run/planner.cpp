@@ -51,8 +51,7 @@ std::string instead(const std::string &name, const std::vector<std::string> &nam
     if (names.empty()) {
         return fmt::format("; there are no {}", what);
     }
-    return with_advice(did_you_mean(nearest(name, names)),
-                       fmt::format("the {} are {}", what, one_line(join_and(names))));
+    return known_names(name, names, fmt::format("the {} are", what));
 }
 
 Path parts_of(const std::string &text, const Plan &plan)
@@ -130,7 +129,7 @@ bool run_by_their_own_paths(const Plan &plan, const std::string &group,
                             const std::vector<std::optional<Plan::Element>> &items)
 {
     return std::ranges::all_of(items, [&](const auto &item) {
-        if (!item || !item->name || item->name->find_first_of("/:\t\n") != std::string::npos) {
+        if (!item || !item->name || !is_addressable(*item->name)) {
             return false;
         }
         const auto found = plan.resolve(group, *item->name);
@@ -181,7 +180,7 @@ class WorkPlanner
                 job.targets.emplace_back(std::nullopt);
                 continue;
             }
-            job.targets.emplace_back(Job::Target{suite.items.size(), item->number, {}});
+            job.targets.emplace_back(Job::Target{suite.items.size(), item->number});
             ItemRun run;
             run.group = group;
             run.name = *item->name;

@@ -5,8 +5,8 @@
 #pragma once
 
 #include "plan/plan.h"
+#include "run/job.h"
 #include "run/results.h"
-#include "run/runner.h"
 
 #include <string>
 #include <vector>

@@ -12,6 +12,11 @@
 namespace fptest
 {
 
+ItemRun &item_at(Run &run, Place place)
+{
+    return run.suites[place.suite].items[place.item];
+}
+
 const ItemRun &item_at(const Run &run, Place place)
 {
     return run.suites[place.suite].items[place.item];

@@ -104,6 +104,7 @@ struct Place {
     std::size_t item = 0;
 };
 
+ItemRun &item_at(Run &run, Place place);
 const ItemRun &item_at(const Run &run, Place place);
 
 Counts count(const std::vector<ItemRun> &items);

@@ -66,11 +66,7 @@ void clear_reports(Job &job)
         }
         throw;
     }
-    for (auto &target : job.targets) {
-        if (target) {
-            target->mark = mark;
-        }
-    }
+    job.mark = mark;
 }
 
 void clear_marks()

@@ -35,6 +35,10 @@ void append_output(std::string &output, const std::string &text)
     }
 }
 
+// A gatherer that is being started may not be there yet.
+constexpr auto kBeforeMissed = 500ms;
+constexpr auto kBetweenPolls = 250ms;
+
 constexpr char kOverwrittenAfter[] =
     "; a process with an old copy of the plan has written it over meanwhile";
 
@@ -66,7 +70,8 @@ int signal_of(int status)
 
 Runner::Runner(LibraryProcess &library, Signals &signals, Run &run,
                const std::vector<Listener *> &listeners, const Limits &limits)
-    : library_(library), signals_(signals), run_(run), listeners_(listeners), limits_(limits)
+    : library_(library), signals_(signals), run_(run), listeners_(listeners), limits_(limits),
+      reader_(run, listeners, running_)
 {
     signals_.take_suspensions();
     library_.hold_at_ends();
@@ -116,10 +121,9 @@ bool Runner::run(const Job &job)
     library_.command("XMLNodePath::" + job.path, names);
     heard_of_at_ = now();
 
-    job_ = job;
-    next_ = 0;
+    running_ = {job, 0, {}};
     bool runs = true;
-    while ((runs || !active_.empty()) && !broken_) {
+    while ((runs || !running_.items.empty()) && !broken_) {
         if (const auto event = library_.wait(kTurn, signals_.descriptor())) {
             plan = Descriptor(-1);
             heard_of_at_ = now();
@@ -139,12 +143,12 @@ bool Runner::run(const Job &job)
 // whatever cause: that is no success.
 void Runner::require_all_started()
 {
-    for (; next_ < job_.targets.size() && signal_ == 0; ++next_) {
-        if (!job_.targets[next_]) {
+    for (; running_.next < running_.job.targets.size() && signal_ == 0; ++running_.next) {
+        if (!running_.job.targets[running_.next]) {
             continue;
         }
-        const Place place{job_.suite, job_.targets[next_]->item};
-        ItemRun &result = item(place);
+        const Place place{running_.job.suite, running_.job.targets[running_.next]->item};
+        ItemRun &result = item_at(run_, place);
         result.start = std::chrono::system_clock::now();
         for (Listener *listener : listeners_) {
             listener->started(run_, place);
@@ -163,8 +167,8 @@ void Runner::require_all_started()
 // Without a stored plan nothing that comes can report.
 void Runner::require_plan()
 {
-    const std::string text = whole_stored_plan();
-    if (Plan::parse_annotated(text) || Plan::load_as_library(text)) {
+    const StoredPlan plan = whole_stored_plan();
+    if (plan.annotated || Plan::load_as_library(plan.text)) {
         return;
     }
     give_up(fmt::format("the stored plan {} is gone, or not whole any more: store it again",
@@ -183,7 +187,8 @@ void Runner::handle(const LibraryProcess::Event &event, bool &runs)
         end_item(event);
         break;
     case LibraryProcess::Event::Kind::connected:
-        begin_gathering();
+        reader_.begin_gathering();
+        library_.go_on();
         break;
     case LibraryProcess::Event::Kind::returned:
         runs = false;
@@ -216,11 +221,12 @@ void Runner::lose_library(const LibraryProcess::Event &event)
 {
     library_gone_ = gone_text(event);
     stop_asked_ = false;
-    if (!active_.empty()) {
-        append_output(item(active_.back().place).output, library_.take_output(event.output));
+    if (!running_.items.empty()) {
+        append_output(item_at(run_, running_.items.back().place).output,
+                      library_.take_output(event.output));
     }
-    read_reports(Plan::parse_annotated(whole_stored_plan()));
-    for (RunningItem &active : active_) {
+    reader_.read(whole_stored_plan().annotated);
+    for (RunningItem &active : running_.items) {
         finish(active, on_run_clock(event.time));
     }
     notify_ended();
@@ -233,41 +239,62 @@ void Runner::lose_library(const LibraryProcess::Event &event)
 void Runner::watch(bool command_runs)
 {
     read_signals();
-    poll_reports();
+    reader_.poll();
+    poll_gatherers();
     stop_what_is_due(command_runs);
     notify_ended();
     tick();
+}
+
+// What the gatherer reports comes in its own time.
+void Runner::poll_gatherers()
+{
+    for (RunningItem &active : running_.items) {
+        poll_gatherer(active);
+        const ItemReport &report = item_at(run_, active.place).report;
+        const bool has_ended = report.progress == "100" && has_result(report);
+        if (active.moved_on && !active.done &&
+            (has_ended || !active.gatherer_end.empty() ||
+             (!limits_.item && now() - active.moved_on_at > kForGathering))) {
+            finish(active, now());
+        }
+    }
+}
+
+// Without it the library would wait at its port without end, and what has died
+// reports no more.
+void Runner::poll_gatherer(RunningItem &active)
+{
+    if (active.done || !active.gatherer_end.empty() || !active.gathers ||
+        now() - active.gatherer_looked_for < kBetweenPolls) {
+        return;
+    }
+    active.gatherer_looked_for = now();
+    active.gatherer_missed = library_.processes().has_gatherer() ? 0 : active.gatherer_missed + 1;
+    if (active.gatherer_missed < 2 || now() - active.start < kBeforeMissed) {
+        return;
+    }
+    active.gatherer_end = active.moved_on ? "the gatherer ended before it had reported"
+                                          : "the gatherer ended before it connected";
+    if (!active.moved_on) {
+        release_command();
+    }
 }
 
 void Runner::tick()
 {
     run_.seconds = Seconds(now() - began_).count();
     const std::string output = library_.take_output();
-    if (!active_.empty()) {
-        append_output(item(active_.back().place).output, output);
+    if (!running_.items.empty()) {
+        append_output(item_at(run_, running_.items.back().place).output, output);
     }
-    for (const RunningItem &active : active_) {
-        item(active.place).running = std::max(0.0, Seconds(now() - active.start).count());
-        item(active.place).stopping = active.stop.has_value();
+    for (const RunningItem &active : running_.items) {
+        item_at(run_, active.place).running = std::max(0.0, Seconds(now() - active.start).count());
+        item_at(run_, active.place).stopping = active.stop.has_value();
     }
     for (Listener *listener : listeners_) {
         listener->tick(run_);
     }
-}
-
-ItemRun &Runner::item(const Place &place)
-{
-    return run_.suites[place.suite].items[place.item];
-}
-
-const ItemRun &Runner::item(const Place &place) const
-{
-    return run_.suites[place.suite].items[place.item];
-}
-
-bool Runner::gathers(const RunningItem &active) const
-{
-    return is_gatherer(item(active.place).name, vendor_);
 }
 
 // --- an item's start and end --------------------------------------------------
@@ -275,27 +302,30 @@ bool Runner::gathers(const RunningItem &active) const
 void Runner::start_next(const LibraryProcess::Event &event)
 {
     vendor_ = event.value;
-    const std::size_t at = next_++;
-    if (at >= job_.targets.size() || !job_.targets[at]) {
+    const std::size_t at = running_.next++;
+    if (at >= running_.job.targets.size() || !running_.job.targets[at]) {
         return;
     }
     RunningItem active;
-    active.place = {job_.suite, job_.targets[at]->item};
-    active.target = *job_.targets[at];
+    active.place = {running_.job.suite, running_.job.targets[at]->item};
+    active.element = running_.job.targets[at]->element;
+    active.gathers = is_gatherer(item_at(run_, active.place).name, vendor_);
+    active.reporting.expected = !active.gathers;
     active.start = on_run_clock(event.time);
     if (signal_ != 0) {
         active.stop = Outcome::stopped;
         active.stop_wanted_at = now();
     }
-    active_.push_back(active);
-    item(active.place).start = std::chrono::system_clock::now() -
-                               std::chrono::duration_cast<std::chrono::system_clock::duration>(
-                                   SteadyClock::now() - event.time);
+    running_.items.push_back(active);
+    item_at(run_, active.place).start =
+        std::chrono::system_clock::now() -
+        std::chrono::duration_cast<std::chrono::system_clock::duration>(SteadyClock::now() -
+                                                                        event.time);
     for (Listener *listener : listeners_) {
         listener->started(run_, active.place);
     }
     if (vendor_ != run_.vendor) {
-        append_output(item(active.place).output,
+        append_output(item_at(run_, active.place).output,
                       fmt::format("fptest: the vendor is {} by now\n", vendor_));
     }
 }
@@ -305,19 +335,19 @@ void Runner::start_next(const LibraryProcess::Event &event)
 void Runner::end_item(const LibraryProcess::Event &event)
 {
     const std::string output = library_.take_output(event.output);
-    const bool is_watched = !active_.empty() && !active_.back().moved_on;
+    const bool is_watched = !running_.items.empty() && !running_.items.back().moved_on;
     if (is_watched) {
-        const auto plan = Plan::parse_annotated(whole_stored_plan());
-        read_reports(plan); // before what it has left can report again
-        active_.back().report_lost = !plan;
+        const auto plan = whole_stored_plan().annotated;
+        reader_.read(plan); // before what it has left can report again
+        running_.items.back().reporting.lost = !plan;
     }
     const std::vector<Leftover> left =
         event.left_running
-            ? note_left_running(is_watched ? active_.back().target.element : kNoElement)
+            ? note_left_running(is_watched ? running_.items.back().element : kNoElement)
             : std::vector<Leftover>();
     if (is_watched) {
-        RunningItem &active = active_.back();
-        ItemRun &result = item(active.place);
+        RunningItem &active = running_.items.back();
+        ItemRun &result = item_at(run_, active.place);
         append_output(result.output, output);
         active.moved_on = true;
         active.moved_on_at = on_run_clock(event.time);
@@ -343,21 +373,21 @@ void Runner::end_item(const LibraryProcess::Event &event)
 void Runner::move_on(const LibraryProcess::Event &event)
 {
     const std::string output = library_.take_output(event.output);
-    if (active_.empty()) {
+    if (running_.items.empty()) {
         return;
     }
-    RunningItem &active = active_.back();
-    append_output(item(active.place).output, output);
+    RunningItem &active = running_.items.back();
+    append_output(item_at(run_, active.place).output, output);
     if (active.moved_on) {
         return;
     }
     active.moved_on = true;
     active.moved_on_at = on_run_clock(event.time);
-    active.told = true;
-    read_reports(Plan::parse_annotated(event.kind == LibraryProcess::Event::Kind::returned
-                                           ? library_.read_back()
-                                           : whole_stored_plan()));
-    if (!gathers(active) || !active.gatherer_end.empty()) {
+    active.reporting.expected = true;
+    reader_.read(event.kind == LibraryProcess::Event::Kind::returned
+                     ? Plan::parse_annotated(library_.read_back())
+                     : whole_stored_plan().annotated);
+    if (!active.gathers || !active.gatherer_end.empty()) {
         finish(active, active.moved_on_at);
         notify_ended();
     }
@@ -369,7 +399,7 @@ void Runner::finish(RunningItem &active, TimePoint end)
         return;
     }
     active.done = true;
-    ItemRun &result = item(active.place);
+    ItemRun &result = item_at(run_, active.place);
     result.seconds = std::max(0.0, Seconds(end - active.start).count());
     result.stopping = false;
     if (!active.stop && limits_.item && *result.seconds > limits_.item->count()) {
@@ -377,25 +407,21 @@ void Runner::finish(RunningItem &active, TimePoint end)
     }
     judge(active);
     // the library may be at the next item of its command already, which has not been left
-    if (gathers(active) && active_.size() == 1 && !active.stop && next_ >= job_.targets.size()) {
-        result.left_running = note_left_running(active.target.element);
+    if (active.gathers && running_.items.size() == 1 && !active.stop &&
+        running_.next >= running_.job.targets.size()) {
+        result.left_running = note_left_running(active.element);
     }
-    if (gathers(active)) {
-        note_gathered(result.report);
-        gathered_in_ = run_.round;
-    }
-    if (gathers(active) && !(result.report.progress == "100" && has_result(result.report))) {
+    if (active.gathers && !(result.report.progress == "100" && has_result(result.report))) {
         gatherer_may_report_late_ = true;
         signal_each(library_.processes().of_gatherer(), SIGTERM);
     }
-    judged_.push_back({active.place, active.target, run_.round, std::move(active.seen)});
-    judged_.back().seen.push_back(result.report);
+    reader_.note_judged(active);
     mend_stored_plan();
 }
 
 void Runner::judge(const RunningItem &active)
 {
-    ItemRun &result = item(active.place);
+    ItemRun &result = item_at(run_, active.place);
     const ItemReport &report = result.report;
     const bool has_reported = has_result(report);
     if (active.stop == Outcome::timed_out ||
@@ -410,10 +436,10 @@ void Runner::judge(const RunningItem &active)
         result.outcome = Outcome::failed;
         result.reason = fmt::format("died by {}{}", name_of_signal(result.signal),
                                     has_reported ? ", though it " + reported(report) : "");
-    } else if (!has_reported || active.report_lost) {
+    } else if (!has_reported || active.reporting.lost) {
         result.outcome = Outcome::no_result;
         result.reason = why_silent(active);
-    } else if (gathers(active) && report.progress != "100") {
+    } else if (active.gathers && report.progress != "100") {
         result.outcome = Outcome::failed;
         result.reason = fmt::format(
             "the gatherer {} at progress {}{}, though it {}",
@@ -430,7 +456,7 @@ void Runner::judge(const RunningItem &active)
     } else {
         result.outcome = Outcome::failed;
         result.reason = reported(report);
-        if (active.overwritten) {
+        if (active.reporting.overwritten) {
             result.reason += kOverwrittenAfter;
         }
     }
@@ -442,7 +468,7 @@ std::string Runner::why_stopped(const RunningItem &active)
         return fmt::format("past the limit of {}: {}", fine_duration(limits_.item->count()),
                            library_gone_);
     }
-    const double seconds = *item(active.place).seconds;
+    const double seconds = *item_at(run_, active.place).seconds;
     if (!active.was_stopped) {
         return fmt::format("ended by itself after {}, past the limit of {}", fine_duration(seconds),
                            fine_duration(limits_.item->count()));
@@ -451,7 +477,7 @@ std::string Runner::why_stopped(const RunningItem &active)
     if (!active.killed) {
         return is_interrupted ? fmt::format("stopped by {}", signal_name(signal_))
                               : fmt::format("stopped after {}{}", duration(seconds),
-                                            active.overwritten ? kOverwrittenAfter : "");
+                                            active.reporting.overwritten ? kOverwrittenAfter : "");
     }
     return fmt::format("killed after {}, as it did not end when it was asked to",
                        is_interrupted ? "the run was interrupted by " + signal_name(signal_)
@@ -464,52 +490,51 @@ std::string Runner::why_silent(const RunningItem &active)
     if (!suffix) {
         return fmt::format("vendor {} runs no item", vendor_);
     }
-    const std::string program = program_of(item(active.place).name, *suffix);
-    if (is_plain_name(item(active.place).name) && access(program.c_str(), X_OK) != 0) {
+    const std::string program = program_of(item_at(run_, active.place).name, *suffix);
+    if (is_plain_name(item_at(run_, active.place).name) && access(program.c_str(), X_OK) != 0) {
         return fmt::format("there is no program {}", one_line(program));
     }
-    if (active.overwritten) {
-        return gathers(active) ? "a process with an old copy of the plan has written it over, "
-                                 "perhaps the gatherer: let it report by a new process each time"
-                               : "a process with an old copy of the plan has written it over, and "
-                                 "nothing was reported after that";
+    if (active.reporting.overwritten) {
+        return active.gathers ? "a process with an old copy of the plan has written it over, "
+                                "perhaps the gatherer: let it report by a new process each time"
+                              : "a process with an old copy of the plan has written it over, and "
+                                "nothing was reported after that";
     }
-    if (active.in_another_plan) {
+    if (active.reporting.in_another_plan) {
         return "the stored plan is another one by now: a process that knows that one has saved it";
     }
-    if (active.undone) {
+    if (active.reporting.undone) {
         return "a process with an old copy of the plan has written over what it had reported";
     }
     if (!active.gatherer_end.empty()) {
         return active.gatherer_end;
     }
-    if (active.report_lost) {
+    if (active.reporting.lost) {
         return "what it reported is lost: the stored plan is gone, or not whole any more";
     }
     const std::string text = read_stored_plan().value_or("");
-    std::string why;
-    if (Plan::parse_annotated(text) && !Plan::load_as_library(text, &why)) {
-        return fmt::format("no report can be written any more: the stored plan does not load ({})",
-                           why);
-    }
     if (text.empty()) {
         return "no report could be written: the stored plan is gone";
     }
     if (!Plan::parse_annotated(text)) {
         return "no report could be written: the stored plan is not whole any more";
     }
-    return gathers(active)
-               ? fmt::format("no result was reported within {}",
-                             fine_duration(limits_.item.value_or(kForGathering).count()))
-               : "ended without reporting a result";
+    std::string why;
+    if (!Plan::load_as_library(text, &why)) {
+        return fmt::format("no report can be written any more: the stored plan does not load ({})",
+                           why);
+    }
+    return active.gathers ? fmt::format("no result was reported within {}",
+                                        fine_duration(limits_.item.value_or(kForGathering).count()))
+                          : "ended without reporting a result";
 }
 
 // In the order of their starts, because that is the order of their numbers.
 void Runner::notify_ended()
 {
-    while (!active_.empty() && active_.front().done) {
-        const Place place = active_.front().place;
-        active_.pop_front();
+    while (!running_.items.empty() && running_.items.front().done) {
+        const Place place = running_.items.front().place;
+        running_.items.pop_front();
         for (Listener *listener : listeners_) {
             listener->ended(run_, place);
         }

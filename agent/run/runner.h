@@ -5,34 +5,19 @@
 #pragma once
 
 #include "module/library_process.h"
-#include "plan/plan.h"
+#include "run/job.h"
+#include "run/report_reader.h"
 #include "run/results.h"
 #include "run/signals.h"
 
 #include <chrono>
 #include <cstddef>
-#include <deque>
 #include <optional>
 #include <string>
-#include <sys/stat.h>
 #include <vector>
 
 namespace fptest
 {
-
-// One command and the items that the library comes to in it.
-struct Job {
-    struct Target {
-        std::size_t item = 0;    // in the suite
-        std::size_t element = 0; // in the plan
-        std::string mark;        // that its element bears; empty for none
-    };
-
-    std::string path;
-    std::size_t suite = 0;
-    // nothing where the library comes to what it cannot run
-    std::vector<std::optional<Target>> targets;
-};
 
 class Runner
 {
@@ -48,7 +33,10 @@ class Runner
            const std::vector<Listener *> &listeners, const Limits &limits);
 
     // The stored plan before the run: a gatherer may have kept a copy of it.
-    void note_earlier_plan(const std::string &text);
+    void note_earlier_plan(const std::string &text)
+    {
+        reader_.note_earlier_plan(text);
+    }
 
     // Runs a job and fills in its items. False where the run has come to its end: the run
     // then says why.
@@ -79,50 +67,13 @@ class Runner
 
   private:
     using SteadyClock = std::chrono::steady_clock;
-    // The time of the run: it stands still while the run is suspended.
-    using TimePoint = SteadyClock::time_point;
-
-    // An item from its start until its end has been told. It runs; the library moves on, so
-    // that only a gatherer is still at work; it is done; its end is told, in the order of
-    // the starts. The last one is the library's current item, those before it are gatherers.
-    struct RunningItem {
-        Place place;
-        Job::Target target;
-        TimePoint start;
-        bool moved_on = false; // the library has: only a gatherer is still at work then
-        TimePoint moved_on_at;
-        bool done = false;
-        std::optional<Outcome> stop; // timed_out or stopped, once that is wanted
-        bool meets_other = false;    // the library's stop, not the item
-        bool was_stopped = false;    // a stop has met it
-        bool killed = false;
-        bool overwritten = false; // by an old copy of the plan, and not reported since
-        bool report_lost = false; // with the stored plan
-        bool undone = false;      // its result was there, and is not any more
-        bool in_another_plan = false;
-        bool told = false;       // the gatherer, to gather
-        bool keeps_copy = false; // of the plan: what it reports has no mark
-        TimePoint stop_wanted_at;
-        TimePoint stop_tried_at;
-        TimePoint gatherer_looked_for;
-        int gatherer_missed = 0; // how many times in a row
-        std::string gatherer_end;
-        std::vector<ItemReport> seen; // the last of those before its report
-    };
+    using TimePoint = RunningItem::TimePoint;
 
     // The gatherer's command returns when the gatherer has been told; its report comes in
     // its own time.
     static constexpr std::chrono::duration<double> kForGathering{10};
     static constexpr std::chrono::milliseconds kTurn{25}; // between two looks at the plan
     static constexpr std::size_t kNoElement = static_cast<std::size_t>(-1);
-
-    // An item that has been judged, and may be reported still.
-    struct Judged {
-        Place place;
-        Job::Target target;
-        int round = 0;
-        std::vector<ItemReport> seen; // an old copy of the plan may bring one of them back
-    };
 
     TimePoint now() const;
     TimePoint on_run_clock(TimePoint time) const; // of a moment on the steady clock
@@ -136,16 +87,7 @@ class Runner
     void lose_library(const LibraryProcess::Event &event);
     void require_all_started();
     void require_plan();
-    void poll_reports();
-    void read_reports(const std::optional<Plan> &plan);
-    void read_report(RunningItem &active, const Plan &plan);
-    void read_late_report(Judged &judged, const Plan &plan);
-    bool is_older(RunningItem &active, const Plan &plan, const ItemReport &report);
-    void mark_again();
-    void begin_gathering();
-    void tell_late(const Place &place, int round, const ItemReport &report);
-    void note_gathered(const ItemReport &report);
-    bool was_gathered(const ItemReport &report) const;
+    void poll_gatherers();
     void poll_gatherer(RunningItem &active);
     void read_signals();
     void suspend();
@@ -170,26 +112,15 @@ class Runner
     void notify_ended();
     void tick();
 
-    ItemRun &item(const Place &place);
-    const ItemRun &item(const Place &place) const;
-    bool gathers(const RunningItem &active) const;
-
     LibraryProcess &library_;
     Signals &signals_;
     Run &run_;
     const std::vector<Listener *> &listeners_;
     Limits limits_;
-    Job job_;              // the one that runs
-    std::size_t next_ = 0; // of its targets
-    std::deque<RunningItem> active_;
-    std::vector<Judged> judged_;             // of this round, and gatherers
-    std::vector<ItemReport> gathered_;       // what an old copy may say of the gatherer
-    int gathered_in_ = 0;                    // the round of the last gathering
-    bool marks_are_gone_ = false;            // from items' elements
+    RunningJob running_;
+    ReportReader reader_;
     std::vector<Leftover> left_;             // by items of this round
     std::vector<std::size_t> left_elements_; // the items' elements
-    struct stat plan_status_ {
-    };
     SteadyClock::duration suspended_{};
     TimePoint last_suspension_;
     SteadyClock::duration last_suspended_{};

@@ -75,7 +75,7 @@ void Runner::read_signals()
         signal_ = signal;
         signal_taken_at_ = now();
         give_up(fmt::format("interrupted by {}", signal_name(signal)));
-        for (RunningItem &active : active_) {
+        for (RunningItem &active : running_.items) {
             if (!active.stop) {
                 active.stop = Outcome::stopped;
                 active.stop_wanted_at = now();
@@ -107,21 +107,21 @@ void Runner::suspend()
 
 void Runner::stop_what_is_due(bool command_runs)
 {
-    for (RunningItem &active : active_) {
+    for (RunningItem &active : running_.items) {
         if (!active.done && !active.stop && limits_.item && now() - active.start > *limits_.item) {
             active.stop = Outcome::timed_out;
             active.stop_wanted_at = now();
         }
     }
-    if (!active_.empty() && !active_.back().done && active_.back().stop) {
-        try_stop(active_.back(), command_runs);
+    if (!running_.items.empty() && !running_.items.back().done && running_.items.back().stop) {
+        try_stop(running_.items.back(), command_runs);
     }
-    if (active_.empty() && command_runs && is_stuck()) {
+    if (running_.items.empty() && command_runs && is_stuck()) {
         library_.kill_library(); // it comes to no item, and does not return
     }
     // the library stops only what it started last: an earlier gatherer gets signals alone
-    for (RunningItem &active : active_) {
-        if (&active != &active_.back() && !active.done && active.stop) {
+    for (RunningItem &active : running_.items) {
+        if (&active != &running_.items.back() && !active.done && active.stop) {
             stop_gatherer(active, false, now() - active.stop_wanted_at);
         }
     }
@@ -142,7 +142,7 @@ bool Runner::is_stuck() const
 void Runner::try_stop(RunningItem &active, bool command_runs)
 {
     const auto waited = now() - active.stop_wanted_at;
-    const bool gatherer = gathers(active);
+    const bool gatherer = active.gathers;
     if ((!gatherer || !active.moved_on) && waited > limits_.grace + kBeforeGivingUp) {
         if (gatherer || item_processes().empty()) {
             library_.kill_library(); // it is that which does not go on
@@ -157,11 +157,11 @@ void Runner::try_stop(RunningItem &active, bool command_runs)
     active.stop_tried_at = now();
     // once: another SIGTERM would start its clean-up anew
     if (!stop_asked_ && !active.was_stopped) {
-        const auto met = met_by_stop(item(active.place).name);
+        const auto met = met_by_stop(item_at(run_, active.place).name);
         active.meets_other =
             met && !std::ranges::any_of(processes_of(active),
                                         [&](const auto &one) { return one.process == *met; });
-        library_.stop(item(active.place).name);
+        library_.stop(item_at(run_, active.place).name);
         stop_asked_ = true;
     }
     if (gatherer) {
@@ -186,7 +186,7 @@ void Runner::release_command()
 // end of the library's process keeps it from them.
 bool Runner::starts_no_more() const
 {
-    return signal_ != 0 && next_ < job_.targets.size();
+    return signal_ != 0 && running_.next < running_.job.targets.size();
 }
 
 void Runner::stop_gatherer(RunningItem &active, bool command_runs, SteadyClock::duration waited)
@@ -196,7 +196,7 @@ void Runner::stop_gatherer(RunningItem &active, bool command_runs, SteadyClock::
         release_command();
     }
     const std::vector<Leftover> left = library_.processes().of_gatherer();
-    if (&active != &active_.back() && !active.was_stopped && signal_each(left, SIGTERM)) {
+    if (&active != &running_.items.back() && !active.was_stopped && signal_each(left, SIGTERM)) {
         signal_each(left, SIGCONT); // one that is suspended would not see it
         active.was_stopped = true;
     }
@@ -215,10 +215,10 @@ void Runner::stop_gatherer(RunningItem &active, bool command_runs, SteadyClock::
 void Runner::note_stop(const LibraryProcess::Event &event)
 {
     stop_asked_ = false;
-    if (active_.empty() || active_.back().done) {
+    if (running_.items.empty() || running_.items.back().done) {
         return;
     }
-    RunningItem &active = active_.back();
+    RunningItem &active = running_.items.back();
     const std::vector<Leftover> processes = processes_of(active);
     if (event.value == 0 && !active.meets_other) {
         active.was_stopped = true;
@@ -232,12 +232,13 @@ void Runner::cannot_stop(RunningItem &active)
 {
     const std::vector<Leftover> left = item_processes();
     broken_ = true;
-    give_up(fmt::format("{}/{} cannot be killed: {} goes on running", item(active.place).group,
-                        item(active.place).name, described(left)));
+    give_up(fmt::format("{}/{} cannot be killed: {} goes on running",
+                        item_at(run_, active.place).group, item_at(run_, active.place).name,
+                        described(left)));
     active.was_stopped = true;
     active.killed = true;
     finish(active, now());
-    item(active.place).reason += ", and goes on running";
+    item_at(run_, active.place).reason += ", and goes on running";
 }
 
 // --- what they leave running ---------------------------------------------------
@@ -250,7 +251,7 @@ std::vector<Leftover> Runner::item_processes() const
 
 std::vector<Leftover> Runner::processes_of(const RunningItem &active) const
 {
-    return gathers(active) ? library_.processes().of_gatherer() : item_processes();
+    return active.gathers ? library_.processes().of_gatherer() : item_processes();
 }
 
 std::vector<Leftover> Runner::note_left_running(std::size_t element)
@@ -294,18 +295,15 @@ template <typename Find> void Runner::end_all(const Find &find)
         signal_each(left, SIGCONT);
         std::this_thread::sleep_for(kTurn);
         read_signals();
-        poll_reports();
+        reader_.poll();
         tick();
     }
 }
 
 void Runner::make_way_for(const Job &job)
 {
-    const auto is_of_job = [&](std::size_t element) {
-        return std::ranges::any_of(
-            job.targets, [&](const auto &target) { return target && target->element == element; });
-    };
-    if (std::ranges::any_of(left_elements_, is_of_job)) {
+    if (std::ranges::any_of(left_elements_,
+                            [&job](std::size_t element) { return job.has(element); })) {
         end_left_running();
     }
     const auto is_gatherers = [&](const auto &target) {
@@ -313,9 +311,7 @@ void Runner::make_way_for(const Job &job)
     };
     const auto gatherer = std::ranges::find_if(job.targets, is_gatherers);
     if (gatherer != job.targets.end()) {
-        if (const auto plan = Plan::parse_annotated(read_stored_plan().value_or(""))) {
-            note_gathered(plan->report((*gatherer)->element));
-        }
+        reader_.note_gathered((*gatherer)->element);
         // the library does not find one that is a script, and would start another beside it
         const std::vector<Leftover> running = library_.processes().of_gatherer();
         const bool is_found = std::ranges::any_of(
@@ -325,8 +321,8 @@ void Runner::make_way_for(const Job &job)
         }
         require_trigger_port(); // an item may have taken it
     }
-    poll_reports();
-    std::erase_if(judged_, [&](const Judged &judged) { return is_of_job(judged.target.element); });
+    reader_.poll();
+    reader_.forget(job);
 }
 
 void Runner::end_round()
@@ -338,13 +334,8 @@ void Runner::end_round()
     if (gatherer_may_report_late_) {
         end_gatherer();
     }
-    poll_reports();
-    // the gatherer goes on: its copy of the plan has its last report
-    if (gathered_.size() > 1) {
-        gathered_.erase(gathered_.begin(), std::prev(gathered_.end()));
-    }
-    std::erase_if(judged_,
-                  [&](const Judged &one) { return !is_gatherer(item(one.place).name, vendor_); });
+    reader_.poll();
+    reader_.forget_round();
 }
 
 void Runner::end_left_running()

@@ -1,0 +1,88 @@
+// SPDX-FileCopyrightText: 2026 The Quillmark authors
+// SPDX-License-Identifier: Apache-2.0
+
+// A command, and how far its items are.
+#pragma once
+
+#include "plan/item_report.h"
+#include "run/results.h"
+
+#include <algorithm>
+#include <chrono>
+#include <cstddef>
+#include <deque>
+#include <optional>
+#include <string>
+#include <vector>
+
+namespace fptest
+{
+
+// One command and the items that the library comes to in it.
+struct Job {
+    struct Target {
+        std::size_t item = 0;    // in the suite
+        std::size_t element = 0; // in the plan
+    };
+
+    std::string path;
+    std::size_t suite = 0;
+    // nothing where the library comes to what it cannot run
+    std::vector<std::optional<Target>> targets;
+    std::string mark = {}; // that their elements bear; empty for none
+
+    bool has(std::size_t element) const
+    {
+        return std::ranges::any_of(targets, [element](const auto &target) {
+            return target && target->element == element;
+        });
+    }
+};
+
+// An item from its start until its end has been told. It runs; the library moves on, so
+// that only a gatherer is still at work; it is done; its end is told, in the order of
+// the starts.
+struct RunningItem {
+    // The time of the run: it stands still while the run is suspended.
+    using TimePoint = std::chrono::steady_clock::time_point;
+
+    // What keeps a report from counting.
+    struct Reporting {
+        bool expected = true;     // from a gatherer only once it has been told
+        bool overwritten = false; // by an old copy of the plan, and not reported since
+        bool lost = false;        // with the stored plan
+        bool undone = false;      // its result was there, and is not any more
+        bool in_another_plan = false;
+        bool from_a_copy = false;     // a gatherer's, of the plan: it has no mark
+        std::vector<ItemReport> seen; // the last of those before its report
+    };
+
+    Place place;
+    std::size_t element = 0;
+    bool gathers = false;
+    TimePoint start;
+    bool moved_on = false; // the library has
+    TimePoint moved_on_at;
+    bool done = false;
+    Reporting reporting;
+
+    std::optional<Outcome> stop; // timed_out or stopped, once that is wanted
+    bool meets_other = false;    // the library's stop, not the item
+    bool was_stopped = false;    // a stop has met it
+    bool killed = false;
+    TimePoint stop_wanted_at;
+    TimePoint stop_tried_at;
+
+    TimePoint gatherer_looked_for;
+    int gatherer_missed = 0; // how many times in a row
+    std::string gatherer_end;
+};
+
+struct RunningJob {
+    Job job;
+    std::size_t next = 0; // of its targets
+    // The last one is the library's current item, those before it are gatherers.
+    std::deque<RunningItem> items;
+};
+
+} // namespace fptest

@@ -1,0 +1,289 @@
+// SPDX-FileCopyrightText: 2026 The Quillmark authors
+// SPDX-License-Identifier: Apache-2.0
+
+#include "run/report_reader.h"
+
+#include "module/stored_plan.h"
+#include "plan/plan_text.h"
+#include "util/failure.h"
+
+#include <algorithm>
+#include <sys/stat.h>
+#include <utility>
+
+namespace fptest
+{
+namespace
+{
+
+constexpr std::size_t kSeen = 100; // reports that are kept of an item
+
+// As it reads once the plan has been made loadable.
+ItemReport as_made_loadable(ItemReport report)
+{
+    if (report.result_without_value) {
+        report.result_without_value = false;
+        report.result = "";
+    }
+    report.description = report.description.value_or("");
+    return report;
+}
+
+// Whether that element is the item still, and not one of another plan.
+bool is_item(const Plan &plan, std::size_t number, const std::string &name)
+{
+    if (number >= plan.elements().size()) {
+        return false;
+    }
+    const char *found = mxmlElementGetAttr(plan.elements()[number], "name");
+    return found != nullptr && name == found;
+}
+
+// One without it is as a process with an old copy of the plan has written it.
+bool bears_mark(const Plan &plan, std::size_t number, const std::string &mark)
+{
+    const char *found = mxmlElementGetAttr(plan.elements()[number], kMark);
+    return mark.empty() || (found != nullptr && mark == found);
+}
+
+} // namespace
+
+ReportReader::ReportReader(Run &run, const std::vector<Listener *> &listeners, RunningJob &running)
+    : run_(run), listeners_(listeners), running_(running)
+{
+}
+
+void ReportReader::poll()
+{
+    struct stat status {
+    };
+    if ((running_.items.empty() && judged_.empty()) || stat(kStoredPlan, &status) != 0 ||
+        !S_ISREG(status.st_mode) ||
+        (status.st_mtim.tv_sec == plan_status_.st_mtim.tv_sec &&
+         status.st_mtim.tv_nsec == plan_status_.st_mtim.tv_nsec &&
+         status.st_size == plan_status_.st_size && status.st_ino == plan_status_.st_ino)) {
+        return;
+    }
+    const std::string text = read_stored_plan().value_or("");
+    if (const auto plan = Plan::parse_annotated(text)) {
+        plan_status_ = status;
+        read(plan);
+        if (!Plan::load_as_library(text)) {
+            mend_stored_plan(); // or who reports next could not
+        }
+    }
+}
+
+void ReportReader::read(const std::optional<Plan> &plan)
+{
+    if (!plan) {
+        return;
+    }
+    for (RunningItem &active : running_.items) {
+        read_report(active, *plan);
+    }
+    for (Judged &judged : judged_) {
+        read_late_report(judged, *plan);
+    }
+    if (std::exchange(marks_are_gone_, false)) {
+        mark_again();
+    }
+}
+
+// What a process with an old copy of the plan says of items is older than they are. A
+// gatherer's own copy is always old: what is new in it is what it has to report.
+bool ReportReader::is_older(RunningItem &active, const Plan &plan, const ItemReport &report)
+{
+    if (bears_mark(plan, active.element, running_.job.mark)) {
+        return false;
+    }
+    marks_are_gone_ = true;
+    if (!active.gathers || !has_result(report)) {
+        return true;
+    }
+    active.reporting.from_a_copy = active.reporting.from_a_copy || !was_gathered(report);
+    return !active.reporting.from_a_copy;
+}
+
+// So that what is reported from now on counts again. What is there is cleared.
+void ReportReader::mark_again()
+{
+    std::vector<std::size_t> numbers;
+    for (RunningItem &active : running_.items) {
+        if (active.reporting.overwritten) {
+            numbers.push_back(active.element);
+        }
+    }
+    for (std::size_t at = running_.next; at < running_.job.targets.size(); ++at) {
+        if (const auto &target = running_.job.targets[at]) {
+            numbers.push_back(target->element);
+        }
+    }
+    if (numbers.empty()) {
+        return;
+    }
+    const Descriptor lock = lock_stored_plan();
+    try {
+        if (const auto marked =
+                without_reports(whole_stored_plan().text, numbers, running_.job.mark)) {
+            replace_stored_plan(*marked);
+        }
+    } catch (const Failure &) {
+        return; // the disk is full
+    }
+}
+
+void ReportReader::begin_gathering()
+{
+    if (running_.items.empty() || !running_.items.back().gathers) {
+        return;
+    }
+    RunningItem &active = running_.items.back();
+    active.reporting.expected = true;
+    const auto plan = whole_stored_plan().annotated;
+    if (!plan || !is_item(*plan, active.element, item_at(run_, active.place).name)) {
+        return;
+    }
+    const ItemReport report = plan->report(active.element);
+    if (has_result(report) && !was_gathered(report)) {
+        tell_late(active.place, true, gathered_in_ != 0 ? gathered_in_ : run_.round, report);
+    }
+    active.reporting.overwritten =
+        has_result(report) || !bears_mark(*plan, active.element, running_.job.mark);
+    if (active.reporting.overwritten) {
+        mark_again();
+    }
+    active.reporting.overwritten = false;
+}
+
+// As of the round of its item.
+void ReportReader::tell_late(const Place &place, bool gathers, int round, const ItemReport &report)
+{
+    const int now = std::exchange(run_.round, round);
+    for (Listener *listener : listeners_) {
+        listener->late(run_, place, report);
+    }
+    run_.round = now;
+    if (gathers) {
+        note_gathered(report);
+    }
+}
+
+void ReportReader::note_earlier_plan(const std::string &text)
+{
+    const auto plan = Plan::parse_annotated(text);
+    for (std::size_t number = 0; plan && number < plan->elements().size(); ++number) {
+        const char *name = mxmlElementGetAttr(plan->elements()[number], "name");
+        if (name != nullptr && is_gatherer(name, run_.vendor)) {
+            note_gathered(plan->report(number));
+        }
+    }
+}
+
+void ReportReader::note_gathered(std::size_t element)
+{
+    if (const auto plan = Plan::parse_annotated(read_stored_plan().value_or(""))) {
+        note_gathered(plan->report(element));
+    }
+}
+
+void ReportReader::note_judged(RunningItem &active)
+{
+    const ItemReport &report = item_at(run_, active.place).report;
+    if (active.gathers) {
+        note_gathered(report);
+        gathered_in_ = run_.round;
+    }
+    judged_.push_back({active.place, active.element, active.gathers, running_.job.mark, run_.round,
+                       std::move(active.reporting.seen)});
+    judged_.back().seen.push_back(report);
+}
+
+void ReportReader::forget(const Job &job)
+{
+    std::erase_if(judged_, [&](const Judged &judged) { return job.has(judged.element); });
+}
+
+void ReportReader::forget_round()
+{
+    // its copy of the plan has its last report
+    if (gathered_.size() > 1) {
+        gathered_.erase(gathered_.begin(), std::prev(gathered_.end()));
+    }
+    std::erase_if(judged_, [](const Judged &judged) { return !judged.gathers; });
+}
+
+void ReportReader::note_gathered(const ItemReport &report)
+{
+    if (has_result(report)) {
+        std::erase(gathered_, as_made_loadable(report));
+        gathered_.push_back(as_made_loadable(report));
+    }
+}
+
+bool ReportReader::was_gathered(const ItemReport &report) const
+{
+    return std::ranges::find(gathered_, as_made_loadable(report)) != gathered_.end();
+}
+
+void ReportReader::read_report(RunningItem &active, const Plan &plan)
+{
+    const std::size_t number = active.element;
+    active.reporting.in_another_plan = !is_item(plan, number, item_at(run_, active.place).name);
+    if (active.done || active.reporting.in_another_plan || !active.reporting.expected) {
+        return;
+    }
+    ItemRun &result = item_at(run_, active.place);
+    ItemReport report = plan.report(number);
+    if (report.result == "") { // it has been made loadable already
+        report.result.reset();
+        report.result_without_value = true;
+    }
+    if (is_older(active, plan, report)) {
+        active.reporting.overwritten = true;
+        return;
+    }
+    if (as_made_loadable(report) == as_made_loadable(result.report) ||
+        (active.reporting.overwritten && !has_result(report))) { // as it was cleared
+        return;
+    }
+    active.reporting.overwritten = false;
+    active.reporting.undone = result.report.result && !report.result;
+    if (active.reporting.seen.size() == kSeen) {
+        active.reporting.seen.erase(active.reporting.seen.begin());
+    }
+    active.reporting.seen.push_back(std::exchange(result.report, std::move(report)));
+    for (Listener *listener : listeners_) {
+        listener->progressed(run_, active.place);
+    }
+}
+
+void ReportReader::read_late_report(Judged &judged, const Plan &plan)
+{
+    const std::size_t number = judged.element;
+    if (!is_item(plan, number, item_at(run_, judged.place).name)) {
+        return;
+    }
+    const auto is_same = [&](const RunningItem &active) {
+        return active.place.suite == judged.place.suite && active.place.item == judged.place.item;
+    };
+    if (std::ranges::any_of(running_.items, is_same)) {
+        plan_status_ = {}; // its end is told first: look again then
+        return;
+    }
+    const ItemReport report = plan.report(number);
+    const bool keeps_copy = judged.gathers && !was_gathered(report);
+    if (!bears_mark(plan, judged.element, judged.mark) && !keeps_copy) {
+        return;
+    }
+    const auto is_report = [&](const ItemReport &one) {
+        return as_made_loadable(one) == as_made_loadable(report);
+    };
+    if (!has_result(report) || std::ranges::any_of(judged.seen, is_report)) {
+        return;
+    }
+    judged.seen.push_back(report);
+    tell_late(judged.place, judged.gathers, judged.round, report);
+}
+
+} // namespace fptest

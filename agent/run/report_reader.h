@@ -1,0 +1,81 @@
+// SPDX-FileCopyrightText: 2026 The Quillmark authors
+// SPDX-License-Identifier: Apache-2.0
+
+// Reads from the stored plan what items report: while they run, and after they have
+// been judged.
+#pragma once
+
+#include "plan/item_report.h"
+#include "plan/plan.h"
+#include "run/job.h"
+#include "run/results.h"
+
+#include <cstddef>
+#include <string>
+#include <sys/stat.h>
+#include <vector>
+
+namespace fptest
+{
+
+class ReportReader
+{
+  public:
+    // All of them outlive it.
+    ReportReader(Run &run, const std::vector<Listener *> &listeners, RunningJob &running);
+
+    // The stored plan before the run: a gatherer may have kept a copy of it.
+    void note_earlier_plan(const std::string &text);
+
+    // What the stored plan says of a gatherer before it is cleared from it.
+    void note_gathered(std::size_t element);
+
+    // Reads the plan where it has changed; one that is being written is left for the
+    // next time.
+    void poll();
+
+    // Reads it, where it is whole.
+    void read(const std::optional<Plan> &plan);
+
+    // The gatherer is about to be told: what is there is of an earlier gathering.
+    void begin_gathering();
+
+    // An item has been judged: what it reports from now on is late.
+    void note_judged(RunningItem &active);
+
+    // What items of this job, or of the round, report from now on is not told as late
+    // either. A gatherer's still is after its round.
+    void forget(const Job &job);
+    void forget_round();
+
+  private:
+    // An item that has been judged, and may be reported still.
+    struct Judged {
+        Place place;
+        std::size_t element = 0;
+        bool gathers = false;
+        std::string mark;
+        int round = 0;
+        std::vector<ItemReport> seen; // an old copy of the plan may bring one of them back
+    };
+
+    void read_report(RunningItem &active, const Plan &plan);
+    void read_late_report(Judged &judged, const Plan &plan);
+    bool is_older(RunningItem &active, const Plan &plan, const ItemReport &report);
+    void mark_again();
+    void tell_late(const Place &place, bool gathers, int round, const ItemReport &report);
+    void note_gathered(const ItemReport &report);
+    bool was_gathered(const ItemReport &report) const;
+
+    Run &run_;
+    const std::vector<Listener *> &listeners_;
+    RunningJob &running_;
+    std::vector<Judged> judged_;       // of this round, and gatherers
+    std::vector<ItemReport> gathered_; // what an old copy may say of the gatherer
+    int gathered_in_ = 0;              // the round of the last gathering
+    bool marks_are_gone_ = false;      // from items' elements
+    struct stat plan_status_ {
+    };
+};
+
+} // namespace fptest
