@@ -86,7 +86,13 @@ void ReportReader::read(const std::optional<Plan> &plan)
         read_late_report(judged, *plan);
     }
     if (std::exchange(marks_are_gone_, false)) {
-        mark_again();
+        std::vector<std::size_t> numbers;
+        for (const RunningItem &active : running_.items) {
+            if (active.reporting.overwritten) {
+                numbers.push_back(active.element);
+            }
+        }
+        mark_again(std::move(numbers));
     }
 }
 
@@ -105,15 +111,10 @@ bool ReportReader::is_older(RunningItem &active, const Plan &plan, const ItemRep
     return !active.reporting.from_a_copy;
 }
 
-// So that what is reported from now on counts again. What is there is cleared.
-void ReportReader::mark_again()
+// These and the items to come, so that what they report from now on counts. What is
+// there is cleared.
+void ReportReader::mark_again(std::vector<std::size_t> numbers)
 {
-    std::vector<std::size_t> numbers;
-    for (RunningItem &active : running_.items) {
-        if (active.reporting.overwritten) {
-            numbers.push_back(active.element);
-        }
-    }
     for (std::size_t at = running_.next; at < running_.job.targets.size(); ++at) {
         if (const auto &target = running_.job.targets[at]) {
             numbers.push_back(target->element);
@@ -148,10 +149,8 @@ void ReportReader::begin_gathering()
     if (has_result(report) && !was_gathered(report)) {
         tell_late(active.place, true, gathered_in_ != 0 ? gathered_in_ : run_.round, report);
     }
-    active.reporting.overwritten =
-        has_result(report) || !bears_mark(*plan, active.element, running_.job.mark);
-    if (active.reporting.overwritten) {
-        mark_again();
+    if (has_result(report) || !bears_mark(*plan, active.element, running_.job.mark)) {
+        mark_again({active.element});
     }
     active.reporting.overwritten = false;
 }

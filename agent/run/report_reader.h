@@ -62,7 +62,7 @@ class ReportReader
     void read_report(RunningItem &active, const Plan &plan);
     void read_late_report(Judged &judged, const Plan &plan);
     bool is_older(RunningItem &active, const Plan &plan, const ItemReport &report);
-    void mark_again();
+    void mark_again(std::vector<std::size_t> numbers);
     void tell_late(const Place &place, bool gathers, int round, const ItemReport &report);
     void note_gathered(const ItemReport &report);
     bool was_gathered(const ItemReport &report) const;
