@@ -35,7 +35,7 @@ template <typename Number> CLI::Validator number_in(Number least, Number most)
                     text = fmt::format("{}", number); // CLI11 reads 010 as octal
                     return std::string();
                 }
-                return refused(text, fmt::format("is no number from {} to {}", least, most));
+                return refused(text, fmt::format("is not a number from {} to {}", least, most));
             },
             ""};
 }
@@ -91,7 +91,7 @@ CLI::Validator time_span()
                     return refused(text, "is longer than 1000 days");
                 }
                 if (!(seconds >= 0.001)) {
-                    return refused(text, "is no time as 90, 90s, 10m, 2h or 1d");
+                    return refused(text, "is not a time such as 90, 90s, 10m, 2h or 1d");
                 }
                 text = fmt::format("{}", seconds);
                 return std::string();

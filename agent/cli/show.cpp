@@ -71,7 +71,7 @@ Exit show(const std::string &file)
     const std::string name = file.empty() ? kStoredPlan : file == "-" ? "<stdin>" : one_line(file);
     const auto plan = Plan::parse_annotated(read_shown(file));
     if (!plan) {
-        throw Failure(Exit::usage, "{} is no whole test plan: fptest check says what is wrong",
+        throw Failure(Exit::usage, "{} is not a whole test plan: fptest check says what is wrong",
                       name);
     }
     const auto rows = table(*plan);

@@ -74,7 +74,7 @@ std::string surplus(const CLI::App &app, const CLI::App &command, const std::str
         return fmt::format("{} is one argument too many", in_quotes(word));
     }
     return command.get_option_no_throw(word) != nullptr
-               ? fmt::format("{} is no option where it comes after --: put it before that", word)
+               ? fmt::format("{} is not an option after --: put it before", word)
                : without_option(command, word);
 }
 

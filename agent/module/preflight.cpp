@@ -83,8 +83,9 @@ void choose_log(const std::string &option)
 void require_device()
 {
     if (access("/system/bin/sh", X_OK) != 0) {
-        throw Failure(Exit::environment, "this machine is no device: there is no /system/bin/sh; "
-                                         "on a desk, run it as: device/run -- fptest ...");
+        throw Failure(Exit::environment,
+                      "this machine is not a device: there is no /system/bin/sh; "
+                      "on a desk, run it as: device/run -- fptest ...");
     }
     if (access(kDataDirectory, W_OK | X_OK) != 0) {
         throw Failure(Exit::environment,

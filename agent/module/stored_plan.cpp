@@ -43,7 +43,7 @@ void require_regular_plan()
     struct stat plan {
     };
     if (stat(kStoredPlan, &plan) == 0 && !S_ISREG(plan.st_mode)) {
-        throw Failure(Exit::environment, "{} is no regular file: remove it", kStoredPlan);
+        throw Failure(Exit::environment, "{} is not a regular file: remove it", kStoredPlan);
     }
 }
 

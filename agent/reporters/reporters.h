@@ -23,7 +23,7 @@ namespace fptest
 std::unique_ptr<Listener> json_report(const std::string &path);
 
 // JUnit XML; the path "-" is standard output. The file always holds a whole document:
-// it is replaced, at most once a second and at the end. What is no regular file is
+// it is replaced, at most once a second and at the end. What is not a regular file is
 // written at the end alone. Each suite has a property "finished". What has not been
 // run is an error until the run has finished, so that what is left of a run that was
 // killed is no success.

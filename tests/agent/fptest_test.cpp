@@ -214,16 +214,18 @@ TEST_F(Fptest, SaysInOneLineWhyItShowsNothing)
            {"show"});
     expect(2, "fptest: /tmp/scene/none: No such file or directory", {"show", work("none")});
     const std::string half = "<P><CmdGroup name=\"G\"><Cmd name=\"a\"/><Cmd nam";
-    expect(2, "fptest: /tmp/scene/plan.xml is no whole test plan: fptest check says what is wrong",
+    expect(2,
+           "fptest: /tmp/scene/plan.xml is not a whole test plan: fptest check says what is wrong",
            {"show", plan(half)});
-    expect(2, "fptest: <stdin> is no whole test plan: fptest check says what is wrong",
+    expect(2, "fptest: <stdin> is not a whole test plan: fptest check says what is wrong",
            {"show", "-"}, half);
     expect(2, "fptest: <stdin> has no items: fptest check says more", {"show", "-"},
            "<P><CmdGroup name=\"G\"/></P>");
     write_file(kPlanFile, half);
-    expect(2,
-           "fptest: /data/vorlane/src1.xml is no whole test plan: fptest check says what is wrong",
-           {"show"});
+    expect(
+        2,
+        "fptest: /data/vorlane/src1.xml is not a whole test plan: fptest check says what is wrong",
+        {"show"});
 }
 
 TEST_F(Fptest, CutsTheTableToTheTerminal)

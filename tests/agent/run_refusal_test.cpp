@@ -165,10 +165,11 @@ TEST_F(Refusal, OutsideOfADevice)
     }
     const Start start{.arguments = {"run", "--plan", plan(kTwoGroups), "P/Bringup"},
                       .prepare = without_device};
-    expect(3,
-           "fptest: this machine is no device: there is no /system/bin/sh; on a desk, run it as: "
-           "device/run -- fptest ...",
-           start);
+    expect(
+        3,
+        "fptest: this machine is not a device: there is no /system/bin/sh; on a desk, run it as: "
+        "device/run -- fptest ...",
+        start);
 }
 
 TEST_F(Refusal, WhereTheGatherersPortIsTaken)

@@ -256,7 +256,7 @@ TEST_F(Send, WantsADevice)
     const Ended ended = run_fptest(start);
     EXPECT_EQ(ended.status, 3);
     EXPECT_EQ(ended.err,
-              "fptest: this machine is no device: there is no /system/bin/sh; on a desk, "
+              "fptest: this machine is not a device: there is no /system/bin/sh; on a desk, "
               "run it as: device/run -- fptest ...\n");
     EXPECT_FALSE(std::filesystem::exists(kPlanFile));
 }

@@ -473,7 +473,7 @@ TEST_F(Trust, TakesNoFifoAndNoDirectoryForThePlan)
               {"send", "pingtest"},
               {"show"},
               {"report", "G", "Item", "--progress", "1", "--result", "0"}}) {
-            expect_refusal(3, "fptest: /data/vorlane/src1.xml is no regular file: remove it",
+            expect_refusal(3, "fptest: /data/vorlane/src1.xml is not a regular file: remove it",
                            arguments);
         }
     }

@@ -48,7 +48,7 @@ TEST_F(Usage, IsExplainedInOneLine)
         {{"run", "--as-s=1", "P/G"},
          "there is no option '--as-s=1'; did you mean '--as-sent'? See fptest run --help"},
         {{"run", "P/G", "--", "--quiet"},
-         "--quiet is no option where it comes after --: put it before that; see fptest run --help"},
+         "--quiet is not an option after --: put it before; see fptest run --help"},
         {{"run", "P/G", "--", "--quit"},
          "there is no option '--quit'; did you mean '--quiet'? See fptest run --help"},
         {{"run", "-x"}, "there is no option '-x'; see fptest run --help"},
