@@ -51,14 +51,13 @@ std::string reason(const Fault &fault)
     return {};
 }
 
-// What the shell runs for the text between backticks.
-std::string without_escapes(const std::string &text)
+// What the shell runs for the text between backticks, where a '\' may be before these.
+std::string without_escapes(const std::string &text, std::string_view escaped)
 {
     std::string plain;
     for (std::size_t at = 0; at < text.size(); ++at) {
         const bool is_escape =
-            text[at] == '\\' && at + 1 < text.size() &&
-            std::string_view("$`\\").find(text[at + 1]) != std::string_view::npos;
+            text[at] == '\\' && at + 1 < text.size() && escaped.find(text[at + 1]) != escaped.npos;
         plain += text[is_escape ? ++at : at];
     }
     return plain;
@@ -126,11 +125,19 @@ ShellChecker::Verdict ShellChecker::judge(const Item &item, const std::string &l
     return verdict;
 }
 
-// With -n the shell does not look between backticks.
-bool ShellChecker::is_refused(const std::string &backticks, std::string &why)
+// With -n the shell does not look between backticks. What is between those in others
+// costs only what these print.
+bool ShellChecker::is_refused(const Effect &substitution, std::string &why)
 {
-    return backticks.find("\\\"") == backticks.npos && // where quotes round it change what is meant
-           shell_.ask(without_escapes(backticks), why) == Shell::Answer::refused;
+    const std::string &text = substitution.text;
+    if (substitution.mark != "`") {
+        return std::ranges::any_of(read_shell_line(text).effects, [&](const Effect &effect) {
+            return effect.kind == Effect::Kind::substitution && is_refused(effect, why);
+        });
+    }
+    // a '\' before a '"' is an escape where quotes are round it
+    return shell_.ask(without_escapes(text, "$`\\"), why) == Shell::Answer::refused &&
+           shell_.ask(without_escapes(text, "$`\\\""), why) == Shell::Answer::refused;
 }
 
 void ShellChecker::report_name(const Item &item, const std::string &characters, bool is_refused)
@@ -176,12 +183,13 @@ void ShellChecker::report_effect(const Item &item, const Effect &effect, std::si
         }
         break;
     case Effect::Kind::substitution:
-        if (effect.mark == "`" && is_refused(effect.text, why)) {
+        if (is_refused(effect, why)) {
             findings_.error(
                 place,
-                "the shell would refuse the command line of item {}: between the backticks here, "
-                "{}; put a '\\' before them if they are meant for the item",
-                name, one_line(why));
+                "the shell would refuse the command line of item {}: between {} here, {}; put a "
+                "'\\' before {} if it is meant for the item",
+                name, effect.mark == "`" ? "the backticks" : "backticks in " + text, one_line(why),
+                mark);
             break;
         }
         findings_.warning(place,

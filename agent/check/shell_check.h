@@ -38,7 +38,7 @@ class ShellChecker
     };
 
     Verdict judge(const Item &item, const std::string &line);
-    bool is_refused(const std::string &backticks, std::string &why);
+    bool is_refused(const ShellReading::Effect &substitution, std::string &why);
     void report_name(const Item &item, const std::string &characters, bool is_refused);
     void report_refusal(const Item &item, const Verdict &verdict, std::size_t args_begin);
     void report_effect(const Item &item, const ShellReading::Effect &effect, std::size_t place);

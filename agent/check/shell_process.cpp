@@ -50,6 +50,33 @@ std::optional<std::string> read_all(int descriptor, double seconds)
     }
 }
 
+bool is_letter(unsigned char byte)
+{
+    return std::isalpha(byte) != 0 || byte >= 0x80;
+}
+
+// Whether it stays an expansion between double quotes, in which nothing is run, and no
+// variable decides what becomes of it. What could be an end of it, or a quote, is refused.
+bool can_be_tried(std::string_view expansion)
+{
+    const bool is_arithmetic = expansion.starts_with("$((");
+    const std::size_t mark = is_arithmetic ? 3 : 2;
+    const std::string_view inside = expansion.substr(mark, expansion.size() - 2 * mark + 1);
+    const std::string_view marks = is_arithmetic && inside.find_first_of("()") != inside.npos
+                                       ? " _=!<>+-*/%^~&|,:()"
+                                   : is_arithmetic ? " _=!<>+-*/%^~&|,:${}"
+                                                   : " _=!+-*/%^~,:@#.;[]";
+    const auto is_taken = [&](char byte) {
+        const auto character = static_cast<unsigned char>(byte);
+        return is_letter(character) || std::isdigit(character) || marks.find(byte) != marks.npos;
+    };
+    // "${ COMMAND;}" and "${|COMMAND;}" run something
+    return std::ranges::all_of(inside, is_taken) && (is_arithmetic || !inside.starts_with(' ')) &&
+           inside.find("{ ") == inside.npos && inside.find("{|") == inside.npos &&
+           // it may divide by a variable, or a variable decides what is looked at
+           !(std::ranges::any_of(inside, is_letter) && inside.find_first_of("/%") != inside.npos);
+}
+
 } // namespace
 
 Shell::Answer Shell::ask(const std::string &line, std::string &why)
@@ -62,21 +89,7 @@ Shell::Answer Shell::ask(const std::string &line, std::string &why)
 
 Shell::Answer Shell::ask_to_expand(const std::string &expansion, std::string &why)
 {
-    const bool is_arithmetic = expansion.starts_with("$((");
-    const bool has_names =
-        std::ranges::any_of(expansion, [](unsigned char byte) { return std::isalpha(byte); });
-    const std::string_view inside = std::string_view(expansion).substr(is_arithmetic ? 3 : 1);
-    constexpr std::string_view kRuns[] = {"`", "$(", "{ ", "{|", "{\t", "{\n"};
-    constexpr std::string_view kMayEndArithmetic = "'\"\\;#\n";
-    if (std::ranges::any_of(
-            kRuns, [&](std::string_view runs) { return inside.find(runs) != inside.npos; }) ||
-        (is_arithmetic && inside.find_first_of(kMayEndArithmetic) != inside.npos)) {
-        return Answer::unknown;
-    }
-    // it may divide by a variable, or a variable decides what is looked at
-    if (inside.find('?') != inside.npos ||
-        (has_names && inside.find_first_of("/%") != inside.npos) ||
-        (!is_arithmetic && inside.find("${") != inside.npos)) {
+    if (!can_be_tried(expansion)) {
         return Answer::unknown;
     }
     const auto begin = Clock::now();
@@ -102,9 +115,10 @@ Shell::Answer Shell::ask_once(const std::string &option, const std::string &line
     std::string name = "sh";
     std::string how = option;
     std::string takes_text = "-c";
+    std::string no_more_options = "--"; // the text may begin with a '-'
     std::string text = line;
-    const std::array<char *, 5> arguments = {name.data(), how.data(), takes_text.data(),
-                                             text.data(), nullptr};
+    const std::array<char *, 6> arguments = {
+        name.data(), how.data(), takes_text.data(), no_more_options.data(), text.data(), nullptr};
     const std::array<char *, 1> environment = {nullptr};
     pid_t process = -1;
     const int error = posix_spawn(&process, "/system/bin/sh", &actions, nullptr, arguments.data(),

@@ -4,6 +4,7 @@
 #include "check/shell_reader.h"
 
 #include <algorithm>
+#include <set>
 #include <utility>
 
 namespace fptest
@@ -509,9 +510,10 @@ class LineScanner
     bool pass_arithmetic(std::string_view mark)
     {
         const std::size_t begin = at_;
-        if (!pass(mark)) {
+        if (not_arithmetic_.contains(begin) || !pass(mark)) {
             return false;
         }
+        const std::size_t effects = reading_.effects.size();
         std::size_t open = 2;
         while (!at_end()) {
             if (pass("(")) {
@@ -524,6 +526,8 @@ class LineScanner
                     return true;
                 }
                 if (open == 2) {
+                    not_arithmetic_.insert(begin);
+                    reading_.effects.resize(effects);
                     at_ = begin;
                     return false;
                 }
@@ -544,6 +548,7 @@ class LineScanner
     ShellReading reading_;
     std::size_t depth_ = 0; // of what is run on its own
     std::size_t braces_ = 0;
+    std::set<std::size_t> not_arithmetic_; // where it has been tried: once, or it never ends
     bool after_first_ = false;
     bool has_line_end_ = false;
     std::optional<std::size_t> open_; // where the last effect's text begins

@@ -70,12 +70,14 @@ TEST(CheckedGrammar, IsTheShellsToJudge)
 // With -n it accepts these all the same.
 TEST(CheckedGrammar, IsTheShellsBetweenBackticksToo)
 {
-    for (const std::string args : {"`\"`", "\"`(`\"", "``(``"}) {
+    for (const std::string args : {"`\"`", "\"`(`\"", "``(``", "$(`echo (b)`)",
+                                   "$(echo \"`echo (b)`\")", "`echo \\\"(b)`", "`+x (b)`"}) {
         EXPECT_TRUE(has_error(args)) << args;
         EXPECT_FALSE(runs(args)) << args;
     }
-    for (const std::string args : {"``", "`echo \\`echo b\\``", "`echo \\`(\\``",
-                                   "`echo '(' \\$HOME`", "\"`echo \\\"a b\\\"`\""}) {
+    for (const std::string args :
+         {"``", "`echo \\`echo b\\``", "`echo \\`(\\``", "`echo '(' \\$HOME`",
+          "\"`echo \\\"a b\\\"`\"", "$(`echo b`)", "`echo \\\"b`", "`-v`", "`-c`"}) {
         EXPECT_FALSE(has_error(args)) << args;
         EXPECT_TRUE(runs(args)) << args;
     }
@@ -89,12 +91,18 @@ TEST(CheckedExpansion, IsAnErrorWhereTheShellGivesUpAtIt)
         EXPECT_TRUE(has_error(args)) << args;
         EXPECT_FALSE(runs(args)) << args;
     }
-    for (const std::string args :
-         {"${a}",     "${a:-b c}", "${a-${b c}}x", "${#a}",      "${a#b}",   "${a%%b}",
-          "${a/b/c}", "${a@Q}",    "${a:0:1}",     "${1}",       "${10}",    "${*}",
-          "${@}",     "${#}",      "${?}",         "${$}",       "${!}",     "${-}",
-          "${a[1]}",  "${a[*]}",   "$'${'",        "\\${a b}",   "'${a b}'", "x || : ${a b}",
-          "${!a}",    "${%a}",     "${HOME?}",     "$((1 + 2))", "${a:=b}",  "$((a = 3, 4))"}) {
+    for (const std::string args : {"${a}",         "${a:-b c}",    "${a-${b c}}x",
+                                   "${#a}",        "${a#b}",       "${a%%b}",
+                                   "${a/b/c}",     "${a@Q}",       "${a:0:1}",
+                                   "${1}",         "${10}",        "${*}",
+                                   "${@}",         "${#}",         "${?}",
+                                   "${$}",         "${!}",         "${-}",
+                                   "${a[1]}",      "${a[*]}",      "$'${'",
+                                   "\\${a b}",     "'${a b}'",     "x || : ${a b}",
+                                   "${!a}",        "${%a}",        "${HOME?}",
+                                   "$((1 + 2))",   "${a:=b}",      "$((a = 3, 4))",
+                                   "${b:-'c\"d'}", "\"${a#'}'}\"", "$(((1 + 2) * (3)))",
+                                   "${b:-'c}d'}"}) {
         EXPECT_FALSE(has_error(args)) << args;
         EXPECT_TRUE(runs("; a=b; : " + args)) << args;
     }
@@ -102,7 +110,8 @@ TEST(CheckedExpansion, IsAnErrorWhereTheShellGivesUpAtIt)
 
 TEST(CheckedGrammar, IsJudgedWithoutRunningAnything)
 {
-    const std::string file = "/tmp/is_not_made";
+    ASSERT_EQ(chdir("/tmp"), 0);
+    const std::string file = "is_not_made"; // with a '/' an expansion is left alone
     std::string why;
     for (const std::string args :
          {"; touch ", "$(touch ", "`touch ", "\ntouch ", "&& touch ", ">"}) {
@@ -115,10 +124,24 @@ TEST(CheckedGrammar, IsJudgedWithoutRunningAnything)
         for (const std::string &expansion :
              {"$((1 + " + run + "))", "${a:-" + run + "}", "${a[" + run + "]}", "$((" + run + "))",
               "${ touch " + file + ";}", "${|touch " + file + ";}",
-              "$((1)); touch " + file + "; ((1))"}) {
+              "$((1)); touch " + file + "; ((1))", "${x:-'}\"; touch " + file + "; : \"'}",
+              "${x[1]:-'}\"; touch " + file + "; : \"'}"}) {
             EXPECT_EQ(Shell().ask_to_expand(expansion, why), Shell::Answer::unknown);
             EXPECT_NE(access(file.c_str(), F_OK), 0) << expansion;
         }
+    }
+}
+
+TEST(CheckedGrammar, IsReadInATimeThatDoesNotDoubleWithEachLevel)
+{
+    for (const auto &[begin, end] : {std::pair("$((", ") )"), std::pair("$(((", ") ) )")}) {
+        std::string line = "x";
+        for (int level = 0; level < 100; ++level) {
+            line = begin + line + end;
+        }
+        const auto start = std::chrono::steady_clock::now();
+        read_shell_line("/system/bin/X " + line);
+        EXPECT_LT(std::chrono::steady_clock::now() - start, std::chrono::seconds(2)) << begin;
     }
 }
 
