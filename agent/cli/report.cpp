@@ -45,10 +45,11 @@ struct ReportOptions {
 constexpr std::size_t kLongestEntity = 6;
 constexpr std::size_t kAttributes = 64;
 
-Plan load_stored(const std::string &text)
+Plan load_stored(std::string &text)
 {
     std::string why;
-    auto plan = Plan::load_as_library(text, &why);
+    auto plan = made_of_stored_plan(
+        text, [&why](const std::string &read) { return Plan::load_as_library(read, &why); });
     if (!plan) {
         throw Failure(Exit::environment, "{} does not load ({}): store the plan again", kStoredPlan,
                       one_line(why));
@@ -93,7 +94,7 @@ Exit report(const ReportOptions &options)
     choose_log(options.log);
     mend_stored_plan(); // or a report that has spoiled it would cost this one
     const Descriptor lock = lock_stored_plan();
-    const std::string text =
+    std::string text =
         require_stored_plan(", so nothing can be reported: store one with fptest run --plan FILE");
     const Plan plan = load_stored(text);
     const std::size_t number = find_item(plan, options);

@@ -4,10 +4,12 @@
 // fptest report: how a shell script reports.
 #include "fptest_runner.h"
 
+#include <chrono>
 #include <filesystem>
 #include <fstream>
 #include <regex>
 #include <sys/stat.h>
+#include <thread>
 
 namespace fs = std::filesystem;
 
@@ -240,6 +242,18 @@ TEST_F(Report, WantsAPlanThatLoads)
     EXPECT_THAT(ended.err, StartsWith("fptest: /data/vorlane/src1.xml does not load ("));
     EXPECT_THAT(ended.err, EndsWith("): store the plan again\n"));
     EXPECT_EQ(read_file(kPlanFile), broken);
+}
+
+TEST_F(Report, WaitsForAPlanThatIsJustBeingSaved)
+{
+    write_file(kPlanFile, "");
+    const std::jthread saves([] {
+        std::this_thread::sleep_for(std::chrono::milliseconds(200));
+        write_file(kPlanFile, kPlan);
+    });
+    const Ended ended = report({"Bringup", "SpiCheck", "--progress", "1", "--result", "0"});
+    EXPECT_EQ(ended.status, 0) << ended.err;
+    EXPECT_THAT(read_file(kPlanFile), HasSubstr("progress=\"1\""));
 }
 
 TEST_F(Report, SaysThatThePlanIsNotWritable)
