@@ -104,6 +104,7 @@ LibraryProcess::~LibraryProcess()
 
 void LibraryProcess::command(const std::string &text, const std::vector<std::string> &items)
 {
+    rewind_output();
     std::string message = text.c_str(); // commands are zero-terminated
     for (const std::string &item : items) {
         message += '\0' + item;
@@ -124,6 +125,7 @@ void LibraryProcess::hold_at_ends()
 
 void LibraryProcess::go_on()
 {
+    rewind_output();
     send_message(control_.get(), {MessageKind::go_on, ""});
 }
 
@@ -260,6 +262,15 @@ off_t LibraryProcess::output_size() const
     struct stat status {
     };
     return fstat(output_.get(), &status) == 0 ? status.st_size : 0;
+}
+
+// A limit of a file's size counts all that was ever printed, of every item. What is left
+// running may lose what it prints right now.
+void LibraryProcess::rewind_output()
+{
+    if (!has_events() && output_size() == taken_ && ftruncate(output_.get(), 0) == 0) {
+        taken_ = 0;
+    }
 }
 
 // A gatherer that stays keeps it for what it prints: that must neither fail from the

@@ -111,6 +111,7 @@ class LibraryProcess
     void read_control();
     void lose();
     off_t output_size() const;
+    void rewind_output();
     void leave_output();
     void note_truncation(off_t end);
 

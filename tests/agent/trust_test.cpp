@@ -446,15 +446,30 @@ TEST_F(Trust, NamesWhatAGathererLeavesRunning)
 
 // --- limits of the machine ------------------------------------------------------------
 
+// The run of the plan, with these options, where no file may be longer than so many
+// blocks of 512 bytes.
+Ended run_with_limit(int blocks, const std::string &options)
+{
+    support::Start start;
+    start.arguments = {"/system/bin/sh", "-c",
+                       "ulimit -f " + std::to_string(blocks) + "; exec fptest run --quiet " +
+                           options + " --plan /tmp/scene/plan.xml P/G"};
+    start.environment = {{"VR_LOG_FILE", std::nullopt}}; // items write to it
+    return support::run(start);
+}
+
+TEST_F(Trust, CountsNoOutputOfEarlierItemsAgainstTheLimitOfFiles)
+{
+    plan(device::plan_of({{"G",
+                           {{"Script", "'head -c 12000 /dev/zero; fptest report G Script "
+                                       "--progress 100 --result 0'"}}}}));
+    EXPECT_EQ(run_with_limit(60, "--repeat 4").status, 0);
+}
+
 TEST_F(Trust, GoesOnWhereAReportIsTooLongForTheLimitOfFiles)
 {
     plan(kOnePasses);
-    support::Start start;
-    start.arguments = {"/system/bin/sh", "-c",
-                       "ulimit -f 2; exec fptest run --quiet --repeat 20 --json /tmp/scene/json "
-                       "--plan /tmp/scene/plan.xml P/G"};
-    start.environment = {{"VR_LOG_FILE", std::nullopt}}; // items write to it
-    const Ended ended = support::run(start);
+    const Ended ended = run_with_limit(2, "--repeat 20 --json /tmp/scene/json");
     EXPECT_EQ(ended.status, 3);
     EXPECT_THAT(ended.err, EndsWith("fptest: /tmp/scene/json: File too large; the run "
                                     "went on all the same\n"));
