@@ -48,11 +48,12 @@ struct RunningItem {
 
     // What keeps a report from counting.
     struct Reporting {
-        bool expected = true;     // from a gatherer only once it has been told
+        bool expected = true;     // from a gatherer that was running only once it is told
         bool overwritten = false; // by an old copy of the plan, and not reported since
         bool lost = false;        // with the stored plan
         bool undone = false;      // its result was there, and is not any more
         bool in_another_plan = false;
+        bool beside_gatherer = false; // which has saved the plan meanwhile
         bool from_a_copy = false;     // a gatherer's, of the plan: it has no mark
         std::vector<ItemReport> seen; // the last of those before its report
     };
@@ -60,6 +61,7 @@ struct RunningItem {
     Place place;
     std::size_t element = 0;
     bool gathers = false;
+    bool starts_gatherer = false; // none was running
     TimePoint start;
     bool moved_on = false; // the library has
     TimePoint moved_on_at;

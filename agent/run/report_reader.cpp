@@ -29,6 +29,17 @@ ItemReport as_made_loadable(ItemReport report)
     return report;
 }
 
+// What an element has reported. A result that is empty has been made loadable.
+ItemReport report_of(const Plan &plan, std::size_t number)
+{
+    ItemReport report = plan.report(number);
+    if (report.result == "") {
+        report.result.reset();
+        report.result_without_value = true;
+    }
+    return report;
+}
+
 // Whether that element is the item still, and not one of another plan.
 bool is_item(const Plan &plan, std::size_t number, const std::string &name)
 {
@@ -134,6 +145,15 @@ void ReportReader::mark_again(std::vector<std::size_t> numbers)
     }
 }
 
+std::chrono::nanoseconds ReportReader::since_change() const
+{
+    using namespace std::chrono;
+    const auto changed =
+        seconds(plan_status_.st_mtim.tv_sec) + nanoseconds(plan_status_.st_mtim.tv_nsec);
+    // somebody may set the clock
+    return std::clamp<nanoseconds>(system_clock::now().time_since_epoch() - changed, 0ns, 100ms);
+}
+
 void ReportReader::begin_gathering()
 {
     if (running_.items.empty() || !running_.items.back().gathers) {
@@ -145,8 +165,10 @@ void ReportReader::begin_gathering()
     if (!plan || !is_item(*plan, active.element, item_at(run_, active.place).name)) {
         return;
     }
-    const ItemReport report = plan->report(active.element);
-    if (has_result(report) && !was_gathered(report)) {
+    const ItemReport report = report_of(*plan, active.element);
+    if (active.starts_gatherer) {
+        item_at(run_, active.place).report = {};
+    } else if (has_result(report) && !was_gathered(report)) {
         tell_late(active.place, true, gathered_in_ != 0 ? gathered_in_ : run_.round, report);
     }
     if (has_result(report) || !bears_mark(*plan, active.element, running_.job.mark)) {
@@ -233,11 +255,7 @@ void ReportReader::read_report(RunningItem &active, const Plan &plan)
         return;
     }
     ItemRun &result = item_at(run_, active.place);
-    ItemReport report = plan.report(number);
-    if (report.result == "") { // it has been made loadable already
-        report.result.reset();
-        report.result_without_value = true;
-    }
+    ItemReport report = report_of(plan, number);
     if (is_older(active, plan, report)) {
         active.reporting.overwritten = true;
         return;
@@ -252,6 +270,9 @@ void ReportReader::read_report(RunningItem &active, const Plan &plan)
         active.reporting.seen.erase(active.reporting.seen.begin());
     }
     active.reporting.seen.push_back(std::exchange(result.report, std::move(report)));
+    for (RunningItem &other : running_.items) {
+        other.reporting.beside_gatherer |= active.gathers && !other.gathers;
+    }
     for (Listener *listener : listeners_) {
         listener->progressed(run_, active.place);
     }
@@ -270,7 +291,7 @@ void ReportReader::read_late_report(Judged &judged, const Plan &plan)
         plan_status_ = {}; // its end is told first: look again then
         return;
     }
-    const ItemReport report = plan.report(number);
+    const ItemReport report = report_of(plan, number);
     const bool keeps_copy = judged.gathers && !was_gathered(report);
     if (!bears_mark(plan, judged.element, judged.mark) && !keeps_copy) {
         return;

@@ -10,6 +10,7 @@
 #include "run/job.h"
 #include "run/results.h"
 
+#include <chrono>
 #include <cstddef>
 #include <string>
 #include <sys/stat.h>
@@ -37,7 +38,11 @@ class ReportReader
     // Reads it, where it is whole.
     void read(const std::optional<Plan> &plan);
 
-    // The gatherer is about to be told: what is there is of an earlier gathering.
+    // How long ago the plan has changed that was read last.
+    std::chrono::nanoseconds since_change() const;
+
+    // The gatherer is about to be told: what is there is of an earlier gathering, or how
+    // a gatherer that has just been started gets on.
     void begin_gathering();
 
     // An item has been judged: what it reports from now on is late.

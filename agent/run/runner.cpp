@@ -17,6 +17,7 @@
 #include <sys/wait.h>
 #include <thread>
 #include <unistd.h>
+#include <utility>
 
 namespace fptest
 {
@@ -256,7 +257,7 @@ void Runner::poll_gatherers()
         if (active.moved_on && !active.done &&
             (has_ended || !active.gatherer_end.empty() ||
              (!limits_.item && now() - active.moved_on_at > kForGathering))) {
-            finish(active, now());
+            finish(active, has_ended ? now() - reader_.since_change() : now());
         }
     }
 }
@@ -310,7 +311,10 @@ void Runner::start_next(const LibraryProcess::Event &event)
     active.place = {running_.job.suite, running_.job.targets[at]->item};
     active.element = running_.job.targets[at]->element;
     active.gathers = is_gatherer(item_at(run_, active.place).name, vendor_);
-    active.reporting.expected = !active.gathers;
+    if (active.gathers) {
+        active.starts_gatherer = !std::exchange(gatherer_runs_, true);
+        active.reporting.expected = active.starts_gatherer;
+    }
     active.start = on_run_clock(event.time);
     if (signal_ != 0) {
         active.stop = Outcome::stopped;
@@ -470,7 +474,8 @@ std::string Runner::why_stopped(const RunningItem &active)
     }
     const double seconds = *item_at(run_, active.place).seconds;
     if (!active.was_stopped) {
-        return fmt::format("ended by itself after {}, past the limit of {}", fine_duration(seconds),
+        return fmt::format("{} after {}, past the limit of {}",
+                           active.gathers ? "reported" : "ended by itself", fine_duration(seconds),
                            fine_duration(limits_.item->count()));
     }
     const bool is_interrupted = active.stop == Outcome::stopped;
@@ -523,6 +528,10 @@ std::string Runner::why_silent(const RunningItem &active)
     if (!Plan::load_as_library(text, &why)) {
         return fmt::format("no report can be written any more: the stored plan does not load ({})",
                            why);
+    }
+    if (active.reporting.beside_gatherer) {
+        return "no report is there: there was none, or the gatherer's old copy of the plan, "
+               "saved meanwhile, has written over it";
     }
     return active.gathers ? fmt::format("no result was reported within {}",
                                         fine_duration(limits_.item.value_or(kForGathering).count()))

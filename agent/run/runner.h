@@ -130,6 +130,7 @@ class Runner
     int signal_ = 0;
     TimePoint signal_taken_at_;
     bool stop_asked_ = false;               // and not yet answered
+    bool gatherer_runs_ = false;            // before the job's next item
     bool gatherer_may_report_late_ = false; // it may still report what it was told in vain
     std::string library_gone_;              // why, in the job in which its process ended
     bool broken_ = false;

@@ -319,6 +319,7 @@ void Runner::make_way_for(const Job &job)
         if (gatherer_may_report_late_ || (!running.empty() && !is_found)) {
             end_gatherer();
         }
+        gatherer_runs_ = library_.processes().has_gatherer();
         require_trigger_port(); // an item may have taken it
     }
     reader_.poll();

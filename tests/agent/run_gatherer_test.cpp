@@ -255,6 +255,38 @@ TEST_F(RunGatherer, ReportsInVainBeforeItIsTold)
     }
 }
 
+TEST_F(RunGatherer, ShowsHowItGetsOnBeforeItConnectsForTheFirstTime)
+{
+    const std::string start = "--help; exec -a " + std::string(kProbe) +
+                              " /system/bin/Item report G 20 0 ready sleep 0.3 gather ";
+    for (const std::string way : {"--quiet", "--as-group"}) {
+        SCOPED_TRACE(way);
+        run_group({{"SensorProbe", start + "report G 100 0 fine"}}, {way});
+        EXPECT_THAT(outcomes(), ElementsAre("SensorProbe: passed"));
+        run_group({{"SensorProbe", start + "sleep 0.1"}}, {way});
+        EXPECT_THAT(outcomes(), ElementsAre("SensorProbe: no result"));
+        EXPECT_EQ(reasons().at(0), "the gatherer ended before it had reported");
+        EXPECT_THAT(events("late"), IsEmpty());
+        ASSERT_THAT(events("progress"), SizeIs(1));
+        EXPECT_EQ(events("progress")[0].at("description"), "ready");
+    }
+}
+
+TEST_F(RunGatherer, MayHaveTakenTheReportOfAnItemThatSeemsToHaveNone)
+{
+    const Gatherer gatherer("gather report-here G SensorProbe 50 -2 half await /tmp/scene/fine "
+                            "report-here G SensorProbe 100 0 whole sleep 60");
+    run_group({{"SensorProbe", ""},
+               {"Item", "sleep 0.3 report G 100 0 fine note /tmp/scene/fine sleep 0.2"}},
+              {"--as-group"});
+    EXPECT_THAT(outcomes(), ElementsAre("SensorProbe: passed", "Item: no result"));
+    EXPECT_THAT(reasons().at(1),
+                AnyOf("no report is there: there was none, or the gatherer's old copy of the plan, "
+                      "saved meanwhile, has written over it",
+                      "a process with an old copy of the plan has written over what it had "
+                      "reported"));
+}
+
 TEST_F(RunGatherer, IsWaitedForNoLongerOnceItHasReportedAResultThatThePlanHasNoTextFor)
 {
     const Gatherer gatherer("gather report G 100 7 seven sleep 60");
