@@ -3,6 +3,7 @@
 
 // What the calls leave in the host's descriptor table, and descriptor 0.
 #include "device_test.h"
+#include "support/this_process.h"
 
 #include <fcntl.h>
 #include <set>
@@ -36,26 +37,6 @@ class Descriptors : public DeviceTest
 
   private:
     std::set<int> known_;
-};
-
-// Standard input's place is free while this lives.
-class FreeDescriptorZero
-{
-  public:
-    FreeDescriptorZero() : kept_(dup(STDIN_FILENO))
-    {
-        close(STDIN_FILENO);
-    }
-    ~FreeDescriptorZero()
-    {
-        dup2(kept_, STDIN_FILENO);
-        close(kept_);
-    }
-    FreeDescriptorZero(const FreeDescriptorZero &) = delete;
-    FreeDescriptorZero &operator=(const FreeDescriptorZero &) = delete;
-
-  private:
-    int kept_;
 };
 
 std::string target_of(int descriptor)
@@ -93,7 +74,7 @@ TEST_F(Descriptors, RunsReportsAndReadBacksLeaveNoneOpen)
 
 TEST_F(Descriptors, ZeroIsASuccessForStoring)
 {
-    const FreeDescriptorZero free;
+    const support::FreedDescriptor freed(STDIN_FILENO);
     store("<P/>");
 
     EXPECT_EQ(target_of(0), kPlanFile);
@@ -106,7 +87,7 @@ TEST_F(Descriptors, ZeroIsASuccessForStoring)
 TEST_F(Descriptors, ZeroIsAFailureForLoadingAndStaysOpen)
 {
     write_file(kPlanFile, plan_of({{"G", {{"Note", ""}}}}));
-    const FreeDescriptorZero free;
+    const support::FreedDescriptor freed(STDIN_FILENO);
     run_path("P/G");
 
     EXPECT_EQ(target_of(0), kPlanFile);
@@ -123,7 +104,7 @@ TEST_F(Descriptors, ZeroIsAFailureForSavingAndHasEmptiedTheFile)
     store(plan_of({{"G", {{"Note", ""}}}}));
     run_path("P/G");
     log_lines();
-    const FreeDescriptorZero free;
+    const support::FreedDescriptor freed(STDIN_FILENO);
     FPTEST_SetTransation("G", "Note", 1, 0, "first");
 
     EXPECT_EQ(target_of(0), kPlanFile);
@@ -143,7 +124,7 @@ TEST_F(Descriptors, ZeroIsAFailureForSavingAndHasEmptiedTheFile)
 TEST_F(Descriptors, ZeroIsAFailureForReadingBackAndStaysOpen)
 {
     write_file(kPlanFile, "text");
-    const FreeDescriptorZero free;
+    const support::FreedDescriptor freed(STDIN_FILENO);
     char buffer[8] = "-------";
     FPTEST_ExtractResultMsg(buffer, 4);
 

@@ -7,10 +7,10 @@
 
 #include "device_test.h"
 #include "support/process.h"
+#include "support/this_process.h"
 
 #include <cstddef>
 #include <string>
-#include <sys/resource.h>
 
 namespace device
 {
@@ -65,27 +65,7 @@ Lines log_of_report(int progress, const std::string &description);
 // A host beside the test's own process.
 using OtherHost = support::Process;
 
-// A limit of this process while this lives.
-class Limit
-{
-  public:
-    Limit(int resource, rlim_t value) : resource_(resource)
-    {
-        getrlimit(resource_, &before_);
-        const rlimit tight{value, before_.rlim_max};
-        EXPECT_EQ(setrlimit(resource_, &tight), 0);
-    }
-    ~Limit()
-    {
-        setrlimit(resource_, &before_);
-    }
-    Limit(const Limit &) = delete;
-    Limit &operator=(const Limit &) = delete;
-
-  private:
-    int resource_;
-    rlimit before_{};
-};
+using support::Limit;
 
 bool is_in_place();
 

@@ -310,7 +310,7 @@ TEST_F(PlanSave, SavingTakesDescriptorOneForASuccess)
     mxml_node_t *tree = load_plan(kLaidOut);
     write_plan("");
     {
-        const FreedOutput freed;
+        const support::FreedDescriptor freed(STDOUT_FILENO);
         internals::save_XmlFile(tree);
     }
     EXPECT_EQ(events(), saved());

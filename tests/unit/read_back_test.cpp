@@ -244,7 +244,7 @@ TEST_F(ReadBack, DescriptorOneIsASuccess)
     write_plan(bytes(300));
     std::string got;
     {
-        const FreedOutput freed;
+        const support::FreedDescriptor freed(STDOUT_FILENO);
         got = read_back(400);
     }
     EXPECT_EQ(got, received(400, bytes(300)));

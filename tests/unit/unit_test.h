@@ -7,11 +7,11 @@
 #include "internals.h"
 #include "platform.h"
 #include "quillmark.h"
+#include "support/this_process.h"
 
 #include <gmock/gmock.h>
 
 #include <cstddef>
-#include <cstdio>
 #include <initializer_list>
 #include <string>
 #include <unistd.h>
@@ -75,28 +75,6 @@ inline std::string shape(mxml_node_t *node)
     }
     return children.empty() ? text : text + "{" + children + "}";
 }
-
-// Standard output's descriptor is free meanwhile: nothing may be printed.
-class FreedOutput
-{
-  public:
-    FreedOutput()
-    {
-        std::fflush(stdout);
-        kept_ = dup(STDOUT_FILENO);
-        close(STDOUT_FILENO);
-    }
-    ~FreedOutput()
-    {
-        dup2(kept_, STDOUT_FILENO);
-        close(kept_);
-    }
-    FreedOutput(const FreedOutput &) = delete;
-    FreedOutput &operator=(const FreedOutput &) = delete;
-
-  private:
-    int kept_ = -1;
-};
 
 // The library as at load time, on a platform without a test plan.
 class LibraryTest : public ::testing::Test
