@@ -149,7 +149,7 @@ TEST_F(FailingGatherer, ThatNeverConnectsHoldsTheHostUntilItIsEnded)
 
 TEST_F(FailingGatherer, FindsThePortHeldByAListenerWhoseAcceptHasFailed)
 {
-    load();
+    load_plan();
     {
         const Socket next(dup(STDIN_FILENO));
         const Limit limited(RLIMIT_NOFILE, static_cast<rlim_t>(next.get()) + 2);

@@ -2,7 +2,7 @@
 // SPDX-License-Identifier: Apache-2.0
 
 // The test plan: its layout, and saving it.
-#include "sequences.h"
+#include "unit_test.h"
 
 #include <cerrno>
 #include <cstring>

@@ -3,6 +3,7 @@
 
 #include "platform_state.h"
 
+#include "support/sequences.h"
 #include "support/temporary_directory.h"
 
 #include <gtest/gtest.h>
@@ -26,12 +27,6 @@ const support::TemporaryDirectory &directory()
 {
     static const support::TemporaryDirectory made;
     return made;
-}
-
-// From the front: a call has a bracket after its name, a line on standard output a colon.
-bool is_log(const std::string &event)
-{
-    return event.find('|') < event.find_first_of("(: ");
 }
 
 } // namespace
@@ -159,14 +154,14 @@ std::vector<std::string> events()
 std::vector<std::string> log_lines()
 {
     auto taken = events();
-    std::erase_if(taken, [](const auto &event) { return !is_log(event); });
+    std::erase_if(taken, [](const auto &event) { return !sequences::is_log(event); });
     return taken;
 }
 
 std::vector<std::string> calls()
 {
     auto taken = events();
-    std::erase_if(taken, is_log);
+    std::erase_if(taken, sequences::is_log);
     return taken;
 }
 

@@ -7,34 +7,16 @@
 #include "internals.h"
 #include "platform.h"
 #include "quillmark.h"
+#include "support/sequences.h"
 #include "support/this_process.h"
 
 #include <gmock/gmock.h>
 
 #include <cstddef>
-#include <initializer_list>
 #include <string>
 #include <unistd.h>
-#include <vector>
 
-using Lines = std::vector<std::string>;
-
-inline Lines joined(std::initializer_list<Lines> parts)
-{
-    Lines all;
-    for (const Lines &part : parts) {
-        all.insert(all.end(), part.begin(), part.end());
-    }
-    return all;
-}
-inline Lines operator+(const Lines &first, const Lines &then)
-{
-    return joined({first, then});
-}
-inline Lines operator+(const Lines &first, const std::string &then)
-{
-    return joined({first, {then}});
-}
+using support::Lines;
 
 // Every character that a string can hold, except those.
 inline std::string every_character_but(const std::string &these)
@@ -146,4 +128,6 @@ class LibraryTest : public ::testing::Test
     }
 };
 
+using namespace platform;
+using namespace sequences;
 using namespace testing;
