@@ -358,7 +358,7 @@ constexpr char kAnnotated[] =
     "\t\t<Cmd name=\"z\" args=\"\" progress=\"5\"\nresult=\"-2\" description />\n"
     "\t\t<Cmd name=\"w\" args=\"\" />\n</CmdGroup>\n</TestPlan>\n";
 
-TEST(ReadPlan, TellsWhatEveryItemHasReported)
+TEST(PlanWithReports, TellsWhatEveryItemHasReported)
 {
     const auto plan = Plan::parse_annotated(kAnnotated);
     ASSERT_TRUE(plan);
@@ -374,7 +374,7 @@ TEST(ReadPlan, TellsWhatEveryItemHasReported)
     EXPECT_EQ(plan->report(999), ItemReport{});
 }
 
-TEST(ReadPlan, NeedsAWholeTextThatTheLibraryLoads)
+TEST(PlanWithReports, NeedsAWholeTextThatTheLibraryLoads)
 {
     const std::string annotated = kAnnotated;
     for (const std::string &whole :
@@ -398,7 +398,7 @@ std::optional<ItemReport> report_of(const std::string &attributes)
     return plan ? std::optional(plan->groups().at(0).items.at(0).report) : std::nullopt;
 }
 
-TEST(ReadPlan, ShowsWhatNoPlanCanHoldAndKeepsTheRest)
+TEST(PlanWithReports, ShowsWhatNoPlanCanHoldAndKeepsTheRest)
 {
     EXPECT_EQ(report_of("description=\"a\x01\x1B\xFF"
                         "b\0c\""s)
@@ -408,7 +408,7 @@ TEST(ReadPlan, ShowsWhatNoPlanCanHoldAndKeepsTheRest)
     EXPECT_EQ(report_of("description=\"a\n\tb\r\"")->description, "a\n\tb\r");
 }
 
-TEST(ReadPlan, TellsAValueThatIsEmptyFromOneThatIsMissing)
+TEST(PlanWithReports, TellsAValueThatIsEmptyFromOneThatIsMissing)
 {
     EXPECT_EQ(report_of("result=\"\""), (ItemReport{std::nullopt, "", false, std::nullopt}));
     EXPECT_EQ(report_of("result"), (ItemReport{std::nullopt, std::nullopt, true, std::nullopt}));

@@ -125,11 +125,6 @@ Lines log_of_report(int progress, const std::string &description)
 
 // --- faults ------------------------------------------------------------------
 
-bool is_in_place()
-{
-    return std::getenv("QUILLMARK_DEVICE") == std::string("in-place");
-}
-
 void PrivateMounts::SetUp()
 {
     if (is_in_place()) {

@@ -18,7 +18,7 @@ namespace device
 {
 
 // A gatherer that is asked for help says it and ends, and connects nowhere.
-inline const std::string kPlan = plan_of({{"G", {{"Note", "x"}, {"SensorProbe", "--help"}}}});
+inline const std::string kPlan = group_of({{"Note", "x"}, {"SensorProbe", "--help"}});
 
 // The plan as it is saved after a report on Note.
 std::string saved_plan(int progress, const std::string &description);
@@ -64,8 +64,6 @@ Lines log_of_report(int progress, const std::string &description);
 using OtherHost = support::Process;
 
 using support::Limit;
-
-bool is_in_place();
 
 // Mounts of this process alone. It needs no privilege for them, only a user
 // namespace of its own.

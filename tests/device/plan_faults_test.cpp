@@ -8,7 +8,6 @@
 #include "faults.h"
 
 #include <array>
-#include <cerrno>
 #include <csignal>
 #include <cstddef>
 #include <cstdlib>
@@ -18,7 +17,6 @@
 #include <string>
 #include <sys/mount.h>
 #include <sys/resource.h>
-#include <sys/statvfs.h>
 #include <sys/time.h>
 #include <sys/types.h>
 #include <unistd.h>
@@ -42,37 +40,14 @@ class FullDisk : public DeviceTest
             GTEST_SKIP() << "in place, the disk is the container's own and is not to be filled";
         }
         DeviceTest::SetUp();
-        struct statvfs disk {
-        };
-        ASSERT_EQ(statvfs(kDataDirectory, &disk), 0);
-        ASSERT_LE(disk.f_blocks * disk.f_frsize, 64U << 20) << "too much to be filled";
-        EXPECT_EQ(disk.f_frsize, kBlock);
     }
-
-    static constexpr std::size_t kBlock = 4096;
-
-    static void fill()
-    {
-        const Descriptor filler(open(kFiller, O_WRONLY | O_CREAT | O_CLOEXEC, 0600));
-        const std::string block(kBlock, 'f');
-        while (write(filler.get(), block.data(), block.size()) > 0) {
-        }
-        EXPECT_EQ(errno, ENOSPC);
-    }
-    static void make_room()
-    {
-        EXPECT_EQ(unlink(kFiller), 0);
-    }
-
-  private:
-    static constexpr char kFiller[] = "/data/vorlane/filler";
 };
 
 TEST_F(FullDisk, StoredPlanIsLostAndTheNextOneWorks)
 {
     store("<P/>"); // stays open, and so keeps its block when it is removed
     load_plan();
-    fill();
+    fill_disk();
     EXPECT_EQ(log_of_store(kPlan), lines_of_store(kPlan, {kNotWritten}));
     EXPECT_EQ(g_TestCmdTree, nullptr);
     EXPECT_EQ(fs::file_size(kPlanFile), 0U);
@@ -83,7 +58,7 @@ TEST_F(FullDisk, StoredPlanIsLostAndTheNextOneWorks)
     EXPECT_EQ(log_of_report(1, "d"), lines_of_unloaded_report(1, "d"));
     EXPECT_EQ(fs::file_size(kPlanFile), 0U);
 
-    make_room();
+    fs::remove(kFiller);
     EXPECT_EQ(log_of_store(kPlan), lines_of_store(kPlan));
     EXPECT_EQ(read_file(kPlanFile), kPlan);
     EXPECT_EQ(log_of_note(), lines_of_note());
@@ -94,19 +69,20 @@ TEST_F(FullDisk, StoredPlanIsLostAndTheNextOneWorks)
 
 TEST_F(FullDisk, ReportIsCutAtTheDisksEndAndTheNextOneSavesAllOfIt)
 {
+    const std::size_t block = 4096; // what the disk gives at a time
     const std::string description(10000, 'd');
     store(kPlan);
     load_plan();
-    fill();
+    fill_disk();
     EXPECT_EQ(log_of_report(1, description), lines_of_report(1, description));
     // the block that the plan had before
-    EXPECT_EQ(read_file(kPlanFile), saved_plan(1, description).substr(0, kBlock));
-    EXPECT_EQ(read_back(), saved_plan(1, description).substr(0, kBlock));
-    EXPECT_EQ(log_lines(), lines_of_read_back(kBlock));
+    EXPECT_EQ(read_file(kPlanFile), saved_plan(1, description).substr(0, block));
+    EXPECT_EQ(read_back(), saved_plan(1, description).substr(0, block));
+    EXPECT_EQ(log_lines(), lines_of_read_back(block));
     // from the copy in memory, which is whole
     EXPECT_EQ(log_of_note(), lines_of_note());
 
-    make_room();
+    fs::remove(kFiller);
     EXPECT_EQ(log_of_report(2, description), lines_of_report(2, description));
     EXPECT_EQ(read_back(), saved_plan(2, description));
 }

@@ -29,16 +29,6 @@ namespace fs = std::filesystem;
 namespace
 {
 
-// Whether all end but for one that goes on running.
-bool children_end(pid_t running = -1)
-{
-    return eventually([=] {
-        return std::ranges::none_of(processes(), [=](const Process &process) {
-            return process.parent == getpid() && process.pid != running && process.state != 'Z';
-        });
-    });
-}
-
 // --- a missing shell ---------------------------------------------------------
 
 class MissingShell : public PrivateMounts
@@ -106,7 +96,7 @@ TEST_F(MissingShell, InBinLetsNoItemRun)
 TEST_F(MissingShell, InBinLetsTheGathererRun)
 {
     hide_the_libcs();
-    store(plan_of({{"G", {{"SensorProbe", "--group G"}}}}));
+    store(group_of({{"SensorProbe", "--group G"}}));
     load_plan();
     run_path("P/G/SensorProbe");
     EXPECT_EQ(log_lines(), lines_of_gatherer("--group G", kNotAsked, kTriggered));
@@ -287,7 +277,7 @@ class HostsSignals : public DeviceTest
     void SetUp() override
     {
         DeviceTest::SetUp();
-        store(plan_of({{"G", {{"Note", "--sleep 0.3"}, {"SensorProbe", "--group G"}}}}));
+        store(group_of({{"Note", "--sleep 0.3"}, {"SensorProbe", "--group G"}}));
         load_plan();
     }
 
