@@ -100,24 +100,6 @@ TEST_F(ItemRun, NameThatTheCutLeavesEmptyStillRuns)
     EXPECT_THAT(ran(), IsEmpty());
 }
 
-TEST_F(ItemRun, NameOfAHundredCharactersIsRunWhole)
-{
-    const std::string name(100, 'n');
-    store(group_of({{name, "x"}}));
-    run_path("P/G");
-
-    EXPECT_THAT(ran(), ElementsAre("/system/bin/" + name + "|x"));
-}
-
-TEST_F(ItemRun, CommandLineIsCutTo1024Characters)
-{
-    store(group_of({{"Note", std::string(1500, 'x')}}));
-    run_path("P/G");
-
-    const std::string start = "/system/bin/Note ";
-    EXPECT_THAT(ran(), ElementsAre("/system/bin/Note|" + std::string(1024 - start.size(), 'x')));
-}
-
 TEST_F(ItemRun, VendorOneAppendsItsSuffix)
 {
     set_vendor("1");
@@ -139,28 +121,6 @@ TEST_F(ItemRun, VendorTwoAppendsItsSuffix)
 
     EXPECT_THAT(ran(), ElementsAre("/system/bin/Note_ca_qsee|x"));
     EXPECT_THAT(log_lines(), Contains("SingleItemExecute| tLine:Note_ca_qsee"));
-}
-
-TEST_F(ItemRun, VendorMayHaveABlankBeforeAndLettersAfter)
-{
-    store(group_of({{"Note", "x"}}));
-    for (const char *text : {" 1", "1abc"}) {
-        set_vendor(text);
-        run_path("P/G");
-    }
-    EXPECT_THAT(ran(), ElementsAre("/system/bin/Note_ca|x", "/system/bin/Note_ca|x"));
-}
-
-TEST_F(ItemRun, OtherVendorsRunNothing)
-{
-    store(group_of({{"Note", "x"}}));
-    for (const char *text : {"3", "-1"}) {
-        set_vendor(text);
-        log_lines();
-        run_path("P/G");
-        EXPECT_EQ(log_lines().back(), "SingleItemExecute| More than one vendor, Setting error!");
-    }
-    EXPECT_THAT(ran(), IsEmpty());
 }
 
 TEST_F(ItemRun, VendorIsReadAfreshForEveryItemOfAGroup)
