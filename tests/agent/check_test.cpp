@@ -26,7 +26,6 @@
 #include <utility>
 #include <vector>
 
-using fptest::check;
 using fptest::Finding;
 using fptest::Plan;
 using fptest::PlanSource;
