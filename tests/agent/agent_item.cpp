@@ -22,6 +22,7 @@
 //   crash           by a signal
 //   gather          waits for the library's word, as the gatherer does
 #include "quillmark.h"
+#include "support/files.h"
 
 #include <chrono>
 #include <csignal>
@@ -30,7 +31,6 @@
 #include <fcntl.h>
 #include <filesystem>
 #include <fstream>
-#include <iterator>
 #include <netinet/in.h>
 #include <string>
 #include <string_view>
@@ -117,12 +117,6 @@ void wait_for_word_to_gather()
     }
 }
 
-std::string file_text(const std::string &path)
-{
-    std::ifstream file(path, std::ios::binary);
-    return {std::istreambuf_iterator<char>(file), {}};
-}
-
 } // namespace
 
 int main(int argc, char **argv)
@@ -138,7 +132,7 @@ int main(int argc, char **argv)
             report(next(1), name, next(2), next(3), next(4).c_str());
             at += 5;
         } else if (word == "report-file") {
-            report(next(1), name, next(2), next(3), file_text(next(4)).c_str());
+            report(next(1), name, next(2), next(3), support::read_file(next(4)).c_str());
             at += 5;
         } else if (word == "report-null") {
             report(next(1), name, next(2), next(3), nullptr);
@@ -152,7 +146,7 @@ int main(int argc, char **argv)
             std::fflush(nullptr);
             at += 2;
         } else if (word == "complain-file") {
-            std::fprintf(stderr, "%s\n", file_text(next(1)).c_str());
+            std::fprintf(stderr, "%s\n", support::read_file(next(1)).c_str());
             at += 2;
         } else if (word == "sleep") {
             std::this_thread::sleep_for(Seconds(std::stod(next(1))));

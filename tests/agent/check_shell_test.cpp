@@ -5,15 +5,14 @@
 // command lines is in check/shell.txt.
 #include "check/check.h"
 #include "check/shell_reader.h"
+#include "support/process.h"
 
 #include <gtest/gtest.h>
 
 #include <algorithm>
 #include <chrono>
-#include <fcntl.h>
 #include <random>
 #include <string>
-#include <sys/wait.h>
 #include <unistd.h>
 #include <vector>
 
@@ -41,18 +40,8 @@ bool has_error(const std::string &args)
 // Whether the shell does run a line with these args.
 bool runs(const std::string &args)
 {
-    const std::string line = "true " + args + "\necho done";
-    const pid_t process = fork();
-    if (process == 0) {
-        const int null = open("/dev/null", O_RDWR);
-        dup2(null, STDIN_FILENO);
-        dup2(null, STDERR_FILENO);
-        execl("/system/bin/sh", "sh", "-c", ("(" + line + ") | grep -q done").c_str(), nullptr);
-        _exit(127);
-    }
-    int status = -1;
-    waitpid(process, &status, 0);
-    return status == 0;
+    const std::string line = "(true " + args + "\necho done) | grep -q done";
+    return support::run({.arguments = {"/system/bin/sh", "-c", line}}).status == 0;
 }
 
 // Only where there is a shell to be asked.

@@ -6,6 +6,7 @@
 #include "check/messages.h"
 
 #include "plan/plan.h"
+#include "support/files.h"
 
 #include <gtest/gtest.h>
 
@@ -13,7 +14,6 @@
 #include <cctype>
 #include <chrono>
 #include <filesystem>
-#include <fstream>
 #include <iterator>
 #include <map>
 #include <ostream>
@@ -26,7 +26,6 @@
 #include <utility>
 #include <vector>
 
-using fptest::check;
 using fptest::Finding;
 using fptest::Plan;
 using fptest::PlanSource;
@@ -106,12 +105,12 @@ std::vector<Case> cases_of(const std::filesystem::path &file)
         {"items", {"<P>\n<CmdGroup name=\"A\">\n", "</CmdGroup>\n</P>\n"}}};
     const std::regex head("== (plan|sent|groups|items): (.+)");
     const std::regex finding(R"(( *)\^(\d*) ((error|warning): .+))");
-    std::ifstream lines(file);
     std::vector<Case> cases;
     std::string printed;
     std::smatch found;
-    int number = 1;
-    for (std::string line; std::getline(lines, line); ++number) {
+    int number = 0;
+    for (std::string line : support::lines_of(support::read_file(file))) {
+        ++number;
         if (std::regex_match(line, found, head)) {
             std::string name = file.stem().string() + " " + found[2].str();
             std::ranges::replace_if(
@@ -184,8 +183,7 @@ std::string group(const std::string &name, const std::string &content)
 
 std::string demo_plan()
 {
-    std::ifstream file(QUILLMARK_SOURCE_DIR "/plans/demo.xml", std::ios::binary);
-    return {std::istreambuf_iterator<char>(file), {}};
+    return support::read_file(QUILLMARK_SOURCE_DIR "/plans/demo.xml");
 }
 
 TEST(CheckedPlan, OfTheDemoHasNoFindings)

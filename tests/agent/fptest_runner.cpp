@@ -5,9 +5,7 @@
 
 #include <algorithm>
 #include <array>
-#include <cerrno>
 #include <csignal>
-#include <cstdlib>
 #include <filesystem>
 #include <linux/capability.h>
 #include <linux/securebits.h>
@@ -15,7 +13,6 @@
 #include <sched.h>
 #include <sys/mount.h>
 #include <sys/prctl.h>
-#include <sys/statvfs.h>
 #include <sys/syscall.h>
 #include <unistd.h>
 
@@ -148,6 +145,14 @@ std::string without_times(const std::string &text)
     return std::regex_replace(text, time, "T s");
 }
 
+device::Lines without_times(device::Lines lines)
+{
+    for (std::string &line : lines) {
+        line = without_times(line);
+    }
+    return lines;
+}
+
 device::Lines paths_run(const std::string &log)
 {
     static const std::regex shape(R"(4/VRCODE: fptest_ItemsTest *:.*=> Input cmdline : (.*))");
@@ -245,22 +250,4 @@ void FptestTest::expect_items_to_end()
                           << device::status_field(process.pid, "SigCgt");
         }
     }
-}
-
-void FptestTest::fill_disk()
-{
-    struct statvfs disk {
-    };
-    ASSERT_EQ(statvfs(kData, &disk), 0);
-    ASSERT_LE(disk.f_blocks * disk.f_frsize, 64U << 20) << "too much to be filled";
-    const Descriptor filler(open("/data/vorlane/filler", O_WRONLY | O_CREAT | O_CLOEXEC, 0600));
-    const std::string block(disk.f_frsize, 'f');
-    while (write(filler.get(), block.data(), block.size()) > 0) {
-    }
-    ASSERT_EQ(errno, ENOSPC);
-}
-
-bool FptestTest::is_in_place()
-{
-    return std::getenv("QUILLMARK_DEVICE") == std::string("in-place");
 }

@@ -49,6 +49,7 @@ Ended run_program(const std::vector<std::string> &arguments);
 
 // The text with its times, like "0.3 s", made the same.
 std::string without_times(const std::string &text);
+device::Lines without_times(device::Lines lines);
 
 // --- what the library says in its log -------------------------------------------
 
@@ -59,9 +60,7 @@ device::Lines programs_run(const std::string &log = device::kLogFile);
 // The processes that it was told to stop.
 std::vector<pid_t> processes_stopped(const std::string &log = device::kLogFile);
 
-inline constexpr char kOnePasses[] = "<P><CmdGroup name=\"G\">"
-                                     "<Cmd name=\"Item\" args=\"report G 100 0 fine\"/>"
-                                     "</CmdGroup></P>";
+inline const std::string kOnePasses = device::group_of({{"Item", "report G 100 0 fine"}});
 
 } // namespace fptest_runner
 
@@ -84,10 +83,6 @@ class FptestTest : public DeviceTest
     static device::Lines running_items();
     // A test failure where some go on.
     static void expect_items_to_end();
-
-    // Leaves no room in /data/vorlane.
-    static void fill_disk();
-    static bool is_in_place();
 };
 
 using namespace fptest_runner;

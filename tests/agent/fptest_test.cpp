@@ -138,8 +138,8 @@ TEST_F(Fptest, TakesNoValuesThatMakeNoSense)
         {"--pass-code", {"2", "7", "-1", "x", ""}}};
     for (const auto &[option, values] : wrong) {
         for (const std::string &value : values) {
-            const Ended ended = run_fptest(
-                {"run", option, value, "--plan", plan(plan_of({{"G", {{"Item", ""}}}})), "P/G"});
+            const Ended ended =
+                run_fptest({"run", option, value, "--plan", plan(group_of({{"Item", ""}})), "P/G"});
             EXPECT_EQ(ended.status, 2) << option << " " << value;
             EXPECT_THAT(lines_of(ended.err), SizeIs(1)) << ended.err;
             EXPECT_THAT(ended.err, HasSubstr(option));
@@ -183,7 +183,7 @@ TEST_F(Fptest, ShowsAResultWithoutAValue)
 
 TEST_F(Fptest, ShowsAFileAndStandardInput)
 {
-    const std::string text = plan_of({{"G", {{"Item", ""}}}});
+    const std::string text = group_of({{"Item", ""}});
     const std::string table = "GROUP  ITEM  PROGRESS  RESULT  DESCRIPTION\n"
                               "G      Item         -       -  -\n";
     EXPECT_EQ(run_fptest({"show", plan(text)}).out, table);
@@ -244,7 +244,7 @@ TEST_F(Fptest, CutsTheTableToTheTerminal)
 
 TEST_F(Fptest, ChecksAPlan)
 {
-    const std::string sound = plan_of({{"G", {{"Item", ""}, {"Other", ""}}}});
+    const std::string sound = group_of({{"Item", ""}, {"Other", ""}});
     const Ended ended = run_fptest({"check", plan(sound)});
     EXPECT_EQ(ended.status, 0);
     EXPECT_EQ(ended.err, "");
@@ -306,7 +306,7 @@ TEST_F(Fptest, ChecksArgsWhereThereIsNoShellToAsk)
 
 TEST_F(Fptest, ChecksSeveralFilesAndStandardInput)
 {
-    const std::string sound = file("sound.xml", plan_of({{"G", {{"Item", ""}}}}));
+    const std::string sound = file("sound.xml", group_of({{"Item", ""}}));
     const std::string broken = file("broken.xml", "<P><CmdGroup></P>");
     EXPECT_EQ(run_fptest({"check", sound, sound}).status, 0);
     const Ended ended = run_fptest({"check", broken, "-", sound}, "<P/>");
@@ -317,13 +317,13 @@ TEST_F(Fptest, ChecksSeveralFilesAndStandardInput)
     EXPECT_THAT(summaries, ElementsAre(StartsWith("/tmp/scene/broken.xml: 1 error, 0 warnings ("),
                                        StartsWith("<stdin>: 1 error, 0 warnings ("),
                                        StartsWith("/tmp/scene/sound.xml: 0 errors, 0 warnings (")));
-    EXPECT_EQ(run_fptest({"check", "-"}, plan_of({{"G", {{"Item", ""}}}})).status, 0);
+    EXPECT_EQ(run_fptest({"check", "-"}, group_of({{"Item", ""}})).status, 0);
 }
 
 TEST_F(Fptest, PassesAPlanWithWarningsAlone)
 {
     const std::string name(30, 'n'); // too long to be stopped by
-    const Ended ended = run_fptest({"check", plan(plan_of({{"G", {{name, ""}}}}))});
+    const Ended ended = run_fptest({"check", plan(group_of({{name, ""}}))});
     EXPECT_EQ(ended.status, 0);
     EXPECT_THAT(ended.out, HasSubstr(": warning: "));
     EXPECT_THAT(ended.out, HasSubstr(": 0 errors, 1 warning (1 group, 1 item, "));
@@ -331,7 +331,7 @@ TEST_F(Fptest, PassesAPlanWithWarningsAlone)
 
 TEST_F(Fptest, SaysWhichFilesItCannotCheck)
 {
-    const std::string sound = file("sound.xml", plan_of({{"G", {{"Item", ""}}}}));
+    const std::string sound = file("sound.xml", group_of({{"Item", ""}}));
     const std::string broken = file("broken.xml", "<P><CmdGroup></P>");
     const Ended ended = run_fptest({"check", work("none"), sound, kWork, broken});
     EXPECT_EQ(ended.status, 2);
@@ -343,7 +343,7 @@ TEST_F(Fptest, SaysWhichFilesItCannotCheck)
 
 TEST_F(Fptest, SaysThatStandardOutputCannotBeWritten)
 {
-    write_file(kPlanFile, plan_of({{"G", {{"Item", ""}}}}));
+    write_file(kPlanFile, group_of({{"Item", ""}}));
     const std::string broken = file("broken.xml", "<P><CmdGroup></P>");
     for (const Lines &arguments : {Lines{"show"}, Lines{"check", kPlanFile}, Lines{"check", broken},
                                    Lines{"--help"}, Lines{"run", "--list"}}) {
@@ -356,7 +356,7 @@ TEST_F(Fptest, SaysThatStandardOutputCannotBeWritten)
 
 TEST_F(Fptest, SaysThatStandardOutputIsClosed)
 {
-    write_file(kPlanFile, plan_of({{"G", {{"Item", ""}}}}));
+    write_file(kPlanFile, group_of({{"Item", ""}}));
     const std::vector<std::pair<std::string, std::string>> commands = {
         {"show", "fptest show"},
         {std::string("check ") + kPlanFile, "fptest check"},

@@ -299,7 +299,7 @@ TEST_F(JsonReport, SaysThatTheDiskIsFullAndStaysQuiet)
 TEST_F(JsonReport, TakesBackALineThatFoundNoRoom)
 {
     EXPECT_EQ(in_a_child([&] {
-                  limit_file_size(2000);
+                  const Limit limit(RLIMIT_FSIZE, 2000);
                   const auto report = json_report(path("json"));
                   Playback playback(*report, mixed_run());
                   playback.play();
@@ -318,7 +318,7 @@ TEST_F(JsonReport, WritesNoMoreOnceALineHasFoundNoRoom)
 {
     // the short line after the long one would fit
     EXPECT_EQ(in_a_child([&] {
-                  limit_file_size(1500);
+                  const Limit limit(RLIMIT_FSIZE, 1500);
                   const auto report = json_report(path("json"));
                   ItemRun loud = passed("a");
                   loud.output = std::string(2000, 'x');

@@ -342,7 +342,7 @@ TEST_F(JunitReport, SaysThatWhatItWritesIntoHasNoRoom)
     EXPECT_EQ(in_a_child([&] {
                   const int file = open(path("out").c_str(), O_RDWR | O_CREAT | O_CLOEXEC, 0666);
                   const std::string name = "/dev/fd/" + std::to_string(file);
-                  limit_file_size(1000);
+                  const Limit limit(RLIMIT_FSIZE, 1000);
                   const auto report = junit_report(name);
                   Playback playback(*report, mixed_run());
                   playback.begin();
@@ -360,7 +360,7 @@ TEST_F(JunitReport, KeepsTheLastWholeDocumentWhereTheNextFindsNoRoom)
     EXPECT_EQ(in_a_child([&] {
                   RunOfItems run = mixed_run();
                   run.suites[0].items[0].output = std::string(10000, 'x');
-                  limit_file_size(5000);
+                  const Limit limit(RLIMIT_FSIZE, 5000);
                   const auto report = junit_report(path("xml"));
                   Playback(*report, run).play();
                   EXPECT_EQ(report->failure(), path("xml") + ": File too large");

@@ -117,7 +117,7 @@ TEST_F(LongPlan, KeepsToTheCommandWhereThatIsAskedFor)
     EXPECT_FALSE(fs::exists(kPlanFile));
 
     // cut where it still loads
-    std::string cut = plan_of({{"G", {{"Item", "report G 100 0 a"}}}});
+    std::string cut = group_of({{"Item", "report G 100 0 a"}});
     cut += std::string(kLimit, ' ') + "\n";
     ended = run_fptest({"run", "--as-sent", "--plan", plan(cut), "P/G"});
     EXPECT_EQ(ended.status, 0) << ended.err;
@@ -183,7 +183,7 @@ TEST_F(LongPlan, IsReadUpToSixteenMebibytes)
     expect_refusal(2, "fptest: /dev/zero: " + why, {"check", "/dev/zero"});
     expect_refusal(2, "fptest: /dev/zero: " + why, {"show", "/dev/zero"});
     expect_refusal(2, "fptest: /dev/zero: " + why, {"run", "--plan", "/dev/zero", "P/G"});
-    const std::string text = plan_of({{"G", {{"Item", ""}}}});
+    const std::string text = group_of({{"Item", ""}});
     const std::size_t most = 16U << 20U;
     const std::string longest = text + std::string(most - text.size(), '\n');
     Ended ended = run_fptest({"check", "--for", "file", "-"}, longest);

@@ -27,17 +27,13 @@ constexpr char kStop[] = "\x13";     // Ctrl-S
 constexpr char kContinue[] = "\x11"; // Ctrl-Q
 
 // The first one overruns its time.
-constexpr char kTwoItems[] = "<P><CmdGroup name=\"G\">"
-                             "<Cmd name=\"Item\" args=\"note /tmp/scene/begun sleep 30\"/>"
-                             "<Cmd name=\"Other\" args=\"report G 100 0 fine\"/>"
-                             "</CmdGroup></P>";
+const std::string kTwoItems =
+    group_of({{"Item", "note /tmp/scene/begun sleep 30"}, {"Other", "report G 100 0 fine"}});
 
 // It says so much that no pipe holds it.
-constexpr char kLoud[] = "<P><CmdGroup name=\"G\">"
-                         "<Cmd name=\"Item\" args=\"flood 60000 report G 100 1 loud\"/>"
-                         "<Cmd name=\"Other\" args=\"flood 60000 report G 100 1 loud\"/>"
-                         "<Cmd name=\"Third\" args=\"note /tmp/scene/third report G 100 0 fine\"/>"
-                         "</CmdGroup></P>";
+const std::string kLoud = group_of({{"Item", "flood 60000 report G 100 1 loud"},
+                                    {"Other", "flood 60000 report G 100 1 loud"},
+                                    {"Third", "note /tmp/scene/third report G 100 0 fine"}});
 
 class Output : public FptestTest
 {
@@ -102,15 +98,12 @@ TEST_F(Output, TerminalThatIsStoppedHoldsUpNothing)
     EXPECT_THAT(session.text(), Not(HasSubstr("timed out")));
     session.type(kContinue);
     EXPECT_EQ(session.wait_for_end(), 1);
-    device::Lines lines;
-    for (const std::string &line : session.all_lines()) {
-        lines.push_back(without_times(line));
-    }
-    EXPECT_THAT(lines, ElementsAre("/tmp/scene/plan.xml: 2 items, vendor 0", "G",
-                                   "  Item     [        ]       T s  timed out  -  "
-                                   "stopped after T s",
-                                   "  Other    [########] 100%  T s  passed     0  fine",
-                                   "1 passed, 1 failed, T s"));
+    EXPECT_THAT(without_times(session.all_lines()),
+                ElementsAre("/tmp/scene/plan.xml: 2 items, vendor 0", "G",
+                            "  Item     [        ]       T s  timed out  -  "
+                            "stopped after T s",
+                            "  Other    [########] 100%  T s  passed     0  fine",
+                            "1 passed, 1 failed, T s"));
 }
 
 TEST_F(Output, PipeThatIsFullHoldsUpNothingAndLosesNothing)
@@ -160,11 +153,9 @@ TEST_F(Output, InterruptedRunEndsItsItemWhileNobodyReads)
 {
     const Descriptor reader = unread_fifo();
     FptestProcess fptest({"run", "--tap", "--json", work("fifo"), "--plan",
-                          plan("<P><CmdGroup name=\"G\">"
-                               "<Cmd name=\"Item\" args=\"flood 60000 report G 100 1 loud\"/>"
-                               "<Cmd name=\"Other\" args=\"flood 60000 report G 100 1 loud\"/>"
-                               "<Cmd name=\"Third\" args=\"note /tmp/scene/third sleep 60\"/>"
-                               "</CmdGroup></P>"),
+                          plan(group_of({{"Item", "flood 60000 report G 100 1 loud"},
+                                         {"Other", "flood 60000 report G 100 1 loud"},
+                                         {"Third", "note /tmp/scene/third sleep 60"}})),
                           "P/G"});
     ASSERT_TRUE(wait_for_file("third"));
     fptest.signal(SIGTERM);
@@ -397,9 +388,8 @@ TEST_F(Output, ReportThatHasBegunSaysThatNothingWasRun)
 TEST_F(Output, ShowsWhatAnItemSaysWhileItRuns)
 {
     TerminalSession session({FPTEST_PROGRAM, "run", "--plan",
-                             plan("<P><CmdGroup name=\"G\"><Cmd name=\"Item\" args=\"say before "
-                                  "say waiting-for-a-finger await /tmp/scene/go "
-                                  "report G 100 0 fine\"/></CmdGroup></P>"),
+                             plan(group_of({{"Item", "say before say waiting-for-a-finger await "
+                                                     "/tmp/scene/go report G 100 0 fine"}})),
                              "P/G"},
                             80, 24);
     EXPECT_TRUE(session.wait_for_text("running    -  waiting-for-a-finger")) << session.text();
@@ -410,11 +400,10 @@ TEST_F(Output, ShowsWhatAnItemSaysWhileItRuns)
 
 TEST_F(Output, ShowsThatAnItemPastItsLimitIsStopping)
 {
-    TerminalSession session({FPTEST_PROGRAM, "run", "--timeout", "0.5", "--grace", "20", "--plan",
-                             plan("<P><CmdGroup name=\"G\"><Cmd name=\"Item\" args=\"ignore-stop "
-                                  "say going-on await /tmp/scene/go\"/></CmdGroup></P>"),
-                             "P/G"},
-                            80, 24);
+    TerminalSession session(
+        {FPTEST_PROGRAM, "run", "--timeout", "0.5", "--grace", "20", "--plan",
+         plan(group_of({{"Item", "ignore-stop say going-on await /tmp/scene/go"}})), "P/G"},
+        80, 24);
     const std::regex line("  Item .* 1\\.[0-9] s  stopping   -  going-on\n");
     EXPECT_TRUE(session.wait_for([&] { return std::regex_search(session.text(), line); }))
         << session.text();
@@ -428,9 +417,9 @@ TEST_F(Output, ShowsWhatTheGathererSaysBeforeItReports)
 {
     TerminalSession session(
         {FPTEST_PROGRAM, "run", "--plan",
-         plan("<P><CmdGroup name=\"G\"><Cmd name=\"SensorProbe\" args=\"--help >/dev/null; exec "
-              "/system/bin/Item say warming-up await /tmp/scene/warm gather say gathering await "
-              "/tmp/scene/go\"/></CmdGroup></P>"),
+         plan(group_of(
+             {{"SensorProbe", "--help >/dev/null; exec /system/bin/Item say warming-up await "
+                              "/tmp/scene/warm gather say gathering await /tmp/scene/go"}})),
          "P/G"},
         80, 24);
     EXPECT_TRUE(session.wait_for_text("running    -  warming-up")) << session.text();
@@ -442,10 +431,10 @@ TEST_F(Output, ShowsWhatTheGathererSaysBeforeItReports)
 
 TEST_F(Output, SaysEveryTenSecondsWhatAnItemHasSaid)
 {
-    FptestProcess fptest({"run", "--plan",
-                          plan("<P><CmdGroup name=\"G\"><Cmd name=\"Item\" args=\"say one sleep 11 "
-                               "say two sleep 10 report G 100 0 fine\"/></CmdGroup></P>"),
-                          "P/G"});
+    FptestProcess fptest(
+        {"run", "--plan",
+         plan(group_of({{"Item", "say one sleep 11 say two sleep 10 report G 100 0 fine"}})),
+         "P/G"});
     const Ended ended = fptest.wait(60);
     EXPECT_EQ(without_times(ended.out), "/tmp/scene/plan.xml: 1 item, vendor 0\n"
                                         "G/Item: running, T s\n"

@@ -5,13 +5,13 @@
 // itself in tests/unit/path_test.cpp.
 #include "plan/plan.h"
 #include "plan/plan_text.h"
+#include "support/files.h"
+#include "support/this_process.h"
 
 #include <gmock/gmock.h>
 
 #include <csignal>
 #include <cstring>
-#include <fstream>
-#include <iterator>
 #include <optional>
 #include <stdexcept>
 #include <string>
@@ -80,15 +80,9 @@ Names listed(const Plan &plan)
     return lines;
 }
 
-std::string file_text(const std::string &path)
-{
-    std::ifstream file(path, std::ios::binary);
-    return {std::istreambuf_iterator<char>(file), {}};
-}
-
 // --- what a command stores ------------------------------------------------------
 
-TEST(StoredPart, IsTheTextWithoutColonsInFrontUpToAColonAZeroByteOrItsLimit)
+TEST(StoredPlan, IsTheTextWithoutColonsInFrontUpToAColonAZeroByteOrItsLimit)
 {
     const std::string limit(2048, 'x');
     for (const auto &[text, stored] : std::initializer_list<std::pair<std::string, std::string>>{
@@ -265,43 +259,17 @@ TEST(LoadedPlan, PrintsNothingAndLeavesTheLibraryAsItWas)
               "mxml: XML does not start with '<' (saw 'x').\n");
 }
 
-// Sets a limit of this process until the end of a test.
-class Limit
-{
-  public:
-    Limit(__rlimit_resource what, rlim_t value) : what_(what)
-    {
-        getrlimit(what_, &before_);
-        const rlimit limit = {value, before_.rlim_max};
-        setrlimit(what_, &limit);
-    }
-    Limit(const Limit &) = delete;
-    Limit &operator=(const Limit &) = delete;
-    ~Limit()
-    {
-        setrlimit(what_, &before_);
-    }
-
-  private:
-    __rlimit_resource what_;
-    rlimit before_{};
-};
-
 TEST(LoadedPlan, MayHaveDescriptorZero)
 {
-    const int kept = dup(STDIN_FILENO);
-    close(STDIN_FILENO);
-    const auto plan = Plan::load_as_library("<P/>");
-    dup2(kept, STDIN_FILENO);
-    close(kept);
-    EXPECT_TRUE(plan);
+    const support::FreedDescriptor freed(STDIN_FILENO);
+    EXPECT_TRUE(Plan::load_as_library("<P/>"));
 }
 
 TEST(LoadedPlan, NeedsRoomInMemory)
 {
     std::signal(SIGXFSZ, SIG_IGN);
     {
-        const Limit small(RLIMIT_FSIZE, 10);
+        const support::Limit small(RLIMIT_FSIZE, 10);
         EXPECT_TRUE(Plan::load_as_library("<P></P>"));
         EXPECT_THROW(Plan::load_as_library("<P>       </P>"), std::system_error);
     }
@@ -390,7 +358,7 @@ constexpr char kAnnotated[] =
     "\t\t<Cmd name=\"z\" args=\"\" progress=\"5\"\nresult=\"-2\" description />\n"
     "\t\t<Cmd name=\"w\" args=\"\" />\n</CmdGroup>\n</TestPlan>\n";
 
-TEST(ReadPlan, TellsWhatEveryItemHasReported)
+TEST(PlanWithReports, TellsWhatEveryItemHasReported)
 {
     const auto plan = Plan::parse_annotated(kAnnotated);
     ASSERT_TRUE(plan);
@@ -406,7 +374,7 @@ TEST(ReadPlan, TellsWhatEveryItemHasReported)
     EXPECT_EQ(plan->report(999), ItemReport{});
 }
 
-TEST(ReadPlan, NeedsAWholeTextThatTheLibraryLoads)
+TEST(PlanWithReports, NeedsAWholeTextThatTheLibraryLoads)
 {
     const std::string annotated = kAnnotated;
     for (const std::string &whole :
@@ -430,7 +398,7 @@ std::optional<ItemReport> report_of(const std::string &attributes)
     return plan ? std::optional(plan->groups().at(0).items.at(0).report) : std::nullopt;
 }
 
-TEST(ReadPlan, ShowsWhatNoPlanCanHoldAndKeepsTheRest)
+TEST(PlanWithReports, ShowsWhatNoPlanCanHoldAndKeepsTheRest)
 {
     EXPECT_EQ(report_of("description=\"a\x01\x1B\xFF"
                         "b\0c\""s)
@@ -440,7 +408,7 @@ TEST(ReadPlan, ShowsWhatNoPlanCanHoldAndKeepsTheRest)
     EXPECT_EQ(report_of("description=\"a\n\tb\r\"")->description, "a\n\tb\r");
 }
 
-TEST(ReadPlan, TellsAValueThatIsEmptyFromOneThatIsMissing)
+TEST(PlanWithReports, TellsAValueThatIsEmptyFromOneThatIsMissing)
 {
     EXPECT_EQ(report_of("result=\"\""), (ItemReport{std::nullopt, "", false, std::nullopt}));
     EXPECT_EQ(report_of("result"), (ItemReport{std::nullopt, std::nullopt, true, std::nullopt}));
@@ -563,7 +531,7 @@ TEST(WithoutMarks, TakesThemAwayWhereverTheyAre)
 
 TEST(DemoPlan, RunsWhatItSays)
 {
-    const Plan plan = loaded(file_text(std::string(QUILLMARK_SOURCE_DIR) + "/plans/demo.xml"));
+    const Plan plan = loaded(support::read_file(QUILLMARK_SOURCE_DIR "/plans/demo.xml"));
     EXPECT_THAT(listed(plan), ElementsAre("Bringup: SpiCheck DeadPixel FingerWait QuietRun",
                                           "Gather: SensorProbe", "Endurance: BurnIn"));
     for (const Plan::Group &one : plan.groups()) {

@@ -323,7 +323,7 @@ TEST_F(Report, LosesNothingOfManyAtTheSameTime)
 
 TEST_F(Report, LosesNothingBesideASampleItem)
 {
-    write_file(kPlanFile, plan_of({{"G", {{"BurnIn", "--group G --seconds 1"}, {"mine", ""}}}}));
+    write_file(kPlanFile, group_of({{"BurnIn", "--group G --seconds 1"}, {"mine", ""}}));
     FptestProcess item({"send", "XMLNodePath::P/G/BurnIn"});
     int reports = 0;
     while (!item.has_ended()) {
@@ -339,9 +339,8 @@ TEST_F(Report, LosesNothingBesideASampleItem)
 TEST_F(Report, NeedsNoDeviceButThePlan)
 {
     // it does not wait for a run that it is part of
-    write_file(kPlanFile, plan_of({{"G",
-                                    {{"Script", "'fptest report G Script --progress 100 --result 0 "
-                                                "--log /dev/null'"}}}}));
+    write_file(kPlanFile, group_of({{"Script", "'fptest report G Script --progress 100 --result 0 "
+                                               "--log /dev/null'"}}));
     EXPECT_EQ(run_fptest({"run", "P/G"}).status, 0);
     EXPECT_EQ(row("Script"), "G Script 100 0");
 }

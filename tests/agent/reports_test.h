@@ -9,6 +9,7 @@
 #include "support/process.h"
 #include "support/reports.h"
 #include "support/temporary_directory.h"
+#include "support/this_process.h"
 
 #include <gmock/gmock.h>
 #include <nlohmann/json.hpp>
@@ -22,7 +23,6 @@
 #include <map>
 #include <memory>
 #include <string>
-#include <sys/resource.h>
 #include <sys/stat.h>
 #include <vector>
 
@@ -187,14 +187,6 @@ using TapReport = Reports;
 inline int in_a_child(const std::function<void()> &what)
 {
     return Process(what).wait().status;
-}
-
-inline void limit_file_size(rlim_t bytes)
-{
-    rlimit limit{};
-    ASSERT_EQ(getrlimit(RLIMIT_FSIZE, &limit), 0);
-    limit.rlim_cur = std::min(bytes, limit.rlim_max);
-    ASSERT_EQ(setrlimit(RLIMIT_FSIZE, &limit), 0);
 }
 
 } // namespace reports_test

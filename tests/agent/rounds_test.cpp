@@ -22,12 +22,10 @@ class Rounds : public FptestTest
   protected:
     static std::string fails_in_round_two()
     {
-        return plan("<P><CmdGroup name=\"G\">"
-                    "<Cmd name=\"Item\" args=\"report G 100 0 fine\"/>"
-                    "<Cmd name=\"Other\" args=\"report G 100 1 broken once /tmp/scene/second "
-                    "report G 100 0 ok\"/>"
-                    "<Cmd name=\"Third\" args=\"report G 100 0 fine\"/>"
-                    "</CmdGroup></P>");
+        return plan(
+            group_of({{"Item", "report G 100 0 fine"},
+                      {"Other", "report G 100 1 broken once /tmp/scene/second report G 100 0 ok"},
+                      {"Third", "report G 100 0 fine"}}));
     }
 
     // "Case: verdict" of each.
@@ -82,18 +80,15 @@ TEST_F(Rounds, EndAfterTheirNumberWhereNothingFails)
                                       "until an item fails\n"));
     EXPECT_THAT(without_times(ended.out), HasSubstr("\n2 passed, 0 failed, T s\n"));
     // one that reports nothing has failed as well
-    const std::string silent =
-        "<P><CmdGroup name=\"G\"><Cmd name=\"Item\" args=\"\"/></CmdGroup></P>";
+    const std::string silent = group_of({{"Item", ""}});
     EXPECT_THAT(run_fptest({"run", "--until-fail", "--plan", plan(silent), "P/G"}).out,
                 HasSubstr("\nended: G/Item"));
 }
 
 TEST_F(Rounds, BeginNoneOnceTheTimeIsOverAndCompleteTheOneThatRuns)
 {
-    const std::string path =
-        plan("<P><CmdGroup name=\"G\">"
-             "<Cmd name=\"Item\" args=\"sleep 0.3 report G 100 0 fine\"/>"
-             "<Cmd name=\"Other\" args=\"sleep 0.3 report G 100 0 fine\"/></CmdGroup></P>");
+    const std::string path = plan(group_of(
+        {{"Item", "sleep 0.3 report G 100 0 fine"}, {"Other", "sleep 0.3 report G 100 0 fine"}}));
     const Ended ended =
         run_fptest({"run", "--for", "1s", "--json", work("json"), "--plan", path, "P/G"});
     EXPECT_EQ(ended.status, 0);
@@ -172,9 +167,7 @@ TEST_F(Rounds, TakeNothingWhileTheyHaveNotBegun)
 TEST_F(Rounds, TakeNoMoreMemoryHoweverManyHaveBeenRun)
 {
     FptestProcess fptest({"run", "--repeat", "500", "--json", work("json"), "--tap", "--plan",
-                          plan("<P><CmdGroup name=\"G\"><Cmd name=\"Item\" args=\"await "
-                               "/tmp/scene/plan.xml\"/></CmdGroup></P>"),
-                          "P/G"});
+                          plan(group_of({{"Item", "await /tmp/scene/plan.xml"}})), "P/G"});
     const pid_t library = fptest.library();
     const auto held_in = [&](int round) {
         EXPECT_TRUE(eventually(
@@ -210,10 +203,9 @@ TEST_F(Rounds, LookAtSignalsFromTheFirstMomentOn)
 // What a run that was killed leaves is no success.
 TEST_F(Rounds, AreRedInJunitWhereTheRunIsKilled)
 {
-    const std::string path =
-        plan("<P><CmdGroup name=\"G\"><Cmd name=\"Item\" args=\"report G 100 0 fine\"/>"
-             "<Cmd name=\"Other\" args=\"note /tmp/scene/begun sleep 60\"/>"
-             "<Cmd name=\"Third\" args=\"\"/></CmdGroup></P>");
+    const std::string path = plan(group_of({{"Item", "report G 100 0 fine"},
+                                            {"Other", "note /tmp/scene/begun sleep 60"},
+                                            {"Third", ""}}));
     FptestProcess fptest({"run", "--repeat", "5", "--junit", work("junit"), "--plan", path, "P/G"});
     ASSERT_TRUE(wait_for_file("begun"));
     const auto is_running = [] {

@@ -37,11 +37,6 @@ inline std::string notes(const std::string &description, const std::string &resu
     return "note /tmp/scene/order report G 100 " + result + " " + description;
 }
 
-inline std::string group_of(const Items &items)
-{
-    return device::plan_of({{"G", items}});
-}
-
 inline const Items kThreeThatNote = {
     {"Item", notes("one")}, {"Other", notes("two")}, {"Third", notes("three")}};
 
@@ -70,7 +65,7 @@ class Run : public FptestTest
     // The same of the group G of these items.
     static Lines with_group(const Items &items, Lines options = {})
     {
-        options.insert(options.begin(), {"--plan", plan(group_of(items))});
+        options.insert(options.begin(), {"--plan", plan(device::group_of(items))});
         options.emplace_back("P/G");
         return with_json(std::move(options));
     }

@@ -90,9 +90,8 @@ TEST_F(Send, ReadsAndWritesZeroBytesWhereThatIsWanted)
 
 TEST_F(Send, StoresAndRunsAPlan)
 {
-    const std::string text = plan_of({{"G",
-                                       {{"Item", "note /tmp/scene/order report G 100 0 a"},
-                                        {"Other", "note /tmp/scene/order report G 100 1 b"}}}});
+    const std::string text = group_of({{"Item", "note /tmp/scene/order report G 100 0 a"},
+                                       {"Other", "note /tmp/scene/order report G 100 1 b"}});
     const Ended ended = run_fptest({"send", "-0"}, "XMLFile::" + text + '\0' + "XMLNodePath::P/G" +
                                                        '\0' + "pingtest" + '\0');
     // what the items make of it is not looked at
@@ -105,7 +104,7 @@ TEST_F(Send, StoresAndRunsAPlan)
 
 TEST_F(Send, PrintsWhatItemsPrintToStandardError)
 {
-    write_file(kPlanFile, plan_of({{"G", {{"Item", "say out complain err"}, {"Other", "say 2"}}}}));
+    write_file(kPlanFile, group_of({{"Item", "say out complain err"}, {"Other", "say 2"}}));
     const Ended ended = run_fptest({"send", "XMLNodePath::P/G", "pingtest"});
     EXPECT_EQ(ended.status, 0);
     EXPECT_EQ(ended.out, "\nPing Success!\n");
@@ -116,7 +115,7 @@ TEST_F(Send, PrintsWhatItemsPrintToStandardError)
 
 TEST_F(Send, ShowsWhatAnItemPrintsWhileItRuns)
 {
-    write_file(kPlanFile, plan_of({{"G", {{"Item", "say begun await /tmp/scene/go"}}}}));
+    write_file(kPlanFile, group_of({{"Item", "say begun await /tmp/scene/go"}}));
     FptestProcess fptest({"send", "pingtest", "XMLNodePath::P/G", "XMLNodePath::P/G"});
     EXPECT_TRUE(eventually([&] { return fptest.err().find("begun\n") != std::string::npos; }, 30));
     // a reply as soon as there is one
@@ -127,7 +126,7 @@ TEST_F(Send, ShowsWhatAnItemPrintsWhileItRuns)
 
 TEST_F(Send, GivesItemsNoInput)
 {
-    write_file(kPlanFile, plan_of({{"G", {{"Item", "count-input"}}}}));
+    write_file(kPlanFile, group_of({{"Item", "count-input"}}));
     EXPECT_THAT(run_fptest({"send", "-0"}, "XMLNodePath::P/G/Item\0pingtest"s).err,
                 HasSubstr("0 bytes of input\n"));
     EXPECT_THAT(run_fptest({"send", "XMLNodePath::P/G/Item"}, "text").err,
@@ -144,10 +143,9 @@ TEST_F(Send, WritesTheLibrarysLogWhereItIsTold)
 
 TEST_F(Send, StopsTheItemOfAnInterruptedCommand)
 {
-    write_file(kPlanFile, plan_of({{"G",
-                                    {{"Item", "tell-signal /tmp/scene/signal note /tmp/scene/begun "
-                                              "sleep 60"},
-                                     {"Other", "note /tmp/scene/after"}}}}));
+    write_file(kPlanFile, group_of({{"Item", "tell-signal /tmp/scene/signal note /tmp/scene/begun "
+                                             "sleep 60"},
+                                    {"Other", "note /tmp/scene/after"}}));
     for (const int number : {SIGINT, SIGTERM}) {
         SCOPED_TRACE(number);
         std::filesystem::remove(work("begun"));
@@ -168,8 +166,7 @@ TEST_F(Send, StopsTheItemOfAnInterruptedCommand)
 TEST_F(Send, StopsAlsoWhatAnInterruptedGroupWouldStartNext)
 {
     const std::string sleeps = "note /tmp/scene/order sleep 60";
-    write_file(kPlanFile,
-               plan_of({{"G", {{"Item", sleeps}, {"Other", sleeps}, {"Third", sleeps}}}}));
+    write_file(kPlanFile, group_of({{"Item", sleeps}, {"Other", sleeps}, {"Third", sleeps}}));
     FptestProcess fptest({"send", "XMLNodePath::P/G"});
     ASSERT_TRUE(wait_for_file("order"));
     fptest.signal(SIGINT);
@@ -180,7 +177,7 @@ TEST_F(Send, StopsAlsoWhatAnInterruptedGroupWouldStartNext)
 
 TEST_F(Send, WaitsForTheEndOfAReportBeforeItsPlanIsLoaded)
 {
-    const std::string text = plan_of({{"G", {{"Item", "note /tmp/scene/ran"}}}});
+    const std::string text = group_of({{"Item", "note /tmp/scene/ran"}});
     // a report empties the file, and holds its lock until all is written
     write_file(kPlanFile, "");
     const Descriptor report(open(kPlanFile, O_WRONLY | O_CLOEXEC));
@@ -196,9 +193,8 @@ TEST_F(Send, WaitsForTheEndOfAReportBeforeItsPlanIsLoaded)
 
 TEST_F(Send, StopsAScriptAsWell)
 {
-    write_file(
-        kPlanFile,
-        plan_of({{"G", {{"Script", "'echo x >/tmp/scene/begun; /system/bin/Third sleep 60'"}}}}));
+    write_file(kPlanFile,
+               group_of({{"Script", "'echo x >/tmp/scene/begun; /system/bin/Third sleep 60'"}}));
     FptestProcess fptest({"send", "XMLNodePath::P/G"});
     ASSERT_TRUE(wait_for_file("begun"));
     fptest.signal(SIGINT);
@@ -208,7 +204,7 @@ TEST_F(Send, StopsAScriptAsWell)
 
 TEST_F(Send, SaysThatTheLibrarysProcessEnded)
 {
-    write_file(kPlanFile, plan_of({{"G", {{"Item", "note /tmp/scene/begun sleep 60"}}}}));
+    write_file(kPlanFile, group_of({{"Item", "note /tmp/scene/begun sleep 60"}}));
     FptestProcess fptest({"send", "XMLNodePath::P/G", "pingtest"});
     ASSERT_TRUE(wait_for_file("begun"));
     kill(fptest.library(), SIGKILL);

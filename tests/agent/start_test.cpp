@@ -18,9 +18,7 @@
 namespace
 {
 
-constexpr char kOneSleeps[] = "<P><CmdGroup name=\"G\">"
-                              "<Cmd name=\"Item\" args=\"note /tmp/scene/begun sleep 60\"/>"
-                              "</CmdGroup></P>";
+const std::string kOneSleeps = group_of({{"Item", "note /tmp/scene/begun sleep 60"}});
 
 class Started : public FptestTest
 {
@@ -96,8 +94,7 @@ TEST_F(Started, TerminalThatClosesIsAnInterruption)
 TEST_F(Started, SignalsThatAreIgnoredStayIgnored)
 {
     const std::string path =
-        plan("<P><CmdGroup name=\"G\"><Cmd name=\"Item\" args=\"note /tmp/scene/begun "
-             "await /tmp/scene/go report G 100 0 fine\"/></CmdGroup></P>");
+        plan(group_of({{"Item", "note /tmp/scene/begun await /tmp/scene/go report G 100 0 fine"}}));
     for (const int signal : {SIGHUP, SIGINT}) {
         Start start = start_of_run(path);
         start.prepare = [signal] {

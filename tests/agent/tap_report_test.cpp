@@ -366,11 +366,12 @@ TEST_F(TapReport, WritesNoMoreOnceItHasFoundNoRoom)
                   const Stream stream(std::fopen(path("tap").c_str(), "w"), &std::fclose);
                   const auto report = tap_report(stream.get());
                   Playback playback(*report, mixed_run());
-                  limit_file_size(60);
-                  playback.begin();
-                  playback.run_item({0, 0});
+                  {
+                      const Limit limit(RLIMIT_FSIZE, 60);
+                      playback.begin();
+                      playback.run_item({0, 0});
+                  }
                   EXPECT_EQ(report->failure(), "the TAP output: File too large");
-                  limit_file_size(RLIM_INFINITY);
                   playback.finish();
                   EXPECT_EQ(report->failure(), "the TAP output: File too large");
               }),

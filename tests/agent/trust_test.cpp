@@ -37,10 +37,10 @@ class Trust : public Run
 TEST_F(Trust, TakesNoResultThatAProcessWithAnOldCopyOfThePlanWritesBack)
 {
     // it passes in the first run and reports nothing in the second
-    const std::string text =
-        "<P><CmdGroup name=\"G\"><Cmd name=\"Item\" args=\"note /tmp/scene/runs await "
-        "/tmp/scene/written once /tmp/scene/ran report G 100 0 fine\"/></CmdGroup>"
-        "<CmdGroup name=\"Other\"><Cmd name=\"Other\" args=\"\"/></CmdGroup></P>";
+    const std::string text = plan_of({{"G",
+                                       {{"Item", "note /tmp/scene/runs await /tmp/scene/written "
+                                                 "once /tmp/scene/ran report G 100 0 fine"}}},
+                                      {"Other", {{"Other", ""}}}});
     file("written", "");
     ASSERT_EQ(run_fptest({"run", "--plan", plan(text), "P/G"}).status, 0);
     unlink(work("runs").c_str());
@@ -85,7 +85,7 @@ TEST_F(Trust, TakesWhatIsReportedAfterAnOldCopyOfThePlanWasWritten)
     for (const std::string way : {"--quiet", "--as-group"}) {
         SCOPED_TRACE(way);
         const Items items = {{"Script", script(writes_old_copy)}, {"Item", kPasses}};
-        file("old", device::plan_of({{"G", {{"Script", ""}, {"Item", ""}}}}));
+        file("old", device::group_of({{"Script", ""}, {"Item", ""}}));
         EXPECT_EQ(run_group(items, {way}).status, 0);
         EXPECT_THAT(outcomes(), ElementsAre("Script: passed", "Item: passed"));
     }
@@ -93,7 +93,7 @@ TEST_F(Trust, TakesWhatIsReportedAfterAnOldCopyOfThePlanWasWritten)
 
 TEST_F(Trust, TakesNoResultOfAnEarlierRunThoughThePlanIsGivenAnew)
 {
-    const std::string old = device::plan_of({{"G", {{"Script", ""}}}});
+    const std::string old = device::group_of({{"Script", ""}});
     const std::size_t end = old.find("/>");
     file("old", std::string(old).insert(end, " progress=\"100\" result=\"0\" description=\"old\""));
     const Ended ended =
@@ -185,8 +185,8 @@ TEST_F(Trust, NamesEveryReportThatFailsThoughTheRunIsInterrupted)
             ASSERT_EQ(mkfifo(work(name).c_str(), 0600), 0);
             readers.emplace_back(open(work(name).c_str(), O_RDONLY | O_NONBLOCK | O_CLOEXEC));
         }
-        const std::string text = device::plan_of(
-            {{"G", {{"Item", "note /tmp/scene/begun await /tmp/scene/go report G 100 0 x"}}}});
+        const std::string text = device::group_of(
+            {{"Item", "note /tmp/scene/begun await /tmp/scene/go report G 100 0 x"}});
         FptestProcess fptest(
             {"run", "--json", work("json"), "--junit", work("junit"), "--plan", plan(text), "P/G"});
         ASSERT_TRUE(wait_for_file("begun"));
@@ -211,9 +211,8 @@ TEST_F(Trust, LeavesNoMarksOfItsOwnInThePlan)
 
 TEST_F(Trust, EndsTheRunWhenTheStoredPlanIsGone)
 {
-    const std::string text = "<P><CmdGroup name=\"G\">"
-                             "<Cmd name=\"Item\" args=\"sleep 0; rm /data/vorlane/src1.xml\"/>"
-                             "<Cmd name=\"Other\" args=\"report G 100 0 fine\"/></CmdGroup></P>";
+    const std::string text = group_of(
+        {{"Item", "sleep 0; rm /data/vorlane/src1.xml"}, {"Other", "report G 100 0 fine"}});
     const Ended ended = run_fptest({"run", "--json", work("json"), "--plan", plan(text), "P/G"});
     EXPECT_EQ(ended.status, 3);
     EXPECT_EQ(ended.err, "fptest: the plan has warnings: see fptest check /tmp/scene/plan.xml\n"
@@ -280,10 +279,7 @@ TEST_F(Trust, WritesNoTwoThingsIntoOneFile)
 
 TEST_F(Trust, PassesOnAllThatIsPrintedDuringASend)
 {
-    ASSERT_EQ(run_fptest({"send", "XMLFile::<P><CmdGroup name=\"G\"><Cmd name=\"Item\" "
-                                  "args=\"flood 1000000\"/></CmdGroup></P>"})
-                  .status,
-              0);
+    ASSERT_EQ(run_fptest({"send", "XMLFile::" + group_of({{"Item", "flood 1000000"}})}).status, 0);
     const Ended ended = run_fptest({"send", "XMLNodePath::P/G/Item"});
     const auto lines = lines_of(ended.err);
     const auto first = std::ranges::find(lines, "line 1");
@@ -298,10 +294,8 @@ TEST_F(Trust, PassesOnAllThatIsPrintedDuringASend)
 TEST_F(Trust, PutsWhatIsPrintedDuringASendWhereItBelongsThoughItComesLate)
 {
     const std::string text =
-        "<P><CmdGroup name=\"G\">"
-        "<Cmd name=\"Item\" args=\"say one note /tmp/scene/begun await /tmp/scene/go say 1\"/>"
-        "<Cmd name=\"Other\" args=\"say two note /tmp/scene/last await /tmp/scene/end\"/>"
-        "</CmdGroup></P>";
+        group_of({{"Item", "say one note /tmp/scene/begun await /tmp/scene/go say 1"},
+                  {"Other", "say two note /tmp/scene/last await /tmp/scene/end"}});
     FptestProcess fptest({"send", "XMLFile::" + text, "XMLNodePath::P/G"});
     ASSERT_TRUE(wait_for_file("begun"));
     fptest.signal(SIGSTOP);
@@ -316,9 +310,8 @@ TEST_F(Trust, PutsWhatIsPrintedDuringASendWhereItBelongsThoughItComesLate)
 
 TEST_F(Trust, SendsNothingIntoARun)
 {
-    const std::string text = "<P><CmdGroup name=\"G\"><Cmd name=\"Item\" args=\"note "
-                             "/tmp/scene/begun await /tmp/scene/go report G 100 0 fine\"/>"
-                             "</CmdGroup></P>";
+    const std::string text =
+        group_of({{"Item", "note /tmp/scene/begun await /tmp/scene/go report G 100 0 fine"}});
     FptestProcess fptest({"run", "--plan", plan(text), "P/G"});
     ASSERT_TRUE(wait_for_file("begun"));
     for (const std::string command : {"XMLFile::<P/>", "XMLNodePath::P/G"}) {
@@ -406,9 +399,9 @@ TEST_F(Trust, LosesNoReportThatComesAfterOneThatSpoilsThePlan)
 
 TEST_F(Trust, FailsAGathererThatEndsBeforeItIsDone)
 {
-    FptestProcess fptest(
-        {"run", "--json", work("json"), "--plan",
-         plan(device::plan_of({{"G", {{"SensorProbe", "--group G --seconds 60"}}}})), "P/G"});
+    FptestProcess fptest({"run", "--json", work("json"), "--plan",
+                          plan(device::group_of({{"SensorProbe", "--group G --seconds 60"}})),
+                          "P/G"});
     ASSERT_TRUE(support::eventually(
         [] { return device::processes_named("/system/bin/SensorProbe").size() == 1; }, 20));
     usleep(500'000); // it has been told by now
@@ -498,10 +491,8 @@ TEST_F(Trust, TakesNoFifoAndNoDirectoryForThePlan)
 TEST_F(Trust, GoesOnWhereTheLibraryIsSuspendedBetweenTwoItems)
 {
     const std::string path =
-        plan("<P><CmdGroup name=\"G\"><Cmd name=\"Item\" args=\"report G 100 0 fine;"
-             " (sleep 0.02; kill -STOP $PPID) &amp;\"/><Cmd name=\"Other\" args=\"report G 100 0 "
-             "fine\"/>"
-             "</CmdGroup></P>");
+        plan(group_of({{"Item", "report G 100 0 fine; (sleep 0.02; kill -STOP $PPID) &amp;"},
+                       {"Other", "report G 100 0 fine"}}));
     EXPECT_THAT(run_fptest({"run", "--plan", path, "--timeout", "1", "P/G"}).out,
                 HasSubstr("2 passed"));
 }
@@ -510,8 +501,7 @@ TEST_F(Trust, GoesOnWhereTheLibraryIsSuspendedBetweenTwoItems)
 
 TEST_F(Trust, KnowsHowItemsEndWhereItsCallerIgnoresTheEndsOfChildren)
 {
-    plan("<P><CmdGroup name=\"G\">"
-         "<Cmd name=\"Item\" args=\"report G 100 0 fine; kill -SEGV $$\"/></CmdGroup></P>");
+    plan(group_of({{"Item", "report G 100 0 fine; kill -SEGV $$"}}));
     support::Start start;
     start.arguments = {FPTEST_PROGRAM, "run", "--plan", work("plan.xml"), "P/G"};
     start.prepare = [] { std::signal(SIGCHLD, SIG_IGN); };

@@ -2,65 +2,31 @@
 // SPDX-License-Identifier: Apache-2.0
 
 // The live view, on a terminal as people have it.
-#include "device_test.h"
+#include "fptest_runner.h"
 #include "terminal_session.h"
-#include "util/text.h"
 
 #include <algorithm>
-#include <fstream>
 #include <regex>
-#include <unistd.h>
 
 namespace
 {
 
-constexpr char kFptest[] = QUILLMARK_BINARY_DIR "/agent/fptest";
-constexpr char kViewed[] = "/tmp/plan.xml";
 constexpr int kGreen = 2;
 constexpr int kRed = 1;
 constexpr int kYellow = 3;
 
-// Times differ from run to run.
-std::string masked(const std::string &line)
-{
-    static const std::regex time(R"(\b\d+\.\d s)");
-    return std::regex_replace(line, time, "T.T s");
-}
-
-std::vector<std::string> masked(std::vector<std::string> lines)
-{
-    for (std::string &line : lines) {
-        line = masked(line);
-    }
-    return lines;
-}
-
-class LiveView : public DeviceTest
+class LiveView : public FptestTest
 {
   protected:
-    void SetUp() override
+    static Lines run(Lines arguments)
     {
-        DeviceTest::SetUp();
-        unlink("/tmp/go");
-        unlink("/tmp/signal");
-        unlink("/tmp/log");
-    }
-
-    static void use_plan(const std::string &text)
-    {
-        write_file(kViewed, text);
-    }
-
-    static std::vector<std::string> run(const std::vector<std::string> &arguments)
-    {
-        std::vector<std::string> all = {kFptest, "run", "--plan", kViewed};
-        all.insert(all.end(), arguments.begin(), arguments.end());
-        return all;
+        arguments.insert(arguments.begin(), {FPTEST_PROGRAM, "run", "--plan", work("plan.xml")});
+        return arguments;
     }
 
     static void let_go()
     {
-        write_file("/tmp/go", "");
+        file("go", "");
     }
 
     // The row of a text.
@@ -83,50 +49,49 @@ class LiveView : public DeviceTest
     }
 };
 
-constexpr char kTwoThatReport[] =
-    "<P><CmdGroup name=\"Bringup\">"
-    "<Cmd name=\"Item\" args=\"report Bringup 50 -2 'half of it' await /tmp/go "
-    "report Bringup 100 0 'all of it'\"/>"
-    "<Cmd name=\"Other\" args=\"report Bringup 100 1 broken say why-it-broke\"/>"
-    "</CmdGroup></P>";
+const std::string kTwoThatReport = plan_of(
+    {{"Bringup",
+      {{"Item",
+        "report Bringup 50 -2 'half of it' await /tmp/scene/go report Bringup 100 0 'all of it'"},
+       {"Other", "report Bringup 100 1 broken say why-it-broke"}}}});
 
 } // namespace
 
 TEST_F(LiveView, ShowsAnItemsBarTimeResultAndDescriptionWhileItRuns)
 {
-    use_plan(kTwoThatReport);
+    plan(kTwoThatReport);
     TerminalSession session(run({"P/Bringup"}), 80, 24);
     ASSERT_TRUE(session.wait_for([&] {
         return session.text().find("half of it") != std::string::npos &&
                session.all_lines().back().find("to go") != std::string::npos;
     })) << session.text();
-    EXPECT_THAT(masked(session.all_lines()),
-                ElementsAre("/tmp/plan.xml: 2 items, vendor 0", //
-                            "Bringup",                          //
-                            "  Item     [####    ]  50%  T.T s  running   -2  half of it",
-                            "0 passed, 0 failed, 2 to go, T.T s"));
+    EXPECT_THAT(without_times(session.all_lines()),
+                ElementsAre("/tmp/scene/plan.xml: 2 items, vendor 0", //
+                            "Bringup",                                //
+                            "  Item     [####    ]  50%  T s  running   -2  half of it",
+                            "0 passed, 0 failed, 2 to go, T s"));
     let_go();
     EXPECT_EQ(session.wait_for_end(), 1);
 }
 
 TEST_F(LiveView, LeavesALineForEachItemAndTheTotalBehind)
 {
-    use_plan(kTwoThatReport);
+    plan(kTwoThatReport);
     let_go();
     TerminalSession session(run({"P/Bringup"}), 80, 24);
     EXPECT_EQ(session.wait_for_end(), 1);
-    EXPECT_THAT(masked(session.all_lines()),
-                ElementsAre("/tmp/plan.xml: 2 items, vendor 0", //
-                            "Bringup",                          //
-                            "  Item     [########] 100%  T.T s  passed     0  all of it",
-                            "  Other    [########] 100%  T.T s  failed     1  broken",
+    EXPECT_THAT(without_times(session.all_lines()),
+                ElementsAre("/tmp/scene/plan.xml: 2 items, vendor 0", //
+                            "Bringup",                                //
+                            "  Item     [########] 100%  T s  passed     0  all of it",
+                            "  Other    [########] 100%  T s  failed     1  broken",
                             "    | why-it-broke", //
-                            "1 passed, 1 failed, T.T s"));
+                            "1 passed, 1 failed, T s"));
 }
 
 TEST_F(LiveView, CountsTheSecondsOfWhatRuns)
 {
-    use_plan(kTwoThatReport);
+    plan(kTwoThatReport);
     TerminalSession session(run({"P/Bringup"}), 80, 24);
     const auto shows = [&session](const char *time) {
         return [&session, shape = std::regex(std::string(time) + " s  running")] {
@@ -141,34 +106,25 @@ TEST_F(LiveView, CountsTheSecondsOfWhatRuns)
 
 TEST_F(LiveView, ScrollsWhereThereAreMoreItemsThanLines)
 {
-    std::string plan = "<P><CmdGroup name=\"G\">";
+    std::string text = "<P><CmdGroup name=\"G\">";
     for (int at = 0; at < 4; ++at) {
         for (const std::string name : {"Item", "Other", "Third"}) {
-            plan += "<Cmd name=\"" + name + "\" args=\"report G 100 0 ok\"/>";
+            text += "<Cmd name=\"" + name + "\" args=\"report G 100 0 ok\"/>";
         }
     }
-    use_plan(plan + "</CmdGroup></P>");
+    plan(text + "</CmdGroup></P>");
     TerminalSession session(run({"--force", "P/G"}), 80, 6);
     EXPECT_EQ(session.wait_for_end(), 1);
     const auto lines = session.all_lines();
-    EXPECT_EQ(std::ranges::count_if(lines,
-                                    [](const std::string &line) {
-                                        return line.find("  passed     0  ok") != std::string::npos;
-                                    }),
-              3)
-        << session.text(); // by the group's command only the first of a name reports
-    EXPECT_EQ(
-        std::ranges::count_if(
-            lines, [](const std::string &line) { return line.find("to go") != std::string::npos; }),
-        0)
-        << session.text();
+    // by the group's command only the first of a name reports
+    EXPECT_THAT(lines, Contains(HasSubstr("  passed     0  ok")).Times(3));
+    EXPECT_THAT(lines, Not(Contains(HasSubstr("to go"))));
 }
 
 TEST_F(LiveView, FitsItsLinesIntoANarrowTerminal)
 {
-    use_plan("<P><CmdGroup name=\"G\"><Cmd name=\"Item\" args=\"report G 100 0 "
-             "'a description that takes more than the whole of a line that narrow'\"/>"
-             "</CmdGroup></P>");
+    plan(group_of({{"Item", "report G 100 0 'a description that takes more than the whole of a "
+                            "line that narrow'"}}));
     for (const int columns : {79, 60, 45, 40}) {
         SCOPED_TRACE(columns);
         TerminalSession session(run({"P/G"}), columns, 24);
@@ -184,7 +140,7 @@ TEST_F(LiveView, FitsItsLinesIntoANarrowTerminal)
 
 TEST_F(LiveView, IsPlainWhereALineHasNoRoomForAResult)
 {
-    use_plan(kTwoThatReport);
+    plan(kTwoThatReport);
     let_go();
     for (const int columns : {39, 20, 3}) {
         SCOPED_TRACE(columns);
@@ -197,7 +153,7 @@ TEST_F(LiveView, IsPlainWhereALineHasNoRoomForAResult)
 
 TEST_F(LiveView, LeavesNothingAfterOnATerminalThatBecomesVeryNarrow)
 {
-    use_plan(kTwoThatReport);
+    plan(kTwoThatReport);
     TerminalSession session(run({"P/Bringup"}), 80, 24);
     ASSERT_TRUE(session.wait_for_text("half of it"));
     session.resize(10, 24);
@@ -212,38 +168,27 @@ TEST_F(LiveView, LeavesNothingAfterOnATerminalThatBecomesVeryNarrow)
 
 TEST_F(LiveView, UsesTheNewWidthOfAResizedTerminal)
 {
-    use_plan(kTwoThatReport);
+    plan(kTwoThatReport);
     TerminalSession session(run({"P/Bringup"}), 100, 24);
     ASSERT_TRUE(session.wait_for_text("half of it"));
     session.resize(50, 24);
-    const auto narrow = [&] {
-        const auto lines = session.all_lines();
-        return std::ranges::count_if(lines, [](const std::string &line) {
-                   return line.find("running") != std::string::npos &&
-                          line.find('[') == std::string::npos;
-               }) == 1;
-    };
-    EXPECT_TRUE(session.wait_for(narrow)) << session.text();
+    EXPECT_TRUE(session.wait_for([&] {
+        return Matches(Contains(AllOf(HasSubstr("running"), Not(HasSubstr("[")))).Times(1))(
+            session.all_lines());
+    })) << session.text();
     session.resize(100, 24);
     EXPECT_TRUE(session.wait_for_text("[########        ]")) << session.text();
     let_go();
     EXPECT_EQ(session.wait_for_end(), 1);
     const auto lines = session.all_lines();
-    EXPECT_EQ(
-        std::ranges::count_if(
-            lines, [](const std::string &line) { return line.find("Item") != std::string::npos; }),
-        1)
-        << session.text();
+    EXPECT_THAT(lines, Contains(HasSubstr("Item")).Times(1));
     EXPECT_THAT(lines, Not(Contains(HasSubstr("running")))) << session.text();
 }
 
 TEST_F(LiveView, ColoursWhatBecameOfAnItem)
 {
-    use_plan("<P><CmdGroup name=\"G\">"
-             "<Cmd name=\"Item\" args=\"report G 100 0 fine\"/>"
-             "<Cmd name=\"Other\" args=\"report G 100 1 bad\"/>"
-             "<Cmd name=\"Third\" args=\"sleep 0\"/>"
-             "</CmdGroup></P>");
+    plan(group_of(
+        {{"Item", "report G 100 0 fine"}, {"Other", "report G 100 1 bad"}, {"Third", "sleep 0"}}));
     TerminalSession session(run({"P/G"}), 80, 24);
     EXPECT_EQ(session.wait_for_end(), 1);
     EXPECT_EQ(colour_of(session, "  Item", "passed"), kGreen) << session.text();
@@ -256,7 +201,7 @@ TEST_F(LiveView, ColoursWhatBecameOfAnItem)
 
 TEST_F(LiveView, UsesNoColourWhereThatIsNotWanted)
 {
-    use_plan(kTwoThatReport);
+    plan(kTwoThatReport);
     let_go();
     TerminalSession session(run({"P/Bringup"}), 80, 24, {{"NO_COLOR", "1"}});
     EXPECT_EQ(session.wait_for_end(), 1);
@@ -268,7 +213,7 @@ TEST_F(LiveView, UsesNoColourWhereThatIsNotWanted)
 
 TEST_F(LiveView, IsColouredWhereNoColorIsSetToNothing)
 {
-    use_plan(kTwoThatReport);
+    plan(kTwoThatReport);
     let_go();
     TerminalSession session(run({"P/Bringup"}), 80, 24, {{"NO_COLOR", ""}});
     EXPECT_EQ(session.wait_for_end(), 1);
@@ -277,26 +222,24 @@ TEST_F(LiveView, IsColouredWhereNoColorIsSetToNothing)
 
 TEST_F(LiveView, IsPlainOnATerminalThatCannotMoveItsCursor)
 {
-    use_plan(kTwoThatReport);
+    plan(kTwoThatReport);
     let_go();
     TerminalSession session(run({"P/Bringup"}), 80, 24, {{"TERM", "dumb"}});
     EXPECT_EQ(session.wait_for_end(), 1);
     EXPECT_EQ(session.written().find('\x1b'), std::string::npos);
-    EXPECT_THAT(masked(session.all_lines()),
-                ElementsAre("/tmp/plan.xml: 2 items, vendor 0",
-                            "Bringup/Item: passed, result 0, T.T s: all of it",
-                            "Bringup/Other: failed, result 1, T.T s: broken", "    | why-it-broke",
-                            "1 passed, 1 failed, T.T s"));
+    EXPECT_THAT(without_times(session.all_lines()),
+                ElementsAre("/tmp/scene/plan.xml: 2 items, vendor 0",
+                            "Bringup/Item: passed, result 0, T s: all of it",
+                            "Bringup/Other: failed, result 1, T s: broken", "    | why-it-broke",
+                            "1 passed, 1 failed, T s"));
 }
 
 TEST_F(LiveView, LetsNoDescriptionMoveTheCursor)
 {
-    write_file("/tmp/description", "a\tb\nc");
-    write_file("/tmp/say", "\x1b[2J\x1b[31mred\n");
-    use_plan("<P><CmdGroup name=\"G\">"
-             "<Cmd name=\"Item\" args=\"report-file G 100 0 /tmp/description\"/>"
-             "<Cmd name=\"Other\" args=\"report G 100 1 x; cat /tmp/say\"/>"
-             "</CmdGroup></P>");
+    file("description", "a\tb\nc");
+    file("say", "\x1b[2J\x1b[31mred\n");
+    plan(group_of({{"Item", "report-file G 100 0 /tmp/scene/description"},
+                   {"Other", "report G 100 1 x; cat /tmp/scene/say"}}));
     TerminalSession session(run({"P/G"}), 80, 24);
     EXPECT_EQ(session.wait_for_end(), 1);
     EXPECT_THAT(session.text(), HasSubstr("a␉b␊c"));
@@ -306,9 +249,8 @@ TEST_F(LiveView, LetsNoDescriptionMoveTheCursor)
 
 TEST_F(LiveView, CountsTheColumnsOfWideCharacters)
 {
-    use_plan("<P><CmdGroup name=\"G\"><Cmd name=\"Item\" args=\"report G 50 -2 "
-             "'指紋センサーの検査を行っています。お待ちください' await /tmp/go report G 100 0 x\"/>"
-             "</CmdGroup></P>");
+    plan(group_of({{"Item", "report G 50 -2 '指紋センサーの検査を行っています。お待ちください' "
+                            "await /tmp/scene/go report G 100 0 x"}}));
     TerminalSession session(run({"P/G"}), 80, 24);
     ASSERT_TRUE(session.wait_for_text("指紋"));
     // a line that was taken for shorter than it is would wrap
@@ -321,17 +263,17 @@ TEST_F(LiveView, CountsTheColumnsOfWideCharacters)
 
 TEST_F(LiveView, KeepsWhatItKnewWhileThePlanIsHalfWritten)
 {
-    use_plan(kTwoThatReport);
+    plan(kTwoThatReport);
     TerminalSession session(run({"P/Bringup"}), 80, 24);
     ASSERT_TRUE(session.wait_for_text("half of it"));
-    const std::string plan = read_file(kPlanFile);
-    for (const std::size_t part : {plan.size() / 2, plan.size() - 3, std::size_t{0}}) {
-        write_file(kPlanFile, plan.substr(0, part));
+    const std::string stored = read_file(kPlanFile);
+    for (const std::size_t part : {stored.size() / 2, stored.size() - 3, std::size_t{0}}) {
+        write_file(kPlanFile, stored.substr(0, part));
         EXPECT_FALSE(session.wait_for(
             [&] { return session.text().find("half of it") == std::string::npos; }, 0.4))
             << session.text();
     }
-    write_file(kPlanFile, plan);
+    write_file(kPlanFile, stored);
     let_go();
     EXPECT_EQ(session.wait_for_end(), 1);
     EXPECT_THAT(session.text(), HasSubstr("all of it"));
@@ -341,17 +283,15 @@ TEST_F(LiveView, KeepsWhatItKnewWhileThePlanIsHalfWritten)
 
 TEST_F(LiveView, CtrlCStopsTheItemThroughTheLibrary)
 {
-    use_plan("<P><CmdGroup name=\"G\">"
-             "<Cmd name=\"Item\" args=\"tell-signal /tmp/signal report G 10 -2 begun sleep 60\"/>"
-             "<Cmd name=\"Other\" args=\"report G 100 0 ok\"/>"
-             "</CmdGroup></P>");
-    TerminalSession session(run({"--log", "/tmp/log", "P/G"}), 80, 24);
+    plan(group_of({{"Item", "tell-signal /tmp/scene/signal report G 10 -2 begun sleep 60"},
+                   {"Other", "report G 100 0 ok"}}));
+    TerminalSession session(run({"--log", work("log"), "P/G"}), 80, 24);
     ASSERT_TRUE(session.wait_for_text("begun"));
     session.type("\x03");
     EXPECT_EQ(session.wait_for_end(), 130);
     // the terminal's own signal has not reached the item
-    EXPECT_EQ(read_file("/tmp/signal"), "SIGTERM\n");
-    EXPECT_THAT(read_file("/tmp/log"), HasSubstr("FPTEST_SuspendItemExecute"));
+    EXPECT_EQ(read_file(work("signal")), "SIGTERM\n");
+    EXPECT_THAT(read_file(work("log")), HasSubstr("FPTEST_SuspendItemExecute"));
     const std::string text = session.text();
     EXPECT_THAT(text, HasSubstr("stopped   -2"));
     EXPECT_THAT(text, HasSubstr("stopped by Ctrl-C: begun"));
@@ -361,9 +301,7 @@ TEST_F(LiveView, CtrlCStopsTheItemThroughTheLibrary)
 
 TEST_F(LiveView, CtrlCTwiceLeavesAtOnce)
 {
-    use_plan("<P><CmdGroup name=\"G\">"
-             "<Cmd name=\"Stubborn\" args=\"ignore-stop report G 10 -2 begun sleep 60\"/>"
-             "</CmdGroup></P>");
+    plan(group_of({{"Stubborn", "ignore-stop report G 10 -2 begun sleep 60"}}));
     TerminalSession session(run({"P/G"}), 80, 24);
     ASSERT_TRUE(session.wait_for_text("begun"));
     session.type("\x03");

@@ -3,14 +3,19 @@
 
 #include "device_test.h"
 
+#include "common/descriptor.h"
+
 #include <algorithm>
 #include <array>
 #include <cctype>
+#include <cerrno>
 #include <csignal>
 #include <cstdlib>
+#include <fcntl.h>
 #include <filesystem>
 #include <regex>
 #include <spawn.h>
+#include <sys/wait.h>
 #include <unistd.h>
 
 namespace fs = std::filesystem;
@@ -64,6 +69,11 @@ std::string plan_of(const std::vector<std::pair<std::string, std::vector<PlanIte
     return plan + "</P>";
 }
 
+std::string group_of(const std::vector<PlanItem> &items)
+{
+    return plan_of({{"G", items}});
+}
+
 void store(const std::string &plan)
 {
     EXPECT_EQ(FPTEST_RunTestCmd(("XMLFile::" + plan).c_str(), nullptr, 0), 0);
@@ -88,6 +98,22 @@ void set_vendor(const std::string &text)
 {
     write_file(kParameterFile, "<?xml version=\"1.0\"?>\n<device><SysParam><Quillmark><vendor>" +
                                    text + "</vendor></Quillmark></SysParam></device>\n");
+}
+
+bool is_in_place()
+{
+    return std::getenv("QUILLMARK_DEVICE") == std::string("in-place");
+}
+
+void fill_disk()
+{
+    const fs::space_info disk = fs::space("/data/vorlane");
+    ASSERT_LE(disk.capacity, 64U << 20) << "too much to be filled";
+    const Descriptor filler(open(kFiller, O_WRONLY | O_CREAT | O_CLOEXEC, 0600));
+    const std::string block(4096, 'f');
+    while (write(filler.get(), block.data(), block.size()) > 0) {
+    }
+    ASSERT_EQ(errno, ENOSPC);
 }
 
 Lines ran()
@@ -163,6 +189,30 @@ std::vector<Process> processes_named(const std::string &name)
     auto found = processes();
     std::erase_if(found, [&](const Process &process) { return process.name != name; });
     return found;
+}
+
+std::size_t zombies()
+{
+    return static_cast<std::size_t>(std::ranges::count_if(processes(), [](const Process &process) {
+        return process.parent == getpid() && process.state == 'Z';
+    }));
+}
+
+bool children_end(pid_t running)
+{
+    return eventually([=] {
+        return std::ranges::none_of(processes(), [=](const Process &process) {
+            return process.parent == getpid() && process.pid != running && process.state != 'Z';
+        });
+    });
+}
+
+int signal_that_ends(pid_t child)
+{
+    int status = 0;
+    EXPECT_EQ(waitpid(child, &status, 0), child);
+    EXPECT_TRUE(WIFSIGNALED(status));
+    return WTERMSIG(status);
 }
 
 std::string status_field(pid_t pid, const std::string &field)

@@ -45,6 +45,9 @@ struct PlanItem {
 // space, so that many items fit into what a command can carry.
 std::string plan_of(const std::vector<std::pair<std::string, std::vector<PlanItem>>> &groups);
 
+// A plan of the group G alone, with these items.
+std::string group_of(const std::vector<PlanItem> &items);
+
 void store(const std::string &plan);
 
 // Sends "XMLNodePath::PATH" and expects the empty reply.
@@ -56,6 +59,12 @@ std::string read_back(int room = 64 * 1024);
 
 // The parameter file, with this text for the vendor selector.
 void set_vendor(const std::string &text);
+
+bool is_in_place();
+
+// Leaves no room in /data/vorlane, until the filler is removed.
+inline constexpr char kFiller[] = "/data/vorlane/filler";
+void fill_disk();
 
 // What the test items have noted of themselves: "PROGRAM|ARG|ARG" a line.
 Lines ran();
@@ -81,6 +90,15 @@ std::vector<Process> processes();
 
 // Those of them with exactly that name.
 std::vector<Process> processes_named(const std::string &name);
+
+// How many of this process's children have ended and not been waited for.
+std::size_t zombies();
+
+// Whether all children end but for one that goes on running.
+bool children_end(pid_t running = -1);
+
+// The number of the signal that ends that child, waited for.
+int signal_that_ends(pid_t child);
 
 // A field of /proc/PID/status, as it is there.
 std::string status_field(pid_t pid, const std::string &field);

@@ -3,7 +3,9 @@
 
 #include "faults.h"
 
+#include <algorithm>
 #include <cstdlib>
+#include <iterator>
 #include <sched.h>
 #include <sys/mount.h>
 
@@ -12,38 +14,24 @@ namespace device
 namespace
 {
 
-Lines by(const std::string &function, Lines texts)
+// A command for that item up to the item's lookup by name.
+Lines begun_by(const std::string &item)
 {
-    for (std::string &text : texts) {
-        text.insert(0, function + "| ");
-    }
-    return texts;
+    const std::string path = "P/G/" + item;
+    return parsed({"XMLNodePath", path}) + levelled(path, 3, item) + split({"P", "G", item});
 }
 
-// Up to the item's lookup by name.
-Lines lines_of_command(const std::string &item)
+Lines lookup_of(const std::string &item, const std::string &args, const Lines &query)
 {
-    return by("fptest_ParseCmdLine", {"testHead is : XMLNodePath", "testName is : P/G/" + item}) +
-           by("fptest_ItemsTest", {"Input cmdline : P/G/" + item}) +
-           by("get_node_level", {"level = 3", "node name = " + item}) +
-           by("get_node_name", {"enter...", "root node:P", "mid node:G", "leaf node:" + item}) +
-           by("get_node_index", {"enter..."});
-}
-
-Lines lines_of_lookup(const std::string &item, const std::string &args, const Lines &query)
-{
-    return lines_of_command(item) + by("SingleItemExecute", {"enter... !"}) +
-           by("get_node_byIndex", {"enter...", "curernt leaf node name = " + item, "leave..."}) +
-           by("SingleItemExecute", {"mxmlElementGetAttr name=" + item + "- args=" + args}) +
-           by("ResourceReduce", {"\ncbuf=ps | grep /system/bin/SensorProbe"}) + query +
-           by("SingleItemExecute", {"tpCmd:/system/bin/" + item + " " + args});
+    return begun_by(item) + asked_index() + found(item, args) + query +
+           command("/system/bin/" + item + " " + args);
 }
 
 } // namespace
 
 // --- plans and reports -------------------------------------------------------
 
-std::string saved(int progress, const std::string &description)
+std::string saved_plan(int progress, const std::string &description)
 {
     // Mini-XML wraps long lines
     return "<P>\n<CmdGroup name=\"G\">\n\t<Cmd name=\"Note\" args=\"x\" progress=\"" +
@@ -52,7 +40,7 @@ std::string saved(int progress, const std::string &description)
            "\" />\n\t<Cmd name=\"SensorProbe\" args=\"--help\" />\n</CmdGroup>\n</P>\n";
 }
 
-void load()
+void load_plan()
 {
     FPTEST_SetTransation("no such group", "", 0, 0, "");
     log_lines();
@@ -65,83 +53,56 @@ void report(int progress, const std::string &description)
 
 // --- what is logged ----------------------------------------------------------
 
-Lines operator+(Lines left, const Lines &right)
+Lines logged(const Lines &sequence)
 {
-    left.insert(left.end(), right.begin(), right.end());
-    return left;
-}
-
-std::string open_failure(const std::string &function, const std::string &error)
-{
-    return function + "| Open /data/vorlane/src1.xml file failed(" + error;
+    Lines lines;
+    std::ranges::copy_if(sequence, std::back_inserter(lines), is_log);
+    for (std::string &line : lines) {
+        line.erase(line.find_last_not_of('\n') + 1);
+    }
+    return lines;
 }
 
 Lines lines_of_store(const std::string &plan, const Lines &failure)
 {
-    return Lines{"fptest_ParseCmdLine| testHead is : XMLFile",
-                 "fptest_ParseCmdLine| testName is : " + plan} +
-           failure + Lines{"FPTEST_RunTestCmd| Save source xml file success!"};
-}
-
-Lines lines_of_unloaded(const std::string &item, const Lines &failure)
-{
-    return lines_of_command(item) + failure +
-           by("get_node_index", {"get_node_index[]:load config file failed"}) +
-           by("SingleItemExecute", {"enter... !"}) +
-           by("get_node_byIndex", {"enter...", "get_node_byIndex[]:load config file failed"}) +
-           by("SingleItemExecute", {"get node by Index fail!"});
-}
-
-Lines lines_of_gatherer(const std::string &args, const Lines &query, const Lines &trigger)
-{
-    return lines_of_lookup("SensorProbe", args, query) +
-           Lines{std::string("SingleItemExecute| \nrow=") + (query == kNotAsked ? "-1" : "0")} +
-           trigger + Lines{"SingleItemExecute| leave... !"};
-}
-
-Lines lines_of_report(int progress, const std::string &description, const Lines &save)
-{
-    return by("FPTEST_SetTransation", {"enter...", "input node name = Note"}) +
-           by("get_node_index", {"enter..."}) +
-           by("FPTEST_SetTransation",
-              {"iResult = 0", "index=0 - iResult=0 - iProgress=" + std::to_string(progress) +
-                                  " - iDesc=" + description}) +
-           by("updateSrcXmlFile",
-              {"enter... !", "curernt node name is: Note", "start update progress!",
-               "start update result!", "start update description!", "start save xml!"}) +
-           by("save_XmlFile", {"enter..."}) + save +
-           by("updateSrcXmlFile", {"update Src Xml File success . leave..."}) +
-           by("FPTEST_SetTransation", {"leave..."});
-}
-
-Lines lines_of_unloaded_report(int progress, const std::string &description, const Lines &failure)
-{
-    return by("FPTEST_SetTransation", {"enter...", "input node name = Note"}) +
-           by("get_node_index", {"enter..."}) + failure +
-           by("get_node_index", {"get_node_index[]:load config file failed"}) +
-           by("FPTEST_SetTransation",
-              {"iResult = 0", "index=-1 - iResult=0 - iProgress=" + std::to_string(progress) +
-                                  " - iDesc=" + description}) +
-           by("updateSrcXmlFile", {"enter... !"}) + failure +
-           by("updateSrcXmlFile", {"updateSrcXmlFile[]:load config file failed"}) +
-           by("FPTEST_SetTransation", {"leave..."});
-}
-
-Lines lines_of_read_back(std::size_t size)
-{
-    const std::string count = std::to_string(size);
-    return by("FPTEST_ExtractResultMsg",
-              {"enter... !", "offset = 0", "offset = " + count, "offset = 0"}) +
-           (size == 0 ? Lines{}
-                      : by("FPTEST_ExtractResultMsg",
-                           {"read file unfinish, continue... n = " + count + " "})) +
-           by("FPTEST_ExtractResultMsg",
-              {"reach the end of file", "read byte count = " + count, "leave..."});
+    return logged(parsed({"XMLFile", plan}) + failure + kStored);
 }
 
 Lines lines_of_note(const Lines &query, const std::string &args)
 {
-    return lines_of_lookup("Note", args, query) + Lines{"SingleItemExecute| leave... !"};
+    return logged(lookup_of("Note", args, query) + left());
+}
+
+Lines lines_of_unloaded_note(const Lines &loading)
+{
+    return logged(begun_by("Note") + asked_index(loading, kNoPlan) +
+                  found_nothing(no_item(kNoPlan)));
+}
+
+Lines lines_of_gatherer(const std::string &args, const Lines &query, const Lines &trigger)
+{
+    const std::string row = query == kNotAsked ? "-1" : "0";
+    return logged(lookup_of("SensorProbe", args, query) + ("SingleItemExecute| \nrow=" + row)) +
+           trigger + logged(left());
+}
+
+Lines lines_of_report(int progress, const std::string &description, const Lines &saving)
+{
+    return logged(report_begun("Note") + report_told(0, progress, 0, description) +
+                  updated("Note", saving));
+}
+
+Lines lines_of_unloaded_report(int progress, const std::string &description, const Lines &loading)
+{
+    return logged(report_begun("Note", loading, kNoPlan) +
+                  report_told(-1, progress, 0, description) + loading + not_updated(kNoPlan));
+}
+
+Lines lines_of_read_back(std::size_t size)
+{
+    const int count = static_cast<int>(size);
+    return logged(opened_to_read(count) + (count == 0 ? Lines{} : read_piece(count, count)) +
+                  read_end(0, count));
 }
 
 Lines log_of_store(const std::string &plan)
@@ -163,11 +124,6 @@ Lines log_of_report(int progress, const std::string &description)
 }
 
 // --- faults ------------------------------------------------------------------
-
-bool is_in_place()
-{
-    return std::getenv("QUILLMARK_DEVICE") == std::string("in-place");
-}
 
 void PrivateMounts::SetUp()
 {

@@ -7,51 +7,49 @@
 
 #include "device_test.h"
 #include "support/process.h"
+#include "support/sequences.h"
+#include "support/this_process.h"
 
 #include <cstddef>
+#include <optional>
 #include <string>
-#include <sys/resource.h>
 
 namespace device
 {
 
 // A gatherer that is asked for help says it and ends, and connects nowhere.
-inline const std::string kPlan = plan_of({{"G", {{"Note", "x"}, {"SensorProbe", "--help"}}}});
+inline const std::string kPlan = group_of({{"Note", "x"}, {"SensorProbe", "--help"}});
 
 // The plan as it is saved after a report on Note.
-std::string saved(int progress, const std::string &description);
+std::string saved_plan(int progress, const std::string &description);
 
 // Loads the plan and changes nothing.
-void load();
+void load_plan();
 
 void report(int progress, const std::string &description);
 
 // --- what is logged ----------------------------------------------------------
 
-Lines operator+(Lines left, const Lines &right);
+using namespace sequences;
 
-inline const std::string kTooManyFiles = "24),Too many open files";
-std::string open_failure(const std::string &function, const std::string &error);
+// The log lines of a sequence, as log_lines has them.
+Lines logged(const Lines &sequence);
 
-inline const Lines kNotOpened{"saveRecvFile| OPEN FILE FAIL!"};
-inline const Lines kNotWritten{"saveRecvFile| WRITE DATA FAIL!"};
+// Of a store, which may fail.
 Lines lines_of_store(const std::string &plan, const Lines &failure = {});
 
-// Of a command where there is no plan to be loaded.
-Lines lines_of_unloaded(const std::string &item, const Lines &failure = {});
-
-inline const Lines kNotFound{"ResourceReduce| target process not exist!"};
-inline const Lines kNotAsked{"ResourceReduce| popen error!"};
-Lines lines_of_note(const Lines &query = kNotFound, const std::string &args = "x");
-
-inline const Lines kTriggered{"Sock_Init1| retWri=13", "Sock_Init1| retWri success"};
+inline const Lines kNotAsked = queried(std::nullopt); // whether a gatherer runs
+Lines lines_of_note(const Lines &query = queried(), const std::string &args = "x");
+// Where there is no plan to be loaded.
+Lines lines_of_unloaded_note(const Lines &loading = {});
 // Of a gatherer that was not running.
 Lines lines_of_gatherer(const std::string &args, const Lines &query, const Lines &trigger);
 
-inline const Lines kSaved{"save_XmlFile| leave..."};
-Lines lines_of_report(int progress, const std::string &description, const Lines &save = kSaved);
+inline const Lines kTriggered = logged(told());
+
+Lines lines_of_report(int progress, const std::string &description, const Lines &saving = saved());
 Lines lines_of_unloaded_report(int progress, const std::string &description,
-                               const Lines &failure = {});
+                               const Lines &loading = {});
 
 Lines lines_of_read_back(std::size_t size);
 
@@ -65,29 +63,7 @@ Lines log_of_report(int progress, const std::string &description);
 // A host beside the test's own process.
 using OtherHost = support::Process;
 
-// A limit of this process while this lives.
-class Limit
-{
-  public:
-    Limit(int resource, rlim_t value) : resource_(resource)
-    {
-        getrlimit(resource_, &before_);
-        const rlimit tight{value, before_.rlim_max};
-        EXPECT_EQ(setrlimit(resource_, &tight), 0);
-    }
-    ~Limit()
-    {
-        setrlimit(resource_, &before_);
-    }
-    Limit(const Limit &) = delete;
-    Limit &operator=(const Limit &) = delete;
-
-  private:
-    int resource_;
-    rlimit before_{};
-};
-
-bool is_in_place();
+using support::Limit;
 
 // Mounts of this process alone. It needs no privilege for them, only a user
 // namespace of its own.

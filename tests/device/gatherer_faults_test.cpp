@@ -67,7 +67,7 @@ class FailingGatherer : public DeviceTest
     static Lines trigger_lines()
     {
         const Lines lines = log_lines();
-        const auto row = std::find_if(lines.begin(), lines.end(), [](const std::string &line) {
+        const auto row = std::ranges::find_if(lines, [](const std::string &line) {
             return line.starts_with("SingleItemExecute| \nrow=");
         });
         EXPECT_NE(row, lines.end());
@@ -149,7 +149,7 @@ TEST_F(FailingGatherer, ThatNeverConnectsHoldsTheHostUntilItIsEnded)
 
 TEST_F(FailingGatherer, FindsThePortHeldByAListenerWhoseAcceptHasFailed)
 {
-    load();
+    load_plan();
     {
         const Socket next(dup(STDIN_FILENO));
         const Limit limited(RLIMIT_NOFILE, static_cast<rlim_t>(next.get()) + 2);

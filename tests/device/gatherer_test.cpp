@@ -3,10 +3,8 @@
 
 // The gatherer: started in the background only if none runs, and told to gather
 // over one real connection for each command.
-#include "device_test.h"
 #include "network.h"
 
-#include <algorithm>
 #include <chrono>
 #include <csignal>
 #include <string>
@@ -21,7 +19,7 @@ class Gatherer : public DeviceTest
   protected:
     static void store_plan(const std::string &args = "--group G")
     {
-        store(plan_of({{"G", {{"SensorProbe", args}, {"Note", "x"}}}}));
+        store(group_of({{"SensorProbe", args}, {"Note", "x"}}));
     }
 
     // Runs the command in its own thread while a client of ours is triggered.
@@ -59,8 +57,7 @@ TEST_F(Gatherer, SecondCommandStartsNoOtherAndLogsNoLeaveLine)
     const auto second = processes_named(kProbe);
     ASSERT_EQ(first.size(), 1U);
     // a report may be made by a child of the same name at this moment
-    EXPECT_TRUE(std::any_of(second.begin(), second.end(),
-                            [&](const Process &process) { return process.pid == first[0].pid; }));
+    EXPECT_THAT(second, ::testing::Contains(::testing::Field(&Process::pid, first[0].pid)));
     for (const Process &process : second) {
         EXPECT_TRUE(process.pid == first[0].pid || process.parent == first[0].pid);
     }
@@ -196,16 +193,9 @@ TEST_F(Gatherer, StartedInTheBackgroundItStaysUnreapedWhenItEnds)
     ASSERT_EQ(running.size(), 1U);
 
     kill(running[0].pid, SIGKILL);
-    const auto is_zombie = [](const Process &process) {
-        return process.parent == getpid() && process.state == 'Z';
-    };
-    EXPECT_TRUE(eventually([&] {
-        const auto all = processes();
-        return std::any_of(all.begin(), all.end(), is_zombie);
-    }));
+    EXPECT_TRUE(eventually([] { return zombies() > 0; }));
     run_path("P"); // nothing later reaps it
-    const auto all = processes();
-    EXPECT_EQ(std::count_if(all.begin(), all.end(), is_zombie), 1);
+    EXPECT_EQ(zombies(), 1U);
 }
 
 TEST_F(Gatherer, LauncherPutsTheHostsSignalMaskBackAndTheChildIgnoresNone)

@@ -45,7 +45,7 @@ TEST_F(Host, FirstPingOfTheProcessIsAnsweredAndNoOther)
 TEST_F(Host, SeesTheCachedPlanThroughTheExportedVariable)
 {
     EXPECT_EQ(g_TestCmdTree, nullptr);
-    store(plan_of({{"G", {{"Note", ""}}}}));
+    store(group_of({{"Note", ""}}));
     EXPECT_EQ(g_TestCmdTree, nullptr);
     run_path("P/G");
     ASSERT_NE(g_TestCmdTree, nullptr);

@@ -25,7 +25,7 @@ class Overlap : public DeviceTest, public ::testing::WithParamInterface<int>
     void SetUp() override
     {
         DeviceTest::SetUp();
-        store(plan_of({{"G", {{"Note", "--sleep 60"}}}}));
+        store(group_of({{"Note", "--sleep 60"}}));
         // the shell's word on process 9, at every stop
         const int words = open("/tmp/words", O_WRONLY | O_CREAT | O_TRUNC | O_CLOEXEC, 0600);
         ASSERT_GE(dup2(words, STDERR_FILENO), 0);

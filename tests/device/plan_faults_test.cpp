@@ -8,7 +8,6 @@
 #include "faults.h"
 
 #include <array>
-#include <cerrno>
 #include <csignal>
 #include <cstddef>
 #include <cstdlib>
@@ -18,7 +17,6 @@
 #include <string>
 #include <sys/mount.h>
 #include <sys/resource.h>
-#include <sys/statvfs.h>
 #include <sys/time.h>
 #include <sys/types.h>
 #include <unistd.h>
@@ -42,73 +40,51 @@ class FullDisk : public DeviceTest
             GTEST_SKIP() << "in place, the disk is the container's own and is not to be filled";
         }
         DeviceTest::SetUp();
-        struct statvfs disk {
-        };
-        ASSERT_EQ(statvfs(kDataDirectory, &disk), 0);
-        ASSERT_LE(disk.f_blocks * disk.f_frsize, 64U << 20) << "too much to be filled";
-        EXPECT_EQ(disk.f_frsize, kBlock);
     }
-
-    static constexpr std::size_t kBlock = 4096;
-
-    static void fill()
-    {
-        const Descriptor filler(open(kFiller, O_WRONLY | O_CREAT | O_CLOEXEC, 0600));
-        const std::string block(kBlock, 'f');
-        while (write(filler.get(), block.data(), block.size()) > 0) {
-        }
-        EXPECT_EQ(errno, ENOSPC);
-    }
-    static void make_room()
-    {
-        EXPECT_EQ(unlink(kFiller), 0);
-    }
-
-  private:
-    static constexpr char kFiller[] = "/data/vorlane/filler";
 };
 
 TEST_F(FullDisk, StoredPlanIsLostAndTheNextOneWorks)
 {
     store("<P/>"); // stays open, and so keeps its block when it is removed
-    load();
-    fill();
-    EXPECT_EQ(log_of_store(kPlan), lines_of_store(kPlan, kNotWritten));
+    load_plan();
+    fill_disk();
+    EXPECT_EQ(log_of_store(kPlan), lines_of_store(kPlan, {kNotWritten}));
     EXPECT_EQ(g_TestCmdTree, nullptr);
     EXPECT_EQ(fs::file_size(kPlanFile), 0U);
 
     EXPECT_EQ(read_back(), "");
     EXPECT_EQ(log_lines(), lines_of_read_back(0));
-    EXPECT_EQ(log_of_note(), lines_of_unloaded("Note"));
+    EXPECT_EQ(log_of_note(), lines_of_unloaded_note());
     EXPECT_EQ(log_of_report(1, "d"), lines_of_unloaded_report(1, "d"));
     EXPECT_EQ(fs::file_size(kPlanFile), 0U);
 
-    make_room();
+    fs::remove(kFiller);
     EXPECT_EQ(log_of_store(kPlan), lines_of_store(kPlan));
     EXPECT_EQ(read_file(kPlanFile), kPlan);
     EXPECT_EQ(log_of_note(), lines_of_note());
     EXPECT_THAT(ran(), ElementsAre("/system/bin/Note|x"));
     EXPECT_EQ(log_of_report(2, "d"), lines_of_report(2, "d"));
-    EXPECT_EQ(read_back(), saved(2, "d"));
+    EXPECT_EQ(read_back(), saved_plan(2, "d"));
 }
 
 TEST_F(FullDisk, ReportIsCutAtTheDisksEndAndTheNextOneSavesAllOfIt)
 {
+    const std::size_t block = 4096; // what the disk gives at a time
     const std::string description(10000, 'd');
     store(kPlan);
-    load();
-    fill();
+    load_plan();
+    fill_disk();
     EXPECT_EQ(log_of_report(1, description), lines_of_report(1, description));
     // the block that the plan had before
-    EXPECT_EQ(read_file(kPlanFile), saved(1, description).substr(0, kBlock));
-    EXPECT_EQ(read_back(), saved(1, description).substr(0, kBlock));
-    EXPECT_EQ(log_lines(), lines_of_read_back(kBlock));
+    EXPECT_EQ(read_file(kPlanFile), saved_plan(1, description).substr(0, block));
+    EXPECT_EQ(read_back(), saved_plan(1, description).substr(0, block));
+    EXPECT_EQ(log_lines(), lines_of_read_back(block));
     // from the copy in memory, which is whole
     EXPECT_EQ(log_of_note(), lines_of_note());
 
-    make_room();
+    fs::remove(kFiller);
     EXPECT_EQ(log_of_report(2, description), lines_of_report(2, description));
-    EXPECT_EQ(read_back(), saved(2, description));
+    EXPECT_EQ(read_back(), saved_plan(2, description));
 }
 
 // --- a read-only disk --------------------------------------------------------
@@ -118,11 +94,11 @@ using ReadOnlyDisk = PrivateMounts;
 TEST_F(ReadOnlyDisk, StoreLeavesTheOldPlanInUse)
 {
     store(kPlan);
-    load();
+    load_plan();
     const mxml_node_t *cached = g_TestCmdTree;
     mount_over(kDataDirectory, kDataDirectory);
     remount(kDataDirectory, MS_RDONLY);
-    EXPECT_EQ(log_of_store("<P/>"), lines_of_store("<P/>", kNotOpened));
+    EXPECT_EQ(log_of_store("<P/>"), lines_of_store("<P/>", {kNotOpened}));
     EXPECT_EQ(g_TestCmdTree, cached);
     EXPECT_EQ(read_file(kPlanFile), kPlan);
     EXPECT_EQ(read_back(), kPlan);
@@ -138,11 +114,11 @@ TEST_F(ReadOnlyDisk, StoreLeavesTheOldPlanInUse)
 TEST_F(ReadOnlyDisk, ReportStaysInMemoryUntilOneCanBeSaved)
 {
     store(kPlan);
-    load();
+    load_plan();
     mount_over(kDataDirectory, kDataDirectory);
     remount(kDataDirectory, MS_RDONLY);
     EXPECT_EQ(log_of_report(1, "d"),
-              lines_of_report(1, "d", {open_failure("save_XmlFile", "30),Read-only file system")}));
+              lines_of_report(1, "d", not_saved("-1", "(30),Read-only file system")));
     EXPECT_EQ(read_file(kPlanFile), kPlan);
 
     remount(kDataDirectory, 0);
@@ -188,12 +164,12 @@ TEST_F(DirectoryInThePlansPlace, IsRemovedByAStoreWhileItIsEmpty)
 TEST_F(DirectoryInThePlansPlace, WithSomethingInItKeepsAStoreOut)
 {
     store(kPlan);
-    load();
+    load_plan();
     const mxml_node_t *cached = g_TestCmdTree;
     put_directory();
     write_file(std::string(kPlanFile) + "/kept", "text");
     const auto open = descriptors();
-    EXPECT_EQ(log_of_store("<P/>"), lines_of_store("<P/>", kNotOpened));
+    EXPECT_EQ(log_of_store("<P/>"), lines_of_store("<P/>", {kNotOpened}));
     EXPECT_EQ(read_file(std::string(kPlanFile) + "/kept"), "text");
     EXPECT_EQ(descriptors(), open);
     EXPECT_EQ(g_TestCmdTree, cached);
@@ -208,7 +184,7 @@ TEST_F(DirectoryInThePlansPlace, IsOpenedButNotLoaded)
 {
     put_directory();
     const auto open = descriptors();
-    EXPECT_EQ(log_of_note(), lines_of_unloaded("Note"));
+    EXPECT_EQ(log_of_note(), lines_of_unloaded_note());
     EXPECT_EQ(log_of_report(1, "d"), lines_of_unloaded_report(1, "d"));
     EXPECT_EQ(descriptors(), open);
     EXPECT_TRUE(fs::is_directory(kPlanFile));
@@ -221,15 +197,15 @@ TEST_F(DirectoryInThePlansPlace, IsOpenedButNotLoaded)
 TEST_F(DirectoryInThePlansPlace, KeepsAReportInMemory)
 {
     store(kPlan);
-    load();
+    load_plan();
     put_directory();
     EXPECT_EQ(log_of_report(1, "d"),
-              lines_of_report(1, "d", {open_failure("save_XmlFile", "21),Is a directory")}));
+              lines_of_report(1, "d", not_saved("-1", "(21),Is a directory")));
     EXPECT_TRUE(fs::is_directory(kPlanFile));
 
     fs::remove(kPlanFile);
     EXPECT_EQ(log_of_report(2, "e"), lines_of_report(2, "e"));
-    EXPECT_EQ(read_file(kPlanFile), saved(2, "e"));
+    EXPECT_EQ(read_file(kPlanFile), saved_plan(2, "e"));
 }
 
 long count_in(pid_t process, const std::string &key)
@@ -326,14 +302,14 @@ class FileSizeLimit : public DeviceTest, public ::testing::WithParamInterface<bo
 TEST_P(FileSizeLimit, CutsAStoredPlanWithoutASignal)
 {
     EXPECT_EQ(run_limited(kLimit, [] { store(kPlan); }), 0);
-    EXPECT_EQ(lines(), lines_of_store(kPlan, kNotWritten));
+    EXPECT_EQ(lines(), lines_of_store(kPlan, {kNotWritten}));
     ASSERT_GT(kPlan.size(), kLimit);
     EXPECT_EQ(read_file(kPlanFile), kPlan.substr(0, kLimit));
 }
 
 TEST_P(FileSizeLimit, OfNothingKeepsAStoredPlanOut)
 {
-    expect_end(run_limited(0, [] { store(kPlan); }), lines_of_store(kPlan, kNotWritten), 2);
+    expect_end(run_limited(0, [] { store(kPlan); }), lines_of_store(kPlan, {kNotWritten}), 2);
     EXPECT_EQ(fs::file_size(kPlanFile), 0U);
 }
 
@@ -341,7 +317,7 @@ TEST_P(FileSizeLimit, CutsASavedPlan)
 {
     write_file(kPlanFile, kPlan);
     expect_end(run_limited(kLimit, [] { report(1, "d"); }), lines_of_report(1, "d"), 3);
-    EXPECT_EQ(read_file(kPlanFile), saved(1, "d").substr(0, kLimit));
+    EXPECT_EQ(read_file(kPlanFile), saved_plan(1, "d").substr(0, kLimit));
 }
 
 INSTANTIATE_TEST_SUITE_P(Signal, FileSizeLimit, ::testing::Bool(),

@@ -2,7 +2,7 @@
 // SPDX-License-Identifier: Apache-2.0
 
 // Reports and the stored plan, between real processes.
-#include "device_test.h"
+#include "faults.h"
 
 #include <csignal>
 #include <cstdlib>
@@ -54,7 +54,7 @@ TEST_F(Report, ReportedPlanIsSavedByteForByte)
 
 TEST_F(Report, ProcessWithAStaleCopyWritesOverWhatOthersHaveSaved)
 {
-    store(plan_of({{"G", {{"a", ""}, {"b", ""}}}}));
+    store(group_of({{"a", ""}, {"b", ""}}));
     FPTEST_SetTransation("G", "a", 1, 0, "here"); // loads this process's copy
     report_elsewhere("G b 50 1 elsewhere");
     EXPECT_THAT(read_back(), HasSubstr("elsewhere"));
@@ -66,7 +66,7 @@ TEST_F(Report, ProcessWithAStaleCopyWritesOverWhatOthersHaveSaved)
 
 TEST_F(Report, OtherResultCodeLeavesAPlanThatIsNotLoadedAgain)
 {
-    store(plan_of({{"G", {{"a", ""}}}}));
+    store(group_of({{"a", ""}}));
     FPTEST_SetTransation("G", "a", 100, 2, "");
     EXPECT_THAT(read_back(), HasSubstr(" result "));
 
@@ -80,28 +80,18 @@ TEST_F(Report, WithoutAStoredPlanNothingIsWritten)
 {
     EXPECT_EQ(FPTEST_SetTransation("G", "a", 1, 0, "x"), 0);
     EXPECT_NE(access(kPlanFile, F_OK), 0);
-    EXPECT_THAT(log_lines(),
-                ElementsAre("FPTEST_SetTransation| enter...",
-                            "FPTEST_SetTransation| input node name = a", "get_node_index| enter...",
-                            "load_configs_file| Open /data/vorlane/src1.xml file failed(2),No such "
-                            "file or directory",
-                            "get_node_index| get_node_index[]:load config file failed",
-                            "FPTEST_SetTransation| iResult = 0",
-                            "FPTEST_SetTransation| index=-1 - iResult=0 - iProgress=1 - iDesc=x",
-                            "updateSrcXmlFile| enter... !",
-                            "load_configs_file| Open /data/vorlane/src1.xml file failed(2),No such "
-                            "file or directory",
-                            "updateSrcXmlFile| updateSrcXmlFile[]:load config file failed",
-                            "FPTEST_SetTransation| leave..."));
+    EXPECT_EQ(log_lines(),
+              logged(report_begun("a", failed_load(), kNoPlan) + report_told(-1, 1, 0, "x") +
+                     failed_load() + not_updated(kNoPlan)));
 }
 
 TEST_F(Report, PlanChangedOnDiskIsNotSeenWhileOneIsCached)
 {
-    store(plan_of({{"G", {{"Note", "stored"}}}}));
+    store(group_of({{"Note", "stored"}}));
     run_path("P/G");
-    write_file(kPlanFile, plan_of({{"G", {{"Note", "changed"}}}}));
+    write_file(kPlanFile, group_of({{"Note", "changed"}}));
     run_path("P/G");
-    store(plan_of({{"G", {{"Note", "stored again"}}}}));
+    store(group_of({{"Note", "stored again"}}));
     run_path("P/G");
 
     EXPECT_THAT(ran(), ElementsAre("/system/bin/Note|stored", "/system/bin/Note|stored",
@@ -123,15 +113,7 @@ TEST_F(Report, ReadBackOfALongPlanIsCutAtTheBuffer)
     FPTEST_ExtractResultMsg(buffer.data(), 120);
 
     EXPECT_EQ(buffer, std::string(100, 'a') + std::string(20, 'b') + std::string(80, 'x'));
-    EXPECT_THAT(log_lines(), ElementsAre("FPTEST_ExtractResultMsg| enter... !",
-                                         "FPTEST_ExtractResultMsg| offset = 0",
-                                         "FPTEST_ExtractResultMsg| offset = 150",
-                                         "FPTEST_ExtractResultMsg| offset = 0",
-                                         "FPTEST_ExtractResultMsg| read file unfinish, continue... "
-                                         "n = 120 ",
-                                         "FPTEST_ExtractResultMsg| reach the end of file",
-                                         "FPTEST_ExtractResultMsg| read byte count = 120",
-                                         "FPTEST_ExtractResultMsg| leave..."));
+    EXPECT_EQ(log_lines(), logged(opened_to_read(150) + read_piece(120, 120) + read_end(0, 120)));
 }
 
 TEST_F(Report, ReadBackIntoANegativeRoomEndsTheProcess)

@@ -29,16 +29,6 @@ namespace fs = std::filesystem;
 namespace
 {
 
-// Whether all end but for one that goes on running.
-bool children_end(pid_t running = -1)
-{
-    return eventually([=] {
-        return std::ranges::none_of(processes(), [=](const Process &process) {
-            return process.parent == getpid() && process.pid != running && process.state != 'Z';
-        });
-    });
-}
-
 // --- a missing shell ---------------------------------------------------------
 
 class MissingShell : public PrivateMounts
@@ -93,7 +83,7 @@ TEST_F(MissingShell, InBinLetsNoItemRun)
 {
     hide_the_libcs();
     store(kPlan);
-    load();
+    load_plan();
     EXPECT_EQ(log_of_note(), lines_of_note(kNotAsked));
     EXPECT_THAT(ran(), IsEmpty());
 
@@ -106,8 +96,8 @@ TEST_F(MissingShell, InBinLetsNoItemRun)
 TEST_F(MissingShell, InBinLetsTheGathererRun)
 {
     hide_the_libcs();
-    store(plan_of({{"G", {{"SensorProbe", "--group G"}}}}));
-    load();
+    store(group_of({{"SensorProbe", "--group G"}}));
+    load_plan();
     run_path("P/G/SensorProbe");
     EXPECT_EQ(log_lines(), lines_of_gatherer("--group G", kNotAsked, kTriggered));
     EXPECT_EQ(processes_named(kProbe).size(), 1U);
@@ -117,7 +107,7 @@ TEST_F(MissingShell, OfTheLauncherStartsNoGatherer)
 {
     hide_the_launchers();
     store(kPlan);
-    load();
+    load_plan();
     // has the libc's
     EXPECT_EQ(log_of_note(), lines_of_note());
     EXPECT_THAT(ran(), ElementsAre("/system/bin/Note|x"));
@@ -126,14 +116,14 @@ TEST_F(MissingShell, OfTheLauncherStartsNoGatherer)
     EXPECT_TRUE(eventually([] { return !listeners().empty(); }));
     EXPECT_EQ(receive(connect_to(kTriggerPort)), "gather again!");
     command.join();
-    EXPECT_EQ(log_lines(), lines_of_gatherer("--help", kNotFound, kTriggered));
+    EXPECT_EQ(log_lines(), lines_of_gatherer("--help", queried(), kTriggered));
     EXPECT_THAT(exit_codes(), ::testing::AnyOf(Codes(), Codes({127})));
 }
 
 TEST_F(MissingShell, OfTheLauncherStopsNoItem)
 {
     store(kPlan);
-    load();
+    load_plan();
     run_path("P/G/Note");
     const pid_t running = start_program({"/system/bin/Note", "--sleep", "60"});
     hide_the_launchers();
@@ -149,6 +139,8 @@ TEST_F(MissingShell, OfTheLauncherStopsNoItem)
 }
 
 // --- a limit on descriptors --------------------------------------------------
+
+constexpr char kTooManyFiles[] = "(24),Too many open files";
 
 class DescriptorLimit : public DeviceTest, public ::testing::WithParamInterface<rlim_t>
 {
@@ -178,31 +170,26 @@ class DescriptorLimit : public DeviceTest, public ::testing::WithParamInterface<
 
     static void expect_item(bool loaded)
     {
-        const Lines expected =
-            loaded ? lines_of_note(room() >= 2 ? kNotFound : kNotAsked)
-                   : lines_of_unloaded("Note", {open_failure("load_configs_file", kTooManyFiles)});
+        const Lines expected = loaded ? lines_of_note(room() >= 2 ? queried() : kNotAsked)
+                                      : lines_of_unloaded_note(failed_load("-1", kTooManyFiles));
         EXPECT_EQ(lines_under_limit(0, [] { run_path("P/G/Note"); }), expected);
     }
     static void expect_report(bool loaded)
     {
         const bool is_saved = room() > 0;
-        const Lines failure{
-            open_failure(loaded ? "save_XmlFile" : "load_configs_file", kTooManyFiles)};
         EXPECT_EQ(lines_under_limit(0, [] { report(1, "d"); }),
-                  loaded ? lines_of_report(1, "d", is_saved ? kSaved : failure)
-                         : lines_of_unloaded_report(1, "d", failure));
-        EXPECT_EQ(read_file(kPlanFile), is_saved ? saved(1, "d") : kPlan);
+                  loaded
+                      ? lines_of_report(1, "d", is_saved ? saved() : not_saved("-1", kTooManyFiles))
+                      : lines_of_unloaded_report(1, "d", failed_load("-1", kTooManyFiles)));
+        EXPECT_EQ(read_file(kPlanFile), is_saved ? saved_plan(1, "d") : kPlan);
     }
     static void expect_read_back()
     {
         const bool is_read = room() > 0;
         const std::string plan = read_file(kPlanFile);
         std::string text;
-        EXPECT_EQ(
-            lines_under_limit(0, [&] { text = read_back(); }),
-            is_read ? lines_of_read_back(plan.size())
-                    : Lines({"FPTEST_ExtractResultMsg| enter... !",
-                             "FPTEST_ExtractResultMsg| Open /data/vorlane/src1.xml file failed!"}));
+        EXPECT_EQ(lines_under_limit(0, [&] { text = read_back(); }),
+                  is_read ? lines_of_read_back(plan.size()) : logged(not_opened_to_read("-1")));
         EXPECT_EQ(text, is_read ? plan : "");
     }
     static void expect_suspension()
@@ -217,18 +204,14 @@ class DescriptorLimit : public DeviceTest, public ::testing::WithParamInterface<
     static void expect_gatherer()
     {
         const std::size_t room_before = room();
-        const Lines no_socket{"VRSOCK: setsockopt failed(9),Bad file descriptor",
-                              "VRSOCK: bind failed(9),Bad file descriptor",
-                              "Sock_Init1| listen error",
-                              "Sock_Init1| errno=9",
-                              "Sock_Init1| accept error!",
-                              "Sock_Init1| errno=9"};
-        const Lines no_connection{"Sock_Init1| accept error!", "Sock_Init1| errno=24"};
+        const Lines no_socket = Lines{"VRSOCK: setsockopt failed(9),Bad file descriptor",
+                                      "VRSOCK: bind failed(9),Bad file descriptor"} +
+                                logged(listen_failed(EBADF) + accept_failed(EBADF));
         // the connection stays open, or else the listening socket
         EXPECT_EQ(lines_under_limit(room_before > 0 ? 1 : 0, [] { run_path("P/G/SensorProbe"); }),
-                  lines_of_gatherer("--help", room_before >= 2 ? kNotFound : kNotAsked,
+                  lines_of_gatherer("--help", room_before >= 2 ? queried() : kNotAsked,
                                     room_before == 0   ? no_socket
-                                    : room_before == 1 ? no_connection
+                                    : room_before == 1 ? logged(accept_failed(EMFILE))
                                                        : kTriggered));
         EXPECT_TRUE(children_end()) << "the gatherer does not end";
     }
@@ -236,7 +219,7 @@ class DescriptorLimit : public DeviceTest, public ::testing::WithParamInterface<
     {
         const bool is_stored = room() > 0; // and the plan stays open
         EXPECT_EQ(lines_under_limit(is_stored ? 1 : 0, [] { store(kPlan); }),
-                  lines_of_store(kPlan, is_stored ? Lines{} : kNotOpened));
+                  lines_of_store(kPlan, is_stored ? Lines{} : Lines{kNotOpened}));
         EXPECT_EQ(fs::exists(kPlanFile), is_stored) << "removed before it is opened";
         EXPECT_EQ(g_TestCmdTree == nullptr, is_stored);
     }
@@ -246,7 +229,7 @@ class DescriptorLimit : public DeviceTest, public ::testing::WithParamInterface<
         close_range(STDERR_FILENO + 1, ~0U, 0);
         FPTEST_RunTestCmd("unknown", nullptr, 0); // the log opens its file
         if (loaded) {
-            load();
+            load_plan();
         }
         const bool loads = loaded || room() > 0;
         expect_report(loads);
@@ -294,8 +277,8 @@ class HostsSignals : public DeviceTest
     void SetUp() override
     {
         DeviceTest::SetUp();
-        store(plan_of({{"G", {{"Note", "--sleep 0.3"}, {"SensorProbe", "--group G"}}}}));
-        load();
+        store(group_of({{"Note", "--sleep 0.3"}, {"SensorProbe", "--group G"}}));
+        load_plan();
     }
 
     // Once the gatherer has gathered; its report is a child of the same name.
@@ -314,13 +297,13 @@ class HostsSignals : public DeviceTest
         const auto start = std::chrono::steady_clock::now();
         run_path("P/G/Note");
         EXPECT_GE(std::chrono::steady_clock::now() - start, std::chrono::milliseconds(300));
-        EXPECT_EQ(log_lines(), lines_of_note(kNotFound, "--sleep 0.3"));
+        EXPECT_EQ(log_lines(), lines_of_note(queried(), "--sleep 0.3"));
         EXPECT_THAT(ran(), ElementsAre("/system/bin/Note|--sleep|0.3"));
     }
     static void run_gatherer()
     {
         run_path("P/G/SensorProbe");
-        EXPECT_EQ(log_lines(), lines_of_gatherer("--group G", kNotFound, kTriggered));
+        EXPECT_EQ(log_lines(), lines_of_gatherer("--group G", queried(), kTriggered));
     }
     static void stop_gatherer()
     {

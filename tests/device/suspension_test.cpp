@@ -4,7 +4,6 @@
 // Stopping the item last started, with the real ps and the real kill.
 #include "device_test.h"
 
-#include <algorithm>
 #include <chrono>
 #include <csignal>
 #include <filesystem>
@@ -35,7 +34,7 @@ class Suspension : public DeviceTest
 
 TEST_F(Suspension, RunningItemIsStoppedAndItsCommandReturns)
 {
-    store(plan_of({{"G", {{"Note", "--sleep 60"}}}}));
+    store(group_of({{"Note", "--sleep 60"}}));
     pid_t pid = 0;
     const double seconds = stop_while_running("P/G/Note", [&] {
         EXPECT_TRUE(eventually([] { return !processes_named("/system/bin/Note").empty(); }));
@@ -52,7 +51,7 @@ TEST_F(Suspension, RunningItemIsStoppedAndItsCommandReturns)
 
 TEST_F(Suspension, StoppedItemIsFollowedByTheNextOfItsGroup)
 {
-    store(plan_of({{"G", {{"Note", "--sleep 60"}, {"ab", "next"}}}}));
+    store(group_of({{"Note", "--sleep 60"}, {"ab", "next"}}));
     stop_while_running("P/G", [] {
         EXPECT_TRUE(eventually([] { return !ran().empty(); }));
         EXPECT_EQ(FPTEST_SuspendItemExecute(), 0);
@@ -63,7 +62,7 @@ TEST_F(Suspension, StoppedItemIsFollowedByTheNextOfItsGroup)
 TEST_F(Suspension, ItemIsFoundUnderItsVendorsName)
 {
     set_vendor("1");
-    store(plan_of({{"G", {{"Note", "--sleep 60"}}}}));
+    store(group_of({{"Note", "--sleep 60"}}));
     stop_while_running("P/G/Note", [] {
         EXPECT_TRUE(eventually([] { return !processes_named("/system/bin/Note_ca").empty(); }));
         EXPECT_EQ(FPTEST_SuspendItemExecute(), 0);
@@ -73,7 +72,7 @@ TEST_F(Suspension, ItemIsFoundUnderItsVendorsName)
 
 TEST_F(Suspension, GathererIsStoppedAfterItsCommandHasReturned)
 {
-    store(plan_of({{"G", {{"SensorProbe", "--group G"}}}}));
+    store(group_of({{"SensorProbe", "--group G"}}));
     run_path("P/G/SensorProbe");
     ASSERT_THAT(processes_named("/system/bin/SensorProbe"), ::testing::SizeIs(1));
     // its report is a child of the same name: let that be over
@@ -89,7 +88,7 @@ TEST_F(Suspension, NameIsCutTo28CharactersForTheListing)
     // only the longer one runs: the cut name of the other finds it
     const std::string program = std::string("/system/bin/") + kLonger;
     const pid_t pid = start_program({program, "--sleep", "60"});
-    store(plan_of({{"G", {{kLong, ""}}}}));
+    store(group_of({{kLong, ""}}));
     run_path("P/G");
     log_lines();
 
@@ -97,29 +96,24 @@ TEST_F(Suspension, NameIsCutTo28CharactersForTheListing)
     EXPECT_THAT(log_lines(),
                 ElementsAre("FPTEST_SuspendItemExecute| enter... !",
                             "FPTEST_SuspendItemExecute| pid = " + std::to_string(pid)));
-    int status = 0;
-    ASSERT_EQ(waitpid(pid, &status, 0), pid);
-    EXPECT_TRUE(WIFSIGNALED(status));
-    EXPECT_EQ(WTERMSIG(status), SIGTERM);
+    EXPECT_EQ(signal_that_ends(pid), SIGTERM);
 }
 
 TEST_F(Suspension, OnlyTheFirstListedOfTwoIsStopped)
 {
     const pid_t first = start_program({"/system/bin/ab", "--sleep", "60"});
     const pid_t second = start_program({"/system/bin/ab", "--sleep", "60"});
-    store(plan_of({{"G", {{"ab", ""}}}}));
+    store(group_of({{"ab", ""}}));
     run_path("P/G");
 
     EXPECT_EQ(FPTEST_SuspendItemExecute(), 0);
-    int status = 0;
-    ASSERT_EQ(waitpid(first, &status, 0), first);
-    EXPECT_EQ(WTERMSIG(status), SIGTERM);
-    EXPECT_EQ(waitpid(second, &status, WNOHANG), 0);
+    EXPECT_EQ(signal_that_ends(first), SIGTERM);
+    EXPECT_EQ(waitpid(second, nullptr, WNOHANG), 0);
 }
 
 TEST_F(Suspension, ItemThatHasEndedIsNotFound)
 {
-    store(plan_of({{"G", {{"Note", ""}}}}));
+    store(group_of({{"Note", ""}}));
     run_path("P/G");
     log_lines();
 
@@ -135,12 +129,7 @@ TEST_F(Suspension, ListingThatIsMissingIsNotFoundEither)
     EXPECT_EQ(FPTEST_SuspendItemExecute(), -1);
     EXPECT_THAT(log_lines(), ElementsAre("FPTEST_SuspendItemExecute| enter... !",
                                          "FPTEST_SuspendItemExecute| target process not exist!"));
-    EXPECT_TRUE(eventually([] {
-        const auto all = processes();
-        return std::any_of(all.begin(), all.end(), [](const Process &process) {
-            return process.parent == getpid() && process.state == 'Z';
-        });
-    }));
+    EXPECT_TRUE(eventually([] { return zombies() > 0; }));
     EXPECT_THAT(::testing::internal::GetCapturedStderr(), HasSubstr("ps"));
 }
 
@@ -164,9 +153,7 @@ TEST_F(Suspension, BeforeAnyItemEveryProcessIsListedAndTheFirstIsStopped)
 
     EXPECT_EQ(FPTEST_SuspendItemExecute(), 0);
     EXPECT_EQ(read_file("/data/vorlane/asked"), "0\n");
-    int status = 0;
-    ASSERT_EQ(waitpid(victim, &status, 0), victim);
-    EXPECT_EQ(WTERMSIG(status), SIGTERM);
+    EXPECT_EQ(signal_that_ends(victim), SIGTERM);
 }
 
 TEST_F(Suspension, LineOfASingleWordStillRunsAKillCommand)
@@ -177,12 +164,7 @@ TEST_F(Suspension, LineOfASingleWordStillRunsAKillCommand)
         ::testing::internal::CaptureStderr();
         EXPECT_EQ(FPTEST_SuspendItemExecute(), 0);
         // the shell's complaint about "kill 9 (null)" tells that it was run
-        EXPECT_TRUE(eventually([] {
-            const auto all = processes();
-            return std::none_of(all.begin(), all.end(), [](const Process &process) {
-                return process.parent == getpid() && process.state != 'Z';
-            });
-        }));
+        EXPECT_TRUE(children_end());
         EXPECT_THAT(::testing::internal::GetCapturedStderr(), HasSubstr("syntax error"));
         EXPECT_THAT(log_lines(), ElementsAre("FPTEST_SuspendItemExecute| enter... !"));
     }
@@ -190,7 +172,7 @@ TEST_F(Suspension, LineOfASingleWordStillRunsAKillCommand)
 
 TEST_F(Suspension, EveryCallLeavesItsStreamAndItsChildren)
 {
-    store(plan_of({{"G", {{"Note", ""}}}}));
+    store(group_of({{"Note", ""}}));
     run_path("P/G");
     const auto before = descriptors().size();
     for (std::size_t call = 1; call <= 3; ++call) {
@@ -198,12 +180,7 @@ TEST_F(Suspension, EveryCallLeavesItsStreamAndItsChildren)
         EXPECT_EQ(descriptors().size(), before + call);
         EXPECT_TRUE(descriptors().back().second.starts_with("pipe:"));
     }
-    EXPECT_TRUE(eventually([] {
-        const auto all = processes();
-        return std::count_if(all.begin(), all.end(), [](const Process &process) {
-                   return process.parent == getpid() && process.state == 'Z';
-               }) == 3;
-    }));
+    EXPECT_TRUE(eventually([] { return zombies() == 3; }));
 }
 
 TEST_F(Suspension, StandardKillTakesTheNineForAProcess)
@@ -213,9 +190,7 @@ TEST_F(Suspension, StandardKillTakesTheNineForAProcess)
     EXPECT_NE(kill(9, 0), 0) << "process 9 must be nobody on the device";
     const pid_t victim = start_program({"/system/bin/ab", "--sleep", "60"});
     EXPECT_NE(std::system(("kill 9 " + std::to_string(victim) + " 2>/dev/null").c_str()), 0);
-    int status = 0;
-    ASSERT_EQ(waitpid(victim, &status, 0), victim);
-    EXPECT_EQ(WTERMSIG(status), SIGTERM) << "not 9: that would be SIGKILL";
+    EXPECT_EQ(signal_that_ends(victim), SIGTERM) << "not 9: that would be SIGKILL";
 }
 
 } // namespace

@@ -2,19 +2,18 @@
 // SPDX-License-Identifier: Apache-2.0
 
 // The platform's interfaces as they are implemented on Linux.
-#include "device_test.h"
+#include "network.h"
+#include "support/this_process.h"
 
 #include "sockwrap.h"
 #include "sysparm.h"
 #include "vr_log.h"
 
-#include <arpa/inet.h>
 #include <array>
 #include <cerrno>
 #include <csignal>
 #include <cstring>
 #include <fcntl.h>
-#include <netinet/in.h>
 #include <pthread.h>
 #include <sys/socket.h>
 #include <sys/wait.h>
@@ -133,13 +132,9 @@ TEST_F(Vorlane, LogKeepsErrnoAlsoWhenItFails)
 
 TEST_F(Vorlane, LogLeavesStandardDescriptorsFree)
 {
-    const int kept = dup(STDIN_FILENO);
-    close(STDIN_FILENO);
+    const support::FreedDescriptor freed(STDIN_FILENO);
     vr_log_printf(VR_LOG_DEBUG, "TAG", "text\n");
-    const int lowest = dup(kept);
-    EXPECT_EQ(lowest, STDIN_FILENO);
-    dup2(kept, STDIN_FILENO);
-    close(kept);
+    EXPECT_EQ(dup(STDERR_FILENO), STDIN_FILENO);
     EXPECT_EQ(read_file(kLogFile), "4/TAG: text\n");
 }
 
@@ -160,13 +155,11 @@ TEST_F(Vorlane, LogSplitsNoStrings)
 TEST_F(Vorlane, LogOfAHostWithoutStandardErrorIsNotWrittenIntoItsFiles)
 {
     unsetenv("VR_LOG_FILE");
-    const int kept = dup(STDERR_FILENO);
-    close(STDERR_FILENO);
-    store("<P/>"); // its file gets the free number and keeps it
-    vr_log_printf(VR_LOG_DEBUG, "TAG", "text\n");
-    dup2(kept, STDERR_FILENO);
-    close(kept);
-
+    {
+        const support::FreedDescriptor freed(STDERR_FILENO);
+        store("<P/>"); // its file gets the free number and keeps it
+        vr_log_printf(VR_LOG_DEBUG, "TAG", "text\n");
+    }
     EXPECT_EQ(read_file(kPlanFile), "<P/>");
 }
 
@@ -221,54 +214,42 @@ TEST_F(Vorlane, MissingOrBrokenParameterFileLeavesTheBuffer)
     EXPECT_NE(::testing::internal::GetCapturedStderr(), "");
 }
 
-sockaddr_in any_address(unsigned short port)
+Socket bound(unsigned short port)
 {
-    sockaddr_in address{};
-    address.sin_family = AF_INET;
-    address.sin_port = htons(port);
-    return address;
-}
-
-int listen_on(unsigned short port)
-{
-    const int listener = socket(AF_INET, SOCK_STREAM, 0);
-    const sockaddr_in address = any_address(port);
+    Socket listener(socket(AF_INET, SOCK_STREAM, 0));
+    const sockaddr_in address = loopback(port);
     const int on = 1;
-    Setsockopt(listener, &on);
-    Bind(listener, reinterpret_cast<const sockaddr *>(&address), sizeof address);
-    EXPECT_EQ(listen(listener, 5), 0);
+    Setsockopt(listener.get(), &on);
+    Bind(listener.get(), reinterpret_cast<const sockaddr *>(&address), sizeof address);
+    EXPECT_EQ(listen(listener.get(), 5), 0);
     return listener;
 }
 
-int connect_to(unsigned short port)
+Socket accept_at(int listener)
 {
-    const int client = socket(AF_INET, SOCK_STREAM, 0);
-    sockaddr_in address = any_address(port);
-    address.sin_addr.s_addr = htonl(INADDR_LOOPBACK);
-    EXPECT_EQ(connect(client, reinterpret_cast<sockaddr *>(&address), sizeof address), 0);
-    return client;
+    sockaddr_in peer{};
+    socklen_t length = sizeof peer;
+    Socket connection(Accept(listener, reinterpret_cast<sockaddr *>(&peer), &length));
+    if (connection.is_open()) {
+        EXPECT_EQ(ntohl(peer.sin_addr.s_addr), INADDR_LOOPBACK);
+    }
+    return connection;
 }
 
 TEST_F(Vorlane, PortIsBoundAgainWhileAnOldConnectionLingers)
 {
     for (int round = 0; round < 3; ++round) {
-        const int listener = listen_on(kTriggerPort);
-        const int client = connect_to(kTriggerPort);
-        sockaddr_in peer{};
-        socklen_t length = sizeof peer;
-        const int connection = Accept(listener, reinterpret_cast<sockaddr *>(&peer), &length);
-        ASSERT_GE(connection, 0);
-        EXPECT_EQ(ntohl(peer.sin_addr.s_addr), INADDR_LOOPBACK);
-        close(connection); // first: its end is the one that lingers
-        close(client);
-        close(listener);
+        const Socket listener = bound(kTriggerPort);
+        const Socket client = connect_to(kTriggerPort);
+        // closed first: its end is the one that lingers
+        EXPECT_TRUE(accept_at(listener.get()).is_open());
     }
     EXPECT_EQ(read_file(kLogFile), "");
 }
 
 TEST_F(Vorlane, SocketFailuresAreLoggedUnderTheirOwnTag)
 {
-    const sockaddr_in address = any_address(kTriggerPort);
+    const sockaddr_in address = loopback(kTriggerPort);
     const int on = 1;
     Setsockopt(-1, &on);
     Bind(-1, reinterpret_cast<const sockaddr *>(&address), sizeof address);
@@ -278,9 +259,7 @@ TEST_F(Vorlane, SocketFailuresAreLoggedUnderTheirOwnTag)
 
 TEST_F(Vorlane, AcceptSaysWhyItFailed)
 {
-    sockaddr_in peer{};
-    socklen_t length = sizeof peer;
-    EXPECT_LT(Accept(-1, reinterpret_cast<sockaddr *>(&peer), &length), 0);
+    EXPECT_FALSE(accept_at(-1).is_open());
     EXPECT_EQ(errno, EBADF);
 }
 
@@ -294,7 +273,7 @@ TEST_F(Vorlane, SignalDoesNotEndTheWaitForAConnection)
     };
     action.sa_handler = nothing; // without SA_RESTART
     sigaction(SIGUSR1, &action, nullptr);
-    const int listener = listen_on(kTriggerPort);
+    const Socket listener = bound(kTriggerPort);
     const pthread_t waiting = pthread_self();
     std::thread other([&] {
         for (int signals = 0; signals < 3; ++signals) {
@@ -302,11 +281,9 @@ TEST_F(Vorlane, SignalDoesNotEndTheWaitForAConnection)
             pthread_kill(waiting, SIGUSR1);
         }
         std::this_thread::sleep_for(std::chrono::milliseconds(50));
-        close(connect_to(kTriggerPort));
+        connect_to(kTriggerPort);
     });
-    sockaddr_in peer{};
-    socklen_t length = sizeof peer;
-    EXPECT_GE(Accept(listener, reinterpret_cast<sockaddr *>(&peer), &length), 0);
+    EXPECT_TRUE(accept_at(listener.get()).is_open());
     other.join();
 }
 

@@ -21,7 +21,6 @@
 #include "mini_xml.h"
 #include "reactions.h"
 
-#include "../unit/sequences.h"
 #include "../unit/unit_test.h"
 
 #include <algorithm>

@@ -7,8 +7,6 @@
 #include <cstring>
 #include <regex>
 
-#include "../unit/sequences.h"
-
 namespace faults
 {
 namespace

@@ -3,7 +3,7 @@
 
 // The run of one item: the vendor, the item's name, the presence of a gatherer,
 // and what is started how.
-#include "sequences.h"
+#include "unit_test.h"
 
 #include <algorithm>
 #include <cerrno>

@@ -2,7 +2,7 @@
 // SPDX-License-Identifier: Apache-2.0
 
 // The launcher: a shell command that nobody waits for.
-#include "sequences.h"
+#include "unit_test.h"
 
 #include <cerrno>
 

@@ -3,7 +3,7 @@
 
 // Node paths: their levels and components, and what is logged of their runs. Which
 // items they run: path_test.cpp.
-#include "sequences.h"
+#include "unit_test.h"
 
 #include <algorithm>
 #include <cerrno>

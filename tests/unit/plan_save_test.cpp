@@ -2,7 +2,7 @@
 // SPDX-License-Identifier: Apache-2.0
 
 // The test plan: its layout, and saving it.
-#include "sequences.h"
+#include "unit_test.h"
 
 #include <cerrno>
 #include <cstring>
@@ -310,7 +310,7 @@ TEST_F(PlanSave, SavingTakesDescriptorOneForASuccess)
     mxml_node_t *tree = load_plan(kLaidOut);
     write_plan("");
     {
-        const FreedOutput freed;
+        const support::FreedDescriptor freed(STDOUT_FILENO);
         internals::save_XmlFile(tree);
     }
     EXPECT_EQ(events(), saved());

@@ -2,7 +2,7 @@
 // SPDX-License-Identifier: Apache-2.0
 
 // The test plan: loading and lookups.
-#include "sequences.h"
+#include "unit_test.h"
 
 #include <cerrno>
 #include <climits>
@@ -94,7 +94,7 @@ TEST_F(PlanStore, LoadingTakesDescriptorOneForASuccess)
     write_plan(kLaidOut);
     const mxml_node_t *tree = nullptr;
     {
-        const FreedOutput freed;
+        const support::FreedDescriptor freed(STDOUT_FILENO);
         tree = internals::load_configs_file(kPath);
     }
     EXPECT_EQ(events(), load());

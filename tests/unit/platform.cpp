@@ -3,14 +3,15 @@
 
 #include "platform_state.h"
 
+#include "support/sequences.h"
+#include "support/temporary_directory.h"
+
 #include <gtest/gtest.h>
 
 #include <algorithm>
 #include <cstdio>
-#include <cstdlib>
 #include <filesystem>
-#include <fstream>
-#include <sstream>
+#include <memory>
 #include <unistd.h>
 
 namespace fs = std::filesystem;
@@ -22,46 +23,10 @@ namespace
 
 constexpr char kPlan[] = "/data/vorlane/src1.xml";
 
-// A directory that goes when the process ends.
-class Directory
+const support::TemporaryDirectory &directory()
 {
-  public:
-    Directory()
-    {
-        std::string name = fs::temp_directory_path() / "quillmark-unit-XXXXXX";
-        if (mkdtemp(name.data()) == nullptr) {
-            std::perror("mkdtemp");
-            std::abort();
-        }
-        path_ = name;
-    }
-    ~Directory()
-    {
-        std::error_code ignored;
-        fs::remove_all(path_, ignored);
-    }
-    Directory(const Directory &) = delete;
-    Directory &operator=(const Directory &) = delete;
-
-    [[nodiscard]] const fs::path &path() const
-    {
-        return path_;
-    }
-
-  private:
-    fs::path path_;
-};
-
-const Directory &directory()
-{
-    static const Directory made;
+    static const support::TemporaryDirectory made;
     return made;
-}
-
-// From the front: a call has a bracket after its name, a line on standard output a colon.
-bool is_log(const std::string &event)
-{
-    return event.find('|') < event.find_first_of("(: ");
 }
 
 } // namespace
@@ -81,7 +46,7 @@ void host_quit(int /*signal*/)
 
 std::string redirected(const std::string &path)
 {
-    return directory().path() / fs::path(path).filename();
+    return directory().path(fs::path(path).filename());
 }
 
 Step pass()
@@ -108,10 +73,6 @@ void reset()
     }
     for (const auto &[stream, name] : state().streams) {
         std::fclose(stream);
-    }
-    if (state().standard_input >= 0) {
-        dup2(state().standard_input, STDIN_FILENO);
-        ::close(state().standard_input);
     }
     for (const auto &entry : fs::directory_iterator(directory().path())) {
         fs::remove_all(entry.path());
@@ -175,8 +136,7 @@ void on_log(std::function<void(const std::string &)> hook)
 
 void free_descriptor_zero()
 {
-    state().standard_input = dup(STDIN_FILENO);
-    ::close(STDIN_FILENO);
+    state().freed = std::make_unique<support::FreedDescriptor>(STDIN_FILENO);
 }
 
 void run_child(const std::function<void()> &body)
@@ -194,14 +154,14 @@ std::vector<std::string> events()
 std::vector<std::string> log_lines()
 {
     auto taken = events();
-    std::erase_if(taken, [](const auto &event) { return !is_log(event); });
+    std::erase_if(taken, [](const auto &event) { return !sequences::is_log(event); });
     return taken;
 }
 
 std::vector<std::string> calls()
 {
     auto taken = events();
-    std::erase_if(taken, is_log);
+    std::erase_if(taken, sequences::is_log);
     return taken;
 }
 
@@ -230,17 +190,13 @@ bool plan_exists()
 
 std::string plan_text()
 {
-    std::ifstream file(plan_path(), std::ios::binary);
-    EXPECT_TRUE(file) << "no test plan file";
-    std::ostringstream text;
-    text << file.rdbuf();
-    return text.str();
+    EXPECT_TRUE(plan_exists());
+    return support::read_file(plan_path());
 }
 
 void write_plan(const std::string &text)
 {
-    std::ofstream file(plan_path(), std::ios::binary | std::ios::trunc);
-    file << text;
+    support::write_file(plan_path(), text);
 }
 
 } // namespace platform

@@ -6,12 +6,14 @@
 #pragma once
 
 #include "platform.h"
+#include "support/this_process.h"
 
 #include <csetjmp>
 #include <csignal>
 #include <cstdio>
 #include <deque>
 #include <map>
+#include <memory>
 #include <optional>
 
 namespace platform
@@ -30,7 +32,7 @@ struct State {
     int next_fake = kFirstFake;
     std::optional<std::string> vendor;
     int wait_status = 0;
-    int standard_input = -1; // kept here while descriptor 0 is free
+    std::unique_ptr<support::FreedDescriptor> freed;
     std::function<void(const std::string &)> system_hook;
     std::function<void(const std::string &)> log_hook;
     std::function<void(mxml_node_t *)> load_hook;

@@ -12,8 +12,6 @@
 #include <ostream>
 #include <unistd.h>
 
-using namespace platform;
-
 namespace
 {
 
@@ -45,45 +43,6 @@ class ReadBack : public LibraryTest
     {
         return text +
                std::string(static_cast<std::size_t>(capacity) + kAfter - text.size(), kGuard);
-    }
-
-    static std::string line(const std::string &text)
-    {
-        return "FPTEST_ExtractResultMsg| " + text;
-    }
-    // From the call to the last offset, for a file of that size.
-    static Lines begun(std::size_t size)
-    {
-        const std::string end = std::to_string(size);
-        return Lines{line("enter... !\n")} + "open(/data/vorlane/src1.xml, O_RDONLY) = plan#1" +
-               "lseek(plan#1, 0, SEEK_CUR) = 0" + line("offset = 0") +
-               ("lseek(plan#1, 0, SEEK_END) = " + end) + line("offset = " + end) +
-               "lseek(plan#1, 0, SEEK_SET) = 0" + line("offset = 0");
-    }
-    static Lines read_call(int asked, int result)
-    {
-        return {"read(plan#1, " + std::to_string(asked) + ") = " + std::to_string(result)};
-    }
-    static Lines piece(int asked, int got)
-    {
-        return read_call(asked, got) +
-               line("read file unfinish, continue... n = " + std::to_string(got) + " \n");
-    }
-    static Lines failure(int asked)
-    {
-        return read_call(asked, -1) + line("FPTEST_ExtractResultMsg[]:read file failed\n");
-    }
-    static Lines ended(int asked, int total)
-    {
-        return read_call(asked, 0) + line("reach the end of file\n") +
-               line("read byte count = " + std::to_string(total) + "\n") + "close(plan#1)" +
-               line("leave...\n");
-    }
-    static Lines not_opened(const std::string &descriptor)
-    {
-        return Lines{line("enter... !\n")} +
-               ("open(/data/vorlane/src1.xml, O_RDONLY) = " + descriptor) +
-               line("Open /data/vorlane/src1.xml file failed!\n");
     }
 };
 
@@ -131,15 +90,15 @@ TEST_P(ReadBackOf, FillsTheBufferPieceByPiece)
     const std::size_t kept = std::min(size, static_cast<std::size_t>(capacity));
     EXPECT_EQ(read_back(capacity), received(capacity, bytes(kept)));
 
-    Lines expected = begun(size);
+    Lines expected = opened_to_read(static_cast<int>(size));
     int room = capacity;
     for (const int result : results) {
-        for (const std::string &line : result < 0 ? failure(room) : piece(room, result)) {
+        for (const std::string &line : result < 0 ? read_failure(room) : read_piece(room, result)) {
             expected.push_back(line);
         }
         room -= std::max(result, 0);
     }
-    EXPECT_EQ(events(), expected + ended(room, static_cast<int>(kept)));
+    EXPECT_EQ(events(), expected + read_end(room, static_cast<int>(kept)));
     EXPECT_THAT(left_open(), IsEmpty());
 }
 
@@ -182,12 +141,7 @@ TEST_F(ReadBack, OffsetsAreOnlyLogged)
     plan_steps("lseek", {gives(-1, ESPIPE), gives(7), gives(12)});
     EXPECT_EQ(read_back(400), received(400, bytes(300)));
 
-    EXPECT_EQ(events(),
-              (Lines{line("enter... !\n")} + "open(/data/vorlane/src1.xml, O_RDONLY) = plan#1" +
-               "lseek(plan#1, 0, SEEK_CUR) = -1" + line("offset = -1") +
-               "lseek(plan#1, 0, SEEK_END) = 7" + line("offset = 7") +
-               "lseek(plan#1, 0, SEEK_SET) = 12" + line("offset = 12") + piece(400, 300) +
-               ended(100, 300)));
+    EXPECT_EQ(events(), opened_to_read(7, -1, 12) + read_piece(400, 300) + read_end(100, 300));
 }
 
 TEST_F(ReadBack, OffsetIsLoggedAsAnInt)
@@ -226,7 +180,7 @@ TEST_F(ReadBack, FileThatDoesNotParseIsReadAndNotLoaded)
 TEST_F(ReadBack, MissingFileLeavesTheBufferUntouchedWithNoLeaveLine)
 {
     EXPECT_EQ(read_back(100), received(100, ""));
-    EXPECT_EQ(events(), not_opened("-1"));
+    EXPECT_EQ(events(), not_opened_to_read("-1"));
     EXPECT_FALSE(platform::plan_exists());
 }
 
@@ -235,7 +189,7 @@ TEST_F(ReadBack, DescriptorZeroIsAFailureAndStaysOpen)
     write_plan(bytes(300));
     platform::free_descriptor_zero();
     EXPECT_EQ(read_back(100), received(100, ""));
-    EXPECT_EQ(events(), not_opened("plan#1"));
+    EXPECT_EQ(events(), not_opened_to_read("plan#1"));
     EXPECT_THAT(left_open(), ElementsAre("plan#1"));
 }
 
@@ -244,11 +198,11 @@ TEST_F(ReadBack, DescriptorOneIsASuccess)
     write_plan(bytes(300));
     std::string got;
     {
-        const FreedOutput freed;
+        const support::FreedDescriptor freed(STDOUT_FILENO);
         got = read_back(400);
     }
     EXPECT_EQ(got, received(400, bytes(300)));
-    EXPECT_EQ(events(), begun(300) + piece(400, 300) + ended(100, 300));
+    EXPECT_EQ(events(), opened_to_read(300) + read_piece(400, 300) + read_end(100, 300));
     EXPECT_THAT(left_open(), IsEmpty());
 }
 
@@ -273,7 +227,7 @@ TEST_F(ReadBack, NegativeCapacityReadsAnEmptyFileAsAnyOther)
         FPTEST_ExtractResultMsg(buffer.data(), capacity);
 
         EXPECT_EQ(buffer, std::string(kAfter, kGuard));
-        auto lines = begun(0) + ended(0, 0);
+        auto lines = opened_to_read(0) + read_end(0, 0);
         std::erase_if(lines, [](const auto &event) { return event.starts_with("read("); });
         auto seen = events();
         EXPECT_EQ(std::erase_if(seen, [](const auto &event) { return event.starts_with("read("); }),

@@ -2,7 +2,7 @@
 // SPDX-License-Identifier: Apache-2.0
 
 // Reports: what an item says of its progress and its end goes into the plan.
-#include "sequences.h"
+#include "unit_test.h"
 
 #include <cerrno>
 #include <climits>
@@ -56,37 +56,6 @@ class Report : public LibraryTest
         auto *element = mxmlFindElement(found, g_TestCmdTree, "Cmd", "name", name, MXML_DESCEND);
         return mxmlElementGetAttr(element, attribute_name);
     }
-
-    // The events of a report, piece by piece.
-    static Lines begun(const std::string &name, const Lines &loading = {},
-                       const std::string &failure = "")
-    {
-        return Lines{"FPTEST_SetTransation| enter...\n",
-                     "FPTEST_SetTransation| input node name = " + name + "\n"} +
-               asked_index(loading, failure);
-    }
-    static Lines told(int index, int progress, int result, const std::string &description)
-    {
-        const std::string code = std::to_string(result);
-        return {"FPTEST_SetTransation| iResult = " + code + "\n",
-                "FPTEST_SetTransation| index=" + std::to_string(index) + " - iResult=" + code +
-                    " - iProgress=" + std::to_string(progress) + " - iDesc=" + description + "\n",
-                "updateSrcXmlFile| enter... !\n"};
-    }
-    static Lines updated(const std::string &name, const Lines &saving = saved())
-    {
-        return Lines{"updateSrcXmlFile| curernt node name is: " + name + "\n",
-                     "updateSrcXmlFile| start update progress!\n",
-                     "updateSrcXmlFile| start update result!\n",
-                     "updateSrcXmlFile| start update description!\n",
-                     "updateSrcXmlFile| start save xml!\n"} +
-               saving + "updateSrcXmlFile| update Src Xml File success . leave...\n" +
-               "FPTEST_SetTransation| leave...\n";
-    }
-    static Lines not_updated(const std::string &reason)
-    {
-        return failed("updateSrcXmlFile", reason) + "FPTEST_SetTransation| leave...\n";
-    }
 };
 
 TEST_F(Report, FirstReportLoadsThePlanSetsTheValuesAndSavesThem)
@@ -94,7 +63,7 @@ TEST_F(Report, FirstReportLoadsThePlanSetsTheValuesAndSavesThem)
     write_plan(plan());
     report(50, 0, "half");
 
-    EXPECT_EQ(events(), begun("a", load()) + told(0, 50, 0, "half") + updated("a"));
+    EXPECT_EQ(events(), report_begun("a", load()) + report_told(0, 50, 0, "half") + updated("a"));
     EXPECT_EQ(plan_text(), plan(" progress=\"50\" result=\"0\" description=\"half\""));
     EXPECT_THAT(left_open(), IsEmpty());
 }
@@ -105,7 +74,7 @@ TEST_F(Report, LaterReportUsesThePlanInMemory)
     write_plan("<Other/>");
     EXPECT_EQ(FPTEST_SetTransation("first", "b", -1, 1, "bad"), 0);
 
-    EXPECT_EQ(events(), begun("b") + told(1, -1, 1, "bad") + updated("b"));
+    EXPECT_EQ(events(), report_begun("b") + report_told(1, -1, 1, "bad") + updated("b"));
     EXPECT_EQ(plan_text(), plan("", " progress=\"-1\" result=\"1\" description=\"bad\""));
 }
 
@@ -183,10 +152,11 @@ TEST_F(Report, ValuesAreWrittenOverTheOldOnesOrAfterTheOtherAttributes)
         SetUp();
         load_plan(plan(one.before));
         report(one.progress, one.result, one.description);
-        EXPECT_EQ(events(), begun("a") +
-                                told(0, one.progress, one.result,
-                                     one.description != nullptr ? one.description : "(null)") +
-                                updated("a"));
+        EXPECT_EQ(events(),
+                  report_begun("a") +
+                      report_told(0, one.progress, one.result,
+                                  one.description != nullptr ? one.description : "(null)") +
+                      updated("a"));
         EXPECT_EQ(unwrapped(plan_text()), plan(unwrapped(one.after)));
     }
 }
@@ -199,7 +169,7 @@ TEST_F(Report, DescriptionIsKeptUnchangedWhateverItsLengthAndCharacters)
         load_plan();
         report(1, 0, description.c_str());
         EXPECT_EQ(attribute("first", "a", "description"), description);
-        EXPECT_THAT(events(), Contains(told(0, 1, 0, description)[1]));
+        EXPECT_THAT(events(), Contains(report_told(0, 1, 0, description)[1]));
 
         // and is still the same for who loads the file
         internals::reset();
@@ -239,8 +209,8 @@ TEST_F(Report, UnknownGroupOrItemChangesNothing)
                                       {"second", "a"}}) {
         SCOPED_TRACE(std::string(group) + "/" + name);
         EXPECT_EQ(FPTEST_SetTransation(group, name, 5, 0, "d"), 0);
-        EXPECT_EQ(events(),
-                  begun(name, {}, kNotFound) + told(-1, 5, 0, "d") + not_updated(kNotFound));
+        EXPECT_EQ(events(), report_begun(name, {}, kNotFound) + report_told(-1, 5, 0, "d") +
+                                not_updated(kNotFound));
         EXPECT_EQ(plan_text(), plan());
 
         // nor has anything changed that the next report would save
@@ -255,7 +225,7 @@ TEST_F(Report, ItemThatTheGroupLacksIsTakenFromALaterGroup)
     load_plan();
     EXPECT_EQ(FPTEST_SetTransation("first", "c", 5, 0, "d"), 0);
 
-    EXPECT_EQ(events(), begun("c") + told(1, 5, 0, "d") + updated("c"));
+    EXPECT_EQ(events(), report_begun("c") + report_told(1, 5, 0, "d") + updated("c"));
     EXPECT_EQ(plan_text(), plan("", "", " progress=\"5\" result=\"0\" description=\"d\""));
 }
 
@@ -288,7 +258,7 @@ TEST_F(Report, ItemBelowANestedElementIsFound)
               "<Cmd name=\"a\"/></Block></CmdGroup></P>");
     report(5, 0, "d");
 
-    EXPECT_THAT(events(), Contains(told(1, 5, 0, "d")[1]));
+    EXPECT_THAT(events(), Contains(report_told(1, 5, 0, "d")[1]));
     EXPECT_EQ(plan_text(), "<P>\n<CmdGroup name=\"first\">\n\t<Cmd name=\"x\" />\n\t<Block>\n"
                            "\t\t<Cmd name=\"y\" />\n"
                            "\t\t<Cmd name=\"a\" progress=\"5\" result=\"0\" description=\"d\" />\n"
@@ -298,27 +268,28 @@ TEST_F(Report, ItemBelowANestedElementIsFound)
 TEST_F(Report, PlanThatCannotBeLoadedIsToldTwiceAndChangesNothing)
 {
     report(5, 0, "d");
-    EXPECT_EQ(events(), begun("a", failed_load(), kNoPlan) + told(-1, 5, 0, "d") + failed_load() +
-                            not_updated(kNoPlan));
+    EXPECT_EQ(events(), report_begun("a", failed_load(), kNoPlan) + report_told(-1, 5, 0, "d") +
+                            failed_load() + not_updated(kNoPlan));
     EXPECT_FALSE(platform::plan_exists());
 
     write_plan(plan());
     plan_steps("open", {gives(0, EACCES), gives(0, EACCES)}); // 0 is a failure too
     report(5, 0, "d");
-    EXPECT_EQ(events(), begun("a", failed_load("0", kReason), kNoPlan) + told(-1, 5, 0, "d") +
-                            failed_load("0", kReason) + not_updated(kNoPlan));
+    EXPECT_EQ(events(), report_begun("a", failed_load("0", kReason), kNoPlan) +
+                            report_told(-1, 5, 0, "d") + failed_load("0", kReason) +
+                            not_updated(kNoPlan));
     EXPECT_EQ(plan_text(), plan());
 
     write_plan("<?xml version=\"1.0\"?><P><CmdGroup name=\"first\"><Cmd name=\"a\"");
     report(5, 0, "d");
-    EXPECT_EQ(events(), begun("a", load(), kNoPlan) + told(-1, 5, 0, "d") + load("plan#2") +
-                            not_updated(kNoPlan));
+    EXPECT_EQ(events(), report_begun("a", load(), kNoPlan) + report_told(-1, 5, 0, "d") +
+                            load("plan#2") + not_updated(kNoPlan));
     EXPECT_EQ(g_TestCmdTree, nullptr);
 
     write_plan(plan());
     report(6, 1, "e");
-    EXPECT_EQ(events(),
-              begun("a", load("plan#3")) + told(0, 6, 1, "e") + updated("a", saved("plan#4")));
+    EXPECT_EQ(events(), report_begun("a", load("plan#3")) + report_told(0, 6, 1, "e") +
+                            updated("a", saved("plan#4")));
     EXPECT_EQ(plan_text(), plan(" progress=\"6\" result=\"1\" description=\"e\""));
 }
 
@@ -328,8 +299,8 @@ TEST_F(Report, PlanThatLoadsOnlyAtTheSecondAttemptIsUpdatedAllTheSame)
     plan_steps("open", {gives(-1, EACCES)});
     report(5, 0, "d");
 
-    EXPECT_EQ(events(), begun("a", failed_load("-1", kReason), kNoPlan) + told(-1, 5, 0, "d") +
-                            load() + updated("a"));
+    EXPECT_EQ(events(), report_begun("a", failed_load("-1", kReason), kNoPlan) +
+                            report_told(-1, 5, 0, "d") + load() + updated("a"));
     EXPECT_EQ(plan_text(), plan(" progress=\"5\" result=\"0\" description=\"d\""));
 }
 
@@ -342,7 +313,7 @@ TEST_F(Report, FailedSaveIsStillFollowedByTheSuccessLine)
         plan_steps("open", {gives(descriptor, EACCES)});
         report(5, 0, "d");
 
-        EXPECT_EQ(events(), begun("a") + told(0, 5, 0, "d") +
+        EXPECT_EQ(events(), report_begun("a") + report_told(0, 5, 0, "d") +
                                 updated("a", not_saved(std::to_string(descriptor), kReason)));
         EXPECT_EQ(plan_text(), plan());
         EXPECT_STREQ(attribute("first", "a", "progress"), "5");

@@ -3,7 +3,7 @@
 
 // The suspension: the item last started is looked up in the process list and
 // killed.
-#include "sequences.h"
+#include "unit_test.h"
 
 #include <algorithm>
 #include <cerrno>

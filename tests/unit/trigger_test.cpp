@@ -2,7 +2,7 @@
 // SPDX-License-Identifier: Apache-2.0
 
 // The trigger: one gatherer connects and is told to gather again.
-#include "sequences.h"
+#include "unit_test.h"
 
 #include <cerrno>
 

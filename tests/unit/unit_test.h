@@ -7,34 +7,16 @@
 #include "internals.h"
 #include "platform.h"
 #include "quillmark.h"
+#include "support/sequences.h"
+#include "support/this_process.h"
 
 #include <gmock/gmock.h>
 
 #include <cstddef>
-#include <cstdio>
-#include <initializer_list>
 #include <string>
 #include <unistd.h>
-#include <vector>
 
-using Lines = std::vector<std::string>;
-
-inline Lines joined(std::initializer_list<Lines> parts)
-{
-    Lines all;
-    for (const Lines &part : parts) {
-        all.insert(all.end(), part.begin(), part.end());
-    }
-    return all;
-}
-inline Lines operator+(const Lines &first, const Lines &then)
-{
-    return joined({first, then});
-}
-inline Lines operator+(const Lines &first, const std::string &then)
-{
-    return joined({first, {then}});
-}
+using support::Lines;
 
 // Every character that a string can hold, except those.
 inline std::string every_character_but(const std::string &these)
@@ -75,28 +57,6 @@ inline std::string shape(mxml_node_t *node)
     }
     return children.empty() ? text : text + "{" + children + "}";
 }
-
-// Standard output's descriptor is free meanwhile: nothing may be printed.
-class FreedOutput
-{
-  public:
-    FreedOutput()
-    {
-        std::fflush(stdout);
-        kept_ = dup(STDOUT_FILENO);
-        close(STDOUT_FILENO);
-    }
-    ~FreedOutput()
-    {
-        dup2(kept_, STDOUT_FILENO);
-        close(kept_);
-    }
-    FreedOutput(const FreedOutput &) = delete;
-    FreedOutput &operator=(const FreedOutput &) = delete;
-
-  private:
-    int kept_ = -1;
-};
 
 // The library as at load time, on a platform without a test plan.
 class LibraryTest : public ::testing::Test
@@ -168,4 +128,6 @@ class LibraryTest : public ::testing::Test
     }
 };
 
+using namespace platform;
+using namespace sequences;
 using namespace testing;

@@ -5,14 +5,42 @@
 // expected events of all tests are made of.
 #pragma once
 
-#include "unit_test.h"
+#include "files.h"
 
 #include <bit>
+#include <initializer_list>
 #include <optional>
 #include <string>
+#include <utility>
 
 namespace sequences
 {
+
+using support::Lines;
+
+inline Lines joined(std::initializer_list<Lines> parts)
+{
+    Lines all;
+    for (const Lines &part : parts) {
+        all.insert(all.end(), part.begin(), part.end());
+    }
+    return all;
+}
+inline Lines operator+(const Lines &first, const Lines &then)
+{
+    return joined({first, then});
+}
+inline Lines operator+(const Lines &first, const std::string &then)
+{
+    return joined({first, {then}});
+}
+
+// Whether it is a log line: a call has a bracket after its name, a line on standard
+// output a colon.
+inline bool is_log(const std::string &event)
+{
+    return event.find('|') < event.find_first_of("(: ");
+}
 
 // --- commands and node paths ---------------------------------------------
 
@@ -48,6 +76,11 @@ inline Lines split(const Lines &components)
     }
     return lines;
 }
+
+// A store, whatever has become of it.
+constexpr char kStored[] = "FPTEST_RunTestCmd| Save source xml file success!\n";
+constexpr char kNotOpened[] = "saveRecvFile| OPEN FILE FAIL!\n";
+constexpr char kNotWritten[] = "saveRecvFile| WRITE DATA FAIL!\n";
 
 // --- the plan ------------------------------------------------------------
 
@@ -119,6 +152,81 @@ inline Lines not_saved(const std::string &descriptor, const std::string &reason)
 {
     return opened_to_save(descriptor) +
            ("save_XmlFile| Open /data/vorlane/src1.xml file failed" + reason + "\n");
+}
+
+// --- reading back --------------------------------------------------------
+
+inline Lines not_opened_to_read(const std::string &descriptor)
+{
+    return {"FPTEST_ExtractResultMsg| enter... !\n",
+            "open(/data/vorlane/src1.xml, O_RDONLY) = " + descriptor,
+            "FPTEST_ExtractResultMsg| Open /data/vorlane/src1.xml file failed!\n"};
+}
+// From the call to the last offset, with what the seeks give; the end is the file's size.
+inline Lines opened_to_read(int end, int current = 0, int start = 0)
+{
+    Lines lines{"FPTEST_ExtractResultMsg| enter... !\n",
+                "open(/data/vorlane/src1.xml, O_RDONLY) = plan#1"};
+    for (const auto &[from, offset] :
+         {std::pair{"CUR", current}, std::pair{"END", end}, std::pair{"SET", start}}) {
+        const std::string given = std::to_string(offset);
+        lines.push_back(std::string("lseek(plan#1, 0, SEEK_") + from + ") = " + given);
+        lines.push_back("FPTEST_ExtractResultMsg| offset = " + given);
+    }
+    return lines;
+}
+inline Lines read_call(int asked, int result)
+{
+    return {"read(plan#1, " + std::to_string(asked) + ") = " + std::to_string(result)};
+}
+inline Lines read_piece(int asked, int got)
+{
+    return read_call(asked, got) +
+           ("FPTEST_ExtractResultMsg| read file unfinish, continue... n = " + std::to_string(got) +
+            " \n");
+}
+inline Lines read_failure(int asked)
+{
+    return read_call(asked, -1) + failed("FPTEST_ExtractResultMsg", "read file failed");
+}
+inline Lines read_end(int asked, int total)
+{
+    return read_call(asked, 0) +
+           Lines{"FPTEST_ExtractResultMsg| reach the end of file\n",
+                 "FPTEST_ExtractResultMsg| read byte count = " + std::to_string(total) + "\n",
+                 "close(plan#1)", "FPTEST_ExtractResultMsg| leave...\n"};
+}
+
+// --- reports -------------------------------------------------------------
+
+inline Lines report_begun(const std::string &name, const Lines &loading = {},
+                          const std::string &failure = "")
+{
+    return Lines{"FPTEST_SetTransation| enter...\n",
+                 "FPTEST_SetTransation| input node name = " + name + "\n"} +
+           asked_index(loading, failure);
+}
+inline Lines report_told(int index, int progress, int result, const std::string &description)
+{
+    const std::string code = std::to_string(result);
+    return {"FPTEST_SetTransation| iResult = " + code + "\n",
+            "FPTEST_SetTransation| index=" + std::to_string(index) + " - iResult=" + code +
+                " - iProgress=" + std::to_string(progress) + " - iDesc=" + description + "\n",
+            "updateSrcXmlFile| enter... !\n"};
+}
+inline Lines updated(const std::string &name, const Lines &saving = saved())
+{
+    return Lines{"updateSrcXmlFile| curernt node name is: " + name + "\n",
+                 "updateSrcXmlFile| start update progress!\n",
+                 "updateSrcXmlFile| start update result!\n",
+                 "updateSrcXmlFile| start update description!\n",
+                 "updateSrcXmlFile| start save xml!\n"} +
+           saving + "updateSrcXmlFile| update Src Xml File success . leave...\n" +
+           "FPTEST_SetTransation| leave...\n";
+}
+inline Lines not_updated(const std::string &reason)
+{
+    return failed("updateSrcXmlFile", reason) + "FPTEST_SetTransation| leave...\n";
 }
 
 // --- the run of an item --------------------------------------------------
@@ -256,6 +364,3 @@ inline Lines trigger(int count = 1)
 }
 
 } // namespace sequences
-
-using namespace platform;
-using namespace sequences;
