@@ -68,7 +68,8 @@ bool can_be_tried(std::string_view expansion)
                                                    : " _=!+-*/%^~,:@#.;[]";
     const auto is_taken = [&](char byte) {
         const auto character = static_cast<unsigned char>(byte);
-        return is_letter(character) || std::isdigit(character) || marks.find(byte) != marks.npos;
+        return is_letter(character) || std::isdigit(character) != 0 ||
+               marks.find(byte) != marks.npos;
     };
     // "${ COMMAND;}" and "${|COMMAND;}" run something
     return std::ranges::all_of(inside, is_taken) && (is_arithmetic || !inside.starts_with(' ')) &&
