@@ -31,7 +31,7 @@ std::string shell_characters(std::string_view name)
 }
 
 // Whether the shell may read more in it than words.
-bool is_read_closely(std::string_view line)
+bool may_hold_syntax(std::string_view line)
 {
     return line.size() <= kCommandLimit && // else it is cut, and what is left of it changes
            line.find_first_of("\"'\\$`;&|<>()#\n\r") != line.npos;
@@ -73,11 +73,11 @@ void ShellChecker::check(const Item &item)
 {
     const std::string line = command_line(item.name, item.args, "");
     const std::size_t args_begin = line.size() - item.args.size();
-    const Verdict verdict = is_read_closely(line) ? judge(item, line) : Verdict{};
+    const Verdict verdict = may_hold_syntax(line) ? judge(item, line) : Verdict{};
     const std::string characters = shell_characters(item.name);
     const bool is_of_name = verdict.is_refused && verdict.reading.fault
                                 ? verdict.reading.fault->at < args_begin
-                                : !characters.empty() && !is_read_closely(item.args);
+                                : !characters.empty() && !may_hold_syntax(item.args);
     if (!characters.empty()) {
         report_name(item, characters, verdict.is_refused && is_of_name);
     }
@@ -91,7 +91,7 @@ void ShellChecker::check(const Item &item)
             }
         }
     }
-    // one mistake where it is in front of a line feed that is said
+    // before a line feed that is reported it is the same mistake
     const bool ends_line = std::ranges::any_of(verdict.reading.effects, [&](const Effect &effect) {
         return effect.mark == "\n" && line[effect.at - 1] == '\r';
     });

@@ -57,7 +57,7 @@ bool is_letter(unsigned char byte)
 
 // Whether it stays an expansion between double quotes, in which nothing is run, and no
 // variable decides what becomes of it. What could be an end of it, or a quote, is refused.
-bool can_be_tried(std::string_view expansion)
+bool is_safe_to_expand(std::string_view expansion)
 {
     const bool is_arithmetic = expansion.starts_with("$((");
     const std::size_t mark = is_arithmetic ? 3 : 2;
@@ -82,19 +82,19 @@ bool can_be_tried(std::string_view expansion)
 
 Shell::Answer Shell::ask(const std::string &line, std::string &why)
 {
-    const auto begin = Clock::now();
-    const Answer answer = ask_once("-n", line, why);
-    left_ -= std::chrono::duration<double>(Clock::now() - begin).count();
-    return answer;
+    return ask_timed("-n", line, why);
 }
 
 Shell::Answer Shell::ask_to_expand(const std::string &expansion, std::string &why)
 {
-    if (!can_be_tried(expansion)) {
-        return Answer::unknown;
-    }
+    return is_safe_to_expand(expansion) ? ask_timed("-f", ": \"" + expansion + "\"", why)
+                                        : Answer::unknown;
+}
+
+Shell::Answer Shell::ask_timed(const std::string &option, const std::string &line, std::string &why)
+{
     const auto begin = Clock::now();
-    const Answer answer = ask_once("-f", ": \"" + expansion + "\"", why);
+    const Answer answer = ask_once(option, line, why);
     left_ -= std::chrono::duration<double>(Clock::now() - begin).count();
     return answer;
 }

@@ -66,7 +66,7 @@ class LineScanner
         bool is_empty = true;  // it has no redirection either
         std::size_t cases = 0; // "case" without its "esac"
         std::size_t operator_at = 0;
-        std::string operator_; // what has a command after it
+        std::string operator_ = {}; // what has a command after it
     };
 
     // --- places ---
@@ -155,7 +155,7 @@ class LineScanner
             if (looking_at(")")) {
                 if (state.cases > 0) {
                     ++at_;
-                    state = {0, true, state.cases, 0, ""};
+                    state = {.cases = state.cases};
                 } else if (!is_nested) {
                     fail(Fault::Kind::unexpected, at_, ")");
                 } else {
@@ -202,7 +202,7 @@ class LineScanner
         if (!state.operator_.empty() && state.is_empty) {
             return;
         }
-        state = {0, true, state.cases, 0, ""};
+        state = {.cases = state.cases};
         if (depth_ == 0 && !has_line_end_ && next_command() < line_.size()) {
             has_line_end_ = true;
             end_effect();
@@ -236,7 +236,7 @@ class LineScanner
         const std::size_t begin = at_;
         if (state.words == 1 && pass_function()) {
             note(Effect::Kind::function, begin, "(", begin, at_);
-            state = {0, true, state.cases, 0, ""};
+            state = {.cases = state.cases};
         } else if (state.words > 0 && state.cases == 0) {
             fail(Fault::Kind::unexpected, begin, "(");
         } else if (state.words > 0) {
@@ -293,7 +293,7 @@ class LineScanner
         }
         at_ += mark.size();
         begin_effect(begin, mark);
-        state = {0, true, state.cases, 0, ""};
+        state = {.cases = state.cases};
         if (is_any(mark, {"&&", "||", "|"})) {
             state.operator_at = begin;
             state.operator_ = mark;
@@ -410,11 +410,11 @@ class LineScanner
         if (looking_at("\\") || looking_at("$$")) {
             pass_two();
         } else if (looking_at("'") && !in_quotes) {
-            read_quote(1, false);
+            read_single_quotes(1, false);
         } else if (looking_at("$'") && !in_quotes) {
-            read_quote(2, true);
+            read_single_quotes(2, true);
         } else if (looking_at("\"")) {
-            read_quotes();
+            read_double_quotes();
         } else if (looking_at("`")) {
             read_backticks();
         } else if (looking_at("${")) {
@@ -431,7 +431,7 @@ class LineScanner
         }
     }
 
-    void read_quote(std::size_t size, bool has_escapes)
+    void read_single_quotes(std::size_t size, bool has_escapes)
     {
         const std::size_t begin = at_;
         at_ += size;
@@ -442,24 +442,24 @@ class LineScanner
                 ++at_;
             }
         }
-        end_at("'", begin, line_.substr(begin, size));
+        expect_end("'", begin, line_.substr(begin, size));
     }
 
     // Passes over the end of what began there, or misses it.
-    void end_at(std::string_view end, std::size_t begin, std::string_view mark)
+    void expect_end(std::string_view end, std::size_t begin, std::string_view mark)
     {
         if (!pass(end)) {
             fail(Fault::Kind::no_end, begin, mark);
         }
     }
 
-    void read_quotes()
+    void read_double_quotes()
     {
         const std::size_t begin = at_++;
         while (!at_end() && !looking_at("\"")) {
             read_character(true);
         }
-        end_at("\"", begin, "\"");
+        expect_end("\"", begin, "\"");
     }
 
     void read_backticks()
@@ -469,7 +469,7 @@ class LineScanner
             at_ += looking_at("\\") ? 2 : 1;
         }
         at_ = std::min(at_, line_.size());
-        end_at("`", begin, "`");
+        expect_end("`", begin, "`");
         note(Effect::Kind::substitution, begin, "`", begin + 1, std::max(at_ - 1, begin + 1));
     }
 
@@ -484,7 +484,7 @@ class LineScanner
             read_character(in_quotes && !is_command);
         }
         --braces_;
-        end_at("}", begin, "${");
+        expect_end("}", begin, "${");
         if (braces_ == 0 && !is_command) {
             note(Effect::Kind::expansion, begin, "${", begin, at_);
         }
@@ -503,7 +503,7 @@ class LineScanner
                 read_character(false);
             }
         }
-        end_at(")", begin, "(");
+        expect_end(")", begin, "(");
     }
 
     // False where it begins no arithmetic, or has another end: it is commands then.

@@ -1,8 +1,8 @@
 // SPDX-FileCopyrightText: 2026 The Quillmark authors
 // SPDX-License-Identifier: Apache-2.0
 
-// What a shell makes of an item's command line: "/system/bin/NAME ARGS" is its
-// text, and not only the first program of it is run.
+// Reads "/system/bin/NAME ARGS" as the device's shell would, to find what else than the
+// item that would run.
 #pragma once
 
 #include <cstddef>
@@ -24,17 +24,17 @@ struct ShellReading {
     };
     // What the shell does besides starting the line's first command.
     struct Effect {
+        // "${...}" and "$((...))" are expansions, at which it may give up.
         enum class Kind { command, substitution, expansion, redirection, comment, function };
         Kind kind = Kind::command;
         std::size_t at = 0;
         std::string mark;
         std::string text; // what is run, and may be nothing; else all of it
-        // "${...}" and "$((...))" are expansions, at which it may give up.
     };
 
-    std::optional<Fault> fault;  // the first
-    std::vector<Effect> effects; // of the first command, up to the one that ends it
-                                 // and the first line feed that does
+    std::optional<Fault> fault; // the first
+    // In their order, up to what ends the first command, or the first line feed that does.
+    std::vector<Effect> effects;
 };
 
 // Reads a line as the shell of the device does, but for reserved words: a fault
@@ -66,6 +66,7 @@ class Shell
     }
 
   private:
+    Answer ask_timed(const std::string &option, const std::string &line, std::string &why);
     Answer ask_once(const std::string &option, const std::string &line, std::string &why) const;
 
     double left_; // seconds

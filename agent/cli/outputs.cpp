@@ -3,7 +3,7 @@
 
 #include "cli/outputs.h"
 
-#include "module/preflight.h"
+#include "module/log_file.h"
 #include "plan/plan.h"
 #include "reporters/reporters.h"
 #include "reporters/views.h"

@@ -7,6 +7,7 @@
 #include "cli/outputs.h"
 #include "cli/run_options.h"
 #include "module/library_process.h"
+#include "module/log_file.h"
 #include "module/preflight.h"
 #include "module/stored_plan.h"
 #include "plan/plan.h"

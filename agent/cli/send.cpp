@@ -4,6 +4,7 @@
 #include "cli/options.h"
 #include "cli/outputs.h"
 #include "module/library_process.h"
+#include "module/log_file.h"
 #include "module/preflight.h"
 #include "module/stored_plan.h"
 #include "plan/plan.h"

@@ -22,7 +22,7 @@ namespace fptest
 namespace
 {
 
-std::function<void(int)> status_told;
+std::function<void(int)> on_status;
 
 // The shell that the C library's system() would run.
 const char *shell()
@@ -50,7 +50,7 @@ class SpawnAttributes
         posix_spawnattr_setsigmask(&attributes_, &mask);
         posix_spawnattr_setsigdefault(&attributes_, &defaults);
         short flags = POSIX_SPAWN_SETSIGMASK | POSIX_SPAWN_SETSIGDEF;
-        if (status_told) {
+        if (on_status) {
             posix_spawnattr_setpgroup(&attributes_, 0);
             flags |= POSIX_SPAWN_SETPGROUP;
         }
@@ -97,9 +97,9 @@ int run_by_shell(const char *command, const SpawnAttributes &attributes)
 
 } // namespace
 
-void tell_item_status(std::function<void(int)> told)
+void set_status_handler(std::function<void(int)> handler)
 {
-    status_told = std::move(told);
+    on_status = std::move(handler);
 }
 
 } // namespace fptest
@@ -132,8 +132,8 @@ extern "C" int system(const char *command)
     for (std::size_t at = 0; at < signals.size(); ++at) {
         sigaction(signals[at], &before[at], nullptr);
     }
-    if (fptest::status_told) {
-        fptest::status_told(status);
+    if (fptest::on_status) {
+        fptest::on_status(status);
     }
     return status;
 }

@@ -11,9 +11,9 @@
 namespace fptest
 {
 
-// What is told each status, as waitpid() gives it, before system() returns. Each
+// What is called with each status, as waitpid() gives it, before system() returns. Each
 // command then runs in a process group of its own, so that an item which signals
 // its group does not meet the library.
-void tell_item_status(std::function<void(int)> told);
+void set_status_handler(std::function<void(int)> handler);
 
 } // namespace fptest

@@ -83,8 +83,6 @@ class LibraryProcess
     void suspend();
     void resume();
 
-    static constexpr int kNothingToStop = -2;
-
     // The next event, waited for that long, or until the other descriptor can be
     // read.
     std::optional<Event> wait(std::chrono::milliseconds longest, int other = -1);

@@ -9,6 +9,9 @@
 namespace fptest
 {
 
+// What a stop returns that found nothing to stop.
+inline constexpr int kNothingToStop = -2;
+
 enum class MessageKind : char {
     // to the library's process
     command = 'c',   // the command and the names of its items, a zero byte between each

@@ -16,18 +16,6 @@
 namespace fptest
 {
 
-// A file, with what names it: an option or an environment variable.
-using NamedFile = std::pair<std::string, std::string>;
-// "--log agent.log", "VR_LOG_FILE=agent.log"
-std::string label(const NamedFile &file);
-
-// Where the library's log goes: to the file that --log names, else where VR_LOG_FILE
-// says. Its name is empty where it goes nowhere.
-NamedFile log_file(const std::string &option);
-
-// Sees to that. To be called before the library is.
-void choose_log(const std::string &option);
-
 // That this is a device at all.
 void require_device();
 

@@ -5,7 +5,6 @@
 
 #include "common/descriptor.h"
 #include "module/item_shell.h"
-#include "module/library_process.h"
 #include "module/messages.h"
 #include "module/processes.h"
 #include "plan/plan.h"
@@ -43,16 +42,16 @@ namespace
 constexpr std::size_t kReplyRoom = 1025;
 constexpr std::chrono::seconds kGrace{2}; // for items to end when the agent has gone
 
-std::function<void()> connection_told;
+std::function<void()> on_connection;
 
 class Server
 {
   public:
     explicit Server(int socket) : socket_(socket)
     {
-        print_to(*this);
-        tell_item_status([this](int status) { tell_ended(status); });
-        connection_told = [this] { tell_connected(); };
+        intercept_library_output(*this);
+        set_status_handler([this](int status) { tell_ended(status); });
+        on_connection = [this] { tell_connected(); };
     }
 
     // Ends with the agent, whatever has become of it; an item that is running
@@ -107,7 +106,7 @@ class Server
     // What the library itself prints, "vendor = N" for each item that it comes to,
     // goes to the agent, which learns by it when the item began and what of the
     // output was before. The items are started with descriptor 1.
-    static void print_to(Server &server)
+    static void intercept_library_output(Server &server)
     {
         std::fflush(stdout);
 #ifdef __BIONIC__
@@ -146,7 +145,7 @@ class Server
     void tell_ended(int status)
     {
         hold_after({MessageKind::ended,
-                    moment() + std::to_string(status) + (has_children() ? " 1" : " 0")});
+                    moment() + std::to_string(status) + (reap_children() ? " 1" : " 0")});
     }
 
     void tell_connected()
@@ -173,7 +172,7 @@ class Server
 
     // What an item has left running is this process's own by now. The finished ones
     // among them, and those that stops have left behind, are nobody's to wait for.
-    static bool has_children()
+    static bool reap_children()
     {
         pid_t child = 0;
         do {
@@ -198,7 +197,7 @@ class Server
     static int stop(const std::vector<std::string> &items)
     {
         if (!runs_below(getpid(), items)) {
-            return LibraryProcess::kNothingToStop;
+            return kNothingToStop;
         }
         const Descriptor output(fcntl(STDERR_FILENO, F_DUPFD_CLOEXEC, 0));
         const Descriptor null(open("/dev/null", O_WRONLY | O_CLOEXEC));
@@ -243,7 +242,7 @@ class Server
         }
         // Nobody else waits for the gatherer and for what stops left behind, and a
         // finished process of an item's name would be found in place of the item.
-        static_cast<void>(has_children());
+        static_cast<void>(reap_children());
         busy_ = true;
         command_ = std::thread([this, command] { run(command); });
     }
@@ -338,8 +337,8 @@ extern "C" int Accept(int descriptor, struct sockaddr *address, socklen_t *lengt
     static const auto platforms = reinterpret_cast<decltype(&Accept)>(dlsym(RTLD_NEXT, "Accept"));
     const int connection = platforms(descriptor, address, length);
     const int error = errno;
-    if (connection >= 0 && fptest::connection_told) {
-        fptest::connection_told();
+    if (connection >= 0 && fptest::on_connection) {
+        fptest::on_connection();
     }
     errno = error;
     return connection;

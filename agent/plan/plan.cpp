@@ -374,18 +374,18 @@ std::vector<std::optional<Plan::Element>> Plan::resolve(const std::string &group
 {
     const std::vector<std::string> path = components(group);
     if (path.size() > 2) {
-        return {run_item(path[1], path[2])};
+        return {resolve_item(path[1], path[2])};
     }
-    return path.size() == 2 ? run_group(path[1]) : std::vector<std::optional<Element>>();
+    return path.size() == 2 ? resolve_group(path[1]) : std::vector<std::optional<Element>>();
 }
 
 std::optional<Plan::Element> Plan::resolve(const std::string &group, const std::string &item) const
 {
     const std::vector<std::string> path = components(group + "/" + item);
-    return path.size() > 2 ? run_item(path[1], path[2]) : std::nullopt;
+    return path.size() > 2 ? resolve_item(path[1], path[2]) : std::nullopt;
 }
 
-std::vector<std::optional<Plan::Element>> Plan::run_group(const std::string &name) const
+std::vector<std::optional<Plan::Element>> Plan::resolve_group(const std::string &name) const
 {
     std::vector<std::optional<Element>> run;
     mxml_node_t *const group = find_group(name);
@@ -402,7 +402,8 @@ std::vector<std::optional<Plan::Element>> Plan::run_group(const std::string &nam
     return run;
 }
 
-std::optional<Plan::Element> Plan::run_item(const std::string &group, const std::string &name) const
+std::optional<Plan::Element> Plan::resolve_item(const std::string &group,
+                                                const std::string &name) const
 {
     mxml_node_t *const start = find_group(group);
     const auto places = items_named_.find(name);

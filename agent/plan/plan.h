@@ -83,8 +83,8 @@ class Plan
     Element element(mxml_node_t *node) const;
     // The first of these after the start of that group.
     mxml_node_t *after(mxml_node_t *group, const Numbers &items) const;
-    std::vector<std::optional<Element>> run_group(const std::string &name) const;
-    std::optional<Element> run_item(const std::string &group, const std::string &name) const;
+    std::vector<std::optional<Element>> resolve_group(const std::string &name) const;
+    std::optional<Element> resolve_item(const std::string &group, const std::string &name) const;
 
     Tree tree_;
     std::vector<mxml_node_t *> elements_;

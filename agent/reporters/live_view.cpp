@@ -128,9 +128,7 @@ class LiveView : public Listener
 
     void ended(const Run &run, Place place) override
     {
-        std::erase_if(running_, [&](Place other) {
-            return other.suite == place.suite && other.item == place.item;
-        });
+        std::erase(running_, place);
         const ItemRun &item = item_at(run, place);
         std::string said = how_it_ended(item);
         const std::string more = remark(item);
@@ -260,9 +258,7 @@ class LiveView : public Listener
         line.add(", ");
         line.add(fmt::format("{} failed", counts.failed),
                  counts.failed > 0 ? Colour::red : Colour::none);
-        const std::string all = total(run);
-        // the rest of it, from the comma after the failed ones
-        line.add(all.substr(all.find(',', all.find(',') + 1)));
+        line.add(rest_of_total(run));
         if (!running_.empty() && !run.why_unfinished.empty()) {
             line.add("; Ctrl-C again leaves at once");
         }

@@ -66,7 +66,7 @@ class PlainView : public Listener
 
     void ended(const Run &run, Place place) override
     {
-        runs_ = runs_ && (place.suite != place_.suite || place.item != place_.item);
+        runs_ = runs_ && place != place_;
         const ItemRun &item = item_at(run, place);
         const bool passed = item.outcome == Outcome::passed;
         if (quiet_ && passed && item.left_running.empty()) {

@@ -66,13 +66,18 @@ std::string heading(const Run &run)
 std::string total(const Run &run)
 {
     const Counts counts = count(run);
+    return fmt::format("{} passed, {} failed{}", counts.passed, counts.failed, rest_of_total(run));
+}
+
+std::string rest_of_total(const Run &run)
+{
+    const Counts counts = count(run);
     const std::string rest = has_ended(run) && (counts.not_run > 0 || !run.finished)
                                  ? fmt::format(", {} not run", counts.not_run)
                              : has_ended(run)        ? ""
                              : has_fixed_rounds(run) ? fmt::format(", {} to go", counts.not_run)
                                                      : fmt::format(", round {}", run.round);
-    return fmt::format("{} passed, {} failed{}, {}", counts.passed, counts.failed, rest,
-                       duration(run.seconds));
+    return fmt::format("{}, {}", rest, duration(run.seconds));
 }
 
 std::string how_it_ended(const ItemRun &item)

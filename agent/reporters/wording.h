@@ -19,6 +19,8 @@ std::string heading(const Run &run);
 
 // "3 passed, 1 failed, 2 to go, 12.0 s"
 std::string total(const Run &run);
+// What of it comes after the failed ones: ", 2 to go, 12.0 s".
+std::string rest_of_total(const Run &run);
 
 // "exit status 5", "died by SIGSEGV"; empty where there is nothing to be said: it
 // ended with 0, or by the signal that stopped it.

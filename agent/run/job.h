@@ -46,15 +46,15 @@ struct RunningItem {
     // The time of the run: it stands still while the run is suspended.
     using TimePoint = std::chrono::steady_clock::time_point;
 
-    // What keeps a report from counting.
+    // How far the stored plan's report of it can be relied on.
     struct Reporting {
-        bool expected = true;     // from a gatherer that was running only once it is told
-        bool overwritten = false; // by an old copy of the plan, and not reported since
-        bool lost = false;        // with the stored plan
-        bool undone = false;      // its result was there, and is not any more
+        bool expected = true;     // not before a gatherer is told that already ran
+        bool overwritten = false; // an old copy of the plan has erased it; none has come since
+        bool lost = false;        // the stored plan is gone
+        bool undone = false;      // a result was there, and has gone
         bool in_another_plan = false;
-        bool beside_gatherer = false; // which has saved the plan meanwhile
-        bool from_a_copy = false;     // a gatherer's, of the plan: it has no mark
+        bool beside_gatherer = false; // the gatherer has saved the plan while the item ran
+        bool from_a_copy = false;     // the gatherer's own, which has no mark
         std::vector<ItemReport> seen; // the last of those before its report
     };
 

@@ -125,8 +125,8 @@ std::vector<std::optional<Plan::Element>> resolve(const Path &path, const Plan &
 }
 
 // Whether every item of the group is what a path with its name runs.
-bool run_by_their_own_paths(const Plan &plan, const std::string &group,
-                            const std::vector<std::optional<Plan::Element>> &items)
+bool have_paths_of_their_own(const Plan &plan, const std::string &group,
+                             const std::vector<std::optional<Plan::Element>> &items)
 {
     return std::ranges::all_of(items, [&](const auto &item) {
         if (!item || !item->name || !is_addressable(*item->name)) {
@@ -147,7 +147,7 @@ class WorkPlanner
     void add(const Path &path)
     {
         const auto items = resolve(path, plan_);
-        if (as_group_ || !path.item.empty() || !run_by_their_own_paths(plan_, path.group, items)) {
+        if (as_group_ || !path.item.empty() || !have_paths_of_their_own(plan_, path.group, items)) {
             add_job(path.text, path.group, items);
             return;
         }

@@ -18,17 +18,6 @@ namespace
 
 constexpr std::size_t kSeen = 100; // reports that are kept of an item
 
-// As it reads once the plan has been made loadable.
-ItemReport as_made_loadable(ItemReport report)
-{
-    if (report.result_without_value) {
-        report.result_without_value = false;
-        report.result = "";
-    }
-    report.description = report.description.value_or("");
-    return report;
-}
-
 // What an element has reported. A result that is empty has been made loadable.
 ItemReport report_of(const Plan &plan, std::size_t number)
 {
@@ -38,6 +27,20 @@ ItemReport report_of(const Plan &plan, std::size_t number)
         report.result_without_value = true;
     }
     return report;
+}
+
+// A plan that has been made loadable has a description where there was none.
+bool is_same(const ItemReport &one, const ItemReport &other)
+{
+    return one.progress == other.progress && one.result == other.result &&
+           one.result_without_value == other.result_without_value &&
+           one.description.value_or("") == other.description.value_or("");
+}
+
+bool is_among(const std::vector<ItemReport> &reports, const ItemReport &report)
+{
+    return std::ranges::any_of(reports,
+                               [&](const ItemReport &one) { return is_same(one, report); });
 }
 
 // Whether that element is the item still, and not one of another plan.
@@ -109,7 +112,7 @@ void ReportReader::read(const std::optional<Plan> &plan)
 
 // What a process with an old copy of the plan says of items is older than they are. A
 // gatherer's own copy is always old: what is new in it is what it has to report.
-bool ReportReader::is_older(RunningItem &active, const Plan &plan, const ItemReport &report)
+bool ReportReader::reject_stale(RunningItem &active, const Plan &plan, const ItemReport &report)
 {
     if (bears_mark(plan, active.element, running_.job.mark)) {
         return false;
@@ -196,7 +199,7 @@ void ReportReader::note_earlier_plan(const std::string &text)
     for (std::size_t number = 0; plan && number < plan->elements().size(); ++number) {
         const char *name = mxmlElementGetAttr(plan->elements()[number], "name");
         if (name != nullptr && is_gatherer(name, run_.vendor)) {
-            note_gathered(plan->report(number));
+            note_gathered(report_of(*plan, number));
         }
     }
 }
@@ -204,11 +207,11 @@ void ReportReader::note_earlier_plan(const std::string &text)
 void ReportReader::note_gathered(std::size_t element)
 {
     if (const auto plan = Plan::parse_annotated(read_stored_plan().value_or(""))) {
-        note_gathered(plan->report(element));
+        note_gathered(report_of(*plan, element));
     }
 }
 
-void ReportReader::note_judged(RunningItem &active)
+void ReportReader::watch_for_late_reports(RunningItem &active)
 {
     const ItemReport &report = item_at(run_, active.place).report;
     if (active.gathers) {
@@ -237,14 +240,14 @@ void ReportReader::forget_round()
 void ReportReader::note_gathered(const ItemReport &report)
 {
     if (has_result(report)) {
-        std::erase(gathered_, as_made_loadable(report));
-        gathered_.push_back(as_made_loadable(report));
+        std::erase_if(gathered_, [&](const ItemReport &one) { return is_same(one, report); });
+        gathered_.push_back(report);
     }
 }
 
 bool ReportReader::was_gathered(const ItemReport &report) const
 {
-    return std::ranges::find(gathered_, as_made_loadable(report)) != gathered_.end();
+    return is_among(gathered_, report);
 }
 
 void ReportReader::read_report(RunningItem &active, const Plan &plan)
@@ -256,11 +259,11 @@ void ReportReader::read_report(RunningItem &active, const Plan &plan)
     }
     ItemRun &result = item_at(run_, active.place);
     ItemReport report = report_of(plan, number);
-    if (is_older(active, plan, report)) {
+    if (reject_stale(active, plan, report)) {
         active.reporting.overwritten = true;
         return;
     }
-    if (as_made_loadable(report) == as_made_loadable(result.report) ||
+    if (is_same(report, result.report) ||
         (active.reporting.overwritten && !has_result(report))) { // as it was cleared
         return;
     }
@@ -284,10 +287,8 @@ void ReportReader::read_late_report(Judged &judged, const Plan &plan)
     if (!is_item(plan, number, item_at(run_, judged.place).name)) {
         return;
     }
-    const auto is_same = [&](const RunningItem &active) {
-        return active.place.suite == judged.place.suite && active.place.item == judged.place.item;
-    };
-    if (std::ranges::any_of(running_.items, is_same)) {
+    const auto &items = running_.items;
+    if (std::ranges::find(items, judged.place, &RunningItem::place) != items.end()) {
         plan_status_ = {}; // its end is told first: look again then
         return;
     }
@@ -296,10 +297,7 @@ void ReportReader::read_late_report(Judged &judged, const Plan &plan)
     if (!bears_mark(plan, judged.element, judged.mark) && !keeps_copy) {
         return;
     }
-    const auto is_report = [&](const ItemReport &one) {
-        return as_made_loadable(one) == as_made_loadable(report);
-    };
-    if (!has_result(report) || std::ranges::any_of(judged.seen, is_report)) {
+    if (!has_result(report) || is_among(judged.seen, report)) {
         return;
     }
     judged.seen.push_back(report);

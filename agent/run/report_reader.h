@@ -12,6 +12,7 @@
 
 #include <chrono>
 #include <cstddef>
+#include <optional>
 #include <string>
 #include <sys/stat.h>
 #include <vector>
@@ -45,11 +46,11 @@ class ReportReader
     // a gatherer that has just been started gets on.
     void begin_gathering();
 
-    // An item has been judged: what it reports from now on is late.
-    void note_judged(RunningItem &active);
+    // The item has been judged.
+    void watch_for_late_reports(RunningItem &active);
 
-    // What items of this job, or of the round, report from now on is not told as late
-    // either. A gatherer's still is after its round.
+    // Watches for late reports of these items no longer. A gatherer is watched across
+    // rounds.
     void forget(const Job &job);
     void forget_round();
 
@@ -66,7 +67,7 @@ class ReportReader
 
     void read_report(RunningItem &active, const Plan &plan);
     void read_late_report(Judged &judged, const Plan &plan);
-    bool is_older(RunningItem &active, const Plan &plan, const ItemReport &report);
+    bool reject_stale(RunningItem &active, const Plan &plan, const ItemReport &report);
     void mark_again(std::vector<std::size_t> numbers);
     void tell_late(const Place &place, bool gathers, int round, const ItemReport &report);
     void note_gathered(const ItemReport &report);

@@ -102,6 +102,8 @@ struct Run {
 struct Place {
     std::size_t suite = 0;
     std::size_t item = 0;
+
+    bool operator==(const Place &) const = default;
 };
 
 ItemRun &item_at(Run &run, Place place);

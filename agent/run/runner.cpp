@@ -5,17 +5,14 @@
 
 #include "module/preflight.h"
 #include "module/stored_plan.h"
-#include "plan/plan_text.h"
-#include "util/files.h"
+#include "plan/plan.h"
 #include "util/text.h"
 
 #include <algorithm>
 #include <array>
 #include <csignal>
-#include <cstdlib>
 #include <fmt/core.h>
 #include <sys/wait.h>
-#include <thread>
 #include <unistd.h>
 #include <utility>
 
@@ -39,16 +36,6 @@ void append_output(std::string &output, const std::string &text)
 // A gatherer that is being started may not be there yet.
 constexpr auto kBeforeMissed = 500ms;
 constexpr auto kBetweenPolls = 250ms;
-
-constexpr char kOverwrittenAfter[] =
-    "; a process with an old copy of the plan has written it over meanwhile";
-
-std::string reported(const ItemReport &report)
-{
-    return report.result_without_value
-               ? "reported a result that is none of 0, 1 and -2: the plan has no text for it"
-               : fmt::format("reported the result {}", report.result.value_or(""));
-}
 
 // What the item died by; 0 where it ended by itself. A shell that has not become the
 // item, as for quotes in its arguments, says so by its own exit status.
@@ -96,6 +83,13 @@ void Runner::give_up(const std::string &why)
     }
 }
 
+// The device is not as it should be.
+void Runner::break_off(const std::string &why)
+{
+    broken_ = true;
+    give_up(why);
+}
+
 bool Runner::goes_on()
 {
     read_signals();
@@ -114,7 +108,7 @@ bool Runner::run(const Job &job)
             names.push_back(run_.suites[job.suite].items[target->item].name);
         }
     }
-    note_lost_library();
+    drain_events();
     library_.restart(); // if something has ended it since the last job: that costs nothing
     // a process that reports, such as a gatherer, truncates the plan before it writes it:
     // the library may load it until it has come to the first item
@@ -172,9 +166,8 @@ void Runner::require_plan()
     if (plan.annotated || Plan::load_as_library(plan.text)) {
         return;
     }
-    give_up(fmt::format("the stored plan {} is gone, or not whole any more: store it again",
-                        kStoredPlan));
-    broken_ = true;
+    break_off(fmt::format("the stored plan {} is gone, or not whole any more: store it again",
+                          kStoredPlan));
 }
 
 void Runner::handle(const LibraryProcess::Event &event, bool &runs)
@@ -196,7 +189,7 @@ void Runner::handle(const LibraryProcess::Event &event, bool &runs)
         move_on(event);
         break;
     case LibraryProcess::Event::Kind::stopped:
-        note_stop(event);
+        end_stop(event);
         break;
     case LibraryProcess::Event::Kind::gone:
         runs = false;
@@ -206,11 +199,11 @@ void Runner::handle(const LibraryProcess::Event &event, bool &runs)
 }
 
 // Its end between two jobs: what it has started comes to this process then.
-void Runner::note_lost_library()
+void Runner::drain_events()
 {
     while (const auto event = library_.wait(0ms)) {
         if (event->kind == LibraryProcess::Event::Kind::stopped) {
-            note_stop(*event);
+            end_stop(*event);
         } else if (event->kind == LibraryProcess::Event::Kind::gone) {
             stop_asked_ = false; // it answers no more
         }
@@ -347,7 +340,7 @@ void Runner::end_item(const LibraryProcess::Event &event)
     }
     const std::vector<Leftover> left =
         event.left_running
-            ? note_left_running(is_watched ? running_.items.back().element : kNoElement)
+            ? find_left_running(is_watched ? running_.items.back().element : kNoElement)
             : std::vector<Leftover>();
     if (is_watched) {
         RunningItem &active = running_.items.back();
@@ -413,129 +406,14 @@ void Runner::finish(RunningItem &active, TimePoint end)
     // the library may be at the next item of its command already, which has not been left
     if (active.gathers && running_.items.size() == 1 && !active.stop &&
         running_.next >= running_.job.targets.size()) {
-        result.left_running = note_left_running(active.element);
+        result.left_running = find_left_running(active.element);
     }
     if (active.gathers && !(result.report.progress == "100" && has_result(result.report))) {
         gatherer_may_report_late_ = true;
         signal_each(library_.processes().of_gatherer(), SIGTERM);
     }
-    reader_.note_judged(active);
+    reader_.watch_for_late_reports(active);
     mend_stored_plan();
-}
-
-void Runner::judge(const RunningItem &active)
-{
-    ItemRun &result = item_at(run_, active.place);
-    const ItemReport &report = result.report;
-    const bool has_reported = has_result(report);
-    if (active.stop == Outcome::timed_out ||
-        (active.stop == Outcome::stopped && active.was_stopped)) {
-        result.outcome = *active.stop;
-        result.reason = why_stopped(active);
-    } else if (!library_gone_.empty()) {
-        result.outcome = has_reported ? Outcome::failed : Outcome::no_result;
-        result.reason = library_gone_;
-        result.overruled = has_reported;
-    } else if (result.signal != 0) {
-        result.outcome = Outcome::failed;
-        result.reason = fmt::format("died by {}{}", name_of_signal(result.signal),
-                                    has_reported ? ", though it " + reported(report) : "");
-    } else if (!has_reported || active.reporting.lost) {
-        result.outcome = Outcome::no_result;
-        result.reason = why_silent(active);
-    } else if (active.gathers && report.progress != "100") {
-        result.outcome = Outcome::failed;
-        result.reason = fmt::format(
-            "the gatherer {} at progress {}{}, though it {}",
-            active.gatherer_end.empty() ? "was" : "ended", report.progress.value_or("0"),
-            active.gatherer_end.empty() ? " after " + fine_duration(kForGathering.count()) : "",
-            reported(report));
-        result.overruled = true;
-    } else if (limits_.exit_status && result.exit_status.value_or(0) != 0) {
-        result.outcome = Outcome::failed;
-        result.reason = fmt::format("ended with exit status {}, though it {}", *result.exit_status,
-                                    reported(report));
-    } else if (report.result == std::to_string(run_.pass_code)) {
-        result.outcome = Outcome::passed;
-    } else {
-        result.outcome = Outcome::failed;
-        result.reason = reported(report);
-        if (active.reporting.overwritten) {
-            result.reason += kOverwrittenAfter;
-        }
-    }
-}
-
-std::string Runner::why_stopped(const RunningItem &active)
-{
-    if (!active.was_stopped && !library_gone_.empty()) {
-        return fmt::format("past the limit of {}: {}", fine_duration(limits_.item->count()),
-                           library_gone_);
-    }
-    const double seconds = *item_at(run_, active.place).seconds;
-    if (!active.was_stopped) {
-        return fmt::format("{} after {}, past the limit of {}",
-                           active.gathers ? "reported" : "ended by itself", fine_duration(seconds),
-                           fine_duration(limits_.item->count()));
-    }
-    const bool is_interrupted = active.stop == Outcome::stopped;
-    if (!active.killed) {
-        return is_interrupted ? fmt::format("stopped by {}", signal_name(signal_))
-                              : fmt::format("stopped after {}{}", duration(seconds),
-                                            active.reporting.overwritten ? kOverwrittenAfter : "");
-    }
-    return fmt::format("killed after {}, as it did not end when it was asked to",
-                       is_interrupted ? "the run was interrupted by " + signal_name(signal_)
-                                      : duration(seconds));
-}
-
-std::string Runner::why_silent(const RunningItem &active)
-{
-    const auto suffix = vendor_suffix(vendor_);
-    if (!suffix) {
-        return fmt::format("vendor {} runs no item", vendor_);
-    }
-    const std::string program = program_of(item_at(run_, active.place).name, *suffix);
-    if (is_plain_name(item_at(run_, active.place).name) && access(program.c_str(), X_OK) != 0) {
-        return fmt::format("there is no program {}", one_line(program));
-    }
-    if (active.reporting.overwritten) {
-        return active.gathers ? "a process with an old copy of the plan has written it over, "
-                                "perhaps the gatherer: let it report by a new process each time"
-                              : "a process with an old copy of the plan has written it over, and "
-                                "nothing was reported after that";
-    }
-    if (active.reporting.in_another_plan) {
-        return "the stored plan is another one by now: a process that knows that one has saved it";
-    }
-    if (active.reporting.undone) {
-        return "a process with an old copy of the plan has written over what it had reported";
-    }
-    if (!active.gatherer_end.empty()) {
-        return active.gatherer_end;
-    }
-    if (active.reporting.lost) {
-        return "what it reported is lost: the stored plan is gone, or not whole any more";
-    }
-    const std::string text = read_stored_plan().value_or("");
-    if (text.empty()) {
-        return "no report could be written: the stored plan is gone";
-    }
-    if (!Plan::parse_annotated(text)) {
-        return "no report could be written: the stored plan is not whole any more";
-    }
-    std::string why;
-    if (!Plan::load_as_library(text, &why)) {
-        return fmt::format("no report can be written any more: the stored plan does not load ({})",
-                           why);
-    }
-    if (active.reporting.beside_gatherer) {
-        return "no report is there: there was none, or the gatherer's old copy of the plan, "
-               "saved meanwhile, has written over it";
-    }
-    return active.gathers ? fmt::format("no result was reported within {}",
-                                        fine_duration(limits_.item.value_or(kForGathering).count()))
-                          : "ended without reporting a result";
 }
 
 // In the order of their starts, because that is the order of their numbers.

@@ -83,7 +83,7 @@ class Runner
     void start_next(const LibraryProcess::Event &event);
     void end_item(const LibraryProcess::Event &event);
     void move_on(const LibraryProcess::Event &event);
-    void note_lost_library();
+    void drain_events();
     void lose_library(const LibraryProcess::Event &event);
     void require_all_started();
     void require_plan();
@@ -95,13 +95,14 @@ class Runner
     void try_stop(RunningItem &active, bool command_runs);
     void stop_gatherer(RunningItem &active, bool command_runs, SteadyClock::duration waited);
     void release_command();
+    void break_off(const std::string &why);
     bool is_stuck() const;
     bool starts_no_more() const;
-    void note_stop(const LibraryProcess::Event &event);
+    void end_stop(const LibraryProcess::Event &event);
     void cannot_stop(RunningItem &active);
     std::vector<Leftover> item_processes() const;
     std::vector<Leftover> processes_of(const RunningItem &active) const;
-    std::vector<Leftover> note_left_running(std::size_t element);
+    std::vector<Leftover> find_left_running(std::size_t element);
     void end_left_running();
     void end_gatherer();
     template <typename Find> void end_all(const Find &find);

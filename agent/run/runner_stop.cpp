@@ -212,7 +212,7 @@ void Runner::stop_gatherer(RunningItem &active, bool command_runs, SteadyClock::
 
 // A stop does not find an item whose process has another name, as a script's is its
 // shell's, and meets another process whose name begins as the item's.
-void Runner::note_stop(const LibraryProcess::Event &event)
+void Runner::end_stop(const LibraryProcess::Event &event)
 {
     stop_asked_ = false;
     if (running_.items.empty() || running_.items.back().done) {
@@ -231,10 +231,9 @@ void Runner::note_stop(const LibraryProcess::Event &event)
 void Runner::cannot_stop(RunningItem &active)
 {
     const std::vector<Leftover> left = item_processes();
-    broken_ = true;
-    give_up(fmt::format("{}/{} cannot be killed: {} goes on running",
-                        item_at(run_, active.place).group, item_at(run_, active.place).name,
-                        described(left)));
+    break_off(fmt::format("{}/{} cannot be killed: {} goes on running",
+                          item_at(run_, active.place).group, item_at(run_, active.place).name,
+                          described(left)));
     active.was_stopped = true;
     active.killed = true;
     finish(active, now());
@@ -254,7 +253,7 @@ std::vector<Leftover> Runner::processes_of(const RunningItem &active) const
     return active.gathers ? library_.processes().of_gatherer() : item_processes();
 }
 
-std::vector<Leftover> Runner::note_left_running(std::size_t element)
+std::vector<Leftover> Runner::find_left_running(std::size_t element)
 {
     std::vector<Leftover> found = item_processes();
     for (const auto begin = SteadyClock::now();
@@ -274,16 +273,15 @@ template <typename Find> void Runner::end_all(const Find &find)
 {
     const auto begin = now();
     const auto find_all = [&] {
-        note_lost_library();
+        drain_events();
         return find();
     };
     std::set<pid_t> asked;
     for (auto left = find_all(); !left.empty(); left = find_all()) {
         const auto waited = now() - begin;
         if (waited > limits_.grace + kBeforeGivingUp) {
-            give_up(fmt::format("{} cannot be killed, and would report into the next round",
-                                described(left)));
-            broken_ = true;
+            break_off(fmt::format("{} cannot be killed, and would report into the next round",
+                                  described(left)));
             return;
         }
         if (waited > limits_.grace) {

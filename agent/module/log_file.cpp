@@ -1,0 +1,74 @@
+// SPDX-FileCopyrightText: 2026 The Quillmark authors
+// SPDX-License-Identifier: Apache-2.0
+
+#include "module/log_file.h"
+
+#include "common/descriptor.h"
+#include "util/failure.h"
+#include "util/text.h"
+
+#include <cerrno>
+#include <cstdlib>
+#include <cstring>
+#include <fcntl.h>
+#include <fmt/core.h>
+#include <string_view>
+#include <unistd.h>
+
+namespace fptest
+{
+namespace
+{
+
+constexpr char kLogVariable[] = "VR_LOG_FILE";
+
+// The library's process has other descriptors than this one.
+std::string for_all_processes(const std::string &file)
+{
+    static constexpr std::pair<std::string_view, std::string_view> kOwn[] = {
+        {"/dev/stdout", "1"}, {"/dev/stderr", "2"}, {"/dev/fd/", ""}, {"/proc/self/fd/", ""}};
+    for (const auto &[name, number] : kOwn) {
+        if (number.empty() ? file.starts_with(name) : file == name) {
+            return fmt::format("/proc/{}/fd/{}{}", getpid(), number, file.substr(name.size()));
+        }
+    }
+    return file;
+}
+
+} // namespace
+
+std::string label(const NamedFile &file)
+{
+    return file.first + (file.first.starts_with('-') ? " " : "=") + one_line(file.second);
+}
+
+NamedFile log_file(const std::string &option)
+{
+    const char *inherited = std::getenv(kLogVariable);
+    if (!option.empty() || inherited == nullptr) {
+        return {"--log", option};
+    }
+    return {kLogVariable, inherited};
+}
+
+void choose_log(const std::string &option)
+{
+    const NamedFile file = log_file(option);
+    if (file.second.empty()) {
+        setenv(kLogVariable, "/dev/null", 0);
+        return;
+    }
+    const std::string path = for_all_processes(file.second);
+    Descriptor log(
+        open(path.c_str(), O_WRONLY | O_CREAT | O_APPEND | O_NONBLOCK | O_CLOEXEC, 0644));
+    // the library says nothing of what it cannot write
+    if (!log.is_open() || write(log.get(), "", 0) < 0) {
+        throw Failure(Exit::environment, "{} cannot be written: {}; name another file", label(file),
+                      std::strerror(errno));
+    }
+    static Descriptor held(-1); // or a FIFO's reader would see an end before the library begins
+    held = std::move(log);
+    setenv(kLogVariable, path.c_str(), 1);
+}
+
+} // namespace fptest

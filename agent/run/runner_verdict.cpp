@@ -1,0 +1,146 @@
+// SPDX-FileCopyrightText: 2026 The Quillmark authors
+// SPDX-License-Identifier: Apache-2.0
+
+// What the runner makes of an item that has ended: its outcome, and the reason.
+#include "run/runner.h"
+
+#include "module/stored_plan.h"
+#include "plan/library_rules.h"
+#include "util/text.h"
+
+#include <fmt/core.h>
+#include <unistd.h>
+
+namespace fptest
+{
+namespace
+{
+
+constexpr char kOverwrittenAfter[] =
+    "; a process with an old copy of the plan has written it over meanwhile";
+
+std::string reported(const ItemReport &report)
+{
+    return report.result_without_value
+               ? "reported a result that is none of 0, 1 and -2: the plan has no text for it"
+               : fmt::format("reported the result {}", report.result.value_or(""));
+}
+
+} // namespace
+
+void Runner::judge(const RunningItem &active)
+{
+    ItemRun &result = item_at(run_, active.place);
+    const ItemReport &report = result.report;
+    const bool has_reported = has_result(report);
+    if (active.stop == Outcome::timed_out ||
+        (active.stop == Outcome::stopped && active.was_stopped)) {
+        result.outcome = *active.stop;
+        result.reason = why_stopped(active);
+    } else if (!library_gone_.empty()) {
+        result.outcome = has_reported ? Outcome::failed : Outcome::no_result;
+        result.reason = library_gone_;
+        result.overruled = has_reported;
+    } else if (result.signal != 0) {
+        result.outcome = Outcome::failed;
+        result.reason = fmt::format("died by {}{}", name_of_signal(result.signal),
+                                    has_reported ? ", though it " + reported(report) : "");
+    } else if (!has_reported || active.reporting.lost) {
+        result.outcome = Outcome::no_result;
+        result.reason = why_silent(active);
+    } else if (active.gathers && report.progress != "100") {
+        result.outcome = Outcome::failed;
+        result.reason = fmt::format(
+            "the gatherer {} at progress {}{}, though it {}",
+            active.gatherer_end.empty() ? "was" : "ended", report.progress.value_or("0"),
+            active.gatherer_end.empty() ? " after " + fine_duration(kForGathering.count()) : "",
+            reported(report));
+        result.overruled = true;
+    } else if (limits_.exit_status && result.exit_status.value_or(0) != 0) {
+        result.outcome = Outcome::failed;
+        result.reason = fmt::format("ended with exit status {}, though it {}", *result.exit_status,
+                                    reported(report));
+    } else if (report.result == std::to_string(run_.pass_code)) {
+        result.outcome = Outcome::passed;
+    } else {
+        result.outcome = Outcome::failed;
+        result.reason = reported(report);
+        if (active.reporting.overwritten) {
+            result.reason += kOverwrittenAfter;
+        }
+    }
+}
+
+std::string Runner::why_stopped(const RunningItem &active)
+{
+    if (!active.was_stopped && !library_gone_.empty()) {
+        return fmt::format("past the limit of {}: {}", fine_duration(limits_.item->count()),
+                           library_gone_);
+    }
+    const double seconds = *item_at(run_, active.place).seconds;
+    if (!active.was_stopped) {
+        return fmt::format("{} after {}, past the limit of {}",
+                           active.gathers ? "reported" : "ended by itself", fine_duration(seconds),
+                           fine_duration(limits_.item->count()));
+    }
+    const bool is_interrupted = active.stop == Outcome::stopped;
+    if (!active.killed) {
+        return is_interrupted ? fmt::format("stopped by {}", signal_name(signal_))
+                              : fmt::format("stopped after {}{}", duration(seconds),
+                                            active.reporting.overwritten ? kOverwrittenAfter : "");
+    }
+    return fmt::format("killed after {}, as it did not end when it was asked to",
+                       is_interrupted ? "the run was interrupted by " + signal_name(signal_)
+                                      : duration(seconds));
+}
+
+std::string Runner::why_silent(const RunningItem &active)
+{
+    const auto suffix = vendor_suffix(vendor_);
+    if (!suffix) {
+        return fmt::format("vendor {} runs no item", vendor_);
+    }
+    const std::string program = program_of(item_at(run_, active.place).name, *suffix);
+    if (is_plain_name(item_at(run_, active.place).name) && access(program.c_str(), X_OK) != 0) {
+        return fmt::format("there is no program {}", one_line(program));
+    }
+    if (active.reporting.overwritten) {
+        return active.gathers ? "a process with an old copy of the plan has written it over, "
+                                "perhaps the gatherer: let it report by a new process each time"
+                              : "a process with an old copy of the plan has written it over, and "
+                                "nothing was reported after that";
+    }
+    if (active.reporting.in_another_plan) {
+        return "the stored plan is another one by now: a process that knows that one has saved it";
+    }
+    if (active.reporting.undone) {
+        return "a process with an old copy of the plan has written over what it had reported";
+    }
+    if (!active.gatherer_end.empty()) {
+        return active.gatherer_end;
+    }
+    if (active.reporting.lost) {
+        return "what it reported is lost: the stored plan is gone, or not whole any more";
+    }
+    const std::string text = read_stored_plan().value_or("");
+    if (text.empty()) {
+        return "no report could be written: the stored plan is gone";
+    }
+    if (!Plan::parse_annotated(text)) {
+        return "no report could be written: the stored plan is not whole any more";
+    }
+    std::string why;
+    if (!Plan::load_as_library(text, &why)) {
+        return fmt::format("no report can be written any more: the stored plan does not load ({})",
+                           why);
+    }
+    if (active.reporting.beside_gatherer) {
+        return "no report is there: there was none, or the gatherer's old copy of the plan, "
+               "saved meanwhile, has written over it";
+    }
+    return active.gathers ? fmt::format("no result was reported within {}",
+                                        fine_duration(limits_.item.value_or(kForGathering).count()))
+                          : "ended without reporting a result";
+}
+
+} // namespace fptest
