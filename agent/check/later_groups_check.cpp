@@ -3,12 +3,10 @@
 
 #include "check/later_groups_check.h"
 
-#include <algorithm>
 #include <cctype>
 #include <string>
 #include <unordered_map>
 #include <unordered_set>
-#include <utility>
 
 namespace fptest
 {

@@ -82,7 +82,8 @@ struct RunningItem {
 
 struct RunningJob {
     Job job;
-    std::size_t next = 0; // of its targets
+    bool command_runs = false; // the library has not returned from it
+    std::size_t next = 0;      // of its targets
     // The last one is the library's current item, those before it are gatherers.
     std::deque<RunningItem> items;
 };

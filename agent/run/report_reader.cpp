@@ -8,7 +8,6 @@
 #include "util/failure.h"
 
 #include <algorithm>
-#include <sys/stat.h>
 #include <utility>
 
 namespace fptest

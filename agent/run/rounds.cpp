@@ -7,7 +7,6 @@
 #include "module/stored_plan.h"
 #include "plan/plan.h"
 #include "plan/plan_text.h"
-#include "util/files.h"
 #include "util/text.h"
 #include "util/write.h"
 
@@ -15,7 +14,6 @@
 #include <chrono>
 #include <fmt/core.h>
 #include <poll.h>
-#include <thread>
 #include <unistd.h>
 #include <utility>
 

@@ -116,15 +116,14 @@ bool Runner::run(const Job &job)
     library_.command("XMLNodePath::" + job.path, names);
     heard_of_at_ = now();
 
-    running_ = {job, 0, {}};
-    bool runs = true;
-    while ((runs || !running_.items.empty()) && !broken_) {
+    running_ = {.job = job, .command_runs = true};
+    while ((running_.command_runs || !running_.items.empty()) && !broken_) {
         if (const auto event = library_.wait(kTurn, signals_.descriptor())) {
             plan = Descriptor(-1);
             heard_of_at_ = now();
-            handle(*event, runs);
+            handle(*event);
         }
-        watch(runs);
+        watch();
     }
     if (!broken_) {
         require_all_started();
@@ -170,7 +169,7 @@ void Runner::require_plan()
                           kStoredPlan));
 }
 
-void Runner::handle(const LibraryProcess::Event &event, bool &runs)
+void Runner::handle(const LibraryProcess::Event &event)
 {
     switch (event.kind) {
     case LibraryProcess::Event::Kind::item:
@@ -185,14 +184,14 @@ void Runner::handle(const LibraryProcess::Event &event, bool &runs)
         library_.go_on();
         break;
     case LibraryProcess::Event::Kind::returned:
-        runs = false;
+        running_.command_runs = false;
         move_on(event);
         break;
     case LibraryProcess::Event::Kind::stopped:
         end_stop(event);
         break;
     case LibraryProcess::Event::Kind::gone:
-        runs = false;
+        running_.command_runs = false;
         lose_library(event);
         break;
     }
@@ -230,12 +229,12 @@ void Runner::lose_library(const LibraryProcess::Event &event)
     }
 }
 
-void Runner::watch(bool command_runs)
+void Runner::watch()
 {
     read_signals();
     reader_.poll();
     poll_gatherers();
-    stop_what_is_due(command_runs);
+    stop_what_is_due();
     notify_ended();
     tick();
 }

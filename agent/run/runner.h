@@ -78,8 +78,8 @@ class Runner
     TimePoint now() const;
     TimePoint on_run_clock(TimePoint time) const; // of a moment on the steady clock
 
-    void watch(bool command_runs);
-    void handle(const LibraryProcess::Event &event, bool &runs);
+    void watch();
+    void handle(const LibraryProcess::Event &event);
     void start_next(const LibraryProcess::Event &event);
     void end_item(const LibraryProcess::Event &event);
     void move_on(const LibraryProcess::Event &event);
@@ -91,9 +91,9 @@ class Runner
     void poll_gatherer(RunningItem &active);
     void read_signals();
     void suspend();
-    void stop_what_is_due(bool command_runs);
-    void try_stop(RunningItem &active, bool command_runs);
-    void stop_gatherer(RunningItem &active, bool command_runs, SteadyClock::duration waited);
+    void stop_what_is_due();
+    void try_stop(RunningItem &active);
+    void stop_gatherer(RunningItem &active);
     void release_command();
     void break_off(const std::string &why);
     bool is_stuck() const;

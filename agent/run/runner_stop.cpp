@@ -105,7 +105,7 @@ void Runner::suspend()
 
 // --- items --------------------------------------------------------------------
 
-void Runner::stop_what_is_due(bool command_runs)
+void Runner::stop_what_is_due()
 {
     for (RunningItem &active : running_.items) {
         if (!active.done && !active.stop && limits_.item && now() - active.start > *limits_.item) {
@@ -114,15 +114,15 @@ void Runner::stop_what_is_due(bool command_runs)
         }
     }
     if (!running_.items.empty() && !running_.items.back().done && running_.items.back().stop) {
-        try_stop(running_.items.back(), command_runs);
+        try_stop(running_.items.back());
     }
-    if (running_.items.empty() && command_runs && is_stuck()) {
+    if (running_.items.empty() && running_.command_runs && is_stuck()) {
         library_.kill_library(); // it comes to no item, and does not return
     }
     // the library stops only what it started last: an earlier gatherer gets signals alone
     for (RunningItem &active : running_.items) {
         if (&active != &running_.items.back() && !active.done && active.stop) {
-            stop_gatherer(active, false, now() - active.stop_wanted_at);
+            stop_gatherer(active);
         }
     }
 }
@@ -139,7 +139,7 @@ bool Runner::is_stuck() const
 
 // Through the library, again and again, as the item may only just be starting; and
 // by a signal that nothing can ignore where that does not help in time.
-void Runner::try_stop(RunningItem &active, bool command_runs)
+void Runner::try_stop(RunningItem &active)
 {
     const auto waited = now() - active.stop_wanted_at;
     const bool gatherer = active.gathers;
@@ -165,7 +165,7 @@ void Runner::try_stop(RunningItem &active, bool command_runs)
         stop_asked_ = true;
     }
     if (gatherer) {
-        stop_gatherer(active, command_runs, waited);
+        stop_gatherer(active);
     } else if (waited > limits_.grace && signal_each(item_processes(), SIGKILL)) {
         active.was_stopped = true;
         active.killed = true;
@@ -189,14 +189,16 @@ bool Runner::starts_no_more() const
     return signal_ != 0 && running_.next < running_.job.targets.size();
 }
 
-void Runner::stop_gatherer(RunningItem &active, bool command_runs, SteadyClock::duration waited)
+void Runner::stop_gatherer(RunningItem &active)
 {
-    if (command_runs && waited > kBeforeRelease) {
+    const auto waited = now() - active.stop_wanted_at;
+    const bool is_last = &active == &running_.items.back();
+    if (is_last && running_.command_runs && waited > kBeforeRelease) {
         active.was_stopped = true;
         release_command();
     }
     const std::vector<Leftover> left = library_.processes().of_gatherer();
-    if (&active != &running_.items.back() && !active.was_stopped && signal_each(left, SIGTERM)) {
+    if (!is_last && !active.was_stopped && signal_each(left, SIGTERM)) {
         signal_each(left, SIGCONT); // one that is suspended would not see it
         active.was_stopped = true;
     }
