@@ -33,7 +33,7 @@ std::string decimal(double value, int places);
 // standard output goes nowhere from now on, and the figures go where that went.
 void set_library_output_aside();
 
-// Prints a line. A column's width is negative where its text stands left.
+// Prints a line. A column's width is negative where its text is aligned left.
 using Widths = std::array<int, 8>;
 inline constexpr Widths kCaseWidths{-27, 9, 9, 8, 8, 7, 8};
 void print(const std::vector<std::string> &columns, const Widths &widths = kCaseWidths);

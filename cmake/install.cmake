@@ -17,8 +17,8 @@ install(TARGETS quillmark EXPORT quillmark
     NAMELINK_COMPONENT development)
 
 if(TARGET vorlane)
-  # Not beside the library, so that it stands in nobody's way: the platform's has the
-  # same name.
+  # Not beside the library, so that it hides no other: the platform's has the same
+  # name.
   set(vorlane_directory ${CMAKE_INSTALL_LIBDIR}/quillmark)
   if(ANDROID)
     set(vorlane_directory ${CMAKE_INSTALL_LIBDIR})

@@ -2,7 +2,7 @@
 // SPDX-License-Identifier: Apache-2.0
 
 // Where the plan checker and the device's shell must be of one mind; what is said of
-// command lines is in check/shell.txt.
+// command lines is in check/programs.txt.
 #include "check/check.h"
 #include "check/shell_reader.h"
 #include "support/process.h"

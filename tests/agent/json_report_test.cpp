@@ -1,7 +1,7 @@
 // SPDX-FileCopyrightText: 2026 The Quillmark authors
 // SPDX-License-Identifier: Apache-2.0
 // The JSON lines that a run leaves.
-#include "reports_test.h"
+#include "reporters_test.h"
 
 #include <array>
 #include <chrono>
@@ -10,7 +10,7 @@
 #include <thread>
 #include <unistd.h>
 
-using namespace reports_test;
+using namespace reporters_test;
 using namespace std::chrono_literals;
 
 namespace

@@ -1,7 +1,7 @@
 // SPDX-FileCopyrightText: 2026 The Quillmark authors
 // SPDX-License-Identifier: Apache-2.0
 // The JUnit XML that a run leaves.
-#include "reports_test.h"
+#include "reporters_test.h"
 
 #include <chrono>
 #include <fcntl.h>
@@ -10,13 +10,13 @@
 #include <thread>
 #include <unistd.h>
 
-using namespace reports_test;
+using namespace reporters_test;
 using namespace std::chrono_literals;
 
 namespace
 {
 
-TEST_F(JunitReport, IsThisDocument)
+TEST_F(JunitReport, WritesTheExpectedDocument)
 {
     RunOfItems run =
         run_of({suite("Bringup", {passed("SpiCheck"), failed("DeadPixel"),
@@ -313,7 +313,7 @@ TEST_F(JunitReport, GoesIntoAPipeOnceAtTheEnd)
     EXPECT_THAT(directory_.names(), ElementsAre("pipe"));
 }
 
-TEST_F(JunitReport, DoesNotReplaceAFileThatIsSomebodysOutput)
+TEST_F(JunitReport, GoesIntoAnOpenDescriptorWithoutReplacingItsFile)
 {
     const int file = open(path("out").c_str(), O_RDWR | O_CREAT | O_CLOEXEC, 0666);
     ASSERT_EQ(write(file, "before\n", 7), 7);

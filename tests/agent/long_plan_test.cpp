@@ -104,7 +104,7 @@ TEST_F(LongPlan, IsNotPlacedWhereNothingIsRun)
     EXPECT_EQ(read_file(kPlanFile), old);
 }
 
-TEST_F(LongPlan, KeepsToTheCommandWhereThatIsAskedFor)
+TEST_F(LongPlan, IsCutAtTheCommandsLimitWithAsSent)
 {
     const Plan long_plan = plan_of_groups(20, "");
     const std::string file = plan(long_plan.text);

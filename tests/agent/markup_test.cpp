@@ -124,7 +124,7 @@ TEST(Scan, EndsAnInstructionAtItsFirstQuestionMarkAndBracket)
     EXPECT_THAT(scanned("<?a?>"), ElementsAre("instruction a|<?a?>"));
 }
 
-TEST(Scan, TakesWhatBreaksOff)
+TEST(Scan, EndsAnUnfinishedTagWithTheText)
 {
     EXPECT_THAT(scanned("<"), ElementsAre("open|< ..."));
     EXPECT_THAT(scanned("<a"), ElementsAre("open a|<a ..."));

@@ -224,7 +224,7 @@ TEST_F(Output, OneReportAtMostGoesToStandardOutputByWhateverName)
     }
 }
 
-TEST_F(Output, WhatSwallowsEverythingMayBeNamedForAll)
+TEST_F(Output, DevNullMayBeNamedForEveryReport)
 {
     const Start start{.arguments = {"run", "--tap", "--json", "/dev/null", "--junit", "/dev/stdout",
                                     "--plan", plan(kLoud), "P/G/Third"},

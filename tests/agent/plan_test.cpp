@@ -201,7 +201,7 @@ TEST(LoadedPlan, MayBeInUtf16AsForTheLibrary)
     EXPECT_THAT(listed(loaded(text)), ElementsAre("A: x"));
 }
 
-TEST(LoadedPlan, LacksWhatAFileEndsWithAtABadCharacter)
+TEST(LoadedPlan, EndsAtABadCharacter)
 {
     // without a declaration the root needs no end
     for (const std::string &bad : {"\x01"s, "\0"s, "\xFFz"s}) {
@@ -320,7 +320,7 @@ TEST(Groups, AreFoundByTheFirstOfTheirName)
     EXPECT_EQ(plan.find_group(""), nullptr);
 }
 
-TEST(Groups, HaveNumbersOfElements)
+TEST(Groups, KnowTheirElementNumbers)
 {
     const Plan plan =
         loaded(plan_of("<!-- c -->" + group("A", cmd("x") + "<!-- d -->" + cmd("y"))));

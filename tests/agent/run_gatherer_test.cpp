@@ -7,8 +7,11 @@
 
 #include <algorithm>
 #include <csignal>
+#include <fcntl.h>
 #include <map>
+#include <sys/stat.h>
 #include <sys/types.h>
+#include <unistd.h>
 
 namespace
 {
@@ -78,7 +81,7 @@ TEST_F(RunGatherer, InterruptedInAGroupsCommandIsFollowedByNoOtherItem)
     EXPECT_FALSE(is_there("order"));
 }
 
-TEST_F(RunGatherer, LeavesNoItemRunningThatIsTheNextOneOfItsGroup)
+TEST_F(RunGatherer, DoesNotCountTheNextItemOfItsGroupAsLeftRunning)
 {
     EXPECT_EQ(
         run_group({{"SensorProbe", "--help"}, {"Item", "ignore-stop sleep 30"}, {"Other", kPasses}},
@@ -102,7 +105,7 @@ TEST_F(RunGatherer, RunsTheNextItemOfAGroupWhileItGathers)
     EXPECT_THAT(ended.out, HasSubstr("gathering 1, 64 samples\n"));
 }
 
-TEST_F(RunGatherer, GetsItToGatherInEveryRound)
+TEST_F(RunGatherer, GathersInEveryRound)
 {
     const Ended ended = run_group({{"SensorProbe", "--group G --seconds 0.1"}}, {"--repeat", "3"});
     EXPECT_EQ(ended.status, 0) << ended.err;
@@ -325,6 +328,96 @@ TEST_F(RunGatherer, LetsItsPortGoWhenItIsKilled)
     fptest.signal(SIGKILL);
     EXPECT_TRUE(eventually([] { return !library_waits_for_gatherer(); }, 20));
     EXPECT_TRUE(eventually([] { return processes_named(FPTEST_PROGRAM).empty(); }, 20));
+}
+
+TEST_F(RunGatherer, FailsWhereItEndsBeforeItIsDone)
+{
+    FptestProcess fptest({"run", "--json", work("json"), "--plan",
+                          plan(group_of({{"SensorProbe", "--group G --seconds 60"}})), "P/G"});
+    ASSERT_TRUE(
+        eventually([] { return processes_named("/system/bin/SensorProbe").size() == 1; }, 20));
+    usleep(500'000); // it has been told by now
+    ASSERT_EQ(
+        run_fptest({"report", "G", "SensorProbe", "--progress", "50", "--result", "0"}).status, 0);
+    kill(processes_named(kProbe).at(0).pid, SIGSEGV);
+    EXPECT_EQ(fptest.wait().status, 1);
+    EXPECT_THAT(outcomes(), ElementsAre("SensorProbe: failed"));
+    EXPECT_EQ(reasons().at(0),
+              "the gatherer ended at progress 50, though it reported the result 0");
+}
+
+TEST_F(RunGatherer, IsNotRunWhereAnItemHasTakenItsPort)
+{
+    const Items items = {
+        {"Script",
+         "'fptest report G Script --progress 100 --result 0; nc -l -p 34952 "
+         "&lt;/dev/null >/dev/null 2>/dev/null &amp; until netstat -ltn | grep -q 34952; do "
+         "sleep 0.05; done'"},
+        {"SensorProbe", "--group G --seconds 0"}};
+    Ended ended = run_group(items);
+    EXPECT_EQ(ended.status, 3);
+    EXPECT_EQ(
+        lines_of(ended.err).back(),
+        "fptest: port 34952 is not available: Address already in use; the gatherer's run would "
+        "never end: stop what listens there (netstat -ltnp names it)");
+    EXPECT_THAT(outcomes(), ElementsAre("Script: passed", "SensorProbe: not run"));
+
+    // where the library comes to it without being asked first
+    ended = run_group(items, {"--as-group", "--timeout", "0.5", "--grace", "0.2"});
+    EXPECT_EQ(ended.status, 1);
+    EXPECT_THAT(outcomes(), ElementsAre("Script: passed", "SensorProbe: timed out"));
+    EXPECT_LT(ended.seconds, 20);
+}
+
+TEST_F(RunGatherer, IsKilledInAGroupsCommandWhereItIgnoresTheStop)
+{
+    run_group({{"SensorProbe",
+                "--help >/dev/null; exec /system/bin/Stubborn ignore-stop gather sleep 60"},
+               {"Item", "sleep 4 report G 100 0 fine"}},
+              {"--as-group", "--timeout", "1", "--grace", "0.5"});
+    EXPECT_THAT(outcomes(), ElementsAre("SensorProbe: timed out", "Item: timed out"));
+    EXPECT_THAT(reasons().at(0), StartsWith("killed after 1."));
+    EXPECT_THAT(processes_named("/system/bin/Stubborn"), IsEmpty());
+}
+
+TEST_F(RunGatherer, IsStartedOnceForAllRoundsWhereItIsAScript)
+{
+    // the library does not find it by its name
+    run_group({{"SensorProbe", "--help >/dev/null; exec /system/bin/Item gather report-here G "
+                               "SensorProbe 100 0 fine sleep 30"}},
+              {"--repeat", "3"});
+    EXPECT_THAT(outcomes(),
+                ElementsAre("SensorProbe: passed", "SensorProbe: passed", "SensorProbe: passed"));
+    EXPECT_EQ(processes_named("/system/bin/Item").size(), 1U);
+}
+
+TEST_F(RunGatherer, HasRoomForWhatItPrintsAfterTheRun)
+{
+    run_group({{"SensorProbe", "--group G --seconds 0"}});
+    const auto gatherers = processes_named(kProbe);
+    ASSERT_EQ(gatherers.size(), 1U);
+    const std::string output = "/proc/" + std::to_string(gatherers[0].pid) + "/fd/1";
+    const std::string text(100 * 1024, 'x');
+    const Descriptor again(open(output.c_str(), O_WRONLY | O_CLOEXEC));
+    struct stat status {
+    };
+    ASSERT_EQ(fstat(again.get(), &status), 0);
+    const auto room = status.st_size;
+    EXPECT_GE(room, 1024 * 1024);
+    EXPECT_EQ(pwrite(again.get(), text.data(), text.size(), room - 100 * 1024), 100 * 1024);
+    EXPECT_LT(pwrite(again.get(), text.data(), text.size(), room), 0); // and no more than that
+}
+
+TEST_F(RunGatherer, HasWhatItLeavesRunningNamed)
+{
+    run_group(
+        {{"SensorProbe", "--help >/dev/null; setsid sleep 30 &amp; exec /system/bin/Item gather "
+                         "report-here G SensorProbe 100 0 fine"},
+         {"Item", "report G 100 0 fine"}});
+    const auto ends = events("end");
+    ASSERT_THAT(outcomes(), ElementsAre("SensorProbe: passed", "Item: passed"));
+    ASSERT_EQ(ends.at(0).at("left_running").size(), 1U);
+    EXPECT_TRUE(ends.at(1).at("left_running").empty());
 }
 
 // --- vendors -------------------------------------------------------------------------

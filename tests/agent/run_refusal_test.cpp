@@ -61,7 +61,7 @@ TEST_F(Refusal, OfAnUnknownNameNamesTheNearestAndThoseThereAre)
            {"--plan", path, "P/Bringup/Third"});
 }
 
-TEST_F(Refusal, OfAPathThatIsNone)
+TEST_F(Refusal, NamesWhatIsWrongWithAPath)
 {
     write_file(kPlanFile, kTwoGroups);
     for (const std::string path : {"Bringup", "/Bringup/", "/"}) {

@@ -333,7 +333,7 @@ TEST_F(Run, LosesTheItemInWhichTheLibrarysProcessEndedAndNoOther)
     EXPECT_THAT(running_items(), IsEmpty());
 }
 
-TEST_F(Run, LosesWhatTheLibrarysProcessWouldHaveComeToInAGroupsCommand)
+TEST_F(Run, LosesTheRestOfAGroupsCommandInWhichTheLibrarysProcessEnded)
 {
     FptestProcess fptest(with_group(
         {{"Item", "note /tmp/scene/begun sleep 60"}, {"Other", kPasses}}, {"--as-group"}));

@@ -401,7 +401,7 @@ TEST_F(Run, PrintsNothingQuietlyButWhatDidNotPass)
     EXPECT_EQ(ended.err, "");
 }
 
-TEST_F(Run, MendsAPlanThatAReportMadeUnloadableForTheNextItem)
+TEST_F(Run, RepairsAPlanThatAReportMadeUnloadableForTheNextItem)
 {
     const Ended ended = run_group({{"Item", "report G 100 0 one"},
                                    {"Other", "report G 50 7 odd"}, // an attribute without a value

@@ -4,6 +4,7 @@
 // Raw commands, one process for all of them.
 #include "fptest_runner.h"
 
+#include <algorithm>
 #include <chrono>
 #include <csignal>
 #include <fcntl.h>
@@ -139,6 +140,54 @@ TEST_F(Send, WritesTheLibrarysLogWhereItIsTold)
     EXPECT_EQ(run_fptest({"send", "--log", work("log"), "XMLNodePath::other/path"}).status, 0);
     EXPECT_THAT(paths_run(work("log")), ElementsAre("one/path", "other/path"));
     EXPECT_THAT(paths_run(), IsEmpty());
+}
+
+TEST_F(Send, PrintsAllOfALongOutput)
+{
+    ASSERT_EQ(run_fptest({"send", "XMLFile::" + group_of({{"Item", "flood 1000000"}})}).status, 0);
+    const Ended ended = run_fptest({"send", "XMLNodePath::P/G/Item"});
+    const auto lines = lines_of(ended.err);
+    const auto first = std::ranges::find(lines, "line 1");
+    ASSERT_NE(first, lines.end());
+    std::size_t number = 0;
+    for (auto line = first; line != lines.end() && line->starts_with("line "); ++line) {
+        EXPECT_EQ(*line, "line " + std::to_string(++number));
+    }
+    EXPECT_GT(number, 80000U);
+}
+
+TEST_F(Send, PrintsEachOutputWhereItBelongsThoughItIsReadLate)
+{
+    const std::string text =
+        group_of({{"Item", "say one note /tmp/scene/begun await /tmp/scene/go say 1"},
+                  {"Other", "say two note /tmp/scene/last await /tmp/scene/end"}});
+    FptestProcess fptest({"send", "XMLFile::" + text, "XMLNodePath::P/G"});
+    ASSERT_TRUE(wait_for_file("begun"));
+    fptest.signal(SIGSTOP);
+    file("go", "");
+    ASSERT_TRUE(wait_for_file("last"));
+    fptest.signal(SIGCONT);
+    file("end", "");
+    const Ended ended = fptest.wait();
+    EXPECT_EQ(ended.status, 0);
+    EXPECT_EQ(ended.err, "vendor = 0\none\n1\nvendor = 0\ntwo\n");
+}
+
+TEST_F(Send, IsRefusedDuringARun)
+{
+    const std::string text =
+        group_of({{"Item", "note /tmp/scene/begun await /tmp/scene/go report G 100 0 fine"}});
+    FptestProcess fptest({"run", "--plan", plan(text), "P/G"});
+    ASSERT_TRUE(wait_for_file("begun"));
+    for (const std::string command : {"XMLFile::<P/>", "XMLNodePath::P/G"}) {
+        expect_refusal(3,
+                       "fptest: another fptest is running a plan on this device: wait for its "
+                       "end, or stop it",
+                       {"send", command});
+    }
+    EXPECT_EQ(run_fptest({"send", "pingtest"}).out, "Ping Success!\n");
+    file("go", "");
+    EXPECT_EQ(fptest.wait().status, 0);
 }
 
 TEST_F(Send, StopsTheItemOfAnInterruptedCommand)

@@ -1,13 +1,13 @@
 // SPDX-FileCopyrightText: 2026 The Quillmark authors
 // SPDX-License-Identifier: Apache-2.0
 // The TAP that a run leaves, as a parser and prove read it.
-#include "reports_test.h"
+#include "reporters_test.h"
 
 #include <array>
 #include <fcntl.h>
 #include <unistd.h>
 
-using namespace reports_test;
+using namespace reporters_test;
 
 namespace
 {
@@ -21,7 +21,7 @@ const std::string kPassedBlock = "      ---\n"
                                  "      duration_ms: 301\n"
                                  "      ...\n";
 
-TEST_F(TapReport, IsThisText)
+TEST_F(TapReport, WritesTheExpectedDocument)
 {
     EXPECT_EQ(tap_of(mixed_run()), R"(TAP version 14
 1..2

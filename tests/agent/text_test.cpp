@@ -107,7 +107,7 @@ TEST(InQuotes, IsOnOneLineAndCutWhereThatIsWanted)
     EXPECT_EQ(in_quotes("SensorProbe", 8), "'Senso...'");
 }
 
-TEST(OneLine, TurnsNoText)
+TEST(OneLine, ReplacesDirectionControls)
 {
     for (const std::string turn : {"\u202A", "\u202E", "\u2066", "\u2069"}) {
         EXPECT_EQ(one_line("a" + turn + "b"), "a\uFFFDb");
@@ -174,7 +174,7 @@ TEST(ColumnsDeathTest, AreOneForEachCharacterWhereNoLocaleTells)
         ::testing::ExitedWithCode(0), "");
 }
 
-TEST(Ellipsized, PadsWhatIsCut)
+TEST(PadOrEllipsize, FillsTheWidth)
 {
     const std::string three = "\u65E5\u672C\u8A9E";
     struct Fitted {
@@ -215,7 +215,7 @@ TEST(Ellipsized, PadsWhatIsCut)
     }
 }
 
-TEST(Ellipsized, AlwaysTakesExactlyThatManyColumns)
+TEST(PadOrEllipsize, FillsTheWidthWhateverTheText)
 {
     const std::vector<std::string> parts = {"a", kWide, kAccent, kSmile, "\u00E9", "\uFFFD"};
     unsigned state = 1;

@@ -5,11 +5,12 @@
 // user has asked for is left out without a word.
 #include "run_test.h"
 
-#include <algorithm>
+#include <chrono>
 #include <csignal>
 #include <fcntl.h>
 #include <filesystem>
 #include <sys/stat.h>
+#include <thread>
 #include <unistd.h>
 
 namespace
@@ -136,46 +137,6 @@ TEST_F(Trust, KeepsWhatIsPrintedAfterAnItemHasTruncatedItsOutput)
     EXPECT_THAT(of_end(3, "output"), StartsWith("line 1\nline 2\n"));
 }
 
-TEST_F(Trust, RunsNoGathererWhosePortAnItemHasTaken)
-{
-    const Items items = {
-        {"Script",
-         "'fptest report G Script --progress 100 --result 0; nc -l -p 34952 "
-         "&lt;/dev/null >/dev/null 2>/dev/null &amp; until netstat -ltn | grep -q 34952; do "
-         "sleep 0.05; done'"},
-        {"SensorProbe", "--group G --seconds 0"}};
-    Ended ended = run_group(items);
-    EXPECT_EQ(ended.status, 3);
-    EXPECT_EQ(
-        lines_of(ended.err).back(),
-        "fptest: port 34952 is not available: Address already in use; the gatherer's run would "
-        "never end: stop what listens there (netstat -ltnp names it)");
-    EXPECT_THAT(outcomes(), ElementsAre("Script: passed", "SensorProbe: not run"));
-
-    // where the library comes to it without being asked first
-    ended = run_group(items, {"--as-group", "--timeout", "0.5", "--grace", "0.2"});
-    EXPECT_EQ(ended.status, 1);
-    EXPECT_THAT(outcomes(), ElementsAre("Script: passed", "SensorProbe: timed out"));
-    EXPECT_LT(ended.seconds, 20);
-}
-
-TEST_F(Trust, LeavesTheGathererThatStaysRoomForWhatItPrints)
-{
-    run_group({{"SensorProbe", "--group G --seconds 0"}});
-    const auto gatherers = device::processes_named("/system/bin/SensorProbe");
-    ASSERT_EQ(gatherers.size(), 1U);
-    const std::string output = "/proc/" + std::to_string(gatherers[0].pid) + "/fd/1";
-    const std::string text(100 * 1024, 'x');
-    const Descriptor again(open(output.c_str(), O_WRONLY | O_CLOEXEC));
-    struct stat status {
-    };
-    ASSERT_EQ(fstat(again.get(), &status), 0);
-    const auto room = status.st_size;
-    EXPECT_GE(room, 1024 * 1024);
-    EXPECT_EQ(pwrite(again.get(), text.data(), text.size(), room - 100 * 1024), 100 * 1024);
-    EXPECT_LT(pwrite(again.get(), text.data(), text.size(), room), 0); // and no more than that
-}
-
 TEST_F(Trust, NamesEveryReportThatFailsThoughTheRunIsInterrupted)
 {
     for (const int signal : {0, SIGINT}) {
@@ -277,54 +238,6 @@ TEST_F(Trust, WritesNoTwoThingsIntoOneFile)
               0);
 }
 
-TEST_F(Trust, PassesOnAllThatIsPrintedDuringASend)
-{
-    ASSERT_EQ(run_fptest({"send", "XMLFile::" + group_of({{"Item", "flood 1000000"}})}).status, 0);
-    const Ended ended = run_fptest({"send", "XMLNodePath::P/G/Item"});
-    const auto lines = lines_of(ended.err);
-    const auto first = std::ranges::find(lines, "line 1");
-    ASSERT_NE(first, lines.end());
-    std::size_t number = 0;
-    for (auto line = first; line != lines.end() && line->starts_with("line "); ++line) {
-        EXPECT_EQ(*line, "line " + std::to_string(++number));
-    }
-    EXPECT_GT(number, 80000U);
-}
-
-TEST_F(Trust, PutsWhatIsPrintedDuringASendWhereItBelongsThoughItComesLate)
-{
-    const std::string text =
-        group_of({{"Item", "say one note /tmp/scene/begun await /tmp/scene/go say 1"},
-                  {"Other", "say two note /tmp/scene/last await /tmp/scene/end"}});
-    FptestProcess fptest({"send", "XMLFile::" + text, "XMLNodePath::P/G"});
-    ASSERT_TRUE(wait_for_file("begun"));
-    fptest.signal(SIGSTOP);
-    file("go", "");
-    ASSERT_TRUE(wait_for_file("last"));
-    fptest.signal(SIGCONT);
-    file("end", "");
-    const Ended ended = fptest.wait();
-    EXPECT_EQ(ended.status, 0);
-    EXPECT_EQ(ended.err, "vendor = 0\none\n1\nvendor = 0\ntwo\n");
-}
-
-TEST_F(Trust, SendsNothingIntoARun)
-{
-    const std::string text =
-        group_of({{"Item", "note /tmp/scene/begun await /tmp/scene/go report G 100 0 fine"}});
-    FptestProcess fptest({"run", "--plan", plan(text), "P/G"});
-    ASSERT_TRUE(wait_for_file("begun"));
-    for (const std::string command : {"XMLFile::<P/>", "XMLNodePath::P/G"}) {
-        expect_refusal(3,
-                       "fptest: another fptest is running a plan on this device: wait for its "
-                       "end, or stop it",
-                       {"send", command});
-    }
-    EXPECT_EQ(run_fptest({"send", "pingtest"}).out, "Ping Success!\n");
-    file("go", "");
-    EXPECT_EQ(fptest.wait().status, 0);
-}
-
 // --- what an item counts as, whatever it reported -----------------------------------
 
 TEST_F(Trust, FailsWhatHasCrashedHoweverItsArgsAreWritten)
@@ -366,17 +279,6 @@ TEST_F(Trust, FailsWhatARealTimeSignalHasKilled)
     EXPECT_EQ(reasons().at(0), "died by signal 40, though it reported the result 0");
 }
 
-TEST_F(Trust, LeavesOneGathererAloneThatIsAScript)
-{
-    // the library does not find it by its name
-    run_group({{"SensorProbe", "--help >/dev/null; exec /system/bin/Item gather report-here G "
-                               "SensorProbe 100 0 fine sleep 30"}},
-              {"--repeat", "3"});
-    EXPECT_THAT(outcomes(),
-                ElementsAre("SensorProbe: passed", "SensorProbe: passed", "SensorProbe: passed"));
-    EXPECT_EQ(device::processes_named("/system/bin/Item").size(), 1U);
-}
-
 TEST_F(Trust, TellsAReportThatGoesIntoAnItemBeforeItsOwn)
 {
     const Ended ended = run_group({{"Item", "report G 100 0 fine"},
@@ -395,46 +297,6 @@ TEST_F(Trust, LosesNoReportThatComesAfterOneThatSpoilsThePlan)
          {"Item", "report G 100 0 fine"}});
     EXPECT_THAT(outcomes(), ElementsAre("Script: failed", "Item: passed"));
     EXPECT_EQ(description(0), "dead");
-}
-
-TEST_F(Trust, FailsAGathererThatEndsBeforeItIsDone)
-{
-    FptestProcess fptest({"run", "--json", work("json"), "--plan",
-                          plan(device::group_of({{"SensorProbe", "--group G --seconds 60"}})),
-                          "P/G"});
-    ASSERT_TRUE(support::eventually(
-        [] { return device::processes_named("/system/bin/SensorProbe").size() == 1; }, 20));
-    usleep(500'000); // it has been told by now
-    ASSERT_EQ(
-        run_fptest({"report", "G", "SensorProbe", "--progress", "50", "--result", "0"}).status, 0);
-    kill(device::processes_named("/system/bin/SensorProbe").at(0).pid, SIGSEGV);
-    EXPECT_EQ(fptest.wait().status, 1);
-    EXPECT_THAT(outcomes(), ElementsAre("SensorProbe: failed"));
-    EXPECT_EQ(reasons().at(0),
-              "the gatherer ended at progress 50, though it reported the result 0");
-}
-
-TEST_F(Trust, KillsAGathererThatIgnoresTheStopInAGroupAsWell)
-{
-    run_group({{"SensorProbe",
-                "--help >/dev/null; exec /system/bin/Stubborn ignore-stop gather sleep 60"},
-               {"Item", "sleep 4 report G 100 0 fine"}},
-              {"--as-group", "--timeout", "1", "--grace", "0.5"});
-    EXPECT_THAT(outcomes(), ElementsAre("SensorProbe: timed out", "Item: timed out"));
-    EXPECT_THAT(reasons().at(0), StartsWith("killed after 1."));
-    EXPECT_THAT(device::processes_named("/system/bin/Stubborn"), IsEmpty());
-}
-
-TEST_F(Trust, NamesWhatAGathererLeavesRunning)
-{
-    run_group(
-        {{"SensorProbe", "--help >/dev/null; setsid sleep 30 &amp; exec /system/bin/Item gather "
-                         "report-here G SensorProbe 100 0 fine"},
-         {"Item", "report G 100 0 fine"}});
-    const auto ends = events("end");
-    ASSERT_THAT(outcomes(), ElementsAre("SensorProbe: passed", "Item: passed"));
-    ASSERT_EQ(ends.at(0).at("left_running").size(), 1U);
-    EXPECT_TRUE(ends.at(1).at("left_running").empty());
 }
 
 // --- limits of the machine ------------------------------------------------------------

@@ -151,7 +151,7 @@ TEST_F(LiveView, IsPlainWhereALineHasNoRoomForAResult)
     }
 }
 
-TEST_F(LiveView, LeavesNothingAfterOnATerminalThatBecomesVeryNarrow)
+TEST_F(LiveView, LeavesNoOldLinesOnATerminalThatWasVeryNarrowForAWhile)
 {
     plan(kTwoThatReport);
     TerminalSession session(run({"P/Bringup"}), 80, 24);

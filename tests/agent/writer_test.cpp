@@ -180,10 +180,9 @@ TEST_F(WriterTest, TellsAtOnceWhatCannotBeOpened)
               path + ": No such file or directory");
 }
 
-TEST(WrittenFile, MustBeThereStill)
+TEST_F(WriterTest, TellsThatItsFileHasBeenRemoved)
 {
-    const TemporaryDirectory directory;
-    const std::string path = directory.path("file");
+    const std::string path = directory_.path("file");
     Writer writer(path, O_WRONLY | O_CREAT | O_APPEND, 0600);
     writer.write("a");
     EXPECT_EQ(writer.failure(), "");

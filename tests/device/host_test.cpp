@@ -21,7 +21,7 @@ TEST_F(Host, InCGetsItsPingOnce)
               "0 <Ping Success!> <> 32 2049 1024 no plan\n");
 }
 
-TEST_F(Host, MakersLibraryIsReplacedAtLoadTime)
+TEST_F(Host, PlatformsLibraryIsReplacedAtLoadTime)
 {
     support::Start start{.arguments = {kHost}};
     // by its name: the loader takes a blank for the end of a path

@@ -40,5 +40,5 @@ def test_pkg_config_names_the_mini_xml_that_was_named(prefix):
     assert "libmine.so" in said
 
 
-def test_the_makers_headers_that_were_named_are_installed(prefix):
+def test_the_platforms_headers_that_were_named_are_installed(prefix):
     assert "/* mine */" in (prefix / "include/vorlane/vr_log.h").read_text()

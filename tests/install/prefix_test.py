@@ -66,12 +66,12 @@ def vorlane_of(program, path=None):
     return pathlib.Path(re.search(r"libvorlane\.so => (.+) \(0x", listing)[1]).resolve()
 
 
-def test_a_makers_library_takes_the_place_of_the_installed_one(prefix, tmp_path):
+def test_the_platforms_library_takes_the_place_of_the_installed_one(prefix, tmp_path):
     own = prefix / LIBDIR / "quillmark/libvorlane.so"
-    makers = tmp_path / "libvorlane.so"
-    makers.write_bytes(own.read_bytes())
+    platforms = tmp_path / "libvorlane.so"
+    platforms.write_bytes(own.read_bytes())
     assert vorlane_of(prefix / "bin/fptest") == own
-    assert vorlane_of(prefix / "bin/fptest", tmp_path) == makers
+    assert vorlane_of(prefix / "bin/fptest", tmp_path) == platforms
 
 
 def test_fptest_runs_from_any_place(prefix):

@@ -1,13 +1,13 @@
 # SPDX-FileCopyrightText: 2026 The Quillmark authors
 # SPDX-License-Identifier: Apache-2.0
 """What becomes of the library where clang, lld, musl and the linker's options of an
-Android preset stand in the place of an NDK."""
+Android preset take the place of an NDK."""
 import platform
 import re
 import shutil
 
 import pytest
-from libraries import INTERFACE, entries_of, exports_of, make_makers_libraries
+from libraries import INTERFACE, entries_of, exports_of, make_platform_libraries
 from support.outside import CACHE, TREE, output_of
 
 MUSL = "x86_64-linux-musl"
@@ -26,7 +26,7 @@ set(CMAKE_SHARED_LINKER_FLAGS_INIT "-nostdlib -fuse-ld=lld -L/usr/lib/{MUSL} -lc
 
 @pytest.mark.skipif(platform.machine() != "x86_64",
                     reason="the emulator's preset, but another machine")
-def test_it_is_a_small_one_for_16_kilobyte_pages_with_the_makers_own(tmp_path):
+def test_it_is_a_small_one_for_16_kilobyte_pages_on_the_devices_platform(tmp_path):
     toolchain = tmp_path / "build/cmake/android.toolchain.cmake"
     toolchain.parent.mkdir(parents=True)
     toolchain.write_text(TOOLCHAIN)
@@ -35,7 +35,7 @@ def test_it_is_a_small_one_for_16_kilobyte_pages_with_the_makers_own(tmp_path):
     output_of("cmake", "--preset", "android-x86_64", "-B", tmp_path / "built",
               f"-DMINIXML_INCLUDE_DIR={tmp_path}",
               f"-DMINIXML_LIBRARY={CACHE['MINIXML_LIBRARY']}",
-              f"-DVORLANE_LIBRARIES={make_makers_libraries(tmp_path)}",
+              f"-DVORLANE_LIBRARIES={make_platform_libraries(tmp_path)}",
               cwd=TREE, env={"ANDROID_NDK_ROOT": tmp_path})
     output_of("cmake", "--build", tmp_path / "built")
 
@@ -43,7 +43,7 @@ def test_it_is_a_small_one_for_16_kilobyte_pages_with_the_makers_own(tmp_path):
     assert not library.is_symlink(), "Android knows no versions of libraries"
     assert entries_of(library, "SONAME") == ["libquillmark.so"]
     assert (entries_of(library, "NEEDED") ==
-            ["libc.so", "libmaker.so", "libmakerlog.so", "libmxml.so.1"])
+            ["libc.so", "libmxml.so.1", "libplatform.so", "libplatformlog.so"])
     assert exports_of(library) == INTERFACE
     listing = output_of("readelf", "--segments", "--sections", "--wide", library)
     assert set(re.findall(r"^ *LOAD .* (\S+)$", listing, re.M)) == {"0x4000"}

@@ -1,6 +1,6 @@
 # SPDX-FileCopyrightText: 2026 The Quillmark authors
 # SPDX-License-Identifier: Apache-2.0
-"""What shared libraries say of themselves, and libraries of another platform."""
+"""What shared libraries say of themselves, and libraries of a device's platform."""
 import re
 
 from support.outside import TREE, output_of
@@ -10,8 +10,8 @@ INTERFACE = ["FPTEST_ExtractResultMsg", "FPTEST_RunTestCmd", "FPTEST_SetTransati
              "FPTEST_SuspendItemExecute", "g_TestCmdTree"]
 
 # They do nothing.
-MAKERS = {
-    "maker": """
+PLATFORM = {
+    "platform": """
 #include "mxml_whitespace.h"
 #include "sockwrap.h"
 #include "sysparm.h"
@@ -21,7 +21,7 @@ void Bind(int d, const struct sockaddr *a, socklen_t l) {}
 int Accept(int d, struct sockaddr *a, socklen_t *l) { return -1; }
 int get_node_value(const char *f, const char *p, char *b, size_t l) { return -1; }
 """,
-    "makerlog": """
+    "platformlog": """
 #include "vr_log.h"
 int vr_log_printf(int p, const char *t, const char *f, ...) { return 0; }
 """}
@@ -39,10 +39,10 @@ def entries_of(library, kind):
     return sorted(re.findall(rf"\({kind}\).*\[(.*)\]", listing))
 
 
-def make_makers_libraries(directory):
+def make_platform_libraries(directory):
     """Makes them in the directory, and gives them as a list of CMake's."""
     libraries = []
-    for name, text in MAKERS.items():
+    for name, text in PLATFORM.items():
         source, library = directory / f"{name}.c", directory / f"lib{name}.so"
         source.write_text(text)
         output_of("cc", "-shared", "-fPIC", f"-Wl,-soname,{library.name}", "-o", library,

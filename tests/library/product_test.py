@@ -25,7 +25,7 @@ WARNINGS = "-Wall -Wextra -Wpedantic -Werror".split()
     (SMALL, "libquillmark.so.1", "libc.so.6 libmxml.so.1 libvorlane.so", INTERFACE),
     (VORLANE, "libvorlane.so", "libc.so.6 libmxml.so.1",
      ["Accept", "Bind", "Setsockopt", "get_node_value", "mxmlSetLoneWhitespaceOff",
-      "vr_log_printf"])], ids=["shipped", "small", "maker's"])
+      "vr_log_printf"])], ids=["shipped", "small", "platform"])
 def test_a_library_has_its_name_needs_few_and_exports_its_interface_alone(
         library, name, needed, exports):
     assert entries_of(library, "SONAME") == [name]

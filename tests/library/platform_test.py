@@ -1,16 +1,16 @@
 # SPDX-FileCopyrightText: 2026 The Quillmark authors
 # SPDX-License-Identifier: Apache-2.0
-"""A device's own libraries in the place of those for Linux."""
-from libraries import INTERFACE, MAKERS, entries_of, exports_of, make_makers_libraries
+"""A device's platform in the place of the one for Linux."""
+from libraries import INTERFACE, PLATFORM, entries_of, exports_of, make_platform_libraries
 from support.outside import CACHE, TREE, install_library, output_of
 
 
-def test_makers_libraries_are_linked_and_those_for_linux_are_not_built(tmp_path):
-    libraries = make_makers_libraries(tmp_path)
+def test_the_platforms_libraries_are_linked_and_those_for_linux_are_not_built(tmp_path):
+    libraries = make_platform_libraries(tmp_path)
     prefix = install_library(tmp_path, f"-DVORLANE_LIBRARIES={libraries}")
     library = prefix / "lib/libquillmark.so"
     assert (entries_of(library, "NEEDED") ==
-            ["libc.so.6", "libmaker.so", "libmakerlog.so", "libmxml.so.1"])
+            ["libc.so.6", "libmxml.so.1", "libplatform.so", "libplatformlog.so"])
     assert entries_of(library, "RUNPATH") == []
     assert list((tmp_path / "build").rglob("*vorlane*")) == []
     installed = [path for path in prefix.rglob("lib*.*") if not path.is_symlink()]
@@ -25,10 +25,10 @@ def test_makers_libraries_are_linked_and_those_for_linux_are_not_built(tmp_path)
     assert output_of(ping, env=found) == "Ping Success!\n"
 
 
-def test_of_makers_archives_nothing_is_exported(tmp_path):
-    make_makers_libraries(tmp_path)
-    archive = tmp_path / "libmaker.a"
-    for name in MAKERS:
+def test_nothing_of_the_platforms_archives_is_exported(tmp_path):
+    make_platform_libraries(tmp_path)
+    archive = tmp_path / "libplatform.a"
+    for name in PLATFORM:
         output_of("cc", "-c", "-fPIC", f"-I{TREE}/vorlane", f"{name}.c", cwd=tmp_path)
         output_of("ar", "rc", archive, f"{name}.o", cwd=tmp_path)
     prefix = install_library(tmp_path, f"-DVORLANE_LIBRARIES={archive}",

@@ -26,7 +26,7 @@
 #include <sys/stat.h>
 #include <vector>
 
-namespace reports_test
+namespace reporters_test
 {
 
 using namespace fptest;
@@ -189,4 +189,4 @@ inline int in_a_child(const std::function<void()> &what)
     return Process(what).wait().status;
 }
 
-} // namespace reports_test
+} // namespace reporters_test

@@ -1,11 +1,11 @@
 // SPDX-FileCopyrightText: 2026 The Quillmark authors
 // SPDX-License-Identifier: Apache-2.0
 // What all reports of a run have in common.
-#include "reports_test.h"
+#include "reporters_test.h"
 
 #include <random>
 
-using namespace reports_test;
+using namespace reporters_test;
 
 namespace
 {
