@@ -116,7 +116,7 @@ bool Runner::run(const Job &job)
     library_.command("XMLNodePath::" + job.path, names);
     heard_of_at_ = now();
 
-    running_ = {.job = job, .command_runs = true};
+    running_ = {job, true, 0, {}};
     while ((running_.command_runs || !running_.items.empty()) && !broken_) {
         if (const auto event = library_.wait(kTurn, signals_.descriptor())) {
             plan = Descriptor(-1);
