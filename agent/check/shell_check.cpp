@@ -131,9 +131,10 @@ bool ShellChecker::is_refused(const Effect &substitution, std::string &why)
 {
     const std::string &text = substitution.text;
     if (substitution.mark != "`") {
-        return std::ranges::any_of(read_shell_line(text).effects, [&](const Effect &effect) {
-            return effect.kind == Effect::Kind::substitution && is_refused(effect, why);
-        });
+        return shell_.ask(text, why) == Shell::Answer::refused ||
+               std::ranges::any_of(read_shell_line(text).effects, [&](const Effect &effect) {
+                   return effect.kind == Effect::Kind::substitution && is_refused(effect, why);
+               });
     }
     // a '\' before a '"' is an escape where quotes are round it
     return shell_.ask(without_escapes(text, "$`\\"), why) == Shell::Answer::refused &&
@@ -186,10 +187,9 @@ void ShellChecker::report_effect(const Item &item, const Effect &effect, std::si
         if (is_refused(effect, why)) {
             findings_.error(
                 place,
-                "the shell would refuse the command line of item {}: between {} here, {}; put a "
+                "the shell would refuse the command line of item {}: in {} here, {}; put a "
                 "'\\' before {} if it is meant for the item",
-                name, effect.mark == "`" ? "the backticks" : "backticks in " + text, one_line(why),
-                mark);
+                name, effect.mark == "`" ? "the backticks" : text, one_line(why), mark);
             break;
         }
         findings_.warning(place,
@@ -208,6 +208,12 @@ void ShellChecker::report_effect(const Item &item, const Effect &effect, std::si
                           "the shell would take {} for a comment, and not hand it to item {}; put "
                           "the {} in quotes if it is meant for the item",
                           text, name, mark);
+        break;
+    case Effect::Kind::continuation:
+        findings_.warning(place,
+                          "the shell would take away the {} and the line feed here, and join what "
+                          "is before and after them; leave them out",
+                          mark);
         break;
     case Effect::Kind::function:
         findings_.error(place,

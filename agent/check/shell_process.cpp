@@ -63,8 +63,8 @@ bool is_safe_to_expand(std::string_view expansion)
     const std::size_t mark = is_arithmetic ? 3 : 2;
     const std::string_view inside = expansion.substr(mark, expansion.size() - 2 * mark + 1);
     const std::string_view marks = is_arithmetic && inside.find_first_of("()") != inside.npos
-                                       ? " _=!<>+-*/%^~&|,:()"
-                                   : is_arithmetic ? " _=!<>+-*/%^~&|,:${}"
+                                       ? " _=!<>+-*/%^~&|,:?.[]()"
+                                   : is_arithmetic ? " _=!<>+-*/%^~&|,:?.[]${}"
                                                    : " _=!+-*/%^~,:@#.;[]";
     const auto is_taken = [&](char byte) {
         const auto character = static_cast<unsigned char>(byte);
@@ -75,7 +75,7 @@ bool is_safe_to_expand(std::string_view expansion)
     return std::ranges::all_of(inside, is_taken) && (is_arithmetic || !inside.starts_with(' ')) &&
            inside.find("{ ") == inside.npos && inside.find("{|") == inside.npos &&
            // it may divide by a variable, or a variable decides what is looked at
-           !(std::ranges::any_of(inside, is_letter) && inside.find_first_of("/%") != inside.npos);
+           !(std::ranges::any_of(inside, is_letter) && inside.find_first_of("/%?") != inside.npos);
 }
 
 } // namespace

@@ -58,6 +58,7 @@ class LineScanner
         std::string mark;
         std::string end;
         bool drops_tabs = false;
+        bool is_quoted = false; // its end is, so that nothing is expanded in it
     };
 
     // How far the command being read has come.
@@ -91,8 +92,22 @@ class LineScanner
     }
     void pass_blanks()
     {
-        while (pass(" ") || pass("\t") || pass("\\\n")) {
+        while (pass(" ") || pass("\t") || pass_continuation()) {
         }
+    }
+    // The shell takes it away before it reads: from the middle of an operator as well, of
+    // which more is made then than is read here.
+    bool pass_continuation()
+    {
+        const std::size_t begin = at_;
+        if (!pass("\\\n")) {
+            return false;
+        }
+        if (begin > 0 &&
+            std::string_view("$<>&|;(").find(line_[begin - 1]) != std::string_view::npos) {
+            note(Effect::Kind::continuation, begin, "\\", begin, begin);
+        }
+        return true;
     }
     void pass_two()
     {
@@ -319,9 +334,9 @@ class LineScanner
             }
             note(Effect::Kind::redirection, begin, mark, begin, at_);
             if (is_any(mark, {"<<", "<<-"})) {
+                const std::string_view end = line_.substr(target, at_ - target);
                 here_documents_.push_back({place, std::string(line_.substr(place, at_ - place)),
-                                           unquoted(line_.substr(target, at_ - target)),
-                                           mark == "<<-"});
+                                           unquoted(end), mark == "<<-", unquoted(end) != end});
             }
             return;
         }
@@ -350,13 +365,34 @@ class LineScanner
                 if (document.drops_tabs) {
                     text.remove_prefix(std::min(text.find_first_not_of('\t'), text.size()));
                 }
-                found = text == document.end;
-                at_ = std::min(end + 1, line_.size());
+                // what it is within may end right after it
+                const bool is_last = depth_ > 0 && text.starts_with(document.end + ")");
+                found = is_last || text == document.end;
+                if (is_last) {
+                    at_ = end - text.size() + document.end.size();
+                } else if (found || document.is_quoted) {
+                    at_ = std::min(end + 1, line_.size());
+                } else {
+                    read_here_line(end);
+                }
             }
             if (!found) {
                 fail(Fault::Kind::no_end, document.at, document.mark);
             }
         }
+    }
+
+    // A line of a here document, in which quotes mean nothing.
+    void read_here_line(std::size_t end)
+    {
+        while (at_ < end) {
+            if (looking_at_any("$`\\") && !looking_at("$'") && !looking_at("$\"")) {
+                read_character(true);
+            } else {
+                ++at_;
+            }
+        }
+        at_ = std::min(std::max(at_, end + 1), line_.size());
     }
 
     // --- words ---
@@ -407,6 +443,9 @@ class LineScanner
     // One character, or what is quoted or put in its place.
     void read_character(bool in_quotes)
     {
+        if (pass_continuation()) {
+            return;
+        }
         if (looking_at("\\") || looking_at("$$")) {
             pass_two();
         } else if (looking_at("'") && !in_quotes) {

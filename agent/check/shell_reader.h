@@ -25,7 +25,15 @@ struct ShellReading {
     // What the shell does besides starting the line's first command.
     struct Effect {
         // "${...}" and "$((...))" are expansions, at which it may give up.
-        enum class Kind { command, substitution, expansion, redirection, comment, function };
+        enum class Kind {
+            command,
+            substitution,
+            expansion,
+            redirection,
+            comment,
+            function,
+            continuation
+        };
         Kind kind = Kind::command;
         std::size_t at = 0;
         std::string mark;

@@ -53,9 +53,11 @@ struct RunningItem {
         bool lost = false;        // the stored plan is gone
         bool undone = false;      // a result was there, and has gone
         bool in_another_plan = false;
-        bool beside_gatherer = false; // the gatherer has saved the plan while the item ran
-        bool from_a_copy = false;     // the gatherer's own, which has no mark
-        std::vector<ItemReport> seen; // the last of those before its report
+        bool beside_others = false; // they have reported, and so saved the plan, meanwhile
+        bool from_a_copy = false;   // the gatherer's own, which has no mark
+        // The one after which an earlier one has come back; of seen, the last before it.
+        std::optional<ItemReport> taken_back;
+        std::vector<ItemReport> seen;
     };
 
     Place place;

@@ -80,6 +80,8 @@ void ReportReader::poll()
     const std::string text = read_stored_plan().value_or("");
     if (const auto plan = Plan::parse_annotated(text)) {
         plan_status_ = status;
+        changed_ = std::chrono::seconds(status.st_mtim.tv_sec) +
+                   std::chrono::nanoseconds(status.st_mtim.tv_nsec);
         read(plan);
         if (!Plan::load_as_library(text)) {
             mend_stored_plan(); // or who reports next could not
@@ -150,10 +152,8 @@ void ReportReader::mark_again(std::vector<std::size_t> numbers)
 std::chrono::nanoseconds ReportReader::since_change() const
 {
     using namespace std::chrono;
-    const auto changed =
-        seconds(plan_status_.st_mtim.tv_sec) + nanoseconds(plan_status_.st_mtim.tv_nsec);
     // somebody may set the clock
-    return std::clamp<nanoseconds>(system_clock::now().time_since_epoch() - changed, 0ns, 100ms);
+    return std::clamp<nanoseconds>(system_clock::now().time_since_epoch() - changed_, 0ns, 1s);
 }
 
 void ReportReader::begin_gathering()
@@ -182,6 +182,9 @@ void ReportReader::begin_gathering()
 // As of the round of its item.
 void ReportReader::tell_late(const Place &place, bool gathers, int round, const ItemReport &report)
 {
+    for (RunningItem &active : running_.items) {
+        active.reporting.beside_others = true;
+    }
     const int now = std::exchange(run_.round, round);
     for (Listener *listener : listeners_) {
         listener->late(run_, place, report);
@@ -268,12 +271,18 @@ void ReportReader::read_report(RunningItem &active, const Plan &plan)
     }
     active.reporting.overwritten = false;
     active.reporting.undone = result.report.result && !report.result;
+    if (!is_among(active.reporting.seen, report) ||
+        (active.reporting.taken_back && is_same(report, *active.reporting.taken_back))) {
+        active.reporting.taken_back.reset();
+    } else if (!active.reporting.taken_back) {
+        active.reporting.taken_back = result.report;
+    }
     if (active.reporting.seen.size() == kSeen) {
         active.reporting.seen.erase(active.reporting.seen.begin());
     }
     active.reporting.seen.push_back(std::exchange(result.report, std::move(report)));
     for (RunningItem &other : running_.items) {
-        other.reporting.beside_gatherer |= active.gathers && !other.gathers;
+        other.reporting.beside_others |= other.place != active.place;
     }
     for (Listener *listener : listeners_) {
         listener->progressed(run_, active.place);

@@ -82,6 +82,7 @@ class ReportReader
     bool marks_are_gone_ = false;      // from items' elements
     struct stat plan_status_ {
     };
+    std::chrono::nanoseconds changed_{}; // the plan that was read, on the clock of files
 };
 
 } // namespace fptest

@@ -249,7 +249,8 @@ void Runner::poll_gatherers()
         if (active.moved_on && !active.done &&
             (has_ended || !active.gatherer_end.empty() ||
              (!limits_.item && now() - active.moved_on_at > kForGathering))) {
-            finish(active, has_ended ? now() - reader_.since_change() : now());
+            finish(active, has_ended ? std::max(active.moved_on_at, now() - reader_.since_change())
+                                     : now());
         }
     }
 }

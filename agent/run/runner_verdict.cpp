@@ -33,6 +33,9 @@ void Runner::judge(const RunningItem &active)
     ItemRun &result = item_at(run_, active.place);
     const ItemReport &report = result.report;
     const bool has_reported = has_result(report);
+    const auto passes = [this](const ItemReport &one) {
+        return one.result == std::to_string(run_.pass_code);
+    };
     if (active.stop == Outcome::timed_out ||
         (active.stop == Outcome::stopped && active.was_stopped)) {
         result.outcome = *active.stop;
@@ -60,7 +63,14 @@ void Runner::judge(const RunningItem &active)
         result.outcome = Outcome::failed;
         result.reason = fmt::format("ended with exit status {}, though it {}", *result.exit_status,
                                     reported(report));
-    } else if (report.result == std::to_string(run_.pass_code)) {
+    } else if (active.reporting.beside_others && active.reporting.taken_back &&
+               !(passes(report) && passes(*active.reporting.taken_back))) {
+        result.outcome = Outcome::failed;
+        result.reason = fmt::format("{}; a process with an old copy of the plan has then written "
+                                    "back what it had reported before",
+                                    reported(*active.reporting.taken_back));
+        result.overruled = true;
+    } else if (passes(report)) {
         result.outcome = Outcome::passed;
     } else {
         result.outcome = Outcome::failed;
@@ -134,9 +144,9 @@ std::string Runner::why_silent(const RunningItem &active)
         return fmt::format("no report can be written any more: the stored plan does not load ({})",
                            why);
     }
-    if (active.reporting.beside_gatherer) {
-        return "no report is there: there was none, or the gatherer's old copy of the plan, "
-               "saved meanwhile, has written over it";
+    if (active.reporting.beside_others) {
+        return "no report is there: there was none, or a process that has reported meanwhile "
+               "has written over it with its old copy of the plan";
     }
     return active.gathers ? fmt::format("no result was reported within {}",
                                         fine_duration(limits_.item.value_or(kForGathering).count()))

@@ -76,7 +76,8 @@ TEST(CheckedExpansion, IsAnErrorWhereTheShellGivesUpAtIt)
 {
     for (const std::string args :
          {"${}", "${x;y}", "\"${a b}\"", "${a^}", "${.}", "${a,}", "${a.b}", "$((1 + ${a b}))",
-          "$((1+))", "$((1/0))", "${x!y}", "${1:=x}", "$((a b))", "${x[a b]}", "\"$((2 **))\""}) {
+          "$((1+))", "$((1.5))", "$((1?2))", "$((x[))", "$((1/0))", "${x!y}", "${1:=x}", "$((a b))",
+          "${x[a b]}", "\"$((2 **))\""}) {
         EXPECT_TRUE(has_error(args)) << args;
         EXPECT_FALSE(runs(args)) << args;
     }

@@ -269,6 +269,24 @@ TEST_F(Trust, TellsALateReportAlsoOfLessProgressOrInTheMomentOfTheItemsEnd)
     }
 }
 
+TEST_F(Trust, PassesNothingByAnEarlierReportThatAnOldCopyBringsBack)
+{
+    const std::string leaves =
+        "'(sleep 0.5; exec /system/bin/Item report-here G Script 50 0 one sleep 0.9 report-here G "
+        "Script 50 0 two sleep 5) &amp; fptest report G Script --progress 100 --result 0'";
+    for (const auto &[first, last] : {std::pair("0", "1"), std::pair("-2", "0")}) {
+        run_group(
+            {{"Script", leaves},
+             {"Item", std::string("report-here G Item 10 ") + first +
+                          " begun sleep 1 report-here G Item 100 " + last + " done sleep 0.8"}});
+        EXPECT_THAT(outcomes(), ElementsAre("Script: passed", "Item: failed"));
+        EXPECT_EQ(reasons().at(1),
+                  std::string("reported the result ") + last +
+                      "; a process with an old copy of the plan has then written back what it had "
+                      "reported before");
+    }
+}
+
 TEST_F(Trust, FailsWhatARealTimeSignalHasKilled)
 {
     run_group(
