@@ -110,10 +110,11 @@ ShellChecker::Verdict ShellChecker::judge(const Item &item, const std::string &l
     Verdict &verdict = place->second;
     if (is_new) {
         verdict.reading = read_shell_line(line);
-        const Shell::Answer answer = shell_.ask(line, verdict.why);
-        verdict.is_refused = answer == Shell::Answer::unknown ? verdict.reading.fault.has_value()
-                                                              : answer == Shell::Answer::refused;
-        if (answer == Shell::Answer::unknown && shell_.is_out_of_time() && !is_limit_told_) {
+        const DeviceShell::Answer answer = shell_.ask(line, verdict.why);
+        verdict.is_refused = answer == DeviceShell::Answer::unknown
+                                 ? verdict.reading.fault.has_value()
+                                 : answer == DeviceShell::Answer::refused;
+        if (answer == DeviceShell::Answer::unknown && shell_.is_out_of_time() && !is_limit_told_) {
             is_limit_told_ = true;
             findings_.warning(item.name_place,
                               "the device's shell has been asked for as long as fptest waits for "
@@ -131,14 +132,14 @@ bool ShellChecker::is_refused(const Effect &substitution, std::string &why)
 {
     const std::string &text = substitution.text;
     if (substitution.mark != "`") {
-        return shell_.ask(text, why) == Shell::Answer::refused ||
+        return shell_.ask(text, why) == DeviceShell::Answer::refused ||
                std::ranges::any_of(read_shell_line(text).effects, [&](const Effect &effect) {
                    return effect.kind == Effect::Kind::substitution && is_refused(effect, why);
                });
     }
     // a '\' before a '"' is an escape where quotes are round it
-    return shell_.ask(without_escapes(text, "$`\\"), why) == Shell::Answer::refused &&
-           shell_.ask(without_escapes(text, "$`\\\""), why) == Shell::Answer::refused;
+    return shell_.ask(without_escapes(text, "$`\\"), why) == DeviceShell::Answer::refused &&
+           shell_.ask(without_escapes(text, "$`\\\""), why) == DeviceShell::Answer::refused;
 }
 
 void ShellChecker::report_name(const Item &item, const std::string &characters, bool is_refused)
@@ -176,7 +177,7 @@ void ShellChecker::report_effect(const Item &item, const Effect &effect, std::si
         report_command(item, effect, place);
         break;
     case Effect::Kind::expansion:
-        if (shell_.ask_to_expand(effect.text, why) == Shell::Answer::refused) {
+        if (shell_.ask_to_expand(effect.text, why) == DeviceShell::Answer::refused) {
             findings_.error(place,
                             "the shell would refuse the command line of item {}: {}; put a '\\' "
                             "before the '$' here if it is meant for the item",

@@ -5,6 +5,7 @@
 // name and args.
 #pragma once
 
+#include "check/device_shell.h"
 #include "check/findings.h"
 #include "check/shell_reader.h"
 
@@ -45,7 +46,7 @@ class ShellChecker
     void report_command(const Item &item, const ShellReading::Effect &effect, std::size_t place);
 
     Findings &findings_;
-    Shell shell_;
+    DeviceShell shell_;
     bool is_limit_told_ = false;
     std::unordered_map<std::string, Verdict> verdicts_; // by the line
 };

@@ -17,6 +17,7 @@ using Fault = ShellReading::Fault;
 using Effect = ShellReading::Effect;
 
 constexpr std::string_view kEndsWord = " \t\n;&|<>()";
+constexpr std::string_view kOperators = "$;&|<>(";
 
 std::string trimmed(std::string_view text)
 {
@@ -44,7 +45,7 @@ class LineScanner
 
     ShellReading read()
     {
-        read_commands(false);
+        read_commands();
         if (!here_documents_.empty()) {
             fail(Fault::Kind::no_end, here_documents_.front().at, here_documents_.front().mark);
         }
@@ -95,19 +96,14 @@ class LineScanner
         while (pass(" ") || pass("\t") || pass_continuation()) {
         }
     }
-    // The shell takes it away before it reads: from the middle of an operator as well, of
-    // which more is made then than is read here.
+    // In the middle of an operator it makes another one, which is not read here.
     bool pass_continuation()
     {
         const std::size_t begin = at_;
-        if (!pass("\\\n")) {
-            return false;
-        }
-        if (begin > 0 &&
-            std::string_view("$<>&|;(").find(line_[begin - 1]) != std::string_view::npos) {
+        if (pass("\\\n") && begin > 0 && kOperators.find(line_[begin - 1]) != kOperators.npos) {
             note(Effect::Kind::continuation, begin, "\\", begin, begin);
         }
-        return true;
+        return at_ > begin;
     }
     void pass_two()
     {
@@ -159,7 +155,7 @@ class LineScanner
     // --- commands ---
 
     // Up to a ')', where it is the end of something.
-    void read_commands(bool is_nested)
+    void read_commands()
     {
         State state;
         while (!at_end()) {
@@ -171,7 +167,7 @@ class LineScanner
                 if (state.cases > 0) {
                     ++at_;
                     state = {.cases = state.cases};
-                } else if (!is_nested) {
+                } else if (depth_ == 0) {
                     fail(Fault::Kind::unexpected, at_, ")");
                 } else {
                     break;
@@ -284,7 +280,7 @@ class LineScanner
         at_ += mark.size();
         const std::size_t documents = here_documents_.size();
         ++depth_;
-        read_commands(true);
+        read_commands();
         --depth_;
         here_documents_.resize(std::min(documents, here_documents_.size()));
         if (at_end()) {
@@ -443,10 +439,9 @@ class LineScanner
     // One character, or what is quoted or put in its place.
     void read_character(bool in_quotes)
     {
-        if (pass_continuation()) {
-            return;
-        }
-        if (looking_at("\\") || looking_at("$$")) {
+        if (looking_at("\\\n")) {
+            pass_continuation();
+        } else if (looking_at("\\") || looking_at("$$")) {
             pass_two();
         } else if (looking_at("'") && !in_quotes) {
             read_single_quotes(1, false);

@@ -4,6 +4,7 @@
 // Where the plan checker and the device's shell must be of one mind; what is said of
 // command lines is in check/programs.txt.
 #include "check/check.h"
+#include "check/device_shell.h"
 #include "check/shell_reader.h"
 #include "support/process.h"
 
@@ -17,10 +18,10 @@
 #include <vector>
 
 using fptest::check;
+using fptest::DeviceShell;
 using fptest::Finding;
 using fptest::PlanSource;
 using fptest::read_shell_line;
-using fptest::Shell;
 using fptest::ShellReading;
 
 namespace
@@ -48,11 +49,11 @@ bool runs(const std::string &args)
 TEST(CheckedGrammar, IsTheShellsToJudge)
 {
     std::string why;
-    ASSERT_EQ(Shell().ask("/system/bin/X a; if", why), Shell::Answer::refused);
+    ASSERT_EQ(DeviceShell().ask("/system/bin/X a; if", why), DeviceShell::Answer::refused);
     EXPECT_EQ(why, "syntax error: unmatched 'if'");
     // which is not what one would think, and accepted all the same
     ASSERT_TRUE(read_shell_line("/system/bin/X \\<<\\\n<<E").fault);
-    ASSERT_EQ(Shell().ask("/system/bin/X \\<<\\\n<<E", why), Shell::Answer::accepted);
+    ASSERT_EQ(DeviceShell().ask("/system/bin/X \\<<\\\n<<E", why), DeviceShell::Answer::accepted);
     EXPECT_FALSE(has_error("\\<<\\\n<<E"));
 }
 
@@ -106,8 +107,8 @@ TEST(CheckedGrammar, IsJudgedWithoutRunningAnything)
     for (const std::string args :
          {"; touch ", "$(touch ", "`touch ", "\ntouch ", "&& touch ", ">"}) {
         const std::string end = args[0] == '$' ? ")" : args[0] == '`' ? "`" : "";
-        EXPECT_EQ(Shell().ask("/system/bin/true " + args + file + end, why),
-                  Shell::Answer::accepted);
+        EXPECT_EQ(DeviceShell().ask("/system/bin/true " + args + file + end, why),
+                  DeviceShell::Answer::accepted);
         EXPECT_NE(access(file.c_str(), F_OK), 0) << args;
     }
     for (const std::string &run : {"$(touch " + file + ")", "`touch " + file + "`"}) {
@@ -116,7 +117,7 @@ TEST(CheckedGrammar, IsJudgedWithoutRunningAnything)
               "${ touch " + file + ";}", "${|touch " + file + ";}",
               "$((1)); touch " + file + "; ((1))", "${x:-'}\"; touch " + file + "; : \"'}",
               "${x[1]:-'}\"; touch " + file + "; : \"'}"}) {
-            EXPECT_EQ(Shell().ask_to_expand(expansion, why), Shell::Answer::unknown);
+            EXPECT_EQ(DeviceShell().ask_to_expand(expansion, why), DeviceShell::Answer::unknown);
             EXPECT_NE(access(file.c_str(), F_OK), 0) << expansion;
         }
     }
@@ -161,7 +162,7 @@ TEST(CheckedArgs, OfAnyKindAreErrorsWhereTheShellRefusesThem)
                                              "}",   "(", ")", ";",  "&",  "|",  "<",  ">",
                                              "<<E", "#", "$", "$'", "((", "@(", "!",  "2>"};
     std::mt19937 random(11);
-    Shell shell(60);
+    DeviceShell shell(60);
     std::size_t refused = 0;
     std::size_t known = 0;
     for (int round = 0; round < 600; ++round) {
@@ -171,19 +172,19 @@ TEST(CheckedArgs, OfAnyKindAreErrorsWhereTheShellRefusesThem)
         }
         const std::string line = "/system/bin/X " + args;
         std::string why;
-        const Shell::Answer answer = shell.ask(line, why);
-        ASSERT_NE(answer, Shell::Answer::unknown);
+        const DeviceShell::Answer answer = shell.ask(line, why);
+        ASSERT_NE(answer, DeviceShell::Answer::unknown);
         const ShellReading reading = read_shell_line(line);
         const bool is_error =
             std::ranges::any_of(reading.effects, [&](const ShellReading::Effect &effect) {
                 return effect.kind == ShellReading::Effect::Kind::function ||
                        (effect.kind == ShellReading::Effect::Kind::expansion &&
-                        shell.ask_to_expand(effect.text, why) == Shell::Answer::refused) ||
+                        shell.ask_to_expand(effect.text, why) == DeviceShell::Answer::refused) ||
                        (effect.mark == "`" &&
-                        shell.ask(effect.text, why) == Shell::Answer::refused);
+                        shell.ask(effect.text, why) == DeviceShell::Answer::refused);
             });
-        EXPECT_EQ(has_error(args), answer == Shell::Answer::refused || is_error) << line;
-        if (answer == Shell::Answer::accepted) {
+        EXPECT_EQ(has_error(args), answer == DeviceShell::Answer::refused || is_error) << line;
+        if (answer == DeviceShell::Answer::accepted) {
             EXPECT_FALSE(reading.fault) << line;
         } else {
             ++refused;

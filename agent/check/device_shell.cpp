@@ -1,7 +1,7 @@
 // SPDX-FileCopyrightText: 2026 The Quillmark authors
 // SPDX-License-Identifier: Apache-2.0
 
-#include "check/shell_reader.h"
+#include "check/device_shell.h"
 #include "common/descriptor.h"
 
 #include <algorithm>
@@ -11,14 +11,15 @@
 #include <chrono>
 #include <csignal>
 #include <fcntl.h>
+#include <optional>
 #include <poll.h>
 #include <spawn.h>
+#include <string_view>
 #include <sys/wait.h>
 #include <unistd.h>
 
 namespace fptest
 {
-
 namespace
 {
 
@@ -80,18 +81,19 @@ bool is_safe_to_expand(std::string_view expansion)
 
 } // namespace
 
-Shell::Answer Shell::ask(const std::string &line, std::string &why)
+DeviceShell::Answer DeviceShell::ask(const std::string &line, std::string &why)
 {
     return ask_timed("-n", line, why);
 }
 
-Shell::Answer Shell::ask_to_expand(const std::string &expansion, std::string &why)
+DeviceShell::Answer DeviceShell::ask_to_expand(const std::string &expansion, std::string &why)
 {
     return is_safe_to_expand(expansion) ? ask_timed("-f", ": \"" + expansion + "\"", why)
                                         : Answer::unknown;
 }
 
-Shell::Answer Shell::ask_timed(const std::string &option, const std::string &line, std::string &why)
+DeviceShell::Answer DeviceShell::ask_timed(const std::string &option, const std::string &line,
+                                           std::string &why)
 {
     const auto begin = Clock::now();
     const Answer answer = ask_once(option, line, why);
@@ -99,8 +101,8 @@ Shell::Answer Shell::ask_timed(const std::string &option, const std::string &lin
     return answer;
 }
 
-Shell::Answer Shell::ask_once(const std::string &option, const std::string &line,
-                              std::string &why) const
+DeviceShell::Answer DeviceShell::ask_once(const std::string &option, const std::string &line,
+                                          std::string &why) const
 {
     std::array<int, 2> ends{};
     if (left_ <= 0 || access("/system/bin/sh", X_OK) != 0 || pipe2(ends.data(), O_CLOEXEC) != 0) {
