@@ -5,6 +5,7 @@
 
 #include "common/descriptor.h"
 #include "util/text.h"
+#include "util/write.h"
 
 #include <algorithm>
 #include <cctype>
@@ -80,28 +81,14 @@ std::string without_line(std::string message)
     return message;
 }
 
-[[noreturn]] void throw_error(const char *what)
-{
-    throw std::system_error(errno, std::generic_category(), what);
-}
-
 // A descriptor that reads this text: Mini-XML takes a text in memory for
 // ended where a file is not, and reads after the end of one in UTF-16.
 Descriptor descriptor_of(std::string_view text)
 {
     Descriptor file(static_cast<int>(syscall(SYS_memfd_create, "fptest-plan", MFD_CLOEXEC)));
-    if (file.get() < 0) {
-        throw_error("no memory for a test plan");
-    }
-    while (!text.empty()) {
-        const ssize_t written = write(file.get(), text.data(), text.size());
-        if (written < 0) {
-            throw_error("no memory for a test plan");
-        }
-        text.remove_prefix(static_cast<std::size_t>(written));
-    }
-    if (lseek(file.get(), 0, SEEK_SET) != 0) {
-        throw_error("no memory for a test plan");
+    if (file.get() < 0 || write_text(file.get(), text) < text.size() ||
+        lseek(file.get(), 0, SEEK_SET) != 0) {
+        throw std::system_error(errno, std::generic_category(), "no memory for a test plan");
     }
     return file;
 }

@@ -74,7 +74,7 @@ void Runner::read_signals()
         }
         signal_ = signal;
         signal_taken_at_ = now();
-        give_up(fmt::format("interrupted by {}", signal_name(signal)));
+        give_up(fmt::format("interrupted by {}", name_for_people(signal)));
         for (RunningItem &active : running_.items) {
             if (!active.stop) {
                 active.stop = Outcome::stopped;

@@ -95,12 +95,12 @@ std::string Runner::why_stopped(const RunningItem &active)
     }
     const bool is_interrupted = active.stop == Outcome::stopped;
     if (!active.killed) {
-        return is_interrupted ? fmt::format("stopped by {}", signal_name(signal_))
+        return is_interrupted ? fmt::format("stopped by {}", name_for_people(signal_))
                               : fmt::format("stopped after {}{}", duration(seconds),
                                             active.reporting.overwritten ? kOverwrittenAfter : "");
     }
     return fmt::format("killed after {}, as it did not end when it was asked to",
-                       is_interrupted ? "the run was interrupted by " + signal_name(signal_)
+                       is_interrupted ? "the run was interrupted by " + name_for_people(signal_)
                                       : duration(seconds));
 }
 

@@ -3,6 +3,8 @@
 
 #include "run/signals.h"
 
+#include "run/results.h"
+
 #include <cerrno>
 #include <sys/signalfd.h>
 #include <system_error>
@@ -78,16 +80,9 @@ void Signals::suspend()
     sigprocmask(SIG_BLOCK, &suspension, nullptr);
 }
 
-std::string signal_name(int signal)
+std::string name_for_people(int signal)
 {
-    switch (signal) {
-    case SIGINT:
-        return "Ctrl-C";
-    case SIGTERM:
-        return "SIGTERM";
-    default:
-        return "SIGHUP";
-    }
+    return signal == SIGINT ? "Ctrl-C" : name_of_signal(signal);
 }
 
 } // namespace fptest

@@ -45,6 +45,6 @@ class Signals
 };
 
 // "Ctrl-C", "SIGTERM", "SIGHUP"
-std::string signal_name(int signal);
+std::string name_for_people(int signal);
 
 } // namespace fptest
