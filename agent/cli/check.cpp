@@ -67,7 +67,7 @@ Exit check_files(const CheckOptions &options)
 {
     require_standard_output("fptest check");
     if (std::ranges::count(options.files, "-") > 1) {
-        throw Failure(Exit::usage, "'-' is given twice: standard input can be read only once");
+        throw Failure(Cause::input, "'-' is given twice: standard input can be read only once");
     }
     bool sound = true;
     bool readable = true;

@@ -57,7 +57,7 @@ void look_after_reports(const std::vector<std::pair<std::string, std::string>> &
         const fs::path parent = fs::path(file).parent_path();
         const fs::path directory = parent.empty() ? "." : parent;
         if (access(directory.c_str(), W_OK) != 0 && errno == EROFS) {
-            throw Failure(Exit::environment,
+            throw Failure(Cause::device,
                           "{}: the host's directories are read-only on the virtual device: "
                           "device/run --out DIR gives a working directory that can be written",
                           name);

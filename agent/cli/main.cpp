@@ -21,6 +21,7 @@
 namespace
 {
 
+using fptest::Cause;
 using fptest::Exit;
 
 constexpr char kExamples[] =
@@ -89,9 +90,9 @@ class CommandLine
             return;
         }
         if (word.starts_with('-')) {
-            throw fptest::Failure(Exit::usage, "{}", fptest::unknown_option(word, app_));
+            throw fptest::Failure(Cause::input, "{}", fptest::unknown_option(word, app_));
         }
-        throw fptest::Failure(Exit::usage, "there is no command {}{}", fptest::in_quotes(word),
+        throw fptest::Failure(Cause::input, "there is no command {}{}", fptest::in_quotes(word),
                               fptest::known_names(word, names, "the commands are"));
     }
 
@@ -120,7 +121,8 @@ int main(int argc, char **argv)
     try {
         status = CommandLine().run(argc, argv);
     } catch (const fptest::Failure &failure) {
-        status = complain(failure.status(), failure.what());
+        status = complain(failure.cause() == Cause::input ? Exit::usage : Exit::environment,
+                          failure.what());
     } catch (const std::exception &error) {
         status = complain(Exit::environment, error.what());
     }

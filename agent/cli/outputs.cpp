@@ -85,7 +85,7 @@ void require_different(const std::vector<NamedFile> &files)
                 are_same_file(file, other_file) &&
                 !(option == "--plan" && other_option == "the library")) {
                 throw Failure(
-                    Exit::usage, "{} and {} both want the file {}: give them files of their own",
+                    Cause::input, "{} and {} both want the file {}: give them files of their own",
                     option, other_option, one_line(file == kStandardInput ? other_file : file));
             }
         }
@@ -103,7 +103,7 @@ void settle_outputs(RunOptions &options)
                        librarys_file()});
     const auto reports = reports_on_standard_output(options);
     if (reports.size() > 1) {
-        throw Failure(Exit::usage, "{} each want standard output: give all but one a file",
+        throw Failure(Cause::input, "{} each want standard output: give all but one a file",
                       join_and(reports));
     }
     if (!reports.empty()) {
@@ -122,7 +122,7 @@ void settle_outputs(RunOptions &options)
         if (fstat(STDERR_FILENO, &errors) == 0 && S_ISREG(errors.st_mode) &&
             !report.second.empty() && report.second != "-" &&
             are_same_file(report.second, "/proc/self/fd/2")) {
-            throw Failure(Exit::usage,
+            throw Failure(Cause::input,
                           "{} is standard error, and would be emptied: name another file",
                           label(report));
         }
@@ -135,7 +135,7 @@ void require_writable_reports(const RunOptions &options)
          {options.json.empty() ? "" : json_obstacle(options.json),
           options.junit.empty() ? "" : junit_obstacle(options.junit)}) {
         if (!obstacle.empty()) {
-            throw Failure(Exit::environment, "{}; nothing was run", one_line(obstacle));
+            throw Failure(Cause::device, "{}; nothing was run", one_line(obstacle));
         }
     }
 }
@@ -151,7 +151,7 @@ void require_log_of_its_own(const std::string &log, Beside beside)
                           (!is_regular && (beside == Beside::view || isatty(STDOUT_FILENO) != 0));
     if (file.second == "-" || (!is_apart && is_standard_output(file.second))) {
         throw Failure(
-            Exit::usage,
+            Cause::input,
             "{} is standard output, which is not for the library's log: name a file for that",
             label(file));
     }

@@ -52,7 +52,7 @@ Plan load_stored(std::string &text)
     auto plan = made_of_stored_plan(
         text, [&why](const std::string &read) { return Plan::load_as_library(read, &why); });
     if (!plan) {
-        throw Failure(Exit::environment, "{} does not load ({}): store the plan again", kStoredPlan,
+        throw Failure(Cause::device, "{} does not load ({}): store the plan again", kStoredPlan,
                       one_line(why));
     }
     return std::move(*plan);
@@ -61,7 +61,7 @@ Plan load_stored(std::string &text)
 [[noreturn]] void unknown(const std::string &where, const std::string &what,
                           const std::string &name, const std::vector<std::string> &names)
 {
-    throw Failure(Exit::usage, "{} has no {} {}{}", where, what, in_quotes(name),
+    throw Failure(Cause::input, "{} has no {} {}{}", where, what, in_quotes(name),
                   names.empty() ? "; it has none at all" : known_names(name, names, "it has"));
 }
 
@@ -127,7 +127,7 @@ Exit report(const ReportOptions &options)
     wanted.description = as_loaded(description);
     if (!written || !(written->report(number) == wanted)) {
         throw Failure(
-            Exit::environment,
+            Cause::device,
             "the report is not in {}: is it writable? --log FILE tells what the library met",
             kStoredPlan);
     }

@@ -69,16 +69,16 @@ CheckedPlan open_plan(const RunOptions &options)
     const bool has_error = has_errors(read.findings);
     if (has_error && !options.force) {
         print(stderr, read);
-        throw Failure(Exit::usage, "nothing was run, because the plan has errors; fix them, or "
-                                   "run it as it is with --force");
+        throw Failure(Cause::input, "nothing was run, because the plan has errors; fix them, or "
+                                    "run it as it is with --force");
     }
     if (!read.findings.empty() && !options.quiet) {
         say("the plan has {}: see fptest check {}{}", has_error ? "errors" : "warnings",
             read.use == PlanSource::stored ? "--for file " : "", one_line(read.name));
     }
     if (!read.plan) {
-        throw Failure(Exit::usage, "{}: the library cannot load this plan: {}", one_line(read.name),
-                      one_line(read.why));
+        throw Failure(Cause::input, "{}: the library cannot load this plan: {}",
+                      one_line(read.name), one_line(read.why));
     }
     return read;
 }
@@ -142,7 +142,7 @@ void require_programs(const Work &work, int vendor, bool force)
         }
     }
     if (!missing.empty() && !force) {
-        throw Failure(Exit::environment,
+        throw Failure(Cause::device,
                       "no program {} on this device: install what is missing (device/run --bin DIR "
                       "adds programs), or run the rest with --force",
                       join_and(missing));
@@ -173,7 +173,7 @@ void require_nothing_to_report_of_a_list(const RunOptions &options)
                                : !options.junit.empty() ? "--junit"
                                                         : "";
     if (options.list && !report.empty()) {
-        throw Failure(Exit::usage,
+        throw Failure(Cause::input,
                       "--list runs nothing that {} could tell of: leave one of them out", report);
     }
 }
@@ -201,7 +201,7 @@ Exit run(RunOptions options)
     require_nothing_to_report_of_a_list(options);
     settle_outputs(options);
     if (options.as_sent && options.plan.empty()) {
-        throw Failure(Exit::usage, "--as-sent is of no use without --plan FILE, which is sent");
+        throw Failure(Cause::input, "--as-sent is of no use without --plan FILE, which is sent");
     }
     if (options.list) {
         require_standard_output("--list");
@@ -217,7 +217,7 @@ Exit run(RunOptions options)
         paths.push_back(parse_path(text, plan, read.name, options.force));
     }
     if (paths.empty() && !options.list) {
-        throw Failure(Exit::usage,
+        throw Failure(Cause::input,
                       "no PATH given: say what to run, as root/group or root/group/item{}",
                       known_groups(plan));
     }
@@ -270,7 +270,11 @@ Exit run(RunOptions options)
     for (const auto &listener : owned) {
         listeners.push_back(listener.get());
     }
-    return run_rounds(listeners, limits_of(options), *library, signals, run, work, store_plan);
+    if (!run_rounds(listeners, limits_of(options), *library, signals, run, work, store_plan)) {
+        return Exit::interrupted;
+    }
+    const Counts counts = count(run);
+    return counts.passed == counts.all() ? Exit::success : Exit::items_failed;
 }
 
 } // namespace

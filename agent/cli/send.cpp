@@ -49,7 +49,7 @@ std::vector<std::string> read_commands()
     std::vector<std::string> commands;
     const auto input = read_file("-");
     if (!input || input->empty()) {
-        throw Failure(Exit::usage, "no command can be read from standard input{}",
+        throw Failure(Cause::input, "no command can be read from standard input{}",
                       input ? "" : ": " + why_unread());
     }
     const std::string &text = *input;
@@ -119,7 +119,7 @@ class Sender
             }
             library_.pass_output(stderr);
             if (event && event->kind == LibraryProcess::Event::Kind::gone) {
-                throw Failure(Exit::environment, "{}", gone_text(*event));
+                throw Failure(Cause::device, "{}", gone_text(*event));
             }
             if (event && event->kind == LibraryProcess::Event::Kind::returned) {
                 return interrupted_ ? std::nullopt : std::optional(event->text);
@@ -141,7 +141,7 @@ Exit send(const SendOptions &options)
 {
     require_standard_output("fptest send");
     if (options.commands.empty() != options.from_input) {
-        throw Failure(Exit::usage, "give COMMANDs as arguments, or with -0 on standard input");
+        throw Failure(Cause::input, "give COMMANDs as arguments, or with -0 on standard input");
     }
     require_log_of_its_own(options.log, Beside::results);
     require_device();
@@ -164,7 +164,7 @@ Exit send(const SendOptions &options)
         std::fwrite(reply->data(), 1, reply->size(), stdout);
         std::fputc(options.from_input ? '\0' : '\n', stdout);
         if (std::fflush(stdout) != 0) {
-            throw Failure(Exit::environment, "replies cannot be written to standard output");
+            throw Failure(Cause::device, "replies cannot be written to standard output");
         }
         if (const auto plan = plan_of(command)) {
             require_stored(read_stored_plan().value_or(""), *plan);

@@ -71,12 +71,12 @@ Exit show(const std::string &file)
     const std::string name = file.empty() ? kStoredPlan : file == "-" ? "<stdin>" : one_line(file);
     const auto plan = Plan::parse_annotated(read_shown(file));
     if (!plan) {
-        throw Failure(Exit::usage, "{} is not a whole test plan: fptest check says what is wrong",
+        throw Failure(Cause::input, "{} is not a whole test plan: fptest check says what is wrong",
                       name);
     }
     const auto rows = table(*plan);
     if (rows.size() == 1) {
-        throw Failure(Exit::usage, "{} has no items: fptest check says more", name);
+        throw Failure(Cause::input, "{} has no items: fptest check says more", name);
     }
     print(rows);
     return Exit::success;

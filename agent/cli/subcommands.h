@@ -14,6 +14,14 @@
 namespace fptest
 {
 
+enum class Exit {
+    success = 0,
+    items_failed = 1,  // or, of a checked plan, errors
+    usage = 2,         // or an error in the plan
+    environment = 3,   // the device is not ready for it
+    interrupted = 130, // by a signal
+};
+
 // Says how the program is to end, or throws a Failure.
 using Action = std::function<Exit()>;
 

@@ -98,7 +98,7 @@ std::vector<std::string> readable(const CLI::App &command, std::vector<std::stri
             continue;
         }
         if (option->get_expected_max() == 0) {
-            throw Failure(Exit::usage, "{}",
+            throw Failure(Cause::input, "{}",
                           with_help(fmt::format("{} takes no value", option->get_name()),
                                     command.get_name()));
         }

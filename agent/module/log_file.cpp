@@ -63,7 +63,7 @@ void choose_log(const std::string &option)
         open(path.c_str(), O_WRONLY | O_CREAT | O_APPEND | O_NONBLOCK | O_CLOEXEC, 0644));
     // the library says nothing of what it cannot write
     if (!log.is_open() || write(log.get(), "", 0) < 0) {
-        throw Failure(Exit::environment, "{} cannot be written: {}; name another file", label(file),
+        throw Failure(Cause::device, "{} cannot be written: {}; name another file", label(file),
                       std::strerror(errno));
     }
     static Descriptor held(-1); // or a FIFO's reader would see an end before the library begins

@@ -33,13 +33,11 @@ constexpr char kDataDirectory[] = "/data/vorlane";
 void require_device()
 {
     if (access("/system/bin/sh", X_OK) != 0) {
-        throw Failure(Exit::environment,
-                      "this machine is not a device: there is no /system/bin/sh; "
-                      "on a desk, run it as: device/run -- fptest ...");
+        throw Failure(Cause::device, "this machine is not a device: there is no /system/bin/sh; "
+                                     "on a desk, run it as: device/run -- fptest ...");
     }
     if (access(kDataDirectory, W_OK | X_OK) != 0) {
-        throw Failure(Exit::environment,
-                      "{} is not writable: {}; make it, or run this as another user",
+        throw Failure(Cause::device, "{} is not writable: {}; make it, or run this as another user",
                       kDataDirectory, std::strerror(errno));
     }
     require_regular_plan();
@@ -59,7 +57,7 @@ void require_room(std::size_t bytes)
         stat(kStoredPlan, &old) == 0 ? static_cast<std::size_t>(old.st_blocks) * 512 : 0;
     if (static_cast<std::size_t>(disk.f_bavail) * disk.f_frsize + freed < bytes) {
         throw Failure(
-            Exit::environment,
+            Cause::device,
             "the disk of {} is full: make room for {} bytes; the stored plan is as it was",
             kDataDirectory, bytes);
     }
@@ -68,7 +66,7 @@ void require_room(std::size_t bytes)
 void require_stored(const std::string &found, const std::string &wanted)
 {
     if (found != wanted) {
-        throw Failure(Exit::environment,
+        throw Failure(Cause::device,
                       "the plan was not stored: {} of {} bytes are in {}; make room and store it "
                       "again, or see why with --log FILE",
                       found.size(), wanted.size(), kStoredPlan);
@@ -83,8 +81,8 @@ Descriptor lock_device()
                         errno == EWOULDBLOCK;
          ++tries) {
         if (tries == 25) {
-            throw Failure(Exit::environment, "another fptest is running a plan on this device: "
-                                             "wait for its end, or stop it");
+            throw Failure(Cause::device, "another fptest is running a plan on this device: "
+                                         "wait for its end, or stop it");
         }
         std::this_thread::sleep_for(std::chrono::milliseconds(20));
     }
@@ -101,7 +99,7 @@ void require_trigger_port()
     setsockopt(probe.get(), SOL_SOCKET, SO_REUSEADDR, &on, sizeof on);
     if (probe.is_open() &&
         bind(probe.get(), reinterpret_cast<const sockaddr *>(&address), sizeof address) != 0) {
-        throw Failure(Exit::environment,
+        throw Failure(Cause::device,
                       "port {} is not available: {}; the gatherer's run would never end: stop what "
                       "listens there (netstat -ltnp names it)",
                       kTriggerPort, std::strerror(errno));
@@ -126,7 +124,7 @@ int send_and_wait(LibraryProcess &library, const std::string &command)
             return vendor;
         }
         if (event && event->kind == LibraryProcess::Event::Kind::gone) {
-            throw Failure(Exit::environment, "{}", gone_text(*event));
+            throw Failure(Cause::device, "{}", gone_text(*event));
         }
     }
 }
@@ -134,7 +132,7 @@ int send_and_wait(LibraryProcess &library, const std::string &command)
 void require_no_leftovers(const std::vector<std::string> &programs)
 {
     if (const auto found = process_of_any(programs)) {
-        throw Failure(Exit::environment,
+        throw Failure(Cause::device,
                       "{} of an earlier run is still running, as process {}, and would report into "
                       "this one: end it first",
                       one_line(found->first), found->second);
@@ -146,7 +144,7 @@ int ask_vendor(LibraryProcess &library)
     // a path that leads nowhere: the selector is read and told before that shows
     const int vendor = send_and_wait(library, "XMLNodePath::-/fptest asks for the vendor/-");
     if (!vendor_suffix(vendor)) {
-        throw Failure(Exit::environment,
+        throw Failure(Cause::device,
                       "the vendor selector is {}, and the library runs nothing then: set "
                       "device/SysParam/Quillmark/vendor to 0, 1 or 2 in "
                       "/etc/vorlane/sysparms/vr_common_cfg.xml",

@@ -33,9 +33,9 @@ std::string require_stored_plan(const std::string &what_to_do)
         return *text;
     }
     if (errno == ENOENT) {
-        throw Failure(Exit::environment, "no plan is stored in {}{}", kStoredPlan, what_to_do);
+        throw Failure(Cause::device, "no plan is stored in {}{}", kStoredPlan, what_to_do);
     }
-    throw Failure(Exit::environment, "{} cannot be read: {}", kStoredPlan, why_unread());
+    throw Failure(Cause::device, "{} cannot be read: {}", kStoredPlan, why_unread());
 }
 
 void require_regular_plan()
@@ -43,7 +43,7 @@ void require_regular_plan()
     struct stat plan {
     };
     if (stat(kStoredPlan, &plan) == 0 && !S_ISREG(plan.st_mode)) {
-        throw Failure(Exit::environment, "{} is not a regular file: remove it", kStoredPlan);
+        throw Failure(Cause::device, "{} is not a regular file: remove it", kStoredPlan);
     }
 }
 
@@ -99,7 +99,7 @@ void replace_stored_plan(const std::string &text)
         std::rename(aside.c_str(), kStoredPlan) != 0) {
         const int error = errno;
         unlink(aside.c_str());
-        throw Failure(Exit::environment, "{} cannot be written: {}; the old plan is still there",
+        throw Failure(Cause::device, "{} cannot be written: {}; the old plan is still there",
                       kStoredPlan, std::strerror(error));
     }
 }

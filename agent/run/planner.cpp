@@ -65,21 +65,22 @@ Path parts_of(const std::string &text, const Plan &plan)
         at = end + 1;
     }
     if (parts.size() < 2) {
-        throw Failure(Exit::usage, "{} names no group: a path is root/group or root/group/item{}",
+        throw Failure(Cause::input, "{} names no group: a path is root/group or root/group/item{}",
                       in_quotes(text), instead("", group_names(plan), "groups"));
     }
     if (parts.size() > 3) {
-        throw Failure(Exit::usage, "{} has too many parts: a path is root/group or root/group/item",
+        throw Failure(Cause::input,
+                      "{} has too many parts: a path is root/group or root/group/item",
                       in_quotes(text));
     }
     if (text.find_first_of(":\t\n") != std::string::npos) {
-        throw Failure(Exit::usage,
+        throw Failure(Cause::input,
                       "{} has a ':', a tab or a line feed, at which the library would cut it: name "
                       "it without",
                       in_quotes(text));
     }
     if (text.size() > kPathLimit) {
-        throw Failure(Exit::usage, "a path of {} bytes is cut at {}: name the root with less",
+        throw Failure(Cause::input, "a path of {} bytes is cut at {}: name the root with less",
                       text.size(), kPathLimit);
     }
     if (parts.size() == 3) {
@@ -92,14 +93,14 @@ void require_known(const Path &path, const Plan &plan, const std::string &plan_n
 {
     const auto groups = group_names(plan);
     if (std::ranges::find(groups, path.group) == groups.end()) {
-        throw Failure(Exit::usage, "no group {} in {}{}", in_quotes(path.group),
+        throw Failure(Cause::input, "no group {} in {}{}", in_quotes(path.group),
                       one_line(plan_name), instead(path.group, groups, "groups"));
     }
     const auto items = item_names(plan, path.group);
     if (path.item.empty() || force || std::ranges::find(items, path.item) != items.end()) {
         return;
     }
-    throw Failure(Exit::usage, "no item {} in group {} of {}{}", in_quotes(path.item),
+    throw Failure(Cause::input, "no item {} in group {} of {}{}", in_quotes(path.item),
                   in_quotes(path.group), one_line(plan_name),
                   instead(path.item, items, "items of the group"));
 }
@@ -117,7 +118,7 @@ std::vector<std::optional<Plan::Element>> resolve(const Path &path, const Plan &
     auto items = path.item.empty() ? plan.resolve(path.group)
                                    : std::vector{plan.resolve(path.group, path.item)};
     if (std::ranges::none_of(items, runs_something)) {
-        throw Failure(Exit::usage,
+        throw Failure(Cause::input,
                       "{} leads to nothing that can be run: leave it out, or see fptest check",
                       in_quotes(path.text));
     }

@@ -52,7 +52,7 @@ void clear_reports(Job &job)
         return; // a forced one that is not well-formed: nobody has reported in it
     }
     if (!cleared) {
-        throw Failure(Exit::environment, "{} is gone, or not whole any more: store it again",
+        throw Failure(Cause::device, "{} is gone, or not whole any more: store it again",
                       kStoredPlan);
     }
     try {
@@ -238,7 +238,7 @@ bool is_interrupted(const Signals &signals)
     run.why_unfinished = why;
     finish(run, begun);
     flush(begun, signals, true);
-    throw Failure(Exit::environment, "{}", why);
+    throw Failure(Cause::device, "{}", why);
 }
 
 // The view first: it writes nothing over. Where one of them fails, those that have begun
@@ -258,7 +258,7 @@ void begin(Run &run, const std::vector<Listener *> &listeners, Signals &signals)
 
 } // namespace
 
-Exit run_rounds(const std::vector<Listener *> &listeners, const Runner::Limits &limits,
+bool run_rounds(const std::vector<Listener *> &listeners, const Runner::Limits &limits,
                 LibraryProcess &library, Signals &signals, Run &run, const Work &work,
                 const std::function<void()> &store)
 {
@@ -273,36 +273,33 @@ Exit run_rounds(const std::vector<Listener *> &listeners, const Runner::Limits &
     }
     Runner runner(library, signals, run, listeners, limits);
     runner.note_earlier_plan(earlier_plan);
-    bool broken = false;
     try {
         run.finished = Rounds(runner, run, listeners, work).run_all();
         if (!runner.broken()) {
             clear_marks();
         }
     } catch (const Failure &failure) {
-        runner.give_up(failure.what());
-        broken = true;
+        runner.break_off(failure.what());
     }
     finish(run, listeners);
     if (!flush(listeners, signals, runner.signal() != 0)) {
         say_at_end("a report is not whole: it was not read to its end");
-        return Exit::interrupted;
+        return false;
     }
     const std::string failure = failures(listeners);
     if (runner.signal() != 0 && !run.finished) {
         say_at_end(failure);
-        return Exit::interrupted;
+        return false;
     }
-    if (!failure.empty() && (broken || runner.broken())) {
+    if (!failure.empty() && runner.broken()) {
         say_at_end(failure);
     } else if (!failure.empty()) {
-        throw Failure(Exit::environment, "{}; the run went on all the same", failure);
+        throw Failure(Cause::device, "{}; the run went on all the same", failure);
     }
-    if (broken || runner.broken()) {
-        throw Failure(Exit::environment, "{}", run.why_unfinished);
+    if (runner.broken()) {
+        throw Failure(Cause::device, "{}", run.why_unfinished);
     }
-    const Counts counts = count(run);
-    return counts.passed == counts.all() ? Exit::success : Exit::items_failed;
+    return true;
 }
 
 } // namespace fptest

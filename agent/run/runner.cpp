@@ -83,7 +83,6 @@ void Runner::give_up(const std::string &why)
     }
 }
 
-// The device is not as it should be.
 void Runner::break_off(const std::string &why)
 {
     broken_ = true;

@@ -64,6 +64,8 @@ class Runner
     }
     // Ends the run early: what was not run stays so, for this reason.
     void give_up(const std::string &why);
+    // The same, as the device is not as it should be.
+    void break_off(const std::string &why);
 
   private:
     using SteadyClock = std::chrono::steady_clock;
@@ -95,7 +97,6 @@ class Runner
     void try_stop(RunningItem &active);
     void stop_gatherer(RunningItem &active);
     void release_command();
-    void break_off(const std::string &why);
     bool is_stuck() const;
     bool starts_no_more() const;
     void end_stop(const LibraryProcess::Event &event);

@@ -1,7 +1,7 @@
 // SPDX-FileCopyrightText: 2026 The Quillmark authors
 // SPDX-License-Identifier: Apache-2.0
 
-// How the program ends, and what makes it end early.
+// What makes the program end early.
 #pragma once
 
 #include <fmt/core.h>
@@ -11,12 +11,9 @@
 namespace fptest
 {
 
-enum class Exit {
-    success = 0,
-    items_failed = 1,  // or, of a checked plan, errors
-    usage = 2,         // or an error in the plan
-    environment = 3,   // the device is not ready for it
-    interrupted = 130, // by a signal
+enum class Cause {
+    input,  // the command line, or an error in the plan
+    device, // it is not ready for it
 };
 
 // One line for people: what is wrong, where, and what to do.
@@ -24,17 +21,17 @@ class Failure : public std::runtime_error
 {
   public:
     template <typename... Values>
-    Failure(Exit status, fmt::format_string<Values...> text, Values &&...values)
-        : std::runtime_error(fmt::format(text, std::forward<Values>(values)...)), status_(status)
+    Failure(Cause cause, fmt::format_string<Values...> text, Values &&...values)
+        : std::runtime_error(fmt::format(text, std::forward<Values>(values)...)), cause_(cause)
     {
     }
-    Exit status() const
+    Cause cause() const
     {
-        return status_;
+        return cause_;
     }
 
   private:
-    Exit status_;
+    Cause cause_;
 };
 
 } // namespace fptest

@@ -38,7 +38,7 @@ void fill_standard_descriptors()
 void require_standard_output(const std::string &who)
 {
     if (!standard_output_was_open) {
-        throw Failure(Exit::environment, "{} wants standard output, which is closed: open it", who);
+        throw Failure(Cause::device, "{} wants standard output, which is closed: open it", who);
     }
 }
 
@@ -82,7 +82,7 @@ std::string require_file(const std::string &path)
     if (auto text = read_file(path)) {
         return *text;
     }
-    throw Failure(Exit::usage, "{}: {}", one_line(path), why_unread());
+    throw Failure(Cause::input, "{}: {}", one_line(path), why_unread());
 }
 
 std::string end_of_links(const std::string &path)
