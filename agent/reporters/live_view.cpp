@@ -3,8 +3,8 @@
 
 #include "reporters/views.h"
 
+#include "reporters/line_printer.h"
 #include "reporters/wording.h"
-#include "reporters/writer.h"
 #include "util/terminal.h"
 #include "util/text.h"
 
@@ -12,7 +12,6 @@
 #include <charconv>
 #include <chrono>
 #include <fmt/core.h>
-#include <numeric>
 #include <string>
 #include <utility>
 #include <vector>
@@ -27,8 +26,6 @@ using namespace std::chrono_literals;
 
 constexpr std::size_t kNarrowest = 40; // in which an item's result can still be seen
 
-enum class Colour { none, red, green, yellow, cyan };
-
 Colour colour_of(Outcome outcome)
 {
     switch (outcome) {
@@ -42,52 +39,10 @@ Colour colour_of(Outcome outcome)
     }
 }
 
-// A line as it grows, with its width in columns and not in bytes.
-class Line
-{
-  public:
-    Line(std::size_t room, bool coloured) : room_(room), coloured_(coloured)
-    {
-    }
-
-    std::size_t room() const
-    {
-        return room_ - width_;
-    }
-
-    void add(const std::string &text, Colour colour = Colour::none)
-    {
-        const std::string shown = ellipsize(text, room());
-        if (coloured_ && colour != Colour::none && !shown.empty()) {
-            static constexpr const char *codes[] = {"", "31", "32", "33", "36"};
-            text_ += fmt::format("\x1b[{}m{}\x1b[0m", codes[static_cast<int>(colour)], shown);
-        } else {
-            text_ += shown;
-        }
-        width_ += display_width(shown);
-    }
-
-    const std::string &text() const
-    {
-        return text_;
-    }
-    std::size_t width() const
-    {
-        return width_;
-    }
-
-  private:
-    std::size_t room_;
-    bool coloured_;
-    std::string text_;
-    std::size_t width_ = 0;
-};
-
 class LiveView : public Listener
 {
   public:
-    LiveView(std::FILE *terminal, bool coloured)
-        : terminal_(terminal), writer_("standard output", fileno(terminal)), coloured_(coloured)
+    LiveView(std::FILE *terminal, bool coloured) : printer_(terminal, coloured)
     {
     }
 
@@ -136,7 +91,7 @@ class LiveView : public Listener
         Line line = item_line(item);
         const bool has_room = display_width(said) <= line.room();
         line.add(has_room ? said : "");
-        keep(line);
+        printer_.keep(line);
         if (!has_room) {
             keep_text("      " + said);
         }
@@ -165,16 +120,13 @@ class LiveView : public Listener
     // The shell writes next.
     void paused(const Run & /* run */) override
     {
-        if (!drawn_.empty()) {
-            writer_.write("\n");
-            drawn_.clear();
-        }
+        printer_.leave();
     }
 
     // What is there now is the shell's.
     void resumed(const Run &run) override
     {
-        drawn_.clear();
+        printer_.forget();
         draw(run);
     }
 
@@ -191,31 +143,25 @@ class LiveView : public Listener
             keep_text(line);
         }
         write_frame(run);
-        writer_.write("\n");
+        printer_.leave();
     }
 
     bool flush() override
     {
-        return !writer_.is_pending();
+        return printer_.is_flushed();
     }
 
     std::string failure() const override
     {
-        return writer_.failure();
+        return printer_.failure();
     }
 
   private:
-    // The last column stays free: some terminals wrap as soon as it is written.
-    Line new_line() const
-    {
-        return {terminal_width(terminal_) - 1, coloured_};
-    }
-
     // All of an item but its description.
     Line item_line(const ItemRun &item) const
     {
         const bool runs = !item.seconds;
-        Line line = new_line();
+        Line line = printer_.new_line();
         const std::size_t width = line.room();
         const std::size_t bar = width >= 95 ? 16 : width >= 60 ? 8 : 0;
         line.add(fmt::format(
@@ -252,7 +198,7 @@ class LiveView : public Listener
     Line total_line(const Run &run) const
     {
         const Counts counts = count(run);
-        Line line = new_line();
+        Line line = printer_.new_line();
         line.add(fmt::format("{} passed", counts.passed),
                  counts.passed > 0 ? Colour::green : Colour::none);
         line.add(", ");
@@ -265,59 +211,32 @@ class LiveView : public Listener
         return line;
     }
 
-    // Puts a line above those that are redrawn, when they are.
-    void keep(const Line &line)
-    {
-        if (writer_.failure().empty()) {
-            kept_ += line.text() + "\n";
-        }
-    }
-
     void keep_text(const std::string &text, Colour colour = Colour::none)
     {
-        Line line = new_line();
+        Line line = printer_.new_line();
         line.add(text, colour);
-        keep(line);
-    }
-
-    // What takes the drawn lines away and leaves the cursor where they began. A
-    // terminal that was made narrower has wrapped them.
-    std::string erase()
-    {
-        if (drawn_.empty()) {
-            return {};
-        }
-        const std::size_t width = terminal_width(terminal_);
-        const std::size_t rows = std::accumulate(
-            drawn_.begin(), drawn_.end(), std::size_t{0}, [&](std::size_t sum, std::size_t line) {
-                return sum + std::max<std::size_t>(1, (line + width - 1) / width);
-            });
-        drawn_.clear();
-        return rows > 1 ? fmt::format("\r\x1b[{}A\x1b[J", rows - 1) : "\r\x1b[J";
+        printer_.keep(line);
     }
 
     // While the terminal does not take what it was given, frames are left out.
     void draw(const Run &run)
     {
-        if (!writer_.is_pending() || kept_.size() > kMostKept) {
+        if (printer_.wants_frame()) {
             write_frame(run);
         }
     }
 
     void write_frame(const Run &run)
     {
-        std::string frame = erase() + std::exchange(kept_, {});
+        std::vector<Line> frame;
         for (const Place place : running_) {
             const ItemRun &item = item_at(run, place);
-            Line line = item_line(item);
-            line.add(item.report.description ? one_line(*item.report.description)
-                                             : last_line(item.output));
-            frame += line.text() + "\n";
-            drawn_.push_back(line.width());
+            frame.push_back(item_line(item));
+            frame.back().add(item.report.description ? one_line(*item.report.description)
+                                                     : last_line(item.output));
         }
-        const Line line = total_line(run);
-        drawn_.push_back(line.width());
-        writer_.write(frame + line.text());
+        frame.push_back(total_line(run));
+        printer_.redraw(frame);
         drawn_at_ = Clock::now();
     }
 
@@ -329,17 +248,12 @@ class LiveView : public Listener
         return lines.empty() ? "" : lines.back();
     }
 
-    static constexpr std::size_t kMostKept = 65536;
     static constexpr std::size_t kTail = 400;
 
-    std::FILE *terminal_;
-    Writer writer_;
-    bool coloured_;
+    LinePrinter printer_;
     std::size_t name_width_ = 8;
     std::size_t suite_ = std::string::npos;
     std::vector<Place> running_;
-    std::vector<std::size_t> drawn_; // the widths of the lines that are redrawn
-    std::string kept_;               // lines that are above the next frame
     Clock::time_point drawn_at_;
 };
 
