@@ -196,6 +196,21 @@ Runner::Limits limits_of(const RunOptions &options)
     return limits;
 }
 
+Run run_of(const RunOptions &options, const std::string &plan, int vendor)
+{
+    Run run;
+    run.plan = plan;
+    run.rounds = options.repeat;
+    if (!run.rounds && !options.time_limit && !options.until_fail) {
+        run.rounds = 1;
+    }
+    run.time_limit = options.time_limit;
+    run.until_fail = options.until_fail;
+    run.pass_code = options.pass_code;
+    run.vendor = vendor;
+    return run;
+}
+
 Exit run(RunOptions options)
 {
     require_nothing_to_report_of_a_list(options);
@@ -255,16 +270,7 @@ Exit run(RunOptions options)
             library.emplace(); // the one before keeps the plan that was there when it was asked
         }
     };
-    Run run;
-    run.plan = read.name;
-    run.rounds = options.repeat;
-    if (!run.rounds && !options.time_limit && !options.until_fail) {
-        run.rounds = 1;
-    }
-    run.time_limit = options.time_limit;
-    run.until_fail = options.until_fail;
-    run.pass_code = options.pass_code;
-    run.vendor = vendor;
+    Run run = run_of(options, read.name, vendor);
     const auto owned = make_listeners(options);
     std::vector<Listener *> listeners;
     for (const auto &listener : owned) {
