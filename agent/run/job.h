@@ -53,11 +53,28 @@ struct RunningItem {
         bool lost = false;        // the stored plan is gone
         bool undone = false;      // a result was there, and has gone
         bool in_another_plan = false;
-        bool beside_others = false; // they have reported, and so saved the plan, meanwhile
-        bool from_a_copy = false;   // the gatherer's own, which has no mark
+        // At which look it has changed last, and another's report; 0 for none.
+        unsigned changed_at = 0;
+        unsigned other_changed_at = 0;
+        bool from_a_copy = false; // the gatherer's own, which has no mark
         // The one after which an earlier one has come back; of seen, the last before it.
         std::optional<ItemReport> taken_back;
         std::vector<ItemReport> seen;
+
+        // Whether others have reported meanwhile, and so saved the plan as they know it.
+        bool is_beside_others() const
+        {
+            return other_changed_at != 0;
+        }
+        // Whether they may have done so after it, before anybody saw more of it.
+        bool is_uncertain() const
+        {
+            return is_beside_others() && other_changed_at >= changed_at;
+        }
+        bool is_written_over() const
+        {
+            return overwritten || undone || (taken_back && is_beside_others());
+        }
     };
 
     Place place;

@@ -94,6 +94,7 @@ void ReportReader::read(const std::optional<Plan> &plan)
     if (!plan) {
         return;
     }
+    ++look_;
     for (RunningItem &active : running_.items) {
         read_report(active, *plan);
     }
@@ -183,7 +184,7 @@ void ReportReader::begin_gathering()
 void ReportReader::tell_late(const Place &place, bool gathers, int round, const ItemReport &report)
 {
     for (RunningItem &active : running_.items) {
-        active.reporting.beside_others = true;
+        active.reporting.other_changed_at = look_;
     }
     const int now = std::exchange(run_.round, round);
     for (Listener *listener : listeners_) {
@@ -281,8 +282,11 @@ void ReportReader::read_report(RunningItem &active, const Plan &plan)
         active.reporting.seen.erase(active.reporting.seen.begin());
     }
     active.reporting.seen.push_back(std::exchange(result.report, std::move(report)));
+    active.reporting.changed_at = look_;
     for (RunningItem &other : running_.items) {
-        other.reporting.beside_others |= other.place != active.place;
+        if (other.place != active.place) {
+            other.reporting.other_changed_at = look_;
+        }
     }
     for (Listener *listener : listeners_) {
         listener->progressed(run_, active.place);

@@ -46,8 +46,9 @@ void Runner::judge(const RunningItem &active)
         result.overruled = has_reported;
     } else if (result.signal != 0) {
         result.outcome = Outcome::failed;
-        result.reason = fmt::format("died by {}{}", name_of_signal(result.signal),
-                                    has_reported ? ", though it " + reported(report) : "");
+        result.reason = fmt::format("died by {}{}{}", name_of_signal(result.signal),
+                                    has_reported ? ", though it " + reported(report) : "",
+                                    active.reporting.is_written_over() ? kOverwrittenAfter : "");
     } else if (!has_reported || active.reporting.lost) {
         result.outcome = Outcome::no_result;
         result.reason = why_silent(active);
@@ -63,12 +64,19 @@ void Runner::judge(const RunningItem &active)
         result.outcome = Outcome::failed;
         result.reason = fmt::format("ended with exit status {}, though it {}", *result.exit_status,
                                     reported(report));
-    } else if (active.reporting.beside_others && active.reporting.taken_back &&
+    } else if (active.reporting.is_beside_others() && active.reporting.taken_back &&
                !(passes(report) && passes(*active.reporting.taken_back))) {
         result.outcome = Outcome::failed;
         result.reason = fmt::format("{}; a process with an old copy of the plan has then written "
                                     "back what it had reported before",
                                     reported(*active.reporting.taken_back));
+        result.overruled = true;
+    } else if (passes(report) && report.progress != "100" && active.reporting.is_uncertain()) {
+        result.outcome = Outcome::failed;
+        result.reason = fmt::format("it was last seen at progress {}: a process that has reported "
+                                    "meanwhile may have written over more with its old copy of "
+                                    "the plan",
+                                    one_line(report.progress.value_or("-")));
         result.overruled = true;
     } else if (passes(report)) {
         result.outcome = Outcome::passed;
@@ -95,9 +103,10 @@ std::string Runner::why_stopped(const RunningItem &active)
     }
     const bool is_interrupted = active.stop == Outcome::stopped;
     if (!active.killed) {
-        return is_interrupted ? fmt::format("stopped by {}", name_for_people(signal_))
-                              : fmt::format("stopped after {}{}", duration(seconds),
-                                            active.reporting.overwritten ? kOverwrittenAfter : "");
+        return is_interrupted
+                   ? fmt::format("stopped by {}", name_for_people(signal_))
+                   : fmt::format("stopped after {}{}", duration(seconds),
+                                 active.reporting.is_written_over() ? kOverwrittenAfter : "");
     }
     return fmt::format("killed after {}, as it did not end when it was asked to",
                        is_interrupted ? "the run was interrupted by " + name_for_people(signal_)
@@ -144,7 +153,7 @@ std::string Runner::why_silent(const RunningItem &active)
         return fmt::format("no report can be written any more: the stored plan does not load ({})",
                            why);
     }
-    if (active.reporting.beside_others) {
+    if (active.reporting.is_beside_others()) {
         return "no report is there: there was none, or a process that has reported meanwhile "
                "has written over it with its old copy of the plan";
     }

@@ -287,6 +287,17 @@ TEST_F(Trust, PassesNothingByAnEarlierReportThatAnOldCopyBringsBack)
     }
 }
 
+TEST_F(Trust, PassesNothingThatIsNotDoneAndMayHaveBeenWrittenOver)
+{
+    const std::string leaves = "'(sleep 0.5; exec /system/bin/Item report-here G Script 50 0 one "
+                               "await /tmp/scene/go report-here G Script 50 0 two sleep 5) &amp; "
+                               "fptest report G Script --progress 100 --result 0'";
+    run_group({{"Script", leaves},
+               {"Item", "report-here G Item 10 0 begun sleep 1 report-here G Item 100 1 done "
+                        "note /tmp/scene/go sleep 0.3"}});
+    EXPECT_THAT(outcomes(), ElementsAre("Script: passed", "Item: failed"));
+}
+
 TEST_F(Trust, FailsWhatARealTimeSignalHasKilled)
 {
     run_group(
