@@ -22,14 +22,6 @@ namespace
 constexpr char kFill = '\x5a';
 constexpr std::size_t kMostCommands = 12; // enough to meet, and quick
 
-// What an array of that capacity holds after a text was put there.
-std::string filled(std::string_view text, std::size_t capacity)
-{
-    std::string array(text.substr(0, capacity - 1));
-    array.resize(capacity, '\0');
-    return array;
-}
-
 template <std::size_t N> std::string_view bytes(const char (&array)[N])
 {
     return {array, N};

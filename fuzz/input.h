@@ -28,6 +28,14 @@ std::array<std::string, N> texts(const std::uint8_t *data, std::size_t size)
     return found;
 }
 
+// What an array of that capacity holds after a text was put there.
+inline std::string filled(std::string_view text, std::size_t capacity)
+{
+    std::string array(text.substr(0, capacity - 1));
+    array.resize(capacity, '\0');
+    return array;
+}
+
 // A block of its own, exactly as long as it has to be: AddressSanitizer stops
 // whoever touches the byte before or after it.
 class Block

@@ -24,13 +24,6 @@ constexpr char kPlan[] = "<?xml version=\"1.0\"?><P>"
                          "<CmdGroup name=\"c\"/><CmdGroup name=\"\"><Cmd name=\"\"/></CmdGroup>"
                          "</P>";
 
-std::string filled(std::string_view text, std::size_t capacity)
-{
-    std::string array(text.substr(0, capacity - 1));
-    array.resize(capacity, '\0');
-    return array;
-}
-
 void check_level(const std::string &path)
 {
     const auto names = components(path, '/');

@@ -124,9 +124,10 @@ Ended run_fptest(const std::vector<std::string> &arguments, const std::string &i
     return run_fptest({.arguments = arguments, .input = input});
 }
 
-void expect_refusal(int status, const std::string &line, const std::vector<std::string> &arguments)
+void expect_refusal(int status, const std::string &line, const std::vector<std::string> &arguments,
+                    const std::string &input)
 {
-    const Ended ended = run_fptest(arguments);
+    const Ended ended = run_fptest(arguments, input);
     EXPECT_EQ(ended.status, status) << ::testing::PrintToString(arguments);
     EXPECT_EQ(ended.err, line + "\n");
     EXPECT_EQ(ended.out, "");

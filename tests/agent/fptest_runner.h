@@ -42,7 +42,8 @@ Ended run_fptest(const Start &start);
 Ended run_fptest(const std::vector<std::string> &arguments, const std::string &input = "");
 
 // It ends with that status and says why in that line, and nothing else.
-void expect_refusal(int status, const std::string &line, const std::vector<std::string> &arguments);
+void expect_refusal(int status, const std::string &line, const std::vector<std::string> &arguments,
+                    const std::string &input = "");
 
 // Another program of this system, with everything it prints in out.
 Ended run_program(const std::vector<std::string> &arguments);

@@ -1,8 +1,7 @@
 // SPDX-FileCopyrightText: 2026 The Quillmark authors
 // SPDX-License-Identifier: Apache-2.0
 
-// The program as a whole: what it says of itself, wrong usage, and the commands
-// that only read.
+// The program as a whole: what it says of itself, and the commands that only read.
 #include "fptest_runner.h"
 #include "terminal_session.h"
 
@@ -104,51 +103,6 @@ TEST_F(Fptest, TellsItsVersion)
     EXPECT_EQ(ended.err, "");
 }
 
-// --- wrong usage ------------------------------------------------------------------------
-
-void expect_wrong(const std::vector<std::string> &arguments, const std::string &line)
-{
-    fptest_runner::expect_refusal(2, line, arguments);
-}
-
-TEST_F(Fptest, SaysInOneLineWhatIsWrongWithItsArguments)
-{
-    expect_wrong({}, "fptest: no command is given; see fptest --help");
-    expect_wrong({"bogus"}, "fptest: there is no command 'bogus'; the commands are run, check, "
-                            "show, report and send");
-    expect_wrong({"rum"}, "fptest: there is no command 'rum'; did you mean 'run'? The commands "
-                          "are run, check, show, report and send");
-    for (const std::string &command : kCommands) {
-        const Ended ended = run_fptest({command, "--bogus"});
-        EXPECT_EQ(ended.status, 2);
-        EXPECT_THAT(lines_of(ended.err), SizeIs(1)) << ended.err;
-        EXPECT_THAT(ended.err, StartsWith("fptest: "));
-        EXPECT_EQ(ended.out, "");
-    }
-    expect_wrong({"check"}, "fptest: FILE is required; see fptest check --help");
-    expect_wrong({"show", "one", "two"},
-                 "fptest: 'two' is one argument too many; see fptest show --help");
-}
-
-TEST_F(Fptest, TakesNoValuesThatMakeNoSense)
-{
-    const std::vector<std::pair<std::string, Lines>> wrong = {
-        {"--timeout", {"0", "-1", "x", "nan", ""}},
-        {"--repeat", {"0", "-1", "x", "1.5", ""}},
-        {"--pass-code", {"2", "7", "-1", "x", ""}}};
-    for (const auto &[option, values] : wrong) {
-        for (const std::string &value : values) {
-            const Ended ended =
-                run_fptest({"run", option, value, "--plan", plan(group_of({{"Item", ""}})), "P/G"});
-            EXPECT_EQ(ended.status, 2) << option << " " << value;
-            EXPECT_THAT(lines_of(ended.err), SizeIs(1)) << ended.err;
-            EXPECT_THAT(ended.err, HasSubstr(option));
-            EXPECT_EQ(ended.out, "");
-            EXPECT_FALSE(fs::exists(kPlanFile));
-        }
-    }
-}
-
 // --- show -------------------------------------------------------------------------------
 
 TEST_F(Fptest, ShowsTheStoredPlanAsATable)
@@ -201,28 +155,22 @@ TEST_F(Fptest, ShowsWhatNoByteOfADescriptionCanChange)
 
 TEST_F(Fptest, SaysInOneLineWhyItShowsNothing)
 {
-    const auto expect = [](int status, const std::string &line, const Lines &arguments,
-                           const std::string &input = "") {
-        const Ended ended = run_fptest(arguments, input);
-        EXPECT_EQ(ended.status, status);
-        EXPECT_EQ(ended.err, line + "\n");
-        EXPECT_EQ(ended.out, "");
-    };
-    expect(3,
-           "fptest: no plan is stored in /data/vorlane/src1.xml: run one with fptest run --plan "
-           "FILE, or name a file to show",
-           {"show"});
-    expect(2, "fptest: /tmp/scene/none: No such file or directory", {"show", work("none")});
+    expect_refusal(
+        3,
+        "fptest: no plan is stored in /data/vorlane/src1.xml: run one with fptest run --plan "
+        "FILE, or name a file to show",
+        {"show"});
+    expect_refusal(2, "fptest: /tmp/scene/none: No such file or directory", {"show", work("none")});
     const std::string half = "<P><CmdGroup name=\"G\"><Cmd name=\"a\"/><Cmd nam";
-    expect(2,
-           "fptest: /tmp/scene/plan.xml is not a whole test plan: fptest check says what is wrong",
-           {"show", plan(half)});
-    expect(2, "fptest: <stdin> is not a whole test plan: fptest check says what is wrong",
-           {"show", "-"}, half);
-    expect(2, "fptest: <stdin> has no items: fptest check says more", {"show", "-"},
-           "<P><CmdGroup name=\"G\"/></P>");
+    expect_refusal(
+        2, "fptest: /tmp/scene/plan.xml is not a whole test plan: fptest check says what is wrong",
+        {"show", plan(half)});
+    expect_refusal(2, "fptest: <stdin> is not a whole test plan: fptest check says what is wrong",
+                   {"show", "-"}, half);
+    expect_refusal(2, "fptest: <stdin> has no items: fptest check says more", {"show", "-"},
+                   "<P><CmdGroup name=\"G\"/></P>");
     write_file(kPlanFile, half);
-    expect(
+    expect_refusal(
         2,
         "fptest: /data/vorlane/src1.xml is not a whole test plan: fptest check says what is wrong",
         {"show"});

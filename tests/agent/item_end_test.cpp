@@ -440,10 +440,9 @@ TEST_F(ItemEnd, GathererThatEndsAtItsStartHoldsUpNoRun)
 TEST_F(ItemEnd, GathererThatEndsWithoutAReportIsNotWaitedFor)
 {
     FptestProcess fptest(with_group({{"SensorProbe", "--group G --seconds 60"}}));
-    ASSERT_TRUE(
-        eventually([] { return processes_named("/system/bin/SensorProbe").size() == 1; }, 20));
+    ASSERT_TRUE(eventually([] { return processes_named(kProbe).size() == 1; }, 20));
     std::this_thread::sleep_for(std::chrono::milliseconds(500)); // it has been told by now
-    for (const device::Process &process : processes_named("/system/bin/SensorProbe")) {
+    for (const device::Process &process : processes_named(kProbe)) {
         kill(process.pid, SIGKILL);
     }
     const Ended ended = fptest.wait();
@@ -463,7 +462,7 @@ TEST_F(ItemEnd, GathererThatDidNotReportInTimeReportsIntoNothingLater)
         for (const Json &end : events("end")) {
             EXPECT_EQ(end.at("outcome"), "timed out");
         }
-        EXPECT_THAT(processes_named("/system/bin/SensorProbe"), IsEmpty());
+        EXPECT_THAT(processes_named(kProbe), IsEmpty());
     }
 }
 
@@ -471,14 +470,13 @@ TEST_F(ItemEnd, GathererThatIsSuspendedIsKilled)
 {
     FptestProcess fptest(with_group({{"SensorProbe", "--group G --seconds 60"}},
                                     {"--timeout", "1", "--grace", "0.5"}));
-    ASSERT_TRUE(
-        eventually([] { return processes_named("/system/bin/SensorProbe").size() == 1; }, 20));
-    for (const device::Process &process : processes_named("/system/bin/SensorProbe")) {
+    ASSERT_TRUE(eventually([] { return processes_named(kProbe).size() == 1; }, 20));
+    for (const device::Process &process : processes_named(kProbe)) {
         kill(process.pid, SIGSTOP);
     }
     EXPECT_EQ(fptest.wait().status, 1);
     EXPECT_THAT(outcomes(), ElementsAre("SensorProbe: timed out"));
-    EXPECT_THAT(processes_named("/system/bin/SensorProbe"), IsEmpty());
+    EXPECT_THAT(processes_named(kProbe), IsEmpty());
 }
 
 // --- a run that is suspended ---------------------------------------------------------
@@ -508,11 +506,10 @@ TEST_F(ItemEnd, SuspendedRunSuspendsTheGatherer)
         .arguments = with_group({{"SensorProbe", "--group G --seconds 1.5"}}, {"--timeout", "10"}),
         .prepare = in_own_group};
     FptestProcess fptest(start);
-    ASSERT_TRUE(
-        eventually([] { return processes_named("/system/bin/SensorProbe").size() == 1; }, 20));
+    ASSERT_TRUE(eventually([] { return processes_named(kProbe).size() == 1; }, 20));
     fptest.signal(SIGTSTP);
     ASSERT_TRUE(eventually([&] { return is_suspended(fptest.pid()); }, 20));
-    for (const device::Process &process : processes_named("/system/bin/SensorProbe")) {
+    for (const device::Process &process : processes_named(kProbe)) {
         EXPECT_TRUE(eventually([&] { return is_suspended(process.pid); }, 20));
     }
     fptest.signal(SIGCONT);

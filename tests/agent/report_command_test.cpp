@@ -185,44 +185,6 @@ TEST_F(Report, NamesTheNearestItemAndAllOfTheGroup)
                    {"Bringup", "BurnIn", "--progress", "1", "--result", "0"});
 }
 
-TEST_F(Report, TakesNoOtherResults)
-{
-    for (const std::string result : {"7", "2", "-1", "x", ""}) {
-        const Ended ended = report({"Bringup", "SpiCheck", "--progress", "1", "--result", result});
-        EXPECT_EQ(ended.status, 2) << result;
-        EXPECT_THAT(lines_of(ended.err), SizeIs(1)) << ended.err;
-        EXPECT_THAT(ended.err, HasSubstr("--result")) << result;
-        EXPECT_EQ(read_file(kPlanFile), kPlan);
-    }
-    EXPECT_THAT(report({"Bringup", "SpiCheck", "--progress", "1", "--result", "7"}).err,
-                AllOf(HasSubstr("7"), HasSubstr("0"), HasSubstr("1"), HasSubstr("-2")));
-}
-
-TEST_F(Report, TakesNoProgressThatIsNoNumberOrTooLong)
-{
-    // the plan would hold the first 9 characters of it
-    for (const std::string progress : {"1000000000", "-100000000", "50%", "half", "", "1.5"}) {
-        const Ended ended =
-            report({"Bringup", "SpiCheck", "--progress", progress, "--result", "0"});
-        EXPECT_EQ(ended.status, 2) << progress;
-        EXPECT_THAT(lines_of(ended.err), SizeIs(1)) << ended.err;
-        EXPECT_THAT(ended.err, HasSubstr("--progress")) << progress;
-        EXPECT_EQ(read_file(kPlanFile), kPlan);
-    }
-}
-
-TEST_F(Report, WantsEverythingButTheDescription)
-{
-    const std::vector<std::pair<std::string, std::vector<std::string>>> missing = {
-        {"--progress", {"Bringup", "SpiCheck", "--result", "0"}},
-        {"--result", {"Bringup", "SpiCheck", "--progress", "1"}},
-        {"ITEM", {"Bringup", "--progress", "1", "--result", "0"}},
-        {"GROUP", {"--progress", "1", "--result", "0"}}};
-    for (const auto &[what, arguments] : missing) {
-        expect_refusal(2, "fptest: " + what + " is required; see fptest report --help", arguments);
-    }
-}
-
 TEST_F(Report, WantsAPlan)
 {
     fs::remove(kPlanFile);

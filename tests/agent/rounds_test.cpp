@@ -114,21 +114,6 @@ TEST_F(Rounds, EndAfterTheirNumberWhereThatComesBeforeTheTime)
     EXPECT_THAT(without_times(ended.out), HasSubstr("\n2 passed, 0 failed, T s\n"));
 }
 
-TEST_F(Rounds, RefuseWhatIsNotATime)
-{
-    for (const std::string wrong : {"0", "-1", "x", "1w", "10mm", "1 h", "h", "nan", "0.0001"}) {
-        expect_refusal(2,
-                       "fptest: --for: '" + wrong +
-                           "' is not a time such as 90, 90s, 10m, 2h or 1d; see fptest run --help",
-                       {"run", "--for", wrong, "P/G"});
-    }
-    for (const std::string wrong : {"1001d", "99999999999d", "1e300d"}) {
-        expect_refusal(
-            2, "fptest: --for: '" + wrong + "' is longer than 1000 days; see fptest run --help",
-            {"run", "--for", wrong, "P/G"});
-    }
-}
-
 TEST_F(Rounds, AreListedOnce)
 {
     const Ended ended =

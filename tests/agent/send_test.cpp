@@ -273,25 +273,6 @@ TEST_F(Send, SaysThatRepliesCannotBeWritten)
     EXPECT_FALSE(std::filesystem::exists(kPlanFile));
 }
 
-TEST_F(Send, WantsACommand)
-{
-    const Ended ended = run_fptest({"send"});
-    EXPECT_EQ(ended.status, 2);
-    EXPECT_EQ(ended.out, "");
-    EXPECT_THAT(lines_of(ended.err), SizeIs(1));
-    EXPECT_THAT(ended.err, StartsWith("fptest: "));
-    EXPECT_THAT(ended.err, HasSubstr("COMMAND"));
-}
-
-TEST_F(Send, WantsCommandsFromOneSideOnly)
-{
-    const Ended ended = run_fptest({"send", "-0", "pingtest"}, "pingtest");
-    EXPECT_EQ(ended.status, 2);
-    EXPECT_EQ(ended.out, "");
-    EXPECT_THAT(lines_of(ended.err), SizeIs(1));
-    EXPECT_THAT(ended.err, HasSubstr("-0"));
-}
-
 TEST_F(Send, WantsADevice)
 {
     if (is_in_place()) {

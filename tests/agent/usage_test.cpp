@@ -14,7 +14,29 @@ using device::Lines;
 namespace
 {
 
-using Usage = FptestTest;
+const std::string kPlan = group_of({{"Item", ""}});
+
+class Usage : public FptestTest
+{
+  protected:
+    static Lines with(Lines arguments, const std::string &last)
+    {
+        arguments.push_back(last);
+        return arguments;
+    }
+
+    void SetUp() override
+    {
+        FptestTest::SetUp();
+        write_file(device::kPlanFile, kPlan);
+    }
+
+    static void expect_wrong(const Lines &arguments, const std::string &text)
+    {
+        expect_refusal(2, "fptest: " + text, arguments);
+        EXPECT_EQ(read_file(device::kPlanFile), kPlan);
+    }
+};
 
 TEST_F(Usage, IsExplainedInOneLine)
 {
@@ -52,27 +74,79 @@ TEST_F(Usage, IsExplainedInOneLine)
         {{"run", "P/G", "--", "--quit"},
          "there is no option '--quit'; did you mean '--quiet'? See fptest run --help"},
         {{"run", "-x"}, "there is no option '-x'; see fptest run --help"},
+        {{"run", "--bogus"}, "there is no option '--bogus'; see fptest run --help"},
+        {{"check", "--bogus"}, "there is no option '--bogus'; see fptest check --help"},
+        {{"report", "--bogus"}, "there is no option '--bogus'; see fptest report --help"},
+        {{"send", "--bogus"}, "there is no option '--bogus'; see fptest send --help"},
         {{"show", "--group"}, "there is no option '--group'; see fptest show --help"},
         {{"show", "one", "two", "three"}, "'two' is one argument too many; see fptest show --help"},
         {{"report", "G", "I", "a\nb", "--progress", "1", "--result", "0"},
          "'a\u240Ab' is one argument too many; see fptest report --help"},
         {{"check"}, "FILE is required; see fptest check --help"},
         {{"check", "--for", "file"}, "FILE is required; see fptest check --help"},
+        {{"report", "--progress", "1", "--result", "0"},
+         "GROUP is required; see fptest report --help"},
+        {{"report", "G", "--progress", "1", "--result", "0"},
+         "ITEM is required; see fptest report --help"},
+        {{"report", "G", "I", "--result", "0"}, "--progress is required; see fptest report --help"},
         {{"report", "G"}, "ITEM is required; see fptest report --help"},
         {{"report", "G", "I", "--progress", "1"}, "--result is required; see fptest report --help"},
         {{"--versoin"},
          "there is no option '--versoin'; did you mean '--version'? See fptest --help"},
         {{"--help=3"}, "there is no option '--help=3'; did you mean '--help'? See fptest --help"},
+        {{"send"}, "give COMMANDs as arguments, or with -0 on standard input"},
+        {{"send", "-0", "pingtest"}, "give COMMANDs as arguments, or with -0 on standard input"},
+        {{"bogus"},
+         "there is no command 'bogus'; the commands are run, check, show, report and send"},
+        {{"rum"},
+         "there is no command 'rum'; did you mean 'run'? The commands are run, check, show, "
+         "report and send"},
         {{}, "no command is given; see fptest --help"}};
     for (const auto &[arguments, text] : wrong) {
-        expect_refusal(2, "fptest: " + text, arguments);
+        expect_wrong(arguments, text);
+    }
+}
+
+TEST_F(Usage, SaysWhatIsWrongWithAValue)
+{
+    const std::string path = plan(kPlan);
+    const struct {
+        Lines before; // the value
+        Lines values;
+        std::string what; // they are
+    } wrong[] = {
+        {{"run", "--plan", path, "P/G", "--timeout"},
+         {"0", "-1", "x", "nan"},
+         "is not a number from 0.001 to 1000000"},
+        {{"run", "--plan", path, "P/G", "--repeat"},
+         {"0", "-1", "x", "1.5"},
+         "is not a number from 1 to 1000000"},
+        {{"run", "--plan", path, "P/G", "--pass-code"},
+         {"2", "7", "-1", "x"},
+         "is none of 0, 1 and -2"},
+        {{"run", "P/G", "--for"},
+         {"0", "-1", "x", "1w", "10mm", "1 h", "h", "nan", "0.0001"},
+         "is not a time such as 90, 90s, 10m, 2h or 1d"},
+        {{"run", "P/G", "--for"}, {"1001d", "99999999999d", "1e300d"}, "is longer than 1000 days"},
+        {{"report", "G", "Item", "--progress", "1", "--result"},
+         {"7", "2", "-1", "x"},
+         "is none of 0, 1 and -2"},
+        // of more, the plan would hold the first 9 characters
+        {{"report", "G", "Item", "--result", "0", "--progress"},
+         {"1000000000", "-100000000", "50%", "half", "1.5"},
+         "is not a number from -99999999 to 999999999"},
+    };
+    for (const auto &[before, values, what] : wrong) {
+        const std::string end = "; see fptest " + before.front() + " --help";
+        for (const std::string &value : values) {
+            expect_wrong(with(before, value), before.back() + ": '" + value + "' " + what + end);
+        }
+        expect_wrong(with(before, ""), before.back() + ": its value is empty" + end);
     }
 }
 
 TEST_F(Usage, TakesAnEmptyDescription)
 {
-    device::write_file(device::kPlanFile,
-                       "<P><CmdGroup name=\"G\"><Cmd name=\"Item\"/></CmdGroup></P>");
     EXPECT_EQ(
         run_fptest({"report", "G", "Item", "--progress", "100", "--description=", "--result", "0"})
             .status,

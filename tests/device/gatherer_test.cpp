@@ -68,25 +68,13 @@ TEST_F(Gatherer, SecondCommandStartsNoOtherAndLogsNoLeaveLine)
     EXPECT_EQ(lines.end()[-1], "Sock_Init1| retWri success");
 }
 
-TEST_F(Gatherer, RunsAsItsVariantUnderVendorOne)
+TEST_F(Gatherer, RunsAsItsVariantUnderVendorOneAndThenCountsAsRunningUnderEveryVendor)
 {
     set_vendor("1");
     store_plan();
     run_path("P/G/SensorProbe");
-
     EXPECT_EQ(processes_named("/system/bin/SensorProbe_ca").size(), 1U);
-    EXPECT_THAT(processes_named(kProbe), IsEmpty());
-    EXPECT_THAT(
-        log_lines(),
-        ::testing::IsSupersetOf({"SingleItemExecute| tLine:SensorProbe_ca",
-                                 "SingleItemExecute| tpCmd:/system/bin/SensorProbe_ca --group G"}));
-}
 
-TEST_F(Gatherer, VariantThatRunsCountsAsRunningUnderEveryVendor)
-{
-    set_vendor("1");
-    store_plan();
-    run_path("P/G/SensorProbe");
     set_vendor("0");
     log_lines();
     run_path("P/G/SensorProbe");
@@ -112,16 +100,7 @@ TEST_F(Gatherer, IsAnOrdinaryItemUnderVendorTwo)
     EXPECT_THAT(lines, ::testing::Each(::testing::Not(::testing::StartsWith("Sock_Init1"))));
 }
 
-TEST_F(Gatherer, ClientGetsThirteenBytesAndTheConnectionStaysOpen)
-{
-    start_program({kHolder, "--sleep", "60"});
-    store_plan();
-
-    EXPECT_EQ(trigger_own_client(), "gather again!");
-    EXPECT_THAT(processes_named(kProbe), IsEmpty());
-}
-
-TEST_F(Gatherer, EachCommandLeavesOneConnectionAndNoListener)
+TEST_F(Gatherer, ClientOfEachCommandGetsThirteenBytesAndKeepsItsConnection)
 {
     start_program({kHolder, "--sleep", "60"});
     store_plan();
@@ -131,6 +110,7 @@ TEST_F(Gatherer, EachCommandLeavesOneConnectionAndNoListener)
         EXPECT_EQ(count_open("socket:"), before + round);
         EXPECT_THAT(listeners(), IsEmpty());
     }
+    EXPECT_THAT(processes_named(kProbe), IsEmpty());
 }
 
 TEST_F(Gatherer, IsAwaitedOnEveryLocalAddressForAsLongAsItTakes)

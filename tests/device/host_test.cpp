@@ -5,8 +5,6 @@
 #include "device_test.h"
 #include "support/process.h"
 
-#include <array>
-
 namespace
 {
 
@@ -32,14 +30,6 @@ TEST_F(Host, PlatformsLibraryIsReplacedAtLoadTime)
                                        "other log: 4 VRCODE => Get ping reply success!\n"
                                        "other log: 4 VRCODE => testHead is : %s\n"
                                        "0 <Ping Success!> <> 32 2049 1024 no plan\n");
-}
-
-TEST_F(Host, FirstPingOfTheProcessIsAnsweredAndNoOther)
-{
-    std::array<char, 64> reply{};
-    EXPECT_EQ(FPTEST_RunTestCmd("pingtest::x", nullptr, 0), 0);
-    EXPECT_EQ(FPTEST_RunTestCmd("pingtest", reply.data(), reply.size()), 0);
-    EXPECT_STREQ(reply.data(), "");
 }
 
 TEST_F(Host, SeesTheCachedPlanThroughTheExportedVariable)

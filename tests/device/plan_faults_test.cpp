@@ -17,7 +17,6 @@
 #include <string>
 #include <sys/mount.h>
 #include <sys/resource.h>
-#include <sys/time.h>
 #include <sys/types.h>
 #include <unistd.h>
 
@@ -178,71 +177,6 @@ TEST_F(DirectoryInThePlansPlace, WithSomethingInItKeepsAStoreOut)
     fs::remove_all(kPlanFile);
     EXPECT_EQ(log_of_store("<P/>"), lines_of_store("<P/>"));
     EXPECT_EQ(read_file(kPlanFile), "<P/>");
-}
-
-TEST_F(DirectoryInThePlansPlace, IsOpenedButNotLoaded)
-{
-    put_directory();
-    const auto open = descriptors();
-    EXPECT_EQ(log_of_note(), lines_of_unloaded_note());
-    EXPECT_EQ(log_of_report(1, "d"), lines_of_unloaded_report(1, "d"));
-    EXPECT_EQ(descriptors(), open);
-    EXPECT_TRUE(fs::is_directory(kPlanFile));
-
-    fs::remove(kPlanFile);
-    write_file(kPlanFile, kPlan);
-    EXPECT_EQ(log_of_note(), lines_of_note());
-}
-
-TEST_F(DirectoryInThePlansPlace, KeepsAReportInMemory)
-{
-    store(kPlan);
-    load_plan();
-    put_directory();
-    EXPECT_EQ(log_of_report(1, "d"),
-              lines_of_report(1, "d", not_saved("-1", "(21),Is a directory")));
-    EXPECT_TRUE(fs::is_directory(kPlanFile));
-
-    fs::remove(kPlanFile);
-    EXPECT_EQ(log_of_report(2, "e"), lines_of_report(2, "e"));
-    EXPECT_EQ(read_file(kPlanFile), saved_plan(2, "e"));
-}
-
-long count_in(pid_t process, const std::string &key)
-{
-    const std::string counts = read_file("/proc/" + std::to_string(process) + "/io");
-    const auto at = counts.find("\n" + key + ": ");
-    return at == std::string::npos ? -1 : std::stol(counts.substr(at + key.size() + 3));
-}
-
-TEST_F(DirectoryInThePlansPlace, IsReadBackWithoutEndAndEveryTryIsLogged)
-{
-    put_directory();
-    OtherHost host([] {
-        const itimerval alarm{{}, {0, 50000}};
-        setitimer(ITIMER_REAL, &alarm, nullptr);
-        read_back();
-        ADD_FAILURE() << "the read-back has returned";
-    });
-    // as long as nobody has waited for it, its counters can be read
-    EXPECT_TRUE(eventually([&] { return status_field(host.pid(), "State").starts_with("Z"); }));
-    const long reads = count_in(host.pid(), "syscr");
-    EXPECT_EQ(host.wait().status, -SIGALRM);
-
-    const Lines lines = log_lines(host.pid());
-    ASSERT_GE(lines.size(), 100U);
-    EXPECT_THAT(
-        Lines(lines.begin(), lines.begin() + 2),
-        ElementsAre("FPTEST_ExtractResultMsg| enter... !", "FPTEST_ExtractResultMsg| offset = 0"));
-    // where a directory ends is the file system's to say
-    EXPECT_THAT(lines[2], ::testing::StartsWith("FPTEST_ExtractResultMsg| offset = "));
-    EXPECT_EQ(lines[3], "FPTEST_ExtractResultMsg| offset = 0");
-    const Lines failures(lines.begin() + 4, lines.end());
-    EXPECT_THAT(failures, ::testing::Each("FPTEST_ExtractResultMsg| FPTEST_ExtractResultMsg[]:read "
-                                          "file failed"));
-    // the last one may have ended before it was told
-    EXPECT_GE(reads, static_cast<long>(failures.size()));
-    EXPECT_LE(reads, static_cast<long>(failures.size()) + 1);
 }
 
 // --- a limit on the size of files --------------------------------------------

@@ -6,7 +6,8 @@
 
 #include <csignal>
 #include <cstdlib>
-#include <unistd.h>
+#include <filesystem>
+#include <sys/stat.h>
 
 namespace
 {
@@ -76,44 +77,11 @@ TEST_F(Report, OtherResultCodeLeavesAPlanThatIsNotLoadedAgain)
     EXPECT_THAT(read_back(), HasSubstr(" result "));
 }
 
-TEST_F(Report, WithoutAStoredPlanNothingIsWritten)
+TEST_F(Report, PlanFileIsCreatedForEveryoneToReadAndWriteLessTheUmask)
 {
-    EXPECT_EQ(FPTEST_SetTransation("G", "a", 1, 0, "x"), 0);
-    EXPECT_NE(access(kPlanFile, F_OK), 0);
-    EXPECT_EQ(log_lines(),
-              logged(report_begun("a", failed_load(), kNoPlan) + report_told(-1, 1, 0, "x") +
-                     failed_load() + not_updated(kNoPlan)));
-}
-
-TEST_F(Report, PlanChangedOnDiskIsNotSeenWhileOneIsCached)
-{
-    store(group_of({{"Note", "stored"}}));
-    run_path("P/G");
-    write_file(kPlanFile, group_of({{"Note", "changed"}}));
-    run_path("P/G");
-    store(group_of({{"Note", "stored again"}}));
-    run_path("P/G");
-
-    EXPECT_THAT(ran(), ElementsAre("/system/bin/Note|stored", "/system/bin/Note|stored",
-                                   "/system/bin/Note|stored|again"));
-}
-
-TEST_F(Report, PlanIsCutAtItsFirstColonAndAt2048Bytes)
-{
-    store("<P a='x:y'/>");
-    EXPECT_EQ(read_back(), "<P a='x");
-    store(std::string(3000, 'p'));
-    EXPECT_EQ(read_back(), std::string(2048, 'p'));
-}
-
-TEST_F(Report, ReadBackOfALongPlanIsCutAtTheBuffer)
-{
-    write_file(kPlanFile, std::string(100, 'a') + std::string(50, 'b'));
-    std::string buffer(200, 'x');
-    FPTEST_ExtractResultMsg(buffer.data(), 120);
-
-    EXPECT_EQ(buffer, std::string(100, 'a') + std::string(20, 'b') + std::string(80, 'x'));
-    EXPECT_EQ(log_lines(), logged(opened_to_read(150) + read_piece(120, 120) + read_end(0, 120)));
+    umask(0027);
+    store("<P/>");
+    EXPECT_EQ(std::filesystem::status(kPlanFile).permissions(), std::filesystem::perms{0640});
 }
 
 TEST_F(Report, ReadBackIntoANegativeRoomEndsTheProcess)

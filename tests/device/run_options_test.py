@@ -108,7 +108,8 @@ def test_a_users_program_that_is_not_executable_is_named_and_left_out(tmp_path):
     (tmp_path / "README").write_text("not a program")
     (tmp_path / "sources").mkdir()
 
-    assert with_bin(tmp_path, "MyItem") == (0, "mine\n", [
+    assert with_bin(tmp_path, "sh", "-c", "ls /system/bin | grep -xE 'MyItem|Other|README|"
+                    "sources'; MyItem") == (0, "MyItem\nmine\n", [
         f"device/run: --bin {tmp_path}: not executable, and left out: Other, README"])
 
 

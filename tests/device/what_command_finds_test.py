@@ -80,17 +80,6 @@ def test_system_bin_holds_toybox_tools_and_items():
             on_device("readlink", "-f", "/system/bin/toybox").out)
 
 
-def test_programs_of_the_user_are_added(tmp_path):
-    make_program(tmp_path / "MyItem", "#!/system/bin/sh\necho mine $0 $*\n")
-    (tmp_path / "MyItem_ca").symlink_to("MyItem")
-    (tmp_path / "README").write_text("not a program")
-
-    assert shell("MyItem 1; MyItem_ca 2; ls /system/bin | grep -c README",
-                 options=("--bin", tmp_path)).out == (
-        "mine /system/bin/MyItem 1\nmine /system/bin/MyItem_ca 2\n0\n")
-    assert on_device("MyItem").status == 127
-
-
 def test_a_users_program_takes_the_place_of_a_sample_item(tmp_path):
     make_program(tmp_path / "SpiCheck", "#!/system/bin/sh\necho mine\n")
 

@@ -60,17 +60,17 @@ const std::vector<Reaction> &reactions()
     const auto read = [](const Lines &texts) { return log("FPTEST_ExtractResultMsg", texts); };
     const auto trigger = [](const Lines &texts) { return log("Sock_Init1", texts); };
     const auto presence = [](const char *text) { return log("ResourceReduce", {text}); };
-    const std::string open = "Open /data/vorlane/src1.xml file failed";
     const std::string bind = sequences::listener()[2].substr(15);
     static const std::vector<Reaction> rows = {
-        {"open.*TRUNC.*", "save_XmlFile| leave",
-         log("save_XmlFile", {open + "(24),Too many open files\n"})},
-        {"open.*0666.*", "write(", log("saveRecvFile", {"OPEN FILE FAIL!\n"})},
-        {"write.plan[^]*", "write(", log("saveRecvFile", {"WRITE DATA FAIL!\n"})},
+        {"open.*TRUNC.*",
+         "save_XmlFile| leave",
+         {sequences::not_saved("-1", "(24),Too many open files").back()}},
+        {"open.*0666.*", "write(", {sequences::kNotOpened}},
+        {"write.plan[^]*", "write(", {sequences::kNotWritten}},
         {"remove.*", "remove(", {}},
-        {"open.*RDONLY.*", kEnd, read({open + "!\n"})},
+        {"open.*RDONLY.*", kEnd, {sequences::not_opened_to_read("-1").back()}},
         {"read.*", "read(",
-         joined({read({"FPTEST_ExtractResultMsg[]:read file failed\n"}), {kAgain}})},
+         joined({sequences::failed("FPTEST_ExtractResultMsg", "read file failed"), {kAgain}})},
         {"lseek.*(CUR|END).*", "FPTEST_ExtractResultMsg| offset", read({"offset = -1"})},
         // the file is then read from its end
         {"lseek.*SET.*", "FPTEST_ExtractResultMsg| read byte count",
@@ -86,10 +86,10 @@ const std::vector<Reaction> &reactions()
         {"waitpid.*", "waitpid(", {}},
         {"socket.*", "close(listener",
          joined({{"Setsockopt(-1, 1)", "Bind(-1" + bind, "listen(-1, 5) = -1"},
-                 trigger({"listen error", "errno=9"}),
+                 sequences::listen_failed(9),
                  {"Accept(-1, 16) = -1"},
                  trigger({"accept error!\n", "errno=9"})})},
-        {"listen.*", "listen(", trigger({"listen error", "errno=98"})},
+        {"listen.*", "listen(", sequences::listen_failed(98)},
         {"Accept.*", "close(listener", trigger({"accept error!\n", "errno=103"})},
         {"write.connection.*",
          "Sock_Init1| retWri=", trigger({"retWri=-1", "retWri error", "errno=28"})},
@@ -168,8 +168,7 @@ Lines failed(Lines events, std::size_t at, std::size_t cut)
 
 Lines without_path(Lines events)
 {
-    replace(events, "get_node_level|", kEnd,
-            {"get_node_level| level = 1\n", "get_node_level| node name = \n"});
+    replace(events, "get_node_level|", kEnd, sequences::level(1, ""));
     return events;
 }
 
@@ -178,7 +177,7 @@ Lines without_plan(Lines events, Step::Kind step, int error)
     const auto no_plan = [&](const std::string &function) {
         const std::string reason = "(" + std::to_string(error) + ")," + strerror(error);
         return joined({error != 0 ? sequences::failed_load("-1", reason) : Lines(),
-                       {function + "| " + function + "[]:load config file failed\n"}});
+                       sequences::failed(function, sequences::kNoPlan)});
     };
     switch (step) {
     case Step::Kind::Group:
@@ -186,16 +185,16 @@ Lines without_plan(Lines events, Step::Kind step, int error)
         break;
     case Step::Kind::Item:
         replace(events, "get_node_index|", "get_node_index|",
-                joined({{"get_node_index| enter...\n"}, no_plan("get_node_index")}));
+                joined({sequences::asked_index(), no_plan("get_node_index")}));
         replace(events, "get_node_byIndex| curernt", kEnd,
-                {"get_node_byIndex| get_node_byIndex[]:load config file failed\n",
-                 "SingleItemExecute| get node by Index fail!\n"});
+                joined({sequences::failed("get_node_byIndex", sequences::kNoPlan),
+                        {"SingleItemExecute| get node by Index fail!\n"}}));
         break;
     case Step::Kind::Report: {
         std::string &index = events[find(events, 0, "FPTEST_SetTransation| index=")];
         index = std::regex_replace(index, std::regex("index=[0-9]+"), "index=-1");
         replace(events, "get_node_index|", "get_node_index|",
-                joined({{"get_node_index| enter...\n"}, no_plan("get_node_index")}));
+                joined({sequences::asked_index(), no_plan("get_node_index")}));
         replace(events, "updateSrcXmlFile| curernt", "updateSrcXmlFile| update Src",
                 no_plan("updateSrcXmlFile"));
         break;
