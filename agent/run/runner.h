@@ -109,6 +109,7 @@ class Runner
     template <typename Find> void end_all(const Find &find);
     void finish(RunningItem &active, TimePoint end);
     void judge(const RunningItem &active);
+    void judge_report(const RunningItem &active);
     std::string why_silent(const RunningItem &active);
     std::string why_stopped(const RunningItem &active);
     void notify_ended();

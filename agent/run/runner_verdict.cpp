@@ -33,9 +33,6 @@ void Runner::judge(const RunningItem &active)
     ItemRun &result = item_at(run_, active.place);
     const ItemReport &report = result.report;
     const bool has_reported = has_result(report);
-    const auto passes = [this](const ItemReport &one) {
-        return one.result == std::to_string(run_.pass_code);
-    };
     if (active.stop == Outcome::timed_out ||
         (active.stop == Outcome::stopped && active.was_stopped)) {
         result.outcome = *active.stop;
@@ -64,8 +61,21 @@ void Runner::judge(const RunningItem &active)
         result.outcome = Outcome::failed;
         result.reason = fmt::format("ended with exit status {}, though it {}", *result.exit_status,
                                     reported(report));
-    } else if (active.reporting.is_beside_others() && active.reporting.taken_back &&
-               !(passes(report) && passes(*active.reporting.taken_back))) {
+    } else {
+        judge_report(active);
+    }
+}
+
+// By what it has reported, where nothing else speaks against it.
+void Runner::judge_report(const RunningItem &active)
+{
+    ItemRun &result = item_at(run_, active.place);
+    const ItemReport &report = result.report;
+    const auto passes = [this](const ItemReport &one) {
+        return one.result == std::to_string(run_.pass_code);
+    };
+    if (active.reporting.is_beside_others() && active.reporting.taken_back &&
+        !(passes(report) && passes(*active.reporting.taken_back))) {
         result.outcome = Outcome::failed;
         result.reason = fmt::format("{}; a process with an old copy of the plan has then written "
                                     "back what it had reported before",
