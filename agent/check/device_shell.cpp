@@ -51,32 +51,29 @@ std::optional<std::string> read_all(int descriptor, double seconds)
     }
 }
 
-bool is_letter(unsigned char byte)
+bool may_be_in_a_name(unsigned char byte)
 {
-    return std::isalpha(byte) != 0 || byte >= 0x80;
+    return std::isalpha(byte) != 0 || byte == '_' || byte >= 0x80;
 }
 
-// Whether it stays an expansion between double quotes, in which nothing is run, and no
-// variable decides what becomes of it. What could be an end of it, or a quote, is refused.
+// Whether it stays an expansion between double quotes, in which nothing is run. What could
+// be an end of it, a quote or an expansion within it is refused: the shell expands a
+// subscript in arithmetic once more than it is read. Nor may a variable decide what becomes
+// of arithmetic: it may be set on the device.
 bool is_safe_to_expand(std::string_view expansion)
 {
     const bool is_arithmetic = expansion.starts_with("$((");
     const std::size_t mark = is_arithmetic ? 3 : 2;
     const std::string_view inside = expansion.substr(mark, expansion.size() - 2 * mark + 1);
-    const std::string_view marks = is_arithmetic && inside.find_first_of("()") != inside.npos
-                                       ? " _=!<>+-*/%^~&|,:?.[]()"
-                                   : is_arithmetic ? " _=!<>+-*/%^~&|,:?.[]${}"
-                                                   : " _=!+-*/%^~,:@#.;[]";
+    const std::string_view marks = is_arithmetic ? " =!<>+-*/%^~&|,:?.[]()" : " =!+-*/%^~,:@#.;[]";
     const auto is_taken = [&](char byte) {
         const auto character = static_cast<unsigned char>(byte);
-        return is_letter(character) || std::isdigit(character) != 0 ||
+        return may_be_in_a_name(character) || std::isdigit(character) != 0 ||
                marks.find(byte) != marks.npos;
     };
-    // "${ COMMAND;}" and "${|COMMAND;}" run something
     return std::ranges::all_of(inside, is_taken) && (is_arithmetic || !inside.starts_with(' ')) &&
-           inside.find("{ ") == inside.npos && inside.find("{|") == inside.npos &&
-           // it may divide by a variable, or a variable decides what is looked at
-           !(std::ranges::any_of(inside, is_letter) && inside.find_first_of("/%?") != inside.npos);
+           !(std::ranges::any_of(inside, may_be_in_a_name) &&
+             inside.find_first_of("/%?") != inside.npos);
 }
 
 } // namespace

@@ -171,6 +171,8 @@ void ReportReader::begin_gathering()
     const ItemReport report = report_of(*plan, active.element);
     if (active.starts_gatherer) {
         item_at(run_, active.place).report = {};
+        active.reporting.seen.clear();
+        active.reporting.taken_back.reset();
     } else if (has_result(report) && !was_gathered(report)) {
         tell_late(active.place, true, gathered_in_ != 0 ? gathered_in_ : run_.round, report);
     }
@@ -271,7 +273,7 @@ void ReportReader::read_report(RunningItem &active, const Plan &plan)
         return;
     }
     active.reporting.overwritten = false;
-    active.reporting.undone = result.report.result && !report.result;
+    active.reporting.undone = has_result(result.report) && !has_result(report);
     if (!is_among(active.reporting.seen, report) ||
         (active.reporting.taken_back && is_same(report, *active.reporting.taken_back))) {
         active.reporting.taken_back.reset();

@@ -80,7 +80,7 @@ class ReportReader
     std::vector<ItemReport> gathered_; // what an old copy may say of the gatherer
     int gathered_in_ = 0;              // the round of the last gathering
     bool marks_are_gone_ = false;      // from items' elements
-    unsigned look_ = 0;
+    unsigned look_ = 1;
     struct stat plan_status_ {
     };
     std::chrono::nanoseconds changed_{}; // the plan that was read, on the clock of files

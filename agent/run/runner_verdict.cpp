@@ -108,8 +108,9 @@ std::string Runner::why_stopped(const RunningItem &active)
     const double seconds = *item_at(run_, active.place).seconds;
     if (!active.was_stopped) {
         return fmt::format("{} after {}, past the limit of {}",
-                           active.gathers ? "reported" : "ended by itself", fine_duration(seconds),
-                           fine_duration(limits_.item->count()));
+                           active.gathers && active.gatherer_end.empty() ? "reported"
+                                                                         : "ended by itself",
+                           fine_duration(seconds), fine_duration(limits_.item->count()));
     }
     const bool is_interrupted = active.stop == Outcome::stopped;
     if (!active.killed) {

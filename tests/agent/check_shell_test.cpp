@@ -115,7 +115,8 @@ TEST(CheckedGrammar, IsJudgedWithoutRunningAnything)
         for (const std::string &expansion :
              {"$((1 + " + run + "))", "${a:-" + run + "}", "${a[" + run + "]}", "$((" + run + "))",
               "${ touch " + file + ";}", "${|touch " + file + ";}",
-              "$((1)); touch " + file + "; ((1))", "${x:-'}\"; touch " + file + "; : \"'}",
+              "$((a[${x:-$}{${y} touch " + file + " &}]))", "$((1)); touch " + file + "; ((1))",
+              "${x:-'}\"; touch " + file + "; : \"'}",
               "${x[1]:-'}\"; touch " + file + "; : \"'}"}) {
             EXPECT_EQ(DeviceShell().ask_to_expand(expansion, why), DeviceShell::Answer::unknown);
             EXPECT_NE(access(file.c_str(), F_OK), 0) << expansion;
