@@ -382,7 +382,7 @@ class LineScanner
     void read_here_line(std::size_t end)
     {
         while (at_ < end) {
-            if (looking_at_any("$`\\") && !looking_at("$'") && !looking_at("$\"")) {
+            if (looking_at_any("$`\\")) {
                 read_character(true);
             } else {
                 ++at_;

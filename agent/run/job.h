@@ -48,7 +48,7 @@ struct RunningItem {
 
     // How far the stored plan's report of it can be relied on.
     struct Reporting {
-        bool expected = true;     // not before a gatherer is told that already ran
+        bool expected = true;     // false until a gatherer that already ran is told
         bool overwritten = false; // an old copy of the plan has erased it; none has come since
         bool lost = false;        // the stored plan is gone
         bool undone = false;      // a result was there, and has gone
@@ -57,7 +57,7 @@ struct RunningItem {
         unsigned changed_at = 0;
         unsigned other_changed_at = 0;
         bool from_a_copy = false; // the gatherer's own, which has no mark
-        // The one after which an earlier one has come back; of seen, the last before it.
+        // The newest report, where one seen before it has come back since.
         std::optional<ItemReport> taken_back;
         std::vector<ItemReport> seen;
 

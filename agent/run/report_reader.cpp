@@ -8,6 +8,7 @@
 #include "util/failure.h"
 
 #include <algorithm>
+#include <iterator>
 #include <utility>
 
 namespace fptest
@@ -114,7 +115,7 @@ void ReportReader::read(const std::optional<Plan> &plan)
 
 // What a process with an old copy of the plan says of items is older than they are. A
 // gatherer's own copy is always old: what is new in it is what it has to report.
-bool ReportReader::reject_stale(RunningItem &active, const Plan &plan, const ItemReport &report)
+bool ReportReader::is_stale(RunningItem &active, const Plan &plan, const ItemReport &report)
 {
     if (bears_mark(plan, active.element, running_.job.mark)) {
         return false;
@@ -264,7 +265,7 @@ void ReportReader::read_report(RunningItem &active, const Plan &plan)
     }
     ItemRun &result = item_at(run_, active.place);
     ItemReport report = report_of(plan, number);
-    if (reject_stale(active, plan, report)) {
+    if (is_stale(active, plan, report)) {
         active.reporting.overwritten = true;
         return;
     }

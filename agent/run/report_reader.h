@@ -39,7 +39,7 @@ class ReportReader
     // Reads it, where it is whole.
     void read(const std::optional<Plan> &plan);
 
-    // How long ago the plan has changed that was read last.
+    // How long ago the plan changed that poll() read last.
     std::chrono::nanoseconds since_change() const;
 
     // The gatherer is about to be told: what is there is of an earlier gathering, or how
@@ -67,7 +67,7 @@ class ReportReader
 
     void read_report(RunningItem &active, const Plan &plan);
     void read_late_report(Judged &judged, const Plan &plan);
-    bool reject_stale(RunningItem &active, const Plan &plan, const ItemReport &report);
+    bool is_stale(RunningItem &active, const Plan &plan, const ItemReport &report);
     void mark_again(std::vector<std::size_t> numbers);
     void tell_late(const Place &place, bool gathers, int round, const ItemReport &report);
     void note_gathered(const ItemReport &report);
@@ -83,7 +83,7 @@ class ReportReader
     unsigned look_ = 1;
     struct stat plan_status_ {
     };
-    std::chrono::nanoseconds changed_{}; // the plan that was read, on the clock of files
+    std::chrono::nanoseconds changed_{}; // the plan that poll() read, on the clock of files
 };
 
 } // namespace fptest

@@ -23,7 +23,7 @@ enum class Outcome {
     passed,    // it reported the code that means so
     failed,    // it reported another one
     no_result, // it ended and has reported no result
-    timed_out, // it was stopped because it took too long
+    timed_out, // it took too long, however it ended
     stopped,   // it was stopped because the run was
 };
 

@@ -339,7 +339,7 @@ void Runner::end_item(const LibraryProcess::Event &event)
     }
     const std::vector<Leftover> left =
         event.left_running
-            ? find_left_running(is_watched ? running_.items.back().element : kNoElement)
+            ? note_left_running(is_watched ? running_.items.back().element : kNoElement)
             : std::vector<Leftover>();
     if (is_watched) {
         RunningItem &active = running_.items.back();
@@ -405,7 +405,7 @@ void Runner::finish(RunningItem &active, TimePoint end)
     // the library may be at the next item of its command already, which has not been left
     if (active.gathers && running_.items.size() == 1 && !active.stop &&
         running_.next >= running_.job.targets.size()) {
-        result.left_running = find_left_running(active.element);
+        result.left_running = note_left_running(active.element);
     }
     if (active.gathers && !(result.report.progress == "100" && has_result(result.report))) {
         gatherer_may_report_late_ = true;

@@ -103,7 +103,7 @@ class Runner
     void cannot_stop(RunningItem &active);
     std::vector<Leftover> item_processes() const;
     std::vector<Leftover> processes_of(const RunningItem &active) const;
-    std::vector<Leftover> find_left_running(std::size_t element);
+    std::vector<Leftover> note_left_running(std::size_t element);
     void end_left_running();
     void end_gatherer();
     template <typename Find> void end_all(const Find &find);

@@ -14,7 +14,6 @@
 #include <csignal>
 #include <cstdio>
 #include <fmt/core.h>
-#include <iterator>
 #include <poll.h>
 #include <set>
 #include <thread>
@@ -255,7 +254,7 @@ std::vector<Leftover> Runner::processes_of(const RunningItem &active) const
     return active.gathers ? library_.processes().of_gatherer() : item_processes();
 }
 
-std::vector<Leftover> Runner::find_left_running(std::size_t element)
+std::vector<Leftover> Runner::note_left_running(std::size_t element)
 {
     std::vector<Leftover> found = item_processes();
     for (const auto begin = SteadyClock::now();

@@ -6,6 +6,7 @@
 
 #include "module/stored_plan.h"
 #include "plan/library_rules.h"
+#include "plan/plan.h"
 #include "util/text.h"
 
 #include <fmt/core.h>
