@@ -103,13 +103,13 @@ void ReportReader::read(const std::optional<Plan> &plan)
         read_late_report(judged, *plan);
     }
     if (std::exchange(marks_are_gone_, false)) {
-        std::vector<std::size_t> numbers;
+        std::vector<std::size_t> numbers = elements_to_come();
         for (const RunningItem &active : running_.items) {
             if (active.reporting.overwritten) {
                 numbers.push_back(active.element);
             }
         }
-        mark_again(std::move(numbers));
+        mark_again(numbers);
     }
 }
 
@@ -128,15 +128,20 @@ bool ReportReader::is_stale(RunningItem &active, const Plan &plan, const ItemRep
     return !active.reporting.from_a_copy;
 }
 
-// These and the items to come, so that what they report from now on counts. What is
-// there is cleared.
-void ReportReader::mark_again(std::vector<std::size_t> numbers)
+std::vector<std::size_t> ReportReader::elements_to_come() const
 {
+    std::vector<std::size_t> elements;
     for (std::size_t at = running_.next; at < running_.job.targets.size(); ++at) {
         if (const auto &target = running_.job.targets[at]) {
-            numbers.push_back(target->element);
+            elements.push_back(target->element);
         }
     }
+    return elements;
+}
+
+// So that what these elements report from now on counts. What is there is cleared.
+void ReportReader::mark_again(const std::vector<std::size_t> &numbers)
+{
     if (numbers.empty()) {
         return;
     }
@@ -177,8 +182,12 @@ void ReportReader::begin_gathering()
     } else if (has_result(report) && !was_gathered(report)) {
         tell_late(active.place, true, gathered_in_ != 0 ? gathered_in_ : run_.round, report);
     }
-    if (has_result(report) || !bears_mark(*plan, active.element, running_.job.mark)) {
-        mark_again({active.element});
+    const bool has_mark = bears_mark(*plan, active.element, running_.job.mark);
+    if (has_result(report) || !has_mark) {
+        // where it is there still, what others have reported for items to come counts
+        auto numbers = has_mark ? std::vector<std::size_t>() : elements_to_come();
+        numbers.push_back(active.element);
+        mark_again(numbers);
     }
     active.reporting.overwritten = false;
 }
@@ -199,7 +208,7 @@ void ReportReader::tell_late(const Place &place, bool gathers, int round, const 
     }
 }
 
-void ReportReader::note_earlier_plan(const std::string &text)
+void ReportReader::note_gathered(const std::string &text)
 {
     const auto plan = Plan::parse_annotated(text);
     for (std::size_t number = 0; plan && number < plan->elements().size(); ++number) {
@@ -207,13 +216,6 @@ void ReportReader::note_earlier_plan(const std::string &text)
         if (name != nullptr && is_gatherer(name, run_.vendor)) {
             note_gathered(report_of(*plan, number));
         }
-    }
-}
-
-void ReportReader::note_gathered(std::size_t element)
-{
-    if (const auto plan = Plan::parse_annotated(read_stored_plan().value_or(""))) {
-        note_gathered(report_of(*plan, element));
     }
 }
 

@@ -26,11 +26,8 @@ class ReportReader
     // All of them outlive it.
     ReportReader(Run &run, const std::vector<Listener *> &listeners, RunningJob &running);
 
-    // The stored plan before the run: a gatherer may have kept a copy of it.
-    void note_earlier_plan(const std::string &text);
-
-    // What the stored plan says of a gatherer before it is cleared from it.
-    void note_gathered(std::size_t element);
+    // What a stored plan says of gatherers before it goes: they may have kept a copy.
+    void note_gathered(const std::string &text);
 
     // Reads the plan where it has changed; one that is being written is left for the
     // next time.
@@ -68,7 +65,8 @@ class ReportReader
     void read_report(RunningItem &active, const Plan &plan);
     void read_late_report(Judged &judged, const Plan &plan);
     bool is_stale(RunningItem &active, const Plan &plan, const ItemReport &report);
-    void mark_again(std::vector<std::size_t> numbers);
+    std::vector<std::size_t> elements_to_come() const;
+    void mark_again(const std::vector<std::size_t> &numbers);
     void tell_late(const Place &place, bool gathers, int round, const ItemReport &report);
     void note_gathered(const ItemReport &report);
     bool was_gathered(const ItemReport &report) const;

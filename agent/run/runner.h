@@ -35,7 +35,7 @@ class Runner
     // The stored plan before the run: a gatherer may have kept a copy of it.
     void note_earlier_plan(const std::string &text)
     {
-        reader_.note_earlier_plan(text);
+        reader_.note_gathered(text);
     }
 
     // Runs a job and fills in its items. False where the run has come to its end: the run

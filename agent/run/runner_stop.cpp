@@ -308,9 +308,8 @@ void Runner::make_way_for(const Job &job)
     const auto is_gatherers = [&](const auto &target) {
         return target && is_gatherer(run_.suites[job.suite].items[target->item].name, vendor_);
     };
-    const auto gatherer = std::ranges::find_if(job.targets, is_gatherers);
-    if (gatherer != job.targets.end()) {
-        reader_.note_gathered((*gatherer)->element);
+    if (std::ranges::any_of(job.targets, is_gatherers)) {
+        reader_.note_gathered(read_stored_plan().value_or(""));
         // the library does not find one that is a script, and would start another beside it
         const std::vector<Leftover> running = library_.processes().of_gatherer();
         const bool is_found = std::ranges::any_of(

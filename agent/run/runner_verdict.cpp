@@ -27,6 +27,17 @@ std::string reported(const ItemReport &report)
                : fmt::format("reported the result {}", report.result.value_or(""));
 }
 
+bool passes(const ItemReport &report, const Run &run)
+{
+    return report.result == std::to_string(run.pass_code);
+}
+
+// What it reported, where that counts no more.
+std::string though_reported(const ItemReport &report, const Run &run)
+{
+    return fmt::format("{} {}", passes(report, run) ? ", though it" : "; it had", reported(report));
+}
+
 } // namespace
 
 void Runner::judge(const RunningItem &active)
@@ -45,7 +56,7 @@ void Runner::judge(const RunningItem &active)
     } else if (result.signal != 0) {
         result.outcome = Outcome::failed;
         result.reason = fmt::format("died by {}{}{}", name_of_signal(result.signal),
-                                    has_reported ? ", though it " + reported(report) : "",
+                                    has_reported ? though_reported(report, run_) : "",
                                     active.reporting.is_written_over() ? kOverwrittenAfter : "");
     } else if (!has_reported || active.reporting.lost) {
         result.outcome = Outcome::no_result;
@@ -53,15 +64,15 @@ void Runner::judge(const RunningItem &active)
     } else if (active.gathers && report.progress != "100") {
         result.outcome = Outcome::failed;
         result.reason = fmt::format(
-            "the gatherer {} at progress {}{}, though it {}",
-            active.gatherer_end.empty() ? "was" : "ended", report.progress.value_or("0"),
+            "the gatherer {} at progress {}{}{}", active.gatherer_end.empty() ? "was" : "ended",
+            report.progress.value_or("0"),
             active.gatherer_end.empty() ? " after " + fine_duration(kForGathering.count()) : "",
-            reported(report));
+            though_reported(report, run_));
         result.overruled = true;
     } else if (limits_.exit_status && result.exit_status.value_or(0) != 0) {
         result.outcome = Outcome::failed;
-        result.reason = fmt::format("ended with exit status {}, though it {}", *result.exit_status,
-                                    reported(report));
+        result.reason = fmt::format("ended with exit status {}{}", *result.exit_status,
+                                    though_reported(report, run_));
     } else {
         judge_report(active);
     }
@@ -72,24 +83,22 @@ void Runner::judge_report(const RunningItem &active)
 {
     ItemRun &result = item_at(run_, active.place);
     const ItemReport &report = result.report;
-    const auto passes = [this](const ItemReport &one) {
-        return one.result == std::to_string(run_.pass_code);
-    };
     if (active.reporting.is_beside_others() && active.reporting.taken_back &&
-        !(passes(report) && passes(*active.reporting.taken_back))) {
+        !(passes(report, run_) && passes(*active.reporting.taken_back, run_))) {
         result.outcome = Outcome::failed;
         result.reason = fmt::format("{}; a process with an old copy of the plan has then written "
                                     "back what it had reported before",
                                     reported(*active.reporting.taken_back));
         result.overruled = true;
-    } else if (passes(report) && report.progress != "100" && active.reporting.is_uncertain()) {
+    } else if (passes(report, run_) && report.progress != "100" &&
+               active.reporting.is_uncertain()) {
         result.outcome = Outcome::failed;
         result.reason = fmt::format("it was last seen at progress {}: a process that has reported "
                                     "meanwhile may have written over more with its old copy of "
                                     "the plan",
                                     one_line(report.progress.value_or("-")));
         result.overruled = true;
-    } else if (passes(report)) {
+    } else if (passes(report, run_)) {
         result.outcome = Outcome::passed;
     } else {
         result.outcome = Outcome::failed;

@@ -142,12 +142,15 @@ TEST_F(ItemEnd, LibrarysProcessThatEndsBetweenTwoRoundsCostsNothing)
 
 TEST_F(ItemEnd, StopComesOnceSoThatItsHandlerCanEnd)
 {
-    const std::string cleans_up = "clean() { echo asked >>/tmp/scene/asked; sleep 0.6; exit 0; }; "
-                                  "trap clean TERM; while true; do sleep 0.1; done";
+    const std::string cleans_up =
+        "clean() { echo asked >>/tmp/scene/asked; sleep 0.6; exit 0; }; "
+        "trap clean TERM; >/tmp/scene/ready; while true; do sleep 0.1; done";
     run_group({{"Script", script(cleans_up)}}, {"--timeout", "0.5"});
     EXPECT_THAT(reason(0), StartsWith("stopped after "));
     EXPECT_THAT(lines_of(read_file(work("asked"))), SizeIs(1));
-    run_group({{"Script", script("(" + cleans_up + ") &amp; " + script_report("0", "fine"))}});
+    run_group({{"Script", script("rm /tmp/scene/ready; (" + cleans_up +
+                                 ") &amp; until [ -e /tmp/scene/ready ]; do sleep 0.1; done; " +
+                                 script_report("0", "fine"))}});
     EXPECT_THAT(lines_of(read_file(work("asked"))), SizeIs(2));
 }
 
@@ -220,6 +223,9 @@ TEST_F(ItemEnd, ExitStatusFailsAnItemWhereThatIsWanted)
     EXPECT_EQ(run_group(items, {"--exit-status"}).status, 1);
     EXPECT_THAT(outcomes(), ElementsAre("Script: failed", "Item: passed"));
     EXPECT_EQ(reason(0), "ended with exit status 1, though it reported the result 0");
+
+    run_group({{"Script", script(script_report("1", "bad") + "; exit 1")}}, {"--exit-status"});
+    EXPECT_EQ(reason(0), "ended with exit status 1; it had reported the result 1");
 }
 
 TEST_F(ItemEnd, ItemThatSignalsItsProcessGroupEndsAlone)

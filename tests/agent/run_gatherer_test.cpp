@@ -285,6 +285,16 @@ TEST_F(RunGatherer, ShowsHowItGetsOnBeforeItConnectsForTheFirstTime)
     }
 }
 
+TEST_F(RunGatherer, ThatIsReadyLeavesWhatIsReportedForItemsToCome)
+{
+    run_group({{"SensorProbe", "--help; /system/bin/Item report-here G Item 100 0 early; exec -a " +
+                                   std::string(kProbe) +
+                                   " /system/bin/Item report G 20 0 ready gather report G 100 0 x"},
+               {"Item", "sleep 0.1"}},
+              {"--as-group"});
+    EXPECT_THAT(outcomes(), ElementsAre("SensorProbe: passed", "Item: passed"));
+}
+
 TEST_F(RunGatherer, MayHaveTakenTheReportOfAnItemThatSeemsToHaveNone)
 {
     const Gatherer gatherer("gather report-here G SensorProbe 50 -2 half await /tmp/scene/fine "
