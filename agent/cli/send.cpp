@@ -109,7 +109,7 @@ class Sender
         const auto items = items_of(command);
         library_.command(command, items);
         for (;;) {
-            const auto event = library_.wait(100ms, signals_.descriptor());
+            const auto event = library_.wait(100ms, {signals_.descriptor()});
             if (event) {
                 plan = Descriptor(-1); // it is loaded before the first item is told
                 library_.pass_output(stderr, event->output);

@@ -183,17 +183,21 @@ std::string LibraryProcess::read_back()
     return std::move(plan_);
 }
 
-bool LibraryProcess::has_news(std::chrono::milliseconds longest, int other) const
+bool LibraryProcess::has_news(std::chrono::milliseconds longest,
+                              std::initializer_list<int> others) const
 {
-    std::array<pollfd, 2> polled{pollfd{control_.get(), POLLIN, 0}, pollfd{other, POLLIN, 0}};
+    std::vector<pollfd> polled{{control_.get(), POLLIN, 0}};
+    for (const int other : others) {
+        polled.push_back({other, POLLIN, 0});
+    }
     poll(polled.data(), polled.size(), static_cast<int>(longest.count()));
     return polled[0].revents != 0;
 }
 
 std::optional<LibraryProcess::Event> LibraryProcess::wait(std::chrono::milliseconds longest,
-                                                          int other)
+                                                          std::initializer_list<int> others)
 {
-    if (events_.empty() && pid_ > 0 && has_news(longest, other)) {
+    if (events_.empty() && pid_ > 0 && has_news(longest, others)) {
         read_control();
     }
     if (events_.empty()) {
@@ -309,7 +313,7 @@ std::string LibraryProcess::take_output()
 // printed before it.
 bool LibraryProcess::has_events() const
 {
-    return !events_.empty() || has_news(std::chrono::milliseconds(0), -1);
+    return !events_.empty() || has_news(std::chrono::milliseconds(0));
 }
 
 void LibraryProcess::pass_output(std::FILE *stream)

@@ -14,6 +14,7 @@
 #include <cstddef>
 #include <cstdio>
 #include <deque>
+#include <initializer_list>
 #include <optional>
 #include <string>
 #include <sys/types.h>
@@ -83,9 +84,9 @@ class LibraryProcess
     void suspend();
     void resume();
 
-    // The next event, waited for that long, or until the other descriptor can be
-    // read.
-    std::optional<Event> wait(std::chrono::milliseconds longest, int other = -1);
+    // The next event, waited for that long, or until one of the others can be read.
+    std::optional<Event> wait(std::chrono::milliseconds longest,
+                              std::initializer_list<int> others = {});
 
     // The stored plan, as FPTEST_ExtractResultMsg gives it. Only between commands.
     std::string read_back();
@@ -104,7 +105,7 @@ class LibraryProcess
 
   private:
     void start();
-    bool has_news(std::chrono::milliseconds longest, int other) const;
+    bool has_news(std::chrono::milliseconds longest, std::initializer_list<int> others = {}) const;
     bool has_events() const;
     void read_control();
     void lose();

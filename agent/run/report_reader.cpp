@@ -8,7 +8,11 @@
 #include "util/failure.h"
 
 #include <algorithm>
+#include <array>
+#include <filesystem>
 #include <iterator>
+#include <sys/inotify.h>
+#include <unistd.h>
 #include <utility>
 
 namespace fptest
@@ -63,12 +67,23 @@ bool bears_mark(const Plan &plan, std::size_t number, const std::string &mark)
 } // namespace
 
 ReportReader::ReportReader(Run &run, const std::vector<Listener *> &listeners, RunningJob &running)
-    : run_(run), listeners_(listeners), running_(running)
+    : run_(run), listeners_(listeners), running_(running),
+      saves_(inotify_init1(IN_NONBLOCK | IN_CLOEXEC))
 {
+    const std::string folder = std::filesystem::path(kStoredPlan).parent_path();
+    inotify_add_watch(saves_.get(), folder.c_str(), IN_CLOSE_WRITE | IN_MOVED_TO);
+}
+
+int ReportReader::descriptor() const
+{
+    return saves_.get();
 }
 
 void ReportReader::poll()
 {
+    std::array<char, 4096> told{};
+    while (::read(saves_.get(), told.data(), told.size()) > 0) {
+    }
     struct stat status {
     };
     if ((running_.items.empty() && judged_.empty()) || stat(kStoredPlan, &status) != 0 ||

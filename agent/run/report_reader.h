@@ -5,6 +5,7 @@
 // been judged.
 #pragma once
 
+#include "common/descriptor.h"
 #include "plan/item_report.h"
 #include "plan/plan.h"
 #include "run/job.h"
@@ -28,6 +29,11 @@ class ReportReader
 
     // What a stored plan says of gatherers before it goes: they may have kept a copy.
     void note_gathered(const std::string &text);
+
+    // Can be read once somebody has saved the plan. What two processes save between two
+    // looks seems to be one change, so none is to be missed; where the system does not
+    // tell of them, -1.
+    int descriptor() const;
 
     // Reads the plan where it has changed; one that is being written is left for the
     // next time.
@@ -74,6 +80,7 @@ class ReportReader
     Run &run_;
     const std::vector<Listener *> &listeners_;
     RunningJob &running_;
+    Descriptor saves_;
     std::vector<Judged> judged_;       // of this round, and gatherers
     std::vector<ItemReport> gathered_; // what an old copy may say of the gatherer
     int gathered_in_ = 0;              // the round of the last gathering

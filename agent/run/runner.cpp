@@ -117,7 +117,8 @@ bool Runner::run(const Job &job)
 
     running_ = {job, true, 0, {}};
     while ((running_.command_runs || !running_.items.empty()) && !broken_) {
-        if (const auto event = library_.wait(kTurn, signals_.descriptor())) {
+        if (const auto event =
+                library_.wait(kTurn, {signals_.descriptor(), reader_.descriptor()})) {
             plan = Descriptor(-1);
             heard_of_at_ = now();
             handle(*event);

@@ -327,6 +327,16 @@ TEST_F(Run, ShowsProgressAndAsksTheLibraryForNothingWhileACommandRuns)
     EXPECT_EQ(fptest.wait().status, 0);
 }
 
+TEST_F(Run, SeesReportsThatFollowEachOtherAtOnce)
+{
+    std::string reports;
+    for (const std::string progress : {"10", "20", "30", "40", "50", "60", "70", "80", "100"}) {
+        reports += "report G " + progress + " 0 x sleep 0.003 ";
+    }
+    run_group({{"Item", reports}});
+    EXPECT_THAT(events("progress"), SizeIs(Ge(6))); // most of them, on a busy machine
+}
+
 // --- whose result it is -------------------------------------------------------------
 
 TEST_F(Run, TakesNoResultOfAnEarlierRoundForOneOfThis)
