@@ -75,16 +75,16 @@ void ShellChecker::check(const Item &item)
     const std::size_t args_begin = line.size() - item.args.size();
     const Verdict verdict = may_hold_syntax(line) ? judge(item, line) : Verdict{};
     const std::string characters = shell_characters(item.name);
-    const bool is_of_name = verdict.is_refused && verdict.reading.fault
+    const bool is_of_name = verdict.is_line_refused && verdict.reading.fault
                                 ? verdict.reading.fault->at < args_begin
                                 : !characters.empty() && !may_hold_syntax(item.args);
     if (!characters.empty()) {
-        report_name(item, characters, verdict.is_refused && is_of_name);
+        report_name(item, characters, verdict.is_line_refused && is_of_name);
     }
-    if (verdict.is_refused && !is_of_name) {
+    if (verdict.is_line_refused && !is_of_name) {
         report_refusal(item, verdict, args_begin);
     }
-    if (!verdict.is_refused) {
+    if (!verdict.is_line_refused) {
         for (const Effect &effect : verdict.reading.effects) {
             if (effect.at >= args_begin) {
                 report_effect(item, effect, item.args_place(effect.at - args_begin));
@@ -111,9 +111,9 @@ ShellChecker::Verdict ShellChecker::judge(const Item &item, const std::string &l
     if (is_new) {
         verdict.reading = read_shell_line(line);
         const DeviceShell::Answer answer = shell_.ask(line, verdict.why);
-        verdict.is_refused = answer == DeviceShell::Answer::unknown
-                                 ? verdict.reading.fault.has_value()
-                                 : answer == DeviceShell::Answer::refused;
+        verdict.is_line_refused = answer == DeviceShell::Answer::unknown
+                                      ? verdict.reading.fault.has_value()
+                                      : answer == DeviceShell::Answer::refused;
         if (answer == DeviceShell::Answer::unknown && shell_.is_out_of_time() && !is_limit_told_) {
             is_limit_told_ = true;
             findings_.warning(item.name_place,
@@ -128,13 +128,14 @@ ShellChecker::Verdict ShellChecker::judge(const Item &item, const std::string &l
 
 // With -n the shell does not look between backticks. What is between those in others
 // costs only what these print.
-bool ShellChecker::is_refused(const Effect &substitution, std::string &why)
+bool ShellChecker::is_substitution_refused(const Effect &substitution, std::string &why)
 {
     const std::string &text = substitution.text;
     if (substitution.mark != "`") {
         return shell_.ask(text, why) == DeviceShell::Answer::refused ||
                std::ranges::any_of(read_shell_line(text).effects, [&](const Effect &effect) {
-                   return effect.kind == Effect::Kind::substitution && is_refused(effect, why);
+                   return effect.kind == Effect::Kind::substitution &&
+                          is_substitution_refused(effect, why);
                });
     }
     // a '\' before a '"' is an escape where quotes are round it
@@ -142,9 +143,10 @@ bool ShellChecker::is_refused(const Effect &substitution, std::string &why)
            shell_.ask(without_escapes(text, "$`\\\""), why) == DeviceShell::Answer::refused;
 }
 
-void ShellChecker::report_name(const Item &item, const std::string &characters, bool is_refused)
+void ShellChecker::report_name(const Item &item, const std::string &characters,
+                               bool is_line_refused)
 {
-    if (is_refused) {
+    if (is_line_refused) {
         findings_.error(item.name_place,
                         "item {} has {} in its name, which the shell reads as its own: it would "
                         "refuse the command line; rename it",
@@ -185,7 +187,7 @@ void ShellChecker::report_effect(const Item &item, const Effect &effect, std::si
         }
         break;
     case Effect::Kind::substitution:
-        if (is_refused(effect, why)) {
+        if (is_substitution_refused(effect, why)) {
             findings_.error(
                 place,
                 "the shell would refuse the command line of item {}: in {} here, {}; put a "

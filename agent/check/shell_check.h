@@ -34,13 +34,13 @@ class ShellChecker
   private:
     struct Verdict {
         ShellReading reading;
-        bool is_refused = false;
+        bool is_line_refused = false;
         std::string why; // in the shell's words
     };
 
     Verdict judge(const Item &item, const std::string &line);
-    bool is_refused(const ShellReading::Effect &substitution, std::string &why);
-    void report_name(const Item &item, const std::string &characters, bool is_refused);
+    bool is_substitution_refused(const ShellReading::Effect &substitution, std::string &why);
+    void report_name(const Item &item, const std::string &characters, bool is_line_refused);
     void report_refusal(const Item &item, const Verdict &verdict, std::size_t args_begin);
     void report_effect(const Item &item, const ShellReading::Effect &effect, std::size_t place);
     void report_command(const Item &item, const ShellReading::Effect &effect, std::size_t place);

@@ -1,7 +1,7 @@
 // SPDX-FileCopyrightText: 2026 The Quillmark authors
 // SPDX-License-Identifier: Apache-2.0
 
-#include "module/messages.h"
+#include "module/protocol.h"
 
 #include <array>
 #include <cerrno>
