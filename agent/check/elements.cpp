@@ -4,8 +4,9 @@
 #include "check/elements.h"
 
 #include "check/checks.h"
-#include "check/findings.h"
 #include "util/text.h"
+
+#include <string_view>
 
 namespace fptest
 {

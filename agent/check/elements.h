@@ -4,6 +4,8 @@
 // Groups and items as the checks look at them, and the words for them.
 #pragma once
 
+#include "check/findings.h"
+#include "check/source_map.h"
 #include "plan/plan.h"
 
 #include <cstddef>
@@ -15,6 +17,13 @@
 
 namespace fptest
 {
+
+// A plan, and where to say what is wrong with it.
+struct PlanCheck {
+    const Plan &plan;
+    const SourceMap &places;
+    Findings &findings;
+};
 
 struct Item {
     mxml_node_t *node = nullptr;

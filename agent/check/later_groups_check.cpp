@@ -5,6 +5,7 @@
 
 #include <cctype>
 #include <string>
+#include <string_view>
 #include <unordered_map>
 
 namespace fptest

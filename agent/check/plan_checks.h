@@ -5,10 +5,7 @@
 #pragma once
 
 #include "check/elements.h"
-#include "check/findings.h"
 #include "check/shell_check.h"
-#include "check/source_map.h"
-#include "plan/plan.h"
 
 #include <cstddef>
 #include <string>
@@ -17,13 +14,6 @@
 
 namespace fptest
 {
-
-// What all of them look at.
-struct PlanCheck {
-    const Plan &plan;
-    const SourceMap &places;
-    Findings &findings;
-};
 
 // Elements named almost like groups or items.
 void check_tags(const PlanCheck &in);

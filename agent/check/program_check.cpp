@@ -37,7 +37,7 @@ std::optional<VendorName> vendor_name(std::string_view name)
 } // namespace
 
 ProgramChecker::ProgramChecker(const PlanCheck &in, const std::unordered_set<std::string> &names)
-    : in_(in), names_(names), shell_checker_(in.findings)
+    : in_(in), names_(names), shell_checker_(in)
 {
 }
 
@@ -47,17 +47,14 @@ void ProgramChecker::check(const Item &item)
     if (name.empty()) {
         return;
     }
-    const std::size_t place = in_.places.of(item.number, "name");
     if (name.size() > kStopLimit && name.size() <= kNameLimit) {
-        in_.findings.warning(place,
+        in_.findings.warning(in_.places.of(item.number, "name"),
                              "item {} may not be found to be stopped: ps is asked for the first "
                              "{} of the {} bytes of its name, and finds another or none; shorten "
                              "it",
                              quoted_name(name), kStopLimit, name.size());
     }
-    shell_checker_.check({name, item.args.value_or(""), place, [&](std::size_t at) {
-                              return in_.places.inside(item.number, "args", at);
-                          }});
+    shell_checker_.check(item);
     check_vendors(item);
     check_command_line(item);
 }
