@@ -153,18 +153,13 @@ std::size_t ShellChecker::args_place(const Item &item, std::size_t at) const
 void ShellChecker::report_name(const Item &item, const std::string &characters,
                                bool is_line_refused)
 {
-    if (is_line_refused) {
-        in_.findings.error(in_.places.of(item.number, "name"),
-                           "item {} has {} in its name, which the shell reads as its own: it would "
-                           "refuse the command line; rename it",
-                           quoted_name(item.name), characters);
-    } else {
-        in_.findings.warning(
-            in_.places.of(item.number, "name"),
-            "item {} has {} in its name, which the shell reads as its own: it would "
-            "not run a program of that name; rename it",
-            quoted_name(item.name), characters);
-    }
+    in_.findings.add(is_line_refused ? Finding::Severity::error : Finding::Severity::warning,
+                     in_.places.of(item.number, "name"),
+                     "item {} has {} in its name, which the shell reads as its own: it would {}; "
+                     "rename it",
+                     quoted_name(item.name), characters,
+                     is_line_refused ? "refuse the command line"
+                                     : "not run a program of that name");
 }
 
 void ShellChecker::report_refusal(const Item &item, const Verdict &verdict, std::size_t args_begin)
@@ -252,18 +247,15 @@ void ShellChecker::report_command(const Item &item, const Effect &effect, std::s
             "the shell would end the command of item {} at the line feed here, and run "
             "{} as a command of its own; write a blank in its place",
             name, text);
-    } else if ((effect.mark == "&" || effect.mark == "|&") && effect.text.empty()) {
-        in_.findings.warning(
-            place,
-            "the shell would run item {} in the background, so that it ends at once "
-            "for the library; put the {} in quotes if it is meant for the item",
-            name, mark);
     } else if (effect.mark == "&" || effect.mark == "|&") {
-        in_.findings.warning(
-            place,
-            "the shell would run item {} in the background, and run {} as a command "
-            "of its own; put the {} in quotes if it is meant for the item",
-            name, text, mark);
+        in_.findings.warning(place,
+                             "the shell would run item {} in the background, {}; put the {} in "
+                             "quotes if it is meant for the item",
+                             name,
+                             effect.text.empty()
+                                 ? "so that it ends at once for the library"
+                                 : fmt::format("and run {} as a command of its own", text),
+                             mark);
     } else if (effect.text.empty()) {
         in_.findings.warning(
             place,
