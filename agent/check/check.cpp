@@ -11,17 +11,19 @@
 namespace fptest
 {
 
-CheckedPlan check(std::string name, std::string text, PlanSource use)
+CheckedPlan check(std::string name, std::string text, Storing storing)
 {
-    CheckedPlan read{std::move(name), std::move(text), use, "", {}, {}, "", {}};
-    read.stored = use == PlanSource::stored ? read.text : as_stored(read.text);
-    read.plan = Plan::load_as_library(read.stored, &read.why);
+    const std::string stored = storing == Storing::as_file ? text : as_stored(text);
+    CheckedPlan read{std::move(name), std::move(text), storing, stored, Loaded(stored), {}, {}, {}};
+    if (read.stored != read.text) {
+        read.uncut.emplace(read.text);
+    }
     Findings findings;
     if (read.text.starts_with("\xFF\xFE") || read.text.starts_with("\xFE\xFF")) {
         findings.error(0, "the plan is UTF-16: save it as UTF-8");
     } else {
         read.tags = scan(read.text);
-        if (use != PlanSource::stored) {
+        if (storing != Storing::as_file) {
             check_size(read, findings);
         }
         check_form(read, findings);

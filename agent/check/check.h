@@ -24,25 +24,41 @@ struct Finding {
     std::string text;
 };
 
-enum class PlanSource {
-    to_send, // it is stored by a command: what the command cuts off matters
-    as_sent, // the same, where --as-sent asks for that
-    stored,  // it is in its place already
+// How a plan comes to its place.
+enum class Storing {
+    by_command,      // which may cut it
+    by_command_only, // the same, where --as-sent asks for that
+    as_file,         // whole, or it is there already
+};
+
+// What Mini-XML makes of a text.
+struct Loaded {
+    explicit Loaded(const std::string &text) : plan(Plan::load_as_library(text, &why))
+    {
+    }
+
+    std::string why;          // it does not load, in Mini-XML's words
+    std::optional<Plan> plan; // nothing then
 };
 
 // A plan that was read, and what is known of it.
 struct CheckedPlan {
     std::string name; // of the file, for people
     std::string text;
-    PlanSource use;
+    Storing storing;
     std::string stored;            // what of the text the library gets
+    Loaded loaded;                 // of that
+    std::optional<Loaded> uncut;   // of the text, where that is more
     std::vector<Tag> tags;         // of the text
-    std::optional<Plan> plan;      // what the library loads; nothing where it does not
-    std::string why;               // that is so, in Mini-XML's words
     std::vector<Finding> findings; // in the order of the text
+
+    [[nodiscard]] const Loaded &whole() const
+    {
+        return uncut ? *uncut : loaded;
+    }
 };
 
-CheckedPlan check(std::string name, std::string text, PlanSource use);
+CheckedPlan check(std::string name, std::string text, Storing storing);
 
 bool has_errors(const std::vector<Finding> &findings);
 

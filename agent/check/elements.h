@@ -4,34 +4,60 @@
 // Groups and items as the checks look at them, and the words for them.
 #pragma once
 
+#include "check/findings.h"
+#include "check/source_map.h"
 #include "plan/plan.h"
 
 #include <cstddef>
 #include <mxml.h>
 #include <optional>
 #include <string>
-#include <string_view>
+#include <unordered_set>
 #include <vector>
 
 namespace fptest
 {
 
+// A plan, and where to say what is wrong with it.
+struct PlanCheck {
+    const Plan &plan;
+    const SourceMap &places;
+    Findings &findings;
+};
+
 struct Item {
     mxml_node_t *node = nullptr;
     std::size_t number = 0;
-    std::optional<std::string> name;
+    std::string name; // empty where it has none
     std::optional<std::string> args;
 };
 
 struct Group {
     mxml_node_t *node = nullptr;
     std::size_t number = 0;
-    std::optional<std::string> name;
+    std::string name;   // empty where it has none
     bool found = false; // by its name
     std::vector<Item> items;
     std::vector<Item> nested; // in other elements of it
     std::vector<mxml_node_t *> others;
 };
+
+struct Elements {
+    std::vector<Group> groups;
+    std::vector<Item> stray; // in no group
+    std::unordered_set<std::string> item_names;
+};
+
+Elements elements_of(const Plan &plan);
+
+// Those that a path of the group can lead to: the first of each name.
+std::vector<const Item *> addressable_items(const Group &group);
+
+// "a comment", "<TAG>"
+std::string kind_of(mxml_node_t *node);
+
+// "item 'NAME'"
+std::string words_for(const Item &item);
 
 // What a path leads to, one for each of the library's calls.
 using Resolution = std::vector<std::optional<Plan::Element>>;

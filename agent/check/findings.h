@@ -22,16 +22,20 @@ class Findings
 {
   public:
     template <typename... Values>
+    void add(Finding::Severity severity, std::size_t offset, fmt::format_string<Values...> text,
+             Values &&...values)
+    {
+        list_.push_back({severity, offset, fmt::format(text, std::forward<Values>(values)...)});
+    }
+    template <typename... Values>
     void error(std::size_t offset, fmt::format_string<Values...> text, Values &&...values)
     {
-        list_.push_back(
-            {Finding::Severity::error, offset, fmt::format(text, std::forward<Values>(values)...)});
+        add(Finding::Severity::error, offset, text, std::forward<Values>(values)...);
     }
     template <typename... Values>
     void warning(std::size_t offset, fmt::format_string<Values...> text, Values &&...values)
     {
-        list_.push_back({Finding::Severity::warning, offset,
-                         fmt::format(text, std::forward<Values>(values)...)});
+        add(Finding::Severity::warning, offset, text, std::forward<Values>(values)...);
     }
 
     // In the order of the text.

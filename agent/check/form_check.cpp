@@ -7,10 +7,10 @@
 #include "util/text.h"
 
 #include <algorithm>
+#include <array>
 #include <cctype>
 #include <expat.h>
 #include <string_view>
-#include <utility>
 #include <vector>
 
 namespace fptest
@@ -68,15 +68,15 @@ class FormChecker
         report_dropped_character();
         report_cut_declaration();
         const bool endless = report_endless_comments();
-        std::string why = read_.why;
-        std::optional<Plan> other;
-        if (repaired_ != read_.stored) {
-            other = Plan::load_as_library(repaired_, &why);
+        std::optional<Loaded> repaired;
+        if (!given_.empty()) {
+            repaired.emplace(repaired_);
         }
-        if (const auto &plan = repaired_ != read_.stored ? other : read_.plan) {
-            check_plan(read_, *plan, findings_);
+        const Loaded &loaded = repaired ? *repaired : read_.whole();
+        if (loaded.plan) {
+            check_plan(read_, *loaded.plan, findings_);
         } else if (!endless) {
-            report_refusal(why);
+            report_refusal(loaded.why);
         }
     }
 
@@ -130,13 +130,14 @@ class FormChecker
             findings_.error(offset,
                             "an entity is declared here: the library would not {}; write its text "
                             "where it is used",
-                            read_.plan ? "know it" : "load the plan");
+                            read_.loaded.plan ? "know it" : "load the plan");
             return;
         }
-        findings_.error(
-            offset, "not well-formed, {}: the library would {}; {}", reason(flaw.error, offset),
-            read_.plan ? "load it all the same, and run what it took from it" : "not load it",
-            advice(flaw.error, offset));
+        findings_.error(offset, "not well-formed, {}: the library would {}; {}",
+                        reason(flaw.error, offset),
+                        read_.loaded.plan ? "load it all the same, and run what it took from it"
+                                          : "not load it",
+                        advice(flaw.error, offset));
     }
 
     // Where a person looks for it: the parser names the tag for an entity in it,

@@ -1,12 +1,12 @@
 // SPDX-FileCopyrightText: 2026 The Quillmark authors
 // SPDX-License-Identifier: Apache-2.0
 
-#include "check/later_groups_check.h"
+#include "check/plan_checks.h"
 
 #include <cctype>
 #include <string>
+#include <string_view>
 #include <unordered_map>
-#include <unordered_set>
 
 namespace fptest
 {
@@ -35,9 +35,7 @@ std::string likeness(std::string_view name)
 class LaterGroupsCheck
 {
   public:
-    LaterGroupsCheck(const Plan &plan, const SourceMap &places, const std::vector<Group> &groups,
-                     Findings &findings)
-        : plan_(plan), places_(places), findings_(findings)
+    LaterGroupsCheck(const PlanCheck &in, const std::vector<Group> &groups) : in_(in)
     {
         for (const Group &group : groups) {
             if (group.found) {
@@ -50,14 +48,14 @@ class LaterGroupsCheck
     {
         for (const Entry &entry : groups_) {
             for (const Item *item : entry.items) {
-                ++uses_[*item->name];
+                ++uses_[item->name];
             }
         }
         for (at_ = 0; at_ < groups_.size(); ++at_) {
             check_group(groups_[at_]);
             for (const Item *item : groups_[at_].items) {
-                after_last_[*item->name] = at_ + 1;
-                alike_[likeness(*item->name)] = at_;
+                after_last_[item->name] = at_ + 1;
+                alike_[likeness(item->name)] = at_;
             }
         }
     }
@@ -68,28 +66,15 @@ class LaterGroupsCheck
         std::vector<const Item *> items;
     };
 
-    // The first of each name.
-    static std::vector<const Item *> addressable_items(const Group &group)
-    {
-        std::vector<const Item *> items;
-        std::unordered_set<std::string_view> names;
-        for (const Item &item : group.items) {
-            if (item.name && is_addressable(*item.name) && names.insert(*item.name).second) {
-                items.push_back(&item);
-            }
-        }
-        return items;
-    }
-
     void check_group(const Entry &entry)
     {
         const Item *first = nullptr;
         std::string text;
         std::size_t more = 0;
         for (const Item *item : entry.items) {
-            const Group *earlier = earlier_group(*item->name);
+            const Group *earlier = earlier_group(item->name);
             const auto run =
-                earlier != nullptr ? plan_.resolve(*earlier->name, *item->name) : std::nullopt;
+                earlier != nullptr ? in_.plan.resolve(earlier->name, item->name) : std::nullopt;
             if (!run || run->number == item->number) {
                 continue;
             }
@@ -100,12 +85,12 @@ class LaterGroupsCheck
             first = item;
             text = fmt::format("group {} has no item {}, and finds this one after it: {} would run "
                                "{}; check the group in paths to it",
-                               quoted_name(*earlier->name), quoted_name(*item->name),
-                               path_of(*earlier->name, *item->name), names_of({run}));
+                               quoted_name(earlier->name), quoted_name(item->name),
+                               path_of(earlier->name, item->name), names_of({run}));
         }
         if (first != nullptr) {
-            findings_.warning(places_.of(first->number, "name"), "{}{}", text,
-                              more > 0 ? fmt::format(", and to {} more here", more) : "");
+            in_.findings.warning(in_.places.of(first->number, "name"), "{}{}", text,
+                                 more > 0 ? fmt::format(", and to {} more here", more) : "");
         }
     }
 
@@ -122,9 +107,7 @@ class LaterGroupsCheck
                                                                : nullptr;
     }
 
-    const Plan &plan_;
-    const SourceMap &places_;
-    Findings &findings_;
+    const PlanCheck in_;
     std::vector<Entry> groups_;
     std::size_t at_ = 0;
     std::unordered_map<std::string, std::size_t> uses_;
@@ -134,10 +117,9 @@ class LaterGroupsCheck
 
 } // namespace
 
-void check_later_groups(const Plan &plan, const SourceMap &places, const std::vector<Group> &groups,
-                        Findings &findings)
+void check_later_groups(const PlanCheck &in, const std::vector<Group> &groups)
 {
-    LaterGroupsCheck(plan, places, groups, findings).check();
+    LaterGroupsCheck(in, groups).check();
 }
 
 } // namespace fptest

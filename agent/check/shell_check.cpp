@@ -65,29 +65,30 @@ std::string without_escapes(const std::string &text, std::string_view escaped)
 
 } // namespace
 
-ShellChecker::ShellChecker(Findings &findings) : findings_(findings)
+ShellChecker::ShellChecker(const PlanCheck &in) : in_(in)
 {
 }
 
 void ShellChecker::check(const Item &item)
 {
-    const std::string line = command_line(item.name, item.args, "");
-    const std::size_t args_begin = line.size() - item.args.size();
+    const std::string args = item.args.value_or("");
+    const std::string line = command_line(item.name, args, "");
+    const std::size_t args_begin = line.size() - args.size();
     const Verdict verdict = may_hold_syntax(line) ? judge(item, line) : Verdict{};
     const std::string characters = shell_characters(item.name);
-    const bool is_of_name = verdict.is_refused && verdict.reading.fault
+    const bool is_of_name = verdict.is_line_refused && verdict.reading.fault
                                 ? verdict.reading.fault->at < args_begin
-                                : !characters.empty() && !may_hold_syntax(item.args);
+                                : !characters.empty() && !may_hold_syntax(args);
     if (!characters.empty()) {
-        report_name(item, characters, verdict.is_refused && is_of_name);
+        report_name(item, characters, verdict.is_line_refused && is_of_name);
     }
-    if (verdict.is_refused && !is_of_name) {
+    if (verdict.is_line_refused && !is_of_name) {
         report_refusal(item, verdict, args_begin);
     }
-    if (!verdict.is_refused) {
+    if (!verdict.is_line_refused) {
         for (const Effect &effect : verdict.reading.effects) {
             if (effect.at >= args_begin) {
-                report_effect(item, effect, item.args_place(effect.at - args_begin));
+                report_effect(item, effect, args_place(item, effect.at - args_begin));
             }
         }
     }
@@ -95,11 +96,11 @@ void ShellChecker::check(const Item &item)
     const bool ends_line = std::ranges::any_of(verdict.reading.effects, [&](const Effect &effect) {
         return effect.mark == "\n" && line[effect.at - 1] == '\r';
     });
-    if (const std::size_t at = item.args.find('\r'); at != item.args.npos && !ends_line) {
-        findings_.warning(item.args_place(at),
-                          "the shell takes the carriage return here for a character like any "
-                          "other, and would hand it to item {}; leave it out",
-                          quoted_name(item.name));
+    if (const std::size_t at = args.find('\r'); at != args.npos && !ends_line) {
+        in_.findings.warning(args_place(item, at),
+                             "the shell takes the carriage return here for a character like any "
+                             "other, and would hand it to item {}; leave it out",
+                             quoted_name(item.name));
     }
 }
 
@@ -111,16 +112,17 @@ ShellChecker::Verdict ShellChecker::judge(const Item &item, const std::string &l
     if (is_new) {
         verdict.reading = read_shell_line(line);
         const DeviceShell::Answer answer = shell_.ask(line, verdict.why);
-        verdict.is_refused = answer == DeviceShell::Answer::unknown
-                                 ? verdict.reading.fault.has_value()
-                                 : answer == DeviceShell::Answer::refused;
+        verdict.is_line_refused = answer == DeviceShell::Answer::unknown
+                                      ? verdict.reading.fault.has_value()
+                                      : answer == DeviceShell::Answer::refused;
         if (answer == DeviceShell::Answer::unknown && shell_.is_out_of_time() && !is_limit_told_) {
             is_limit_told_ = true;
-            findings_.warning(item.name_place,
-                              "the device's shell has been asked for as long as fptest waits for "
-                              "it: from item {} on, what it would refuse may be missed; check the "
-                              "rest as a plan of its own",
-                              quoted_name(item.name));
+            in_.findings.warning(
+                in_.places.of(item.number, "name"),
+                "the device's shell has been asked for as long as fptest waits for "
+                "it: from item {} on, what it would refuse may be missed; check the "
+                "rest as a plan of its own",
+                quoted_name(item.name));
         }
     }
     return verdict;
@@ -128,13 +130,14 @@ ShellChecker::Verdict ShellChecker::judge(const Item &item, const std::string &l
 
 // With -n the shell does not look between backticks. What is between those in others
 // costs only what these print.
-bool ShellChecker::is_refused(const Effect &substitution, std::string &why)
+bool ShellChecker::is_substitution_refused(const Effect &substitution, std::string &why)
 {
     const std::string &text = substitution.text;
     if (substitution.mark != "`") {
         return shell_.ask(text, why) == DeviceShell::Answer::refused ||
                std::ranges::any_of(read_shell_line(text).effects, [&](const Effect &effect) {
-                   return effect.kind == Effect::Kind::substitution && is_refused(effect, why);
+                   return effect.kind == Effect::Kind::substitution &&
+                          is_substitution_refused(effect, why);
                });
     }
     // a '\' before a '"' is an escape where quotes are round it
@@ -142,26 +145,28 @@ bool ShellChecker::is_refused(const Effect &substitution, std::string &why)
            shell_.ask(without_escapes(text, "$`\\\""), why) == DeviceShell::Answer::refused;
 }
 
-void ShellChecker::report_name(const Item &item, const std::string &characters, bool is_refused)
+std::size_t ShellChecker::args_place(const Item &item, std::size_t at) const
 {
-    if (is_refused) {
-        findings_.error(item.name_place,
-                        "item {} has {} in its name, which the shell reads as its own: it would "
-                        "refuse the command line; rename it",
-                        quoted_name(item.name), characters);
-    } else {
-        findings_.warning(item.name_place,
-                          "item {} has {} in its name, which the shell reads as its own: it would "
-                          "not run a program of that name; rename it",
-                          quoted_name(item.name), characters);
-    }
+    return in_.places.inside(item.number, "args", at);
+}
+
+void ShellChecker::report_name(const Item &item, const std::string &characters,
+                               bool is_line_refused)
+{
+    in_.findings.add(is_line_refused ? Finding::Severity::error : Finding::Severity::warning,
+                     in_.places.of(item.number, "name"),
+                     "item {} has {} in its name, which the shell reads as its own: it would {}; "
+                     "rename it",
+                     quoted_name(item.name), characters,
+                     is_line_refused ? "refuse the command line"
+                                     : "not run a program of that name");
 }
 
 void ShellChecker::report_refusal(const Item &item, const Verdict &verdict, std::size_t args_begin)
 {
     const auto &fault = verdict.reading.fault;
-    findings_.error(
-        item.args_place(fault ? fault->at - args_begin : 0),
+    in_.findings.error(
+        args_place(item, fault ? fault->at - args_begin : 0),
         "the shell would refuse the command line of item {}: {}", quoted_name(item.name),
         fault ? reason(*fault) : fmt::format("{}; fix its args", one_line(verdict.why)));
 }
@@ -178,49 +183,54 @@ void ShellChecker::report_effect(const Item &item, const Effect &effect, std::si
         break;
     case Effect::Kind::expansion:
         if (shell_.ask_to_expand(effect.text, why) == DeviceShell::Answer::refused) {
-            findings_.error(place,
-                            "the shell would refuse the command line of item {}: {}; put a '\\' "
-                            "before the '$' here if it is meant for the item",
-                            name, one_line(why));
+            in_.findings.error(place,
+                               "the shell would refuse the command line of item {}: {}; put a '\\' "
+                               "before the '$' here if it is meant for the item",
+                               name, one_line(why));
         }
         break;
     case Effect::Kind::substitution:
-        if (is_refused(effect, why)) {
-            findings_.error(
+        if (is_substitution_refused(effect, why)) {
+            in_.findings.error(
                 place,
                 "the shell would refuse the command line of item {}: in {} here, {}; put a "
                 "'\\' before {} if it is meant for the item",
                 name, effect.mark == "`" ? "the backticks" : text, one_line(why), mark);
             break;
         }
-        findings_.warning(place,
-                          "the shell would run {} as a command of its own before item {}, and put "
-                          "what that prints here; put a '\\' before it if it is meant for the item",
-                          text, name);
+        in_.findings.warning(
+            place,
+            "the shell would run {} as a command of its own before item {}, and put "
+            "what that prints here; put a '\\' before it if it is meant for the item",
+            text, name);
         break;
     case Effect::Kind::redirection:
-        findings_.warning(place,
-                          "the shell would redirect item {} by {}, and not hand it that; put the "
-                          "{} in quotes if it is meant for the item",
-                          name, text, mark);
+        in_.findings.warning(
+            place,
+            "the shell would redirect item {} by {}, and not hand it that; put the "
+            "{} in quotes if it is meant for the item",
+            name, text, mark);
         break;
     case Effect::Kind::comment:
-        findings_.warning(place,
-                          "the shell would take {} for a comment, and not hand it to item {}; put "
-                          "the {} in quotes if it is meant for the item",
-                          text, name, mark);
+        in_.findings.warning(
+            place,
+            "the shell would take {} for a comment, and not hand it to item {}; put "
+            "the {} in quotes if it is meant for the item",
+            text, name, mark);
         break;
     case Effect::Kind::continuation:
-        findings_.warning(place,
-                          "the shell would take away the {} and the line feed here, and join what "
-                          "is before and after them; leave them out",
-                          mark);
+        in_.findings.warning(
+            place,
+            "the shell would take away the {} and the line feed here, and join what "
+            "is before and after them; leave them out",
+            mark);
         break;
     case Effect::Kind::function:
-        findings_.error(place,
-                        "the shell would make a function of item {} here, and run nothing; put the "
-                        "{} in quotes if it is meant for the item",
-                        name, mark);
+        in_.findings.error(
+            place,
+            "the shell would make a function of item {} here, and run nothing; put the "
+            "{} in quotes if it is meant for the item",
+            name, mark);
         break;
     }
 }
@@ -232,34 +242,36 @@ void ShellChecker::report_command(const Item &item, const Effect &effect, std::s
     const std::string text = quoted_name(effect.text);
     const std::string mark = quoted_name(effect.mark);
     if (effect.mark == "\n") {
-        findings_.error(place,
-                        "the shell would end the command of item {} at the line feed here, and run "
-                        "{} as a command of its own; write a blank in its place",
-                        name, text);
-    } else if ((effect.mark == "&" || effect.mark == "|&") && effect.text.empty()) {
-        findings_.warning(place,
-                          "the shell would run item {} in the background, so that it ends at once "
-                          "for the library; put the {} in quotes if it is meant for the item",
-                          name, mark);
+        in_.findings.error(
+            place,
+            "the shell would end the command of item {} at the line feed here, and run "
+            "{} as a command of its own; write a blank in its place",
+            name, text);
     } else if (effect.mark == "&" || effect.mark == "|&") {
-        findings_.warning(place,
-                          "the shell would run item {} in the background, and run {} as a command "
-                          "of its own; put the {} in quotes if it is meant for the item",
-                          name, text, mark);
+        in_.findings.warning(place,
+                             "the shell would run item {} in the background, {}; put the {} in "
+                             "quotes if it is meant for the item",
+                             name,
+                             effect.text.empty()
+                                 ? "so that it ends at once for the library"
+                                 : fmt::format("and run {} as a command of its own", text),
+                             mark);
     } else if (effect.text.empty()) {
-        findings_.warning(place,
-                          "the shell would end the command of item {0} here, and not hand it the "
-                          "{1}; put the {1} in quotes if it is meant for the item",
-                          name, mark);
+        in_.findings.warning(
+            place,
+            "the shell would end the command of item {0} here, and not hand it the "
+            "{1}; put the {1} in quotes if it is meant for the item",
+            name, mark);
     } else {
         const std::string when = effect.mark == "&&" ? fmt::format(" where item {} succeeds", name)
                                  : effect.mark == "||" ? fmt::format(" where item {} fails", name)
                                  : effect.mark == "|" ? fmt::format(" on what item {} prints", name)
                                                       : fmt::format(", after item {}", name);
-        findings_.warning(place,
-                          "the shell would run {} as a command of its own{}; put the {} in quotes "
-                          "if it is meant for the item",
-                          text, when, mark);
+        in_.findings.warning(
+            place,
+            "the shell would run {} as a command of its own{}; put the {} in quotes "
+            "if it is meant for the item",
+            text, when, mark);
     }
 }
 

@@ -6,11 +6,10 @@
 #pragma once
 
 #include "check/device_shell.h"
-#include "check/findings.h"
+#include "check/elements.h"
 #include "check/shell_reader.h"
 
 #include <cstddef>
-#include <functional>
 #include <string>
 #include <unordered_map>
 
@@ -20,32 +19,27 @@ namespace fptest
 class ShellChecker
 {
   public:
-    struct Item {
-        std::string name;
-        std::string args;
-        std::size_t name_place = 0;
-        std::function<std::size_t(std::size_t)> args_place; // of a byte of the args
-    };
-
-    explicit ShellChecker(Findings &findings);
+    explicit ShellChecker(const PlanCheck &in);
 
     void check(const Item &item);
 
   private:
     struct Verdict {
         ShellReading reading;
-        bool is_refused = false;
+        bool is_line_refused = false;
         std::string why; // in the shell's words
     };
 
     Verdict judge(const Item &item, const std::string &line);
-    bool is_refused(const ShellReading::Effect &substitution, std::string &why);
-    void report_name(const Item &item, const std::string &characters, bool is_refused);
+    bool is_substitution_refused(const ShellReading::Effect &substitution, std::string &why);
+    // Of a byte of its args.
+    [[nodiscard]] std::size_t args_place(const Item &item, std::size_t at) const;
+    void report_name(const Item &item, const std::string &characters, bool is_line_refused);
     void report_refusal(const Item &item, const Verdict &verdict, std::size_t args_begin);
     void report_effect(const Item &item, const ShellReading::Effect &effect, std::size_t place);
     void report_command(const Item &item, const ShellReading::Effect &effect, std::size_t place);
 
-    Findings &findings_;
+    const PlanCheck in_;
     DeviceShell shell_;
     bool is_limit_told_ = false;
     std::unordered_map<std::string, Verdict> verdicts_; // by the line

@@ -4,6 +4,7 @@
 #include "check/shell_reader.h"
 
 #include <algorithm>
+#include <initializer_list>
 #include <set>
 #include <utility>
 
@@ -91,6 +92,12 @@ class LineScanner
         at_ += found ? what.size() : 0;
         return found;
     }
+    // The first of these that is here.
+    std::string_view pass_any(std::initializer_list<std::string_view> marks)
+    {
+        const auto found = std::ranges::find_if(marks, [this](auto mark) { return pass(mark); });
+        return found != marks.end() ? *found : "";
+    }
     void pass_blanks()
     {
         while (pass(" ") || pass("\t") || pass_continuation()) {
@@ -104,10 +111,6 @@ class LineScanner
             note(Effect::Kind::continuation, begin, "\\", begin, begin);
         }
         return at_ > begin;
-    }
-    void pass_two()
-    {
-        at_ = std::min(at_ + 2, line_.size());
     }
 
     void fail(Fault::Kind kind, std::size_t at, std::string_view mark)
@@ -130,7 +133,8 @@ class LineScanner
     {
         if (is_first()) {
             reading_.effects.push_back(
-                {kind, at, std::string(mark), trimmed(line_.substr(begin, end - begin))});
+                {kind, at, std::string(mark),
+                 trimmed(line_.substr(begin, std::max(begin, end) - begin))});
         }
     }
 
@@ -178,7 +182,7 @@ class LineScanner
                 read_comment();
             } else if (looking_at("(")) {
                 read_parenthesis(state);
-            } else if (looking_at("<") || looking_at(">") || looking_at("&>")) {
+            } else if (looking_at_any("<>") || looking_at("&>")) {
                 state.is_empty = false;
                 read_redirection(at_);
             } else if (looking_at_any(";&|")) {
@@ -245,7 +249,7 @@ class LineScanner
     void read_parenthesis(State &state)
     {
         const std::size_t begin = at_;
-        if (state.words == 1 && pass_function()) {
+        if (state.words == 1 && pass_empty_parentheses()) {
             note(Effect::Kind::function, begin, "(", begin, at_);
             state = {.cases = state.cases};
         } else if (state.words > 0 && state.cases == 0) {
@@ -261,17 +265,13 @@ class LineScanner
         }
     }
 
-    // "()" after a name.
-    bool pass_function()
+    bool pass_empty_parentheses()
     {
-        const std::size_t begin = at_;
-        ++at_;
+        const std::size_t begin = at_++;
         pass_blanks();
-        if (pass(")")) {
-            return true;
-        }
-        at_ = begin;
-        return false;
+        const bool found = pass(")");
+        at_ = found ? at_ : begin;
+        return found;
     }
 
     void read_nested(std::string_view mark)
@@ -293,16 +293,12 @@ class LineScanner
     void read_operator(State &state)
     {
         const std::size_t begin = at_;
-        std::string_view mark = line_.substr(at_, 1);
-        for (const std::string_view longer : {"&&", "||", "|&", ";;", ";&", ";|"}) {
-            mark = looking_at(longer) ? longer : mark;
-        }
+        const std::string_view mark = pass_any({"&&", "||", "|&", ";;", ";&", ";|", ";", "&", "|"});
         const bool ends_case = mark.starts_with(';') && mark.size() == 2;
         if (ends_case ? state.cases == 0 : state.is_empty) {
             fail(Fault::Kind::unexpected, begin, mark);
             return;
         }
-        at_ += mark.size();
         begin_effect(begin, mark);
         state = {.cases = state.cases};
         if (is_any(mark, {"&&", "||", "|"})) {
@@ -316,25 +312,20 @@ class LineScanner
     void read_redirection(std::size_t begin)
     {
         const std::size_t place = at_;
-        for (const std::string_view mark : {"<<<", "<<-", "<<", "<&", "<>", "<", "&>>", "&>|",
-                                            "&>&", "&>", ">>", ">|", ">&", ">"}) {
-            if (!pass(mark)) {
-                continue;
-            }
-            pass_blanks();
-            const std::size_t target = at_;
-            pass_word();
-            if (at_ == target) {
-                fail(Fault::Kind::nothing_after, place, mark);
-                return;
-            }
-            note(Effect::Kind::redirection, begin, mark, begin, at_);
-            if (is_any(mark, {"<<", "<<-"})) {
-                const std::string_view end = line_.substr(target, at_ - target);
-                here_documents_.push_back({place, std::string(line_.substr(place, at_ - place)),
-                                           unquoted(end), mark == "<<-", unquoted(end) != end});
-            }
+        const std::string_view mark = pass_any({"<<<", "<<-", "<<", "<&", "<>", "<", "&>>", "&>|",
+                                                "&>&", "&>", ">>", ">|", ">&", ">"});
+        pass_blanks();
+        const std::size_t target = at_;
+        pass_word();
+        if (at_ == target) {
+            fail(Fault::Kind::nothing_after, place, mark);
             return;
+        }
+        note(Effect::Kind::redirection, begin, mark, begin, at_);
+        if (is_any(mark, {"<<", "<<-"})) {
+            const std::string_view end = line_.substr(target, at_ - target);
+            here_documents_.push_back({place, std::string(line_.substr(place, at_ - place)),
+                                       unquoted(end), mark == "<<-", unquoted(end) != end});
         }
     }
 
@@ -398,12 +389,11 @@ class LineScanner
         const std::size_t begin = at_;
         pass_word();
         const std::string_view word = line_.substr(begin, at_ - begin);
+        state.is_empty = false;
         if (word.find_first_not_of("0123456789") == word.npos && looking_at_any("<>")) {
-            state.is_empty = false;
             read_redirection(begin);
             return;
         }
-        state.is_empty = false;
         if (state.words > 0) {
             ++state.words;
             return;
@@ -442,11 +432,11 @@ class LineScanner
         if (looking_at("\\\n")) {
             pass_continuation();
         } else if (looking_at("\\") || looking_at("$$")) {
-            pass_two();
+            at_ = std::min(at_ + 2, line_.size());
         } else if (looking_at("'") && !in_quotes) {
-            read_single_quotes(1, false);
+            read_single_quotes("'");
         } else if (looking_at("$'") && !in_quotes) {
-            read_single_quotes(2, true);
+            read_single_quotes("$'");
         } else if (looking_at("\"")) {
             read_double_quotes();
         } else if (looking_at("`")) {
@@ -457,26 +447,22 @@ class LineScanner
             const std::size_t begin = at_;
             if (!pass_arithmetic("$((")) {
                 read_nested("$(");
-                note(Effect::Kind::substitution, begin, "$(", begin + 2,
-                     std::max(at_ - 1, begin + 2));
+                note(Effect::Kind::substitution, begin, "$(", begin + 2, at_ - 1);
             }
         } else {
             ++at_;
         }
     }
 
-    void read_single_quotes(std::size_t size, bool has_escapes)
+    // In the second kind a quote may be escaped.
+    void read_single_quotes(std::string_view mark)
     {
         const std::size_t begin = at_;
-        at_ += size;
+        at_ += mark.size();
         while (!at_end() && !looking_at("'")) {
-            if (has_escapes && looking_at("\\")) {
-                pass_two();
-            } else {
-                ++at_;
-            }
+            at_ += mark == "$'" && looking_at("\\") ? 2 : 1;
         }
-        expect_end("'", begin, line_.substr(begin, size));
+        expect_end("'", begin, mark);
     }
 
     // Passes over the end of what began there, or misses it.
@@ -502,9 +488,8 @@ class LineScanner
         while (!at_end() && !looking_at("`")) {
             at_ += looking_at("\\") ? 2 : 1;
         }
-        at_ = std::min(at_, line_.size());
         expect_end("`", begin, "`");
-        note(Effect::Kind::substitution, begin, "`", begin + 1, std::max(at_ - 1, begin + 1));
+        note(Effect::Kind::substitution, begin, "`", begin + 1, at_ - 1);
     }
 
     // "${NAME}"; "${ COMMAND;}" and "${|COMMAND;}" run something.
@@ -519,11 +504,10 @@ class LineScanner
         }
         --braces_;
         expect_end("}", begin, "${");
-        if (braces_ == 0 && !is_command) {
-            note(Effect::Kind::expansion, begin, "${", begin, at_);
-        }
         if (is_command) {
-            note(Effect::Kind::substitution, begin, "${", begin + 3, std::max(at_ - 1, begin + 3));
+            note(Effect::Kind::substitution, begin, "${", begin + 3, at_ - 1);
+        } else if (braces_ == 0) {
+            note(Effect::Kind::expansion, begin, "${", begin, at_);
         }
     }
 
@@ -553,20 +537,20 @@ class LineScanner
             if (pass("(")) {
                 ++open;
             } else if (looking_at(")")) {
-                if (open == 2 && pass("))")) {
+                if (open > 2) {
+                    ++at_;
+                    --open;
+                } else if (pass("))")) {
                     if (mark == "$((" && braces_ == 0) {
                         note(Effect::Kind::expansion, begin, mark, begin, at_);
                     }
                     return true;
-                }
-                if (open == 2) {
+                } else {
                     not_arithmetic_.insert(begin);
                     reading_.effects.resize(effects);
                     at_ = begin;
                     return false;
                 }
-                ++at_;
-                --open;
             } else {
                 read_character(true);
             }

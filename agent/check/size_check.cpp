@@ -46,8 +46,8 @@ class SizeChecker
   private:
     [[nodiscard]] std::string fate(const char *what) const
     {
-        return read_.plan ? fmt::format("load {} without the rest", what)
-                          : fmt::format("not load {}", what);
+        return read_.loaded.plan ? fmt::format("load {} without the rest", what)
+                                 : fmt::format("not load {}", what);
     }
 
     // Whether a character reference may be there: not in comments and the like.
@@ -85,7 +85,7 @@ class SizeChecker
                         command_.size(), command_.size() - kPlanLimit, kPlanLimit,
                         colon_ < kPlanLimit ? "were it not cut at a ':' before"
                                             : "and the library would " + fate("it"),
-                        read_.use == PlanSource::as_sent
+                        read_.storing == Storing::by_command_only
                             ? "leave --as-sent out"
                             : "have fptest run --plan place it as a file");
     }

@@ -3,6 +3,7 @@
 
 #include "check/wellformed.h"
 
+#include <algorithm>
 #include <expat.h>
 #include <memory>
 #include <new>

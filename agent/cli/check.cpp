@@ -1,7 +1,8 @@
 // SPDX-FileCopyrightText: 2026 The Quillmark authors
 // SPDX-License-Identifier: Apache-2.0
 
-#include "check/messages.h"
+#include "check/finding_printer.h"
+#include "cli/desk_paths.h"
 #include "cli/options.h"
 #include "plan/plan.h"
 #include "util/files.h"
@@ -25,20 +26,16 @@ constexpr char kCheckExamples[] = "Examples:\n"
 
 struct CheckOptions {
     std::vector<std::string> files;
-    PlanSource use = PlanSource::to_send;
+    Storing storing = Storing::by_command;
 };
 
 // What it holds is known of a plan that loads.
 std::string size_of(const CheckedPlan &read)
 {
-    std::string size = read.use == PlanSource::stored
+    std::string size = read.storing == Storing::as_file
                            ? plural(read.text.size(), "byte")
                            : fmt::format("{} of {} bytes", read.text.size(), kPlanLimit);
-    std::optional<Plan> whole;
-    if (read.text != read.stored) {
-        whole = Plan::load_as_library(read.text);
-    }
-    if (const auto &plan = read.text != read.stored ? whole : read.plan) {
+    if (const auto &plan = read.whole().plan) {
         std::size_t items = 0;
         const auto groups = plan->groups();
         for (const Plan::Group &group : groups) {
@@ -51,9 +48,9 @@ std::string size_of(const CheckedPlan &read)
 }
 
 // False where the plan has errors.
-bool check_file(const std::string &file, const std::string &text, PlanSource use)
+bool check_file(const std::string &file, const std::string &text, Storing storing)
 {
-    const CheckedPlan read = check(file == "-" ? "<stdin>" : one_line(file), text, use);
+    const CheckedPlan read = check(one_line(name_of_plan(file)), text, storing);
     print(stdout, read);
     const auto errors = static_cast<std::size_t>(
         std::ranges::count(read.findings, Finding::Severity::error, &Finding::severity));
@@ -73,7 +70,7 @@ Exit check_files(const CheckOptions &options)
     bool readable = true;
     for (const std::string &file : options.files) {
         if (const auto text = read_file(file)) {
-            sound = check_file(file, *text, options.use) && sound;
+            sound = check_file(file, *text, options.storing) && sound;
         } else {
             say("{}: {}", one_line(file), why_unread());
             readable = false;
@@ -98,11 +95,11 @@ void add_check(CLI::App &app, Action &chosen)
         ->transform(desk_file())
         ->check(not_empty())
         ->required();
-    const auto set_use = [options](const std::string &use) {
-        options->use = use == "file" ? PlanSource::stored : PlanSource::to_send;
+    const auto set_storing = [options](const std::string &how) {
+        options->storing = how == "file" ? Storing::as_file : Storing::by_command;
     };
     command
-        .add_option_function<std::string>("--for", set_use,
+        .add_option_function<std::string>("--for", set_storing,
                                           "how it is to be stored: by a command, which\n"
                                           "cuts it, or as a file")
         ->type_name("command|file")

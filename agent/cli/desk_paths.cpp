@@ -3,6 +3,7 @@
 
 #include "cli/desk_paths.h"
 
+#include "plan/library_rules.h"
 #include "util/failure.h"
 #include "util/text.h"
 #include "util/write.h"
@@ -82,6 +83,11 @@ std::string found_on_desk(const std::string &file)
     }
     const fs::path there = fs::path(caller) / file;
     return fs::exists(there, none) ? there.string() : file;
+}
+
+std::string name_of_plan(const std::string &file)
+{
+    return file.empty() ? kStoredPlan : file == "-" ? "<stdin>" : file;
 }
 
 } // namespace fptest

@@ -20,4 +20,7 @@ void look_after_reports(const std::vector<std::pair<std::string, std::string>> &
 // there may be in the caller's.
 std::string found_on_desk(const std::string &file);
 
+// What a plan is called that comes from this file: the stored one where none is named.
+std::string name_of_plan(const std::string &file);
+
 } // namespace fptest

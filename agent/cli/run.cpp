@@ -1,7 +1,7 @@
 // SPDX-FileCopyrightText: 2026 The Quillmark authors
 // SPDX-License-Identifier: Apache-2.0
 
-#include "check/messages.h"
+#include "check/finding_printer.h"
 #include "cli/desk_paths.h"
 #include "cli/options.h"
 #include "cli/outputs.h"
@@ -46,14 +46,14 @@ constexpr char kRunExamples[] =
 // --- the plan -----------------------------------------------------------------
 
 // A plan that a command cannot hold is put into its place as a file.
-PlanSource use_of(const RunOptions &options, const std::string &text)
+Storing storing_of(const RunOptions &options, const std::string &text)
 {
     if (options.plan.empty()) {
-        return PlanSource::stored;
+        return Storing::as_file;
     }
-    return options.as_sent             ? PlanSource::as_sent
-           : text.size() <= kPlanLimit ? PlanSource::to_send
-                                       : PlanSource::stored;
+    return options.as_sent             ? Storing::by_command_only
+           : text.size() <= kPlanLimit ? Storing::by_command
+                                       : Storing::as_file;
 }
 
 // One that the library loads.
@@ -62,10 +62,7 @@ CheckedPlan open_plan(const RunOptions &options)
     const std::string text = options.plan.empty()
                                  ? require_stored_plan(": give one with --plan FILE")
                                  : require_file(options.plan);
-    CheckedPlan read = check(options.plan.empty()  ? kStoredPlan
-                             : options.plan == "-" ? "<stdin>"
-                                                   : options.plan,
-                             text, use_of(options, text));
+    CheckedPlan read = check(name_of_plan(options.plan), text, storing_of(options, text));
     const bool has_error = has_errors(read.findings);
     if (has_error && !options.force) {
         print(stderr, read);
@@ -74,11 +71,11 @@ CheckedPlan open_plan(const RunOptions &options)
     }
     if (!read.findings.empty() && !options.quiet) {
         say("the plan has {}: see fptest check {}{}", has_error ? "errors" : "warnings",
-            read.use == PlanSource::stored ? "--for file " : "", one_line(read.name));
+            read.storing == Storing::as_file ? "--for file " : "", one_line(read.name));
     }
-    if (!read.plan) {
+    if (!read.loaded.plan) {
         throw Failure(Cause::input, "{}: the library cannot load this plan: {}",
-                      one_line(read.name), one_line(read.why));
+                      one_line(read.name), one_line(read.loaded.why));
     }
     return read;
 }
@@ -226,7 +223,7 @@ Exit run(RunOptions options)
     }
     const Descriptor lock = options.list ? Descriptor(-1) : ready_device();
     const CheckedPlan read = open_plan(options);
-    const Plan &plan = *read.plan;
+    const Plan &plan = *read.loaded.plan;
     std::vector<Path> paths;
     for (const std::string &text : options.paths) {
         paths.push_back(parse_path(text, plan, read.name, options.force));
@@ -252,7 +249,7 @@ Exit run(RunOptions options)
     if (!options.quiet) {
         tell_of_running_gatherer(work, plan, vendor_suffix(vendor).value_or(""));
     }
-    const bool is_sent = read.use != PlanSource::stored;
+    const bool is_sent = read.storing != Storing::as_file;
     const bool is_placed = !is_sent && !options.plan.empty();
     if (is_sent || is_placed) {
         require_room(is_sent ? read.stored.size() : read.text.size());

@@ -1,6 +1,7 @@
 // SPDX-FileCopyrightText: 2026 The Quillmark authors
 // SPDX-License-Identifier: Apache-2.0
 
+#include "cli/desk_paths.h"
 #include "cli/options.h"
 #include "module/stored_plan.h"
 #include "plan/plan.h"
@@ -56,20 +57,20 @@ void print(const std::vector<Row> &rows)
     }
 }
 
-std::string read_shown(const std::string &file)
+std::optional<Plan> read_shown(const std::string &file)
 {
     if (file.empty()) {
         require_stored_plan(": run one with fptest run --plan FILE, or name a file to show");
-        return whole_stored_plan().text;
+        return whole_stored_plan().annotated;
     }
-    return require_file(file);
+    return Plan::parse_annotated(require_file(file));
 }
 
 Exit show(const std::string &file)
 {
     require_standard_output("fptest show");
-    const std::string name = file.empty() ? kStoredPlan : file == "-" ? "<stdin>" : one_line(file);
-    const auto plan = Plan::parse_annotated(read_shown(file));
+    const std::string name = one_line(name_of_plan(file));
+    const auto plan = read_shown(file);
     if (!plan) {
         throw Failure(Cause::input, "{} is not a whole test plan: fptest check says what is wrong",
                       name);

@@ -3,8 +3,8 @@
 
 #include "module/library_process.h"
 
-#include "module/messages.h"
 #include "module/processes.h"
+#include "module/protocol.h"
 #include "module/server.h"
 
 #include <algorithm>

@@ -5,8 +5,8 @@
 
 #include "common/descriptor.h"
 #include "module/item_shell.h"
-#include "module/messages.h"
 #include "module/processes.h"
+#include "module/protocol.h"
 #include "plan/plan.h"
 #include "quillmark.h"
 

@@ -50,7 +50,7 @@ void require_regular_plan()
 StoredPlan whole_stored_plan()
 {
     StoredPlan read;
-    made_of_stored_plan(read.text, [&read](const std::string &text) {
+    read.is_usable = made_of_stored_plan(read.text, [&read](const std::string &text) {
         read.annotated = Plan::parse_annotated(text);
         return read.annotated || Plan::load_as_library(text);
     });

@@ -46,6 +46,7 @@ template <typename Make> auto made_of_stored_plan(std::string &text, const Make 
 struct StoredPlan {
     std::string text;
     std::optional<Plan> annotated; // nothing where it is not whole
+    bool is_usable = false;        // it is whole, or loads
 };
 
 // One that is not whole, and does not load, is read again for half a second.

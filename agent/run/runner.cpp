@@ -161,12 +161,10 @@ void Runner::require_all_started()
 // Without a stored plan nothing that comes can report.
 void Runner::require_plan()
 {
-    const StoredPlan plan = whole_stored_plan();
-    if (plan.annotated || Plan::load_as_library(plan.text)) {
-        return;
+    if (!whole_stored_plan().is_usable) {
+        break_off(fmt::format("the stored plan {} is gone, or not whole any more: store it again",
+                              kStoredPlan));
     }
-    break_off(fmt::format("the stored plan {} is gone, or not whole any more: store it again",
-                          kStoredPlan));
 }
 
 void Runner::handle(const LibraryProcess::Event &event)

@@ -20,9 +20,9 @@
 using fptest::check;
 using fptest::DeviceShell;
 using fptest::Finding;
-using fptest::PlanSource;
 using fptest::read_shell_line;
 using fptest::ShellReading;
+using fptest::Storing;
 
 namespace
 {
@@ -35,7 +35,7 @@ bool has_error(const std::string &args)
     }
     const std::string plan =
         "<P><CmdGroup name=\"A\"><Cmd name=\"X\" args=\"" + escaped + "\"/></CmdGroup></P>";
-    return fptest::has_errors(fptest::check("plan", plan, PlanSource::stored).findings);
+    return fptest::has_errors(fptest::check("plan", plan, Storing::as_file).findings);
 }
 
 // Whether the shell does run a line with these args.
@@ -146,7 +146,7 @@ TEST(CheckedGrammar, IsAskedOfTheShellForFiveSecondsInAll)
     const auto begin = std::chrono::steady_clock::now();
     const auto findings =
         fptest::check("plan", "<P>\n<CmdGroup name=\"A\">\n" + items + "</CmdGroup>\n</P>\n",
-                      PlanSource::stored)
+                      Storing::as_file)
             .findings;
     EXPECT_LT(std::chrono::steady_clock::now() - begin, std::chrono::seconds(12));
     EXPECT_EQ(std::ranges::count(findings,

@@ -3,7 +3,7 @@
 
 // The plan checker: the cases of check/*.txt, every message as it is printed, and
 // what must hold of it for whatever it is given.
-#include "check/messages.h"
+#include "check/finding_printer.h"
 
 #include "plan/plan.h"
 #include "support/files.h"
@@ -28,22 +28,22 @@
 
 using fptest::Finding;
 using fptest::Plan;
-using fptest::PlanSource;
+using fptest::Storing;
 using namespace std::string_literals;
 
 namespace
 {
 
-std::vector<Finding> findings_in(const std::string &text, PlanSource use)
+std::vector<Finding> findings_in(const std::string &text, Storing storing)
 {
-    return fptest::check("p.xml", text, use).findings;
+    return fptest::check("p.xml", text, storing).findings;
 }
 
-std::string messages(const std::string &text, PlanSource use)
+std::string messages(const std::string &text, Storing storing)
 {
     std::string all;
-    for (const Finding &finding : findings_in(text, use)) {
-        all += fptest::Messages("p.xml", text).of(finding);
+    for (const Finding &finding : findings_in(text, storing)) {
+        all += fptest::FindingPrinter("p.xml", text).printed(finding);
     }
     return all;
 }
@@ -162,7 +162,7 @@ class Check : public testing::TestWithParam<Case>
 TEST_P(Check, Finds)
 {
     const Case &one = GetParam();
-    EXPECT_EQ(messages(one.text, one.kind == "sent" ? PlanSource::to_send : PlanSource::stored),
+    EXPECT_EQ(messages(one.text, one.kind == "sent" ? Storing::by_command : Storing::as_file),
               one.findings);
 }
 
@@ -189,18 +189,18 @@ std::string demo_plan()
 TEST(CheckedPlan, OfTheDemoHasNoFindings)
 {
     ASSERT_NE(demo_plan(), "");
-    EXPECT_EQ(messages(demo_plan(), PlanSource::to_send), "");
-    EXPECT_EQ(messages(demo_plan(), PlanSource::stored), "");
+    EXPECT_EQ(messages(demo_plan(), Storing::by_command), "");
+    EXPECT_EQ(messages(demo_plan(), Storing::as_file), "");
 }
 
 TEST(Findings, AreErrorsOrWarnings)
 {
     const std::string empty = group("A", "");
     EXPECT_FALSE(fptest::has_errors({}));
-    EXPECT_FALSE(fptest::has_errors(findings_in("<P>" + empty + "</P>", PlanSource::stored)));
-    EXPECT_TRUE(fptest::has_errors(findings_in("", PlanSource::stored)));
+    EXPECT_FALSE(fptest::has_errors(findings_in("<P>" + empty + "</P>", Storing::as_file)));
+    EXPECT_TRUE(fptest::has_errors(findings_in("", Storing::as_file)));
     EXPECT_TRUE(
-        fptest::has_errors(findings_in("<P>" + empty + "<CmdGroup/></P>", PlanSource::stored)));
+        fptest::has_errors(findings_in("<P>" + empty + "<CmdGroup/></P>", Storing::as_file)));
 }
 
 // --- any plan, any bytes -------------------------------------------------------------
@@ -226,19 +226,19 @@ const std::vector<std::string> kPieces = pieces();
 // errors say so of every path that goes wrong.
 void expect_sound(const std::string &text)
 {
-    for (const PlanSource use : {PlanSource::to_send, PlanSource::stored}) {
+    for (const Storing storing : {Storing::by_command, Storing::as_file}) {
         std::size_t before = 0;
-        for (const Finding &finding : findings_in(text, use)) {
+        for (const Finding &finding : findings_in(text, storing)) {
             ASSERT_LE(before, finding.offset) << text;
             ASSERT_LE(finding.offset, text.size()) << text;
             before = finding.offset;
-            const std::string lines = fptest::Messages("p", text).of(finding);
+            const std::string lines = fptest::FindingPrinter("p", text).printed(finding);
             ASSERT_EQ(std::count(lines.begin(), lines.end(), '\n'), 3) << text;
             ASSERT_EQ(lines.find('\r'), std::string::npos) << text;
             ASSERT_LE(finding.text.size(), 2000U) << text;
         }
     }
-    if (fptest::has_errors(findings_in(text, PlanSource::stored))) {
+    if (fptest::has_errors(findings_in(text, Storing::as_file))) {
         return;
     }
     const auto plan = Plan::load_as_library(text);
@@ -307,7 +307,7 @@ TEST(CheckedPlan, WithoutErrorsRunsWhatItSays)
         }
         text += "</P>";
         ASSERT_NO_FATAL_FAILURE(expect_sound(text));
-        sound += fptest::has_errors(findings_in(text, PlanSource::stored)) ? 0 : 1;
+        sound += fptest::has_errors(findings_in(text, Storing::as_file)) ? 0 : 1;
     }
     EXPECT_GT(sound, 500U); // else little has been tried
 }
@@ -370,7 +370,7 @@ TEST(CheckedPlan, OfTenThousandItemsTakesNoTime)
     for (const std::string &content : {group("A", comments), group("A", nested), groups,
                                        group("A", others) + group("B", others)}) {
         const auto start = std::chrono::steady_clock::now();
-        EXPECT_NE(findings_in("<P>" + content + "</P>", PlanSource::stored).size(), 0U);
+        EXPECT_NE(findings_in("<P>" + content + "</P>", Storing::as_file).size(), 0U);
         EXPECT_LT(std::chrono::steady_clock::now() - start, std::chrono::seconds(2));
     }
 }
@@ -379,7 +379,7 @@ TEST(CheckedPlan, OfTenThousandItemsTakesNoTime)
 
 std::string message(const std::string &file, const std::string &text, const Finding &finding)
 {
-    return fptest::Messages(file, text).of(finding);
+    return fptest::FindingPrinter(file, text).printed(finding);
 }
 
 std::string shown(const std::string &text, std::size_t offset)
@@ -433,10 +433,10 @@ TEST(Message, OfALongLineTakesNoTime)
         text += item;
     }
     const auto begin = std::chrono::steady_clock::now();
-    fptest::Messages messages("f", text);
+    fptest::FindingPrinter printer("f", text);
     std::size_t size = 0;
     for (std::size_t at = 0; at < text.size(); at += item.size()) {
-        size += messages.of({Finding::Severity::error, at, "t"}).size();
+        size += printer.printed({Finding::Severity::error, at, "t"}).size();
     }
     EXPECT_GT(size, 100 * text.size() / item.size());
     EXPECT_LT(std::chrono::steady_clock::now() - begin, std::chrono::seconds(10));

@@ -1,7 +1,7 @@
 // SPDX-FileCopyrightText: 2026 The Quillmark authors
 // SPDX-License-Identifier: Apache-2.0
 
-#include "module/messages.h"
+#include "module/protocol.h"
 
 #include <array>
 #include <cerrno>
@@ -15,7 +15,7 @@ namespace fptest
 namespace
 {
 
-bool write_all(int fd, const char *data, std::size_t size)
+bool send_all(int fd, const char *data, std::size_t size)
 {
     while (size > 0) {
         const ssize_t written = ::send(fd, data, size, MSG_NOSIGNAL);
@@ -31,7 +31,7 @@ bool write_all(int fd, const char *data, std::size_t size)
     return true;
 }
 
-bool read_all(int fd, char *data, std::size_t size)
+bool receive_all(int fd, char *data, std::size_t size)
 {
     while (size > 0) {
         const ssize_t got = read(fd, data, size);
@@ -55,21 +55,21 @@ bool send_message(int socket, const Message &message)
     std::array<char, 5> head{static_cast<char>(message.kind)};
     const auto length = static_cast<std::uint32_t>(message.text.size());
     std::memcpy(head.data() + 1, &length, sizeof length);
-    return write_all(socket, head.data(), head.size()) &&
-           write_all(socket, message.text.data(), message.text.size());
+    return send_all(socket, head.data(), head.size()) &&
+           send_all(socket, message.text.data(), message.text.size());
 }
 
 bool receive_message(int socket, Message &message)
 {
     std::array<char, 5> head{};
     std::uint32_t length = 0;
-    if (!read_all(socket, head.data(), head.size())) {
+    if (!receive_all(socket, head.data(), head.size())) {
         return false;
     }
     message.kind = static_cast<MessageKind>(head[0]);
     std::memcpy(&length, head.data() + 1, sizeof length);
     message.text.resize(length);
-    return read_all(socket, message.text.data(), length);
+    return receive_all(socket, message.text.data(), length);
 }
 
 } // namespace fptest

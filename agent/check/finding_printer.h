@@ -10,22 +10,21 @@
 #include <cstdio>
 #include <string>
 #include <string_view>
-#include <vector>
 
 namespace fptest
 {
 
 // For a file's findings in the order of its text, which they come to quickly.
-class Messages
+class FindingPrinter
 {
   public:
     // The text is not copied.
-    Messages(const std::string &file, std::string_view text);
+    FindingPrinter(const std::string &file, std::string_view text);
 
     // "FILE:LINE:COLUMN: error: TEXT", the source line and a caret under the place;
     // three lines, each with a line feed. A long source line is cut around the place
     // to fit 80 columns.
-    std::string of(const Finding &finding);
+    std::string printed(const Finding &finding);
 
   private:
     std::string file_;

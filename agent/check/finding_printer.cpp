@@ -1,7 +1,7 @@
 // SPDX-FileCopyrightText: 2026 The Quillmark authors
 // SPDX-License-Identifier: Apache-2.0
 
-#include "check/messages.h"
+#include "check/finding_printer.h"
 
 #include "util/text.h"
 #include "util/write.h"
@@ -79,12 +79,12 @@ std::pair<std::string, std::string> source_line(std::string_view text, std::size
 
 } // namespace
 
-Messages::Messages(const std::string &file, std::string_view text)
+FindingPrinter::FindingPrinter(const std::string &file, std::string_view text)
     : file_(one_line(file)), text_(text), positions_(text)
 {
 }
 
-std::string Messages::of(const Finding &finding)
+std::string FindingPrinter::printed(const Finding &finding)
 {
     constexpr std::size_t kWidth = 80;
     constexpr std::size_t kAfter = 40; // columns kept after a place far to the right
@@ -107,7 +107,7 @@ void print(std::FILE *stream, const CheckedPlan &plan)
     const auto is_error = [](const Finding &one) {
         return one.severity == Finding::Severity::error;
     };
-    Messages messages(plan.name, plan.text);
+    FindingPrinter printer(plan.name, plan.text);
     // no warning in an error's place
     std::size_t errors =
         std::min<std::size_t>(std::ranges::count_if(plan.findings, is_error), kShown);
@@ -116,7 +116,7 @@ void print(std::FILE *stream, const CheckedPlan &plan)
     for (const Finding &finding : plan.findings) {
         if (std::size_t &left = is_error(finding) ? errors : warnings; left > 0) {
             --left;
-            std::fputs(messages.of(finding).c_str(), stream);
+            std::fputs(printer.printed(finding).c_str(), stream);
         } else {
             ++hidden;
         }

@@ -1,0 +1,55 @@
+// SPDX-FileCopyrightText: 2026 The Quillmark authors
+// SPDX-License-Identifier: Apache-2.0
+
+// The parts of check_plan(). Each adds what it finds.
+#pragma once
+
+#include "check/elements.h"
+#include "check/shell_check.h"
+
+#include <cstddef>
+#include <string>
+#include <unordered_set>
+#include <vector>
+
+namespace fptest
+{
+
+// Elements named almost like groups or items.
+void check_tags(const PlanCheck &in);
+
+// False where no path finds the group.
+bool check_group_name(const PlanCheck &in, const Group &group);
+
+// first is the element that has the name in this group before it; null for none.
+void check_item_name(const PlanCheck &in, const Group &group, const Item &item,
+                     const std::size_t *first);
+
+// What the library and the shell make of the name and the args of an item.
+class ProgramChecker
+{
+  public:
+    // The names are those of all items.
+    ProgramChecker(const PlanCheck &in, const std::unordered_set<std::string> &names);
+
+    void check(const Item &item);
+
+  private:
+    void check_vendors(const Item &item);
+    void check_command_line(const Item &item);
+
+    const PlanCheck in_;
+    const std::unordered_set<std::string> &names_;
+    ShellChecker shell_checker_;
+};
+
+// An item in another element of its group.
+void check_nested(const PlanCheck &in, const Group &group, const Item &item);
+
+// What else is in a group, by which the library counts on to its items.
+void check_positions(const PlanCheck &in, const Group &group);
+
+// Says where a path of a group leads into a later one that is easily meant.
+void check_later_groups(const PlanCheck &in, const std::vector<Group> &groups);
+
+} // namespace fptest

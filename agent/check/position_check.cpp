@@ -1,0 +1,162 @@
+// SPDX-FileCopyrightText: 2026 The Quillmark authors
+// SPDX-License-Identifier: Apache-2.0
+
+#include "check/checks.h"
+#include "check/plan_checks.h"
+#include "util/text.h"
+
+#include <algorithm>
+#include <string>
+#include <vector>
+
+namespace fptest
+{
+
+namespace
+{
+
+constexpr std::size_t kShownEffects = 3;
+constexpr std::size_t kShownKinds = 5;
+
+bool is_other_of(const PlanCheck &in, const Group &group, const Plan::Element &element)
+{
+    return element.tag != "Cmd" && mxmlGetParent(in.plan.elements()[element.number]) == group.node;
+}
+
+// Those that a group command takes for items; false where there are none.
+bool report_run_others(const PlanCheck &in, const Group &group, const Resolution &run)
+{
+    bool found = false;
+    for (const auto &element : run) {
+        if (element && is_other_of(in, group, *element)) {
+            in.findings.error(in.places.of(element->number),
+                              "{} in group {} has a name, by which {} would run it like an item; "
+                              "put it outside of the group",
+                              kind_of(in.plan.elements()[element->number]), quoted_name(group.name),
+                              path_of(group.name));
+            found = true;
+        }
+    }
+    return found;
+}
+
+std::string some_of(std::vector<std::string> effects)
+{
+    if (const std::size_t count = effects.size(); count > kShownEffects) {
+        effects.resize(kShownEffects);
+        effects.push_back(fmt::format("so on for {} more", count - kShownEffects));
+    }
+    return join_and(effects);
+}
+
+std::string kinds_of(const std::vector<mxml_node_t *> &others)
+{
+    std::vector<std::string> kinds;
+    for (mxml_node_t *other : others) {
+        const std::string kind = kind_of(other);
+        if (std::ranges::find(kinds, kind) != kinds.end()) {
+            continue;
+        }
+        if (kinds.size() == kShownKinds) {
+            kinds.emplace_back("others");
+            break;
+        }
+        kinds.push_back(kind);
+    }
+    return join_and(kinds);
+}
+
+std::size_t place_of_others(const PlanCheck &in, const Group &group)
+{
+    std::size_t place = in.places.of_text(group.number);
+    for (mxml_node_t *other : group.others) {
+        if (mxmlGetType(other) == MXML_ELEMENT) {
+            place = std::min(place, in.places.of(in.plan.number(other)));
+        }
+    }
+    return place != kNone ? place : in.places.of(group.number);
+}
+
+// All in their order, and at most elements of the group beside them.
+bool runs_its_items(const PlanCheck &in, const Group &group, const Resolution &run)
+{
+    std::vector<std::size_t> meant;
+    for (const Item &item : group.items) {
+        if (!item.name.empty()) {
+            meant.push_back(item.number);
+        }
+    }
+    std::vector<std::size_t> found;
+    for (const auto &element : run) {
+        if (element && !is_other_of(in, group, *element)) {
+            found.push_back(element->number);
+        }
+    }
+    return found == meant;
+}
+
+// What paths run that is not what they name.
+std::vector<std::string> shifts_of(const PlanCheck &in, const Group &group, const Resolution &run)
+{
+    std::vector<std::string> effects;
+    if (!runs_its_items(in, group, run)) {
+        effects.push_back(fmt::format("{} would run {}", path_of(group.name), names_of(run)));
+    }
+    for (const Item *item : addressable_items(group)) {
+        const auto found = in.plan.resolve(group.name, item->name);
+        if (!found || found->number != item->number) {
+            effects.push_back(
+                fmt::format("{} would run {}", path_of(group.name, item->name), names_of({found})));
+        }
+    }
+    return effects;
+}
+
+} // namespace
+
+void check_nested(const PlanCheck &in, const Group &group, const Item &item)
+{
+    std::string effect = "no node path leads to it";
+    if (group.found && is_addressable(item.name)) {
+        const auto run = in.plan.resolve(group.name, item.name);
+        const std::string path = path_of(group.name, item.name);
+        effect = run && run->number == item.number
+                     ? fmt::format("{} finds it by chance", path)
+                     : fmt::format("{} would run {}", path, names_of({run}));
+    }
+    in.findings.error(in.places.of(item.number),
+                      "{} is not directly in its group, but in {}: {}; put it directly into a "
+                      "group",
+                      words_for(item), kind_of(mxmlGetParent(item.node)), effect);
+}
+
+void check_positions(const PlanCheck &in, const Group &group)
+{
+    if (group.items.empty() && group.nested.empty() && group.others.empty()) {
+        in.findings.warning(in.places.of(group.number),
+                            "group {} is empty: {} would run nothing, and an item of it is "
+                            "looked for in the groups after it; put items into it",
+                            quoted_name(group.name), path_of(group.name));
+    }
+    if (group.others.empty()) {
+        return;
+    }
+    const Resolution run = in.plan.resolve(group.name);
+    const bool said = report_run_others(in, group, run) || !group.nested.empty();
+    const std::vector<std::string> effects = shifts_of(in, group, run);
+    const std::string kinds = kinds_of(group.others);
+    const std::size_t place = place_of_others(in, group);
+    if (!effects.empty()) {
+        in.findings.error(place,
+                          "{} in group {}, which shifts the positions: {}; keep all but items "
+                          "out of the group",
+                          kinds, quoted_name(group.name), some_of(effects));
+    } else if (!said) {
+        in.findings.warning(place,
+                            "{} in group {}: {} would look for more items than there are, and go "
+                            "on; keep all but items out of the group",
+                            kinds, quoted_name(group.name), path_of(group.name));
+    }
+}
+
+} // namespace fptest
