@@ -6,6 +6,8 @@
 #include "module/processes.h"
 #include "module/protocol.h"
 #include "module/server.h"
+#include "plan/library_rules.h"
+#include "util/failure.h"
 
 #include <algorithm>
 #include <array>
@@ -238,10 +240,16 @@ void LibraryProcess::read_control()
         event.kind = Event::Kind::stopped;
         event.value = std::atoi(message.text.c_str());
         break;
-    default:
+    case MessageKind::plan:
         plan_ = std::move(message.text);
         has_plan_ = true;
         return;
+    case MessageKind::command:
+    case MessageKind::stop:
+    case MessageKind::read_back:
+    case MessageKind::hold:
+    case MessageKind::go_on:
+        return; // it sends none of them
     }
     events_.push_back(std::move(event));
 }
@@ -346,6 +354,43 @@ std::string LibraryProcess::take_output(off_t end)
     taken_ = end;
     fallocate(output_.get(), FALLOC_FL_PUNCH_HOLE | FALLOC_FL_KEEP_SIZE, 0, taken_);
     return text;
+}
+
+std::string gone_text(const LibraryProcess::Event &event)
+{
+    return fmt::format("the library's process ended {}; --log FILE keeps what it says", event.text);
+}
+
+int send_and_wait(LibraryProcess &library, const std::string &command)
+{
+    int vendor = 0;
+    library.command(command);
+    for (;;) {
+        const auto event = library.wait(std::chrono::seconds(1));
+        if (event && event->kind == LibraryProcess::Event::Kind::item) {
+            vendor = event->value;
+        }
+        if (event && event->kind == LibraryProcess::Event::Kind::returned) {
+            return vendor;
+        }
+        if (event && event->kind == LibraryProcess::Event::Kind::gone) {
+            throw Failure(Cause::device, "{}", gone_text(*event));
+        }
+    }
+}
+
+int ask_vendor(LibraryProcess &library)
+{
+    // a path that leads nowhere: the selector is read and told before that shows
+    const int vendor = send_and_wait(library, "XMLNodePath::-/fptest asks for the vendor/-");
+    if (!vendor_suffix(vendor)) {
+        throw Failure(Cause::device,
+                      "the vendor selector is {}, and the library runs nothing then: set "
+                      "device/SysParam/Quillmark/vendor to 0, 1 or 2 in "
+                      "/etc/vorlane/sysparms/vr_common_cfg.xml",
+                      vendor);
+    }
+    return vendor;
 }
 
 } // namespace fptest

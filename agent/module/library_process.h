@@ -125,4 +125,15 @@ class LibraryProcess
     bool has_plan_ = false;
 };
 
+// Says that the library's process has ended, and what to do.
+std::string gone_text(const LibraryProcess::Event &event);
+
+// Sends a command that runs nothing, and waits for its end. Gives the vendor that
+// the library read for it; 0 where it read none. Throws a Failure where the process ends.
+int send_and_wait(LibraryProcess &library, const std::string &command);
+
+// The vendor that the library reads; nothing is run to learn it. Throws a Failure where
+// it is none that the library runs items for.
+int ask_vendor(LibraryProcess &library);
+
 } // namespace fptest

@@ -5,7 +5,7 @@
 
 #include "module/processes.h"
 #include "module/stored_plan.h"
-#include "plan/plan.h"
+#include "plan/library_rules.h"
 #include "util/failure.h"
 #include "util/text.h"
 
@@ -13,13 +13,13 @@
 #include <chrono>
 #include <cstring>
 #include <fcntl.h>
-#include <fmt/core.h>
 #include <netinet/in.h>
 #include <sys/file.h>
 #include <sys/socket.h>
 #include <sys/stat.h>
 #include <sys/statvfs.h>
 #include <thread>
+#include <unistd.h>
 
 namespace fptest
 {
@@ -63,16 +63,6 @@ void require_room(std::size_t bytes)
     }
 }
 
-void require_stored(const std::string &found, const std::string &wanted)
-{
-    if (found != wanted) {
-        throw Failure(Cause::device,
-                      "the plan was not stored: {} of {} bytes are in {}; make room and store it "
-                      "again, or see why with --log FILE",
-                      found.size(), wanted.size(), kStoredPlan);
-    }
-}
-
 Descriptor lock_device()
 {
     Descriptor directory(open(kDataDirectory, O_RDONLY | O_DIRECTORY | O_CLOEXEC));
@@ -106,29 +96,6 @@ void require_trigger_port()
     }
 }
 
-std::string gone_text(const LibraryProcess::Event &event)
-{
-    return fmt::format("the library's process ended {}; --log FILE keeps what it says", event.text);
-}
-
-int send_and_wait(LibraryProcess &library, const std::string &command)
-{
-    int vendor = 0;
-    library.command(command);
-    for (;;) {
-        const auto event = library.wait(std::chrono::seconds(1));
-        if (event && event->kind == LibraryProcess::Event::Kind::item) {
-            vendor = event->value;
-        }
-        if (event && event->kind == LibraryProcess::Event::Kind::returned) {
-            return vendor;
-        }
-        if (event && event->kind == LibraryProcess::Event::Kind::gone) {
-            throw Failure(Cause::device, "{}", gone_text(*event));
-        }
-    }
-}
-
 void require_no_leftovers(const std::vector<std::string> &programs)
 {
     if (const auto found = process_of_any(programs)) {
@@ -137,20 +104,6 @@ void require_no_leftovers(const std::vector<std::string> &programs)
                       "this one: end it first",
                       one_line(found->first), found->second);
     }
-}
-
-int ask_vendor(LibraryProcess &library)
-{
-    // a path that leads nowhere: the selector is read and told before that shows
-    const int vendor = send_and_wait(library, "XMLNodePath::-/fptest asks for the vendor/-");
-    if (!vendor_suffix(vendor)) {
-        throw Failure(Cause::device,
-                      "the vendor selector is {}, and the library runs nothing then: set "
-                      "device/SysParam/Quillmark/vendor to 0, 1 or 2 in "
-                      "/etc/vorlane/sysparms/vr_common_cfg.xml",
-                      vendor);
-    }
-    return vendor;
 }
 
 } // namespace fptest

@@ -6,11 +6,9 @@
 #pragma once
 
 #include "common/descriptor.h"
-#include "module/library_process.h"
 
 #include <cstddef>
 #include <string>
-#include <utility>
 #include <vector>
 
 namespace fptest
@@ -22,24 +20,11 @@ void require_device();
 // That a plan of that size can be stored.
 void require_room(std::size_t bytes);
 
-// That the plan found is the one that was stored.
-void require_stored(const std::string &found, const std::string &wanted);
-
 // That nobody else runs a plan here, for as long as the descriptor is open.
 Descriptor lock_device();
 
 // That the library will be able to listen for the gatherer.
 void require_trigger_port();
-
-// The vendor that the library reads; nothing is run to learn it.
-int ask_vendor(LibraryProcess &library);
-
-// Sends a command that runs nothing, and waits for its end. Gives the vendor that
-// the library read for it; 0 where it read none.
-int send_and_wait(LibraryProcess &library, const std::string &command);
-
-// Says that the library's process has ended, and what to do.
-std::string gone_text(const LibraryProcess::Event &event);
 
 // That no program of an item is still running from an earlier run: it would report
 // into this one.

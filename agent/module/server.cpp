@@ -73,9 +73,16 @@ class Server
             case MessageKind::go_on:
                 release();
                 break;
-            default:
+            case MessageKind::read_back:
                 answer({MessageKind::plan, read_back()});
                 break;
+            case MessageKind::item:
+            case MessageKind::ended:
+            case MessageKind::connected:
+            case MessageKind::returned:
+            case MessageKind::stopped:
+            case MessageKind::plan:
+                break; // the agent sends none of them
             }
         }
         // held to the end, so that the command comes to no further item

@@ -47,6 +47,16 @@ void require_regular_plan()
     }
 }
 
+void require_stored(const std::string &found, const std::string &wanted)
+{
+    if (found != wanted) {
+        throw Failure(Cause::device,
+                      "the plan was not stored: {} of {} bytes are in {}; make room and store it "
+                      "again, or see why with --log FILE",
+                      found.size(), wanted.size(), kStoredPlan);
+    }
+}
+
 StoredPlan whole_stored_plan()
 {
     StoredPlan read;

@@ -22,6 +22,9 @@ std::optional<std::string> read_stored_plan();
 // added to "no plan is stored in ...".
 std::string require_stored_plan(const std::string &what_to_do);
 
+// Throws a Failure where the plan found is not the one that was to be stored.
+void require_stored(const std::string &found, const std::string &wanted);
+
 // Throws a Failure where something else is in its place, such as a FIFO: whoever opened
 // that could wait for ever.
 void require_regular_plan();

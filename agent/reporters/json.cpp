@@ -149,7 +149,8 @@ class JsonReport : public Listener
         Json json = event_of("end", run, place);
         json["outcome"] = word(item.outcome);
         add_report(json, item.report);
-        json["reason"] = words_or_null(item.reason);
+        json["reason"] =
+            words_or_null(item.outcome == Outcome::not_run ? why_not_all(run) : item.reason);
         json["start"] = start_of(item);
         json["seconds"] = seconds_or_null(item.seconds);
         add_end(json, item);

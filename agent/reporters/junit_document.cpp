@@ -103,18 +103,6 @@ std::string attributes(const Tests &tests)
            attribute("errors", tests.errors) + attribute("skipped", tests.skipped);
 }
 
-// Why there is no outcome of an item, or of a round.
-std::string why_not_run(const Run &run, bool was_running)
-{
-    if (run.finished) {
-        return run.why_ended.empty() ? "not run" : run.why_ended;
-    }
-    if (!run.why_unfinished.empty()) {
-        return run.why_unfinished;
-    }
-    return was_running ? "was running when this was written" : "not run yet when this was written";
-}
-
 // What is known of an item that has not passed, for readers that show no
 // properties.
 std::string details(const ItemRun &item)
@@ -142,10 +130,14 @@ std::string details(const ItemRun &item)
     return text;
 }
 
-std::string not_run(const Run &run, const std::string &reason, bool was_running)
+// There is no outcome of an item, or of a round.
+std::string not_run(const Run &run, bool was_running)
 {
+    const std::string &why = why_not_all(run);
     const std::string message =
-        attribute("message", reason.empty() ? why_not_run(run, was_running) : reason);
+        attribute("message", !why.empty()  ? why
+                             : was_running ? "was running when this was written"
+                                           : "not run yet when this was written");
     return run.finished
                ? fmt::format("      <skipped{}/>\n", message)
                : fmt::format("      <error{}{}/>\n",
@@ -158,7 +150,7 @@ std::string verdict(const Run &run, const ItemRun &item)
         return "";
     }
     if (item.outcome == Outcome::not_run) {
-        return not_run(run, item.reason, item.start.has_value());
+        return not_run(run, item.start.has_value());
     }
     const bool has_failed = item.outcome == Outcome::failed;
     return fmt::format("      <{0}{1}{2}>{3}</{0}>\n", has_failed ? "failure" : "error",
@@ -327,7 +319,7 @@ std::string junit_tail(const Run &run)
     return fmt::format("  <testsuite name=\"{0}\"{1}{2}{3}>\n    <testcase classname=\"rounds\" "
                        "name=\"{0}\"{2}>\n{4}    </testcase>\n  </testsuite>\n</testsuites>\n",
                        name_of_rest(run), attributes(tests), time_attribute(0),
-                       timestamp_attribute(run.start), not_run(run, "", false));
+                       timestamp_attribute(run.start), not_run(run, false));
 }
 
 } // namespace fptest

@@ -64,11 +64,10 @@ std::string point(bool ok, std::size_t number, const std::string &name)
     return fmt::format("{} {} - {}", ok ? "ok" : "not ok", number, tap_escaped(name));
 }
 
-std::string skipped(const Run &run, const ItemRun &item)
+std::string skipped(const Run &run)
 {
     const std::string &why = why_not_all(run);
-    const std::string &reason = item.reason.empty() ? why : item.reason;
-    return " # SKIP not run" + (reason.empty() ? "" : ": " + tap_escaped(reason));
+    return " # SKIP not run" + (why.empty() ? "" : ": " + tap_escaped(why));
 }
 
 std::string entry(const char *name, const std::string &value)
@@ -114,8 +113,8 @@ std::string item_point(const Run &run, const ItemRun &item, std::size_t number)
 {
     const bool ran = item.outcome != Outcome::not_run;
     const bool ok = !ran || item.outcome == Outcome::passed;
-    return fmt::format("{}{}{}\n{}", kIndent, point(ok, number, item.name),
-                       ran ? "" : skipped(run, item), ran ? diagnosis(item) : "");
+    return fmt::format("{}{}{}\n{}", kIndent, point(ok, number, item.name), ran ? "" : skipped(run),
+                       ran ? diagnosis(item) : "");
 }
 
 std::string suite_point(const Run &run, const Suite &suite, std::size_t number)
@@ -125,7 +124,7 @@ std::string suite_point(const Run &run, const Suite &suite, std::size_t number)
     if (suite.items.empty()) {
         text += " # SKIP nothing to run";
     } else if (counts.not_run == suite.items.size()) {
-        text += skipped(run, suite.items.front());
+        text += skipped(run);
     }
     return text + "\n";
 }

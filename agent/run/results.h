@@ -33,7 +33,7 @@ struct ItemRun {
     std::string name;
     Outcome outcome = Outcome::not_run;
     ItemReport report;
-    std::string reason; // in words, for every outcome but passed; may be empty
+    std::string reason; // in words, where it has been run and has not passed; may be empty
     std::optional<std::chrono::system_clock::time_point> start;
     std::optional<double> seconds; // how long it ran, once it has ended
     std::string output;            // what it printed: the end of it, where that is long
@@ -113,8 +113,8 @@ Counts count(const std::vector<ItemRun> &items);
 // Of all rounds. What is left of this round, and those to come, are not run.
 Counts count(const Run &run);
 
-// Whether the run is over. The second says why some of its items were not run.
 bool has_ended(const Run &run);
+// Why some of its items have not been run: nothing while it goes on.
 const std::string &why_not_all(const Run &run);
 
 // Whether it is, or was to be, of more than one round.

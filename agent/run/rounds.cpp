@@ -213,13 +213,6 @@ bool flush(const std::vector<Listener *> &listeners, Signals &signals, bool is_i
 void finish(Run &run, const std::vector<Listener *> &listeners)
 {
     summarize(run);
-    for (Suite &suite : run.suites) {
-        for (ItemRun &item : suite.items) {
-            if (item.outcome == Outcome::not_run) {
-                item.reason = why_not_all(run);
-            }
-        }
-    }
     for (Listener *listener : listeners) {
         listener->finish(run);
     }

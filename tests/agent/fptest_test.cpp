@@ -6,9 +6,11 @@
 #include "terminal_session.h"
 
 #include <algorithm>
+#include <chrono>
 #include <filesystem>
 #include <regex>
 #include <set>
+#include <thread>
 
 namespace fs = std::filesystem;
 
@@ -174,6 +176,18 @@ TEST_F(Fptest, SaysInOneLineWhyItShowsNothing)
         2,
         "fptest: /data/vorlane/src1.xml is not a whole test plan: fptest check says what is wrong",
         {"show"});
+}
+
+TEST_F(Fptest, ShowsAPlanOnceAllOfItIsWritten)
+{
+    const std::string whole = kOnePasses;
+    write_file(kPlanFile, whole.substr(0, whole.size() / 2));
+    std::thread writer([&] {
+        std::this_thread::sleep_for(std::chrono::milliseconds(200));
+        write_file(kPlanFile, whole);
+    });
+    EXPECT_EQ(run_fptest({"show"}).status, 0);
+    writer.join();
 }
 
 TEST_F(Fptest, CutsTheTableToTheTerminal)

@@ -213,6 +213,29 @@ TEST_F(ItemEnd, DeathByASignalIsAFailureWhateverWasReported)
     EXPECT_EQ(reason(1), "died by SIGABRT");
 }
 
+TEST_F(ItemEnd, DeathByASignalIsAFailureHoweverTheArgsAreWritten)
+{
+    const std::string crash = "report G 100 0 fine crash";
+    const Ended ended = run_group({{"Item", crash + " 'a b'"},
+                                   {"Other", crash + " $((1+1))"},
+                                   {"Third", crash + " 2>&amp;1"},
+                                   {"Fourth", "report G 100 0 fine"}});
+    EXPECT_EQ(ended.status, 1);
+    EXPECT_THAT(outcomes(),
+                ElementsAre("Item: failed", "Other: failed", "Third: failed", "Fourth: passed"));
+    EXPECT_EQ(reasons().at(0), "died by SIGABRT, though it reported the result 0");
+}
+
+TEST_F(ItemEnd, DeathByARealTimeSignalIsAFailure)
+{
+    run_group(
+        {{"Script", "'fptest report G Script --progress 100 --result 0; kill -40 $$'; true"}});
+    EXPECT_THAT(outcomes(), ElementsAre("Script: passed")); // the shell's end is what counts
+    run_group({{"Script", "'fptest report G Script --progress 100 --result 0; kill -40 $$'"}});
+    EXPECT_THAT(outcomes(), ElementsAre("Script: failed"));
+    EXPECT_EQ(reasons().at(0), "died by signal 40, though it reported the result 0");
+}
+
 TEST_F(ItemEnd, ExitStatusFailsAnItemWhereThatIsWanted)
 {
     const Items items = {{"Script", script(script_report("0", "fine") + "; exit 1")},
@@ -288,6 +311,22 @@ TEST_F(ItemEnd, ReportAfterTheItemsEndIsToldAndChangesNothing)
     EXPECT_EQ(late.at(0).at("description"), "too late");
     EXPECT_THAT(ended.out, HasSubstr("G/Script: late report, result 0: too late; it changes "
                                      "nothing\n"));
+}
+
+TEST_F(ItemEnd, LateReportIsToldAlsoOfLessProgressOrInTheMomentOfTheEnd)
+{
+    // that child ends before it would count as left running
+    for (const std::string late : {"0.3; fptest report G Script --progress 90",
+                                   "0.05; fptest report G Script --progress 100"}) {
+        const Ended ended =
+            run_group({{"Script", "'(sleep " + late +
+                                      " --result 1 --description late) &amp; fptest report G "
+                                      "Script --progress 100 --result 0'"},
+                       {"Item", "sleep 0.8 report G 100 0 fine"}});
+        EXPECT_THAT(outcomes(), ElementsAre("Script: passed", "Item: passed"));
+        EXPECT_THAT(ended.out,
+                    HasSubstr("G/Script: late report, result 1: late; it changes nothing\n"));
+    }
 }
 
 TEST_F(ItemEnd, WhatIsLeftRunningIsEndedBeforeTheNextRoundAndAtTheEnd)

@@ -256,6 +256,15 @@ TEST_F(Output, FileThatHasTwoNamesIsWantedByOne)
     }
 }
 
+TEST_F(Output, FileThatStandardErrorIsIsNotEmptied)
+{
+    const std::string script = "exec 2>>/tmp/scene/errors; echo before >&2\n"
+                               "exec \"$0\" run --plan \"$1\" --json /dev/stderr P/G";
+    support::run({.arguments = {"sh", "-c", script, FPTEST_PROGRAM, plan(kOnePasses)}});
+    EXPECT_EQ(read_file(work("errors")), "before\nfptest: --json /dev/stderr is standard error, "
+                                         "and would be emptied: name another file\n");
+}
+
 TEST_F(Output, ListHasNoReports)
 {
     for (const device::Lines &report :
@@ -292,6 +301,16 @@ const std::vector<device::Lines> kWithLog = {
     {"run", "P/G"},
     {"send", "pingtest"},
     {"report", "G", "Item", "--progress", "1", "--result", "0"}};
+
+TEST_F(Output, LogMayBeAFifoThatAReaderWaitsAt)
+{
+    const std::string script = "mkfifo /tmp/scene/f; cat /tmp/scene/f >/tmp/scene/log & sleep 0.2\n"
+                               "\"$0\" run --plan \"$1\" --log /tmp/scene/f P/G; wait";
+    const Ended ended =
+        support::run({.arguments = {"sh", "-c", script, FPTEST_PROGRAM, plan(kOnePasses)}});
+    EXPECT_THAT(ended.out, HasSubstr("1 passed"));
+    EXPECT_THAT(read_file(work("log")), HasSubstr("fptest_ItemsTest"));
+}
 
 TEST_F(Output, LogIsNeverTheStoredPlan)
 {

@@ -80,7 +80,7 @@ inline RunOfItems mixed_run()
                                   item("QuietRun", Outcome::no_result, "it reported nothing")}),
                 suite("Endurance", {item("Slow", Outcome::timed_out, "stopped after 5 s"),
                                     item("BurnIn", Outcome::stopped, "interrupted by Ctrl-C"),
-                                    item("Last", Outcome::not_run, "interrupted by Ctrl-C")})});
+                                    item("Last", Outcome::not_run)})});
     run.finished = false;
     run.why_unfinished = "interrupted by Ctrl-C";
     return run;

@@ -106,7 +106,7 @@ inline RunOfItems run_with(const std::string &text)
     ItemRun one = item(text, Outcome::failed, text);
     one.report = {text, text, false, text};
     one.output = text;
-    RunOfItems run = run_of({suite(text, {one, item("b", Outcome::not_run, text)})});
+    RunOfItems run = run_of({suite(text, {one, item("b", Outcome::not_run)})});
     run.plan = text;
     run.finished = false;
     run.why_unfinished = text;

@@ -40,7 +40,7 @@ RunOfItems two_items(std::optional<int> rounds)
 // Interrupted before its second item.
 RunOfItems interrupted(RunOfItems run)
 {
-    run.suites[1].items[0] = item("b", Outcome::not_run, "interrupted by SIGTERM");
+    run.suites[1].items[0] = item("b", Outcome::not_run);
     run.suites[1].items[0].group = "H";
     run.finished = false;
     run.why_unfinished = "interrupted by SIGTERM";

@@ -6,6 +6,9 @@
 #include "run_test.h"
 
 #include <filesystem>
+#include <sys/stat.h>
+#include <unistd.h>
+#include <utility>
 
 namespace fs = std::filesystem;
 
@@ -27,6 +30,13 @@ class Refusal : public Run
         EXPECT_EQ(ended.err, line + "\n");
         EXPECT_THAT(programs_run(), IsEmpty());
         EXPECT_FALSE(is_there("order"));
+    }
+    // What fptest says with a file as its standard input.
+    static std::string errors_reading(const std::string &file, Lines arguments)
+    {
+        arguments.insert(arguments.begin(),
+                         {"sh", "-c", "exec \"$@\" <" + file, "-", FPTEST_PROGRAM});
+        return support::run({.arguments = std::move(arguments)}).err;
     }
 
     static void expect(int status, const std::string &line, Lines arguments)
@@ -132,6 +142,72 @@ TEST_F(Refusal, WithoutAPlan)
            {"P/G"});
     expect(2, "fptest: /tmp/scene/none.xml: No such file or directory",
            {"--plan", work("none.xml"), "P/G"});
+}
+
+TEST_F(Refusal, OfAFifoOrADirectoryInPlaceOfTheStoredPlan)
+{
+    const std::string path = plan(kOnePasses);
+    for (const auto &make : {mkfifo, mkdir}) {
+        std::filesystem::remove(kPlanFile);
+        ASSERT_EQ(make(kPlanFile, 0700), 0);
+        for (const device::Lines &arguments :
+             {device::Lines{"run", "--plan", path, "P/G"},
+              {"run", "P/G"},
+              {"run", "--list"},
+              {"send", "pingtest"},
+              {"show"},
+              {"report", "G", "Item", "--progress", "1", "--result", "0"}}) {
+            expect_refusal(3, "fptest: /data/vorlane/src1.xml is not a regular file: remove it",
+                           arguments);
+        }
+    }
+    std::filesystem::remove(kPlanFile);
+}
+
+TEST_F(Refusal, OfAPathThatTheLibraryWouldCut)
+{
+    const std::string path = std::string(2100, 'r') + "/G/Item";
+    expect_refusal(2, "fptest: a path of 2107 bytes is cut at 2047: name the root with less",
+                   {"run", "--plan", plan(kOnePasses), path});
+}
+
+TEST_F(Refusal, OfAnEmptyNameForAFile)
+{
+    for (const std::string option : {"--plan", "--json", "--junit", "--log"}) {
+        expect_refusal(2, "fptest: " + option + ": its value is empty; see fptest run --help",
+                       {"run", option, "", "P/G"});
+    }
+    for (const std::string command : {"check", "show"}) {
+        expect_refusal(2, "fptest: FILE: its value is empty; see fptest " + command + " --help",
+                       {command, ""});
+    }
+}
+
+TEST_F(Refusal, OfOneFileForTwoThings)
+{
+    const std::string plan_file = plan(kOnePasses);
+    expect_refusal(
+        2,
+        "fptest: --json and --junit both want the file " + work("out") +
+            ": give them files of their own",
+        {"run", "--plan", plan_file, "--json", work("out"), "--junit", work("out"), "P/G"});
+    expect_refusal(2,
+                   "fptest: --plan and --json both want the file " + plan_file +
+                       ": give them files of their own",
+                   {"run", "--plan", plan_file, "--json", plan_file, "P/G"});
+    const std::string want =
+        " both want the file " + plan_file + ": give them files of their own\n";
+    for (const std::string option : {"--json", "--junit", "--log"}) {
+        EXPECT_EQ(errors_reading(plan_file, {"run", "--plan", "-", option, plan_file, "P/G"}),
+                  "fptest: --plan and " + option + want);
+    }
+    EXPECT_EQ(errors_reading(plan_file, {"send", "-0", "--log", plan_file}),
+              "fptest: standard input and --log" + want);
+    EXPECT_EQ(read_file(plan_file), kOnePasses);
+    EXPECT_EQ(run_fptest({"run", "--plan", plan_file, "--json", "/dev/null", "--junit", "/dev/null",
+                          "P/G"})
+                  .status,
+              0);
 }
 
 TEST_F(Refusal, OfOneFifoForTwoReports)
@@ -242,6 +318,30 @@ TEST_F(Refusal, WhereAReportCannotBeWritten)
     expect(3,
            "fptest: --log /dev/full cannot be written: No space left on device; name another file",
            {"--log", "/dev/full", "--plan", path, "P/Bringup"});
+}
+
+TEST_F(Refusal, WhereAReportIsFullStoresNothing)
+{
+    write_file(kPlanFile, kOnePasses);
+    for (const bool is_long : {false, true}) {
+        const std::string other = plan("<P about=\"" + std::string(is_long ? 3000 : 1, 'x') +
+                                       "\"><CmdGroup name=\"Other\">"
+                                       "<Cmd name=\"Item\" args=\"\"/></CmdGroup></P>");
+        const Ended ended = run_fptest({"run", "--json", "/dev/full", "--plan", other, "P/Other"});
+        EXPECT_EQ(ended.status, 3);
+        EXPECT_THAT(ended.err, HasSubstr("No space left on device; nothing was run"));
+        EXPECT_EQ(read_file(kPlanFile), kOnePasses);
+    }
+}
+
+TEST_F(Refusal, BesideAnItemOfAnEarlierRun)
+{
+    const pid_t left = start_program({"/system/bin/Item", "sleep", "60"});
+    expect_refusal(3,
+                   "fptest: /system/bin/Item of an earlier run is still running, as process " +
+                       std::to_string(left) + ", and would report into this one: end it first",
+                   {"run", "--plan", plan(kOnePasses), "P/G"});
+    EXPECT_NE(access(kPlanFile, F_OK), 0);
 }
 
 TEST_F(Refusal, OfASecondRunAtTheSameTime)

@@ -5,10 +5,13 @@
 // print.
 #include "run_test.h"
 
+#include <csignal>
 #include <fcntl.h>
 #include <filesystem>
+#include <optional>
 #include <sys/stat.h>
 #include <unistd.h>
+#include <vector>
 
 namespace fs = std::filesystem;
 
@@ -163,6 +166,19 @@ TEST_F(Run, KeepsApartWhatItemsPrintThoughItComesLate)
     EXPECT_EQ(output(3), "four\n");
 }
 
+// As "> /dev/stderr" does: the file is no pipe.
+TEST_F(Run, KeepsWhatIsPrintedAfterAnItemHasTruncatedItsOutput)
+{
+    run_group(
+        {{"Item", "flood 30000"},
+         {"Script", "'echo before; sleep 0.2; echo checking >/dev/stderr; sleep 0.2; echo after'"},
+         {"Other", "say other sleep 0.2 complain again"},
+         {"Third", "flood 60000"}});
+    EXPECT_EQ(output(1), "before\nchecking\nafter\n");
+    EXPECT_EQ(output(2), "other\nagain\n");
+    EXPECT_THAT(output(3), StartsWith("line 1\nline 2\n"));
+}
+
 TEST_F(Run, KeepsTheEndOfALongOutput)
 {
     const Ended ended = run_group(
@@ -255,6 +271,60 @@ TEST_F(Run, GoesOnWithoutAReportThatCannotBeWrittenAnyMore)
     EXPECT_EQ(ended.status, 3);
     EXPECT_EQ(ended.err, "fptest: /tmp/scene/json: Broken pipe; the run went on all the same\n");
     EXPECT_THAT(ended.out, HasSubstr("\n2 passed, 0 failed, "));
+}
+
+TEST_F(Run, NamesEveryReportThatFailsThoughTheRunIsInterrupted)
+{
+    for (const int signal : {0, SIGINT}) {
+        std::vector<Descriptor> readers;
+        for (const std::string name : {"json", "junit"}) {
+            unlink(work(name).c_str());
+            ASSERT_EQ(mkfifo(work(name).c_str(), 0600), 0);
+            readers.emplace_back(open(work(name).c_str(), O_RDONLY | O_NONBLOCK | O_CLOEXEC));
+        }
+        const std::string text = device::group_of(
+            {{"Item", "note /tmp/scene/begun await /tmp/scene/go report G 100 0 x"}});
+        FptestProcess fptest(
+            {"run", "--json", work("json"), "--junit", work("junit"), "--plan", plan(text), "P/G"});
+        ASSERT_TRUE(wait_for_file("begun"));
+        readers.clear();
+        signal == 0 ? static_cast<void>(file("go", "")) : fptest.signal(signal);
+        const Ended ended = fptest.wait();
+        EXPECT_EQ(ended.status, signal == 0 ? 3 : 130);
+        EXPECT_THAT(ended.err, HasSubstr(work("json") + ": Broken pipe"));
+        EXPECT_THAT(ended.err, HasSubstr(work("junit") + ": Broken pipe"));
+        unlink(work("go").c_str());
+        unlink(work("begun").c_str());
+    }
+}
+
+// The run of the plan, with these options, where no file may be longer than so many
+// blocks of 512 bytes.
+Ended run_with_limit(int blocks, const std::string &options)
+{
+    support::Start start;
+    start.arguments = {"/system/bin/sh", "-c",
+                       "ulimit -f " + std::to_string(blocks) + "; exec fptest run --quiet " +
+                           options + " --plan /tmp/scene/plan.xml P/G"};
+    start.environment = {{"VR_LOG_FILE", std::nullopt}}; // items write to it
+    return support::run(start);
+}
+
+TEST_F(Run, CountsNoOutputOfEarlierItemsAgainstTheLimitOfFiles)
+{
+    plan(device::plan_of({{"G",
+                           {{"Script", "'head -c 12000 /dev/zero; fptest report G Script "
+                                       "--progress 100 --result 0'"}}}}));
+    EXPECT_EQ(run_with_limit(60, "--repeat 4").status, 0);
+}
+
+TEST_F(Run, GoesOnWhereAReportIsTooLongForTheLimitOfFiles)
+{
+    plan(kOnePasses);
+    const Ended ended = run_with_limit(2, "--repeat 20 --json /tmp/scene/json");
+    EXPECT_EQ(ended.status, 3);
+    EXPECT_THAT(ended.err, EndsWith("fptest: /tmp/scene/json: File too large; the run "
+                                    "went on all the same\n"));
 }
 
 } // namespace

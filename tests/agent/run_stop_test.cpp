@@ -345,4 +345,13 @@ TEST_F(Run, LosesTheRestOfAGroupsCommandInWhichTheLibrarysProcessEnded)
                                "signal 9; --log FILE keeps what it says");
 }
 
+TEST_F(Run, GoesOnWhereTheLibrarysProcessIsSuspendedBetweenTwoItems)
+{
+    const std::string path =
+        plan(group_of({{"Item", "report G 100 0 fine; (sleep 0.02; kill -STOP $PPID) &amp;"},
+                       {"Other", "report G 100 0 fine"}}));
+    EXPECT_THAT(run_fptest({"run", "--plan", path, "--timeout", "1", "P/G"}).out,
+                HasSubstr("2 passed"));
+}
+
 } // namespace

@@ -426,6 +426,46 @@ TEST_F(Run, RepairsAPlanThatAReportMadeUnloadableForTheNextItem)
 
 // --- what would be run ---------------------------------------------------------------
 
+TEST_F(Run, LosesNoReportThatComesAfterOneThatSpoilsThePlan)
+{
+    run_group(
+        {{"Script", "'/system/bin/Item report-null G 100 0; fptest report G Script --progress "
+                    "100 --result 1 --description dead'"},
+         {"Item", "report G 100 0 fine"}});
+    EXPECT_THAT(outcomes(), ElementsAre("Script: failed", "Item: passed"));
+    EXPECT_EQ(description(0), "dead");
+}
+
+TEST_F(Run, TellsAReportThatGoesIntoAnItemBeforeItsOwn)
+{
+    const Ended ended = run_group({{"Item", "report G 100 0 fine"},
+                                   {"Script", "'fptest report G Item --progress 100 --result 1 "
+                                              "--description pasted'"}});
+    EXPECT_THAT(outcomes(), ElementsAre("Item: passed", "Script: no result"));
+    EXPECT_THAT(ended.out,
+                HasSubstr("G/Item: late report, result 1: pasted; it changes nothing\n"));
+}
+
+TEST_F(Run, EndsWhereTheStoredPlanIsGone)
+{
+    const std::string text = group_of(
+        {{"Item", "sleep 0; rm /data/vorlane/src1.xml"}, {"Other", "report G 100 0 fine"}});
+    const Ended ended = run_fptest({"run", "--json", work("json"), "--plan", plan(text), "P/G"});
+    EXPECT_EQ(ended.status, 3);
+    EXPECT_EQ(ended.err, "fptest: the plan has warnings: see fptest check /tmp/scene/plan.xml\n"
+                         "fptest: the stored plan /data/vorlane/src1.xml is gone, or not whole any "
+                         "more: store it again\n");
+    EXPECT_THAT(outcomes(), ElementsAre("Item: no result", "Other: not run"));
+}
+
+TEST_F(Run, LeavesNoMarksOfItsOwnInThePlan)
+{
+    ASSERT_EQ(run_fptest({"run", "--plan", plan(kOnePasses), "P/G"}).status, 0);
+    ASSERT_EQ(run_fptest({"run", "--repeat", "3", "P/G"}).status, 0);
+    EXPECT_THAT(read_file(kPlanFile), Not(HasSubstr("fptest-run")));
+    EXPECT_THAT(read_file(kPlanFile), HasSubstr("description=\"fine\""));
+}
+
 TEST_F(Run, ListsWhatWouldBeRunAndLeavesEverythingAsItIs)
 {
     const std::string stored = plan_of({{"Old", {{"Item", "note /tmp/scene/order"}}}});

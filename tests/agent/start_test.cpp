@@ -113,4 +113,15 @@ TEST_F(Started, SignalsThatAreIgnoredStayIgnored)
     }
 }
 
+TEST_F(Started, EndsOfChildrenThatAreIgnoredAreKnownAllTheSame)
+{
+    plan(group_of({{"Item", "report G 100 0 fine; kill -SEGV $$"}}));
+    support::Start start;
+    start.arguments = {FPTEST_PROGRAM, "run", "--plan", work("plan.xml"), "P/G"};
+    start.prepare = [] { std::signal(SIGCHLD, SIG_IGN); };
+    const support::Ended ended = support::run(start);
+    EXPECT_EQ(ended.status, 1);
+    EXPECT_THAT(ended.out, HasSubstr("G/Item: failed, result 0, died by SIGSEGV"));
+}
+
 } // namespace

@@ -580,14 +580,4 @@ TEST(Faults, EachCallOfThePlatformFailsOnce)
     EXPECT_THAT(outcome.findings, IsEmpty());
 }
 
-TEST(Faults, AMaskThatCannotBePutBackInTheChildDoesNotKeepItFromTheShell)
-{
-    internals::reset();
-    platform::reset();
-    platform::plan_steps("vfork", {gives(0)});
-    platform::plan_steps("sigprocmask", {platform::pass(), gives(-1, EINVAL)});
-    platform::run_child([] { internals::mysystem("a command"); });
-    EXPECT_THAT(platform::events(), ElementsAreArray(sequences::launched("a command")));
-}
-
 } // namespace

@@ -3,6 +3,11 @@
 
 // How the events of a step with a fault, or after one, differ from those of the
 // same step in the run without a fault.
+//
+// This says again what the library does when a call fails, because no rule that holds for
+// every fault tells a wrong answer to one from the right one. Without it nothing here would
+// notice a launch that leaves signals blocked, a read-back that gives up at the first
+// failure, an item that is started twice, or any failure that is told wrongly or not at all.
 #pragma once
 
 #include "cycle.h"

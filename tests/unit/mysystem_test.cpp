@@ -81,6 +81,13 @@ TEST_F(Launcher, ChildRestoresTheMaskRunsTheShellUnchangedAndExitsWhenThatFails)
     }
 }
 
+TEST_F(Launcher, ChildRunsTheShellThoughItsMaskCannotBePutBack)
+{
+    plan_steps("sigprocmask", {platform::pass(), gives(-1, EINVAL)});
+
+    EXPECT_EQ(child("true"), launched("true"));
+}
+
 TEST_F(Launcher, NextLaunchStartsAnew)
 {
     plan_steps("waitpid", {gives(100), gives(0)});
