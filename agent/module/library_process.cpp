@@ -133,7 +133,7 @@ void LibraryProcess::go_on()
 
 ChildProcesses LibraryProcess::processes() const
 {
-    return {leader_, pid_ > 0 ? pid_ : getpid()};
+    return {leader_, pid_ > 0 ? pid_ : getpid(), vendor_};
 }
 
 void LibraryProcess::restart()
@@ -222,6 +222,7 @@ void LibraryProcess::read_control()
     case MessageKind::item:
         event = with_moment(Event::Kind::item, message.text);
         event.value = std::atoi(event.text.c_str());
+        vendor_ = event.value;
         break;
     case MessageKind::ended: {
         event = with_moment(Event::Kind::ended, message.text);

@@ -119,6 +119,7 @@ class LibraryProcess
     Descriptor control_{-1};
     Descriptor output_{-1};
     bool holds_ = false;
+    int vendor_ = 0; // of the item that the library came to last
     off_t taken_ = 0;
     std::deque<Event> events_;
     std::string plan_;

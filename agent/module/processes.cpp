@@ -3,13 +3,14 @@
 
 #include "module/processes.h"
 
-#include "plan/plan.h"
+#include "plan/library_rules.h"
 #include "util/files.h"
 
 #include <algorithm>
 #include <charconv>
 #include <csignal>
 #include <cstdlib>
+#include <cstring>
 #include <filesystem>
 #include <fmt/core.h>
 #include <map>
@@ -27,7 +28,8 @@ struct Process {
     char state = '?';
     std::string program; // as it was started, or the kernel's name for it
     std::string name;    // without the path
-    std::string script;  // its first argument, without the path: of a script its name
+    std::string script;  // that a shell runs, as it was started
+    bool gathers = false;
 };
 
 using Processes = std::map<pid_t, Process>;
@@ -54,8 +56,12 @@ std::optional<Process> read_process(const std::filesystem::path &directory)
     const std::string command = arguments.c_str();
     process.program = command.empty() ? stat.substr(open + 1, close - open - 1) : command;
     process.name = last_part(process.program);
-    if (arguments.size() > command.size() + 1) {
-        process.script = last_part(arguments.c_str() + command.size() + 1);
+    if (process.name.ends_with("sh")) {
+        std::size_t at = command.size() + 1;
+        while (at < arguments.size() && arguments[at] == '-') { // its options
+            at += std::strlen(&arguments[at]) + 1;
+        }
+        process.script = at < arguments.size() ? &arguments[at] : "";
     }
     return process;
 }
@@ -98,14 +104,27 @@ bool lives(const Process &process)
     return process.state != 'Z' && process.state != 'X';
 }
 
-// By its name: a script is its shell's first argument. Vendor 2's is an item like
-// any other.
-bool is_named_gatherer(const Process &process)
+// All but the ancestor and what that comes of: fptest's caller may have any name. Where
+// the vendor was another one, an earlier run may have left its gatherer, which the
+// library finds.
+Processes read_processes(pid_t ancestor, int vendor)
 {
-    const auto matches = [](const std::string &name) {
-        return name.starts_with(kGatherer) && !name.ends_with("_qsee");
-    };
-    return matches(process.name) || (matches(process.script) && process.name.ends_with("sh"));
+    Processes processes = read_processes();
+    for (auto found = processes.find(ancestor); found != processes.end();) {
+        const pid_t parent = found->second.parent;
+        processes.erase(found);
+        found = processes.find(parent);
+    }
+    for (const int one : {0, 1}) {
+        const std::string program = program_of(kGatherer, *vendor_suffix(one));
+        for (auto &[pid, process] : processes) {
+            if ((process.program == program || process.script == program) &&
+                (one == vendor || !is_below(processes, pid, ancestor))) {
+                process.gathers = true;
+            }
+        }
+    }
+    return processes;
 }
 
 // Whether that holds for a process, or for one that it comes of.
@@ -125,12 +144,6 @@ bool comes_of(const Processes &processes, pid_t pid, const Predicate &predicate)
     return false;
 }
 
-bool comes_of_gatherer(const Processes &processes, pid_t pid)
-{
-    return comes_of(processes, pid,
-                    [](const auto &entry) { return is_named_gatherer(entry.second); });
-}
-
 bool comes_of_any(const Processes &processes, pid_t pid, const std::vector<Leftover> &others)
 {
     return comes_of(processes, pid, [&](const auto &entry) {
@@ -140,7 +153,17 @@ bool comes_of_any(const Processes &processes, pid_t pid, const std::vector<Lefto
     });
 }
 
+bool comes_of_gatherer(const Processes &processes, pid_t pid)
+{
+    return comes_of(processes, pid, [](const auto &entry) { return entry.second.gathers; });
+}
+
 } // namespace
+
+bool is_taken_for_gatherer(const Leftover &process)
+{
+    return process.name.starts_with(kGatherer);
+}
 
 bool runs_below(pid_t ancestor, const std::vector<std::string> &items)
 {
@@ -179,10 +202,21 @@ process_of_any(const std::vector<std::string> &programs)
     return std::nullopt;
 }
 
+std::optional<std::pair<std::string, pid_t>> taken_for_gatherer()
+{
+    const std::string program = program_of(kGatherer, "");
+    for (const auto &[pid, process] : read_processes()) {
+        if (lives(process) && process.program.starts_with(program)) {
+            return std::pair(process.program, pid);
+        }
+    }
+    return std::nullopt;
+}
+
 std::vector<Leftover> ChildProcesses::of_items(const std::vector<Leftover> &left_out) const
 {
     std::vector<Leftover> all;
-    const Processes processes = read_processes();
+    const Processes processes = read_processes(ancestor_, vendor_);
     for (const auto &[pid, process] : processes) {
         if (lives(process) && pid != library_ && process.group != library_ &&
             is_below(processes, pid, ancestor_) && !comes_of_gatherer(processes, pid) &&
@@ -195,7 +229,7 @@ std::vector<Leftover> ChildProcesses::of_items(const std::vector<Leftover> &left
 
 void ChildProcesses::signal_all(int signal) const
 {
-    const Processes processes = read_processes();
+    const Processes processes = read_processes(ancestor_, vendor_);
     for (const auto &[pid, process] : processes) {
         if (lives(process) && pid != library_ &&
             (is_below(processes, pid, ancestor_) || comes_of_gatherer(processes, pid))) {
@@ -221,7 +255,7 @@ bool ChildProcesses::has_gatherer() const
 std::vector<Leftover> ChildProcesses::of_gatherer() const
 {
     std::vector<Leftover> all;
-    const Processes processes = read_processes();
+    const Processes processes = read_processes(ancestor_, vendor_);
     for (const auto &[pid, process] : processes) {
         if (lives(process) && pid != library_ &&
             (comes_of_gatherer(processes, pid) ||

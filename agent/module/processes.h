@@ -21,6 +21,11 @@ struct Leftover {
     pid_t group = 0; // of processes
 };
 
+// Whether the library finds it where it looks for a running gatherer; and one that it
+// finds, by its whole path.
+bool is_taken_for_gatherer(const Leftover &process);
+std::optional<std::pair<std::string, pid_t>> taken_for_gatherer();
+
 // Whether one is running that a stop finds by one of the items' names: ps is
 // asked for the first characters of it.
 bool runs_below(pid_t ancestor, const std::vector<std::string> &items);
@@ -39,7 +44,8 @@ class ChildProcesses
   public:
     // The library's process, which leads its own process group, and the one that
     // inherits what it leaves behind when it dies; they may be the same.
-    ChildProcesses(pid_t library, pid_t ancestor) : library_(library), ancestor_(ancestor)
+    ChildProcesses(pid_t library, pid_t ancestor, int vendor)
+        : library_(library), ancestor_(ancestor), vendor_(vendor)
     {
     }
 
@@ -61,6 +67,7 @@ class ChildProcesses
   private:
     pid_t library_;
     pid_t ancestor_;
+    int vendor_; // by which the gatherer has its name
 };
 
 // Sends them a signal. False where none of them is there.

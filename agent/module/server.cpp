@@ -143,8 +143,9 @@ class Server
     void tell_item(const std::string &line)
     {
         const auto number = line.find_first_of("-0123456789");
-        answer({MessageKind::item,
-                moment() + (number == std::string::npos ? "0" : line.substr(number))});
+        const std::string vendor = number == std::string::npos ? "0" : line.substr(number);
+        vendor_ = std::atoi(vendor.c_str());
+        answer({MessageKind::item, moment() + vendor});
     }
 
     // Where that is wanted, the library is held until the agent has read what the item
@@ -219,10 +220,10 @@ class Server
 
     // Again and again, because a script may just be starting another program; and
     // in the end without asking.
-    static void end_items()
+    void end_items() const
     {
         using namespace std::chrono_literals;
-        const ChildProcesses processes(getpid(), getpid());
+        const ChildProcesses processes(getpid(), getpid(), vendor_);
         const auto limit = std::chrono::steady_clock::now() + kGrace;
         processes.signal_all(SIGCONT); // the run may have been suspended
         while (signal_each(processes.of_items(),
@@ -282,6 +283,7 @@ class Server
     std::thread command_;
     std::vector<std::string> items_;
     std::atomic<bool> busy_ = false;
+    std::atomic<int> vendor_ = 0; // of the item that the library came to last
 };
 
 void move_descriptor(int from, int to)

@@ -309,12 +309,14 @@ void Runner::make_way_for(const Job &job)
         return target && is_gatherer(run_.suites[job.suite].items[target->item].name, vendor_);
     };
     if (std::ranges::any_of(job.targets, is_gatherers)) {
+        if (std::ranges::any_of(library_.processes().of_items(), is_taken_for_gatherer)) {
+            end_left_running(); // the library would start no gatherer beside it
+        }
         reader_.note_gathered(read_stored_plan().value_or(""));
         // the library does not find one that is a script, and would start another beside it
         const std::vector<Leftover> running = library_.processes().of_gatherer();
-        const bool is_found = std::ranges::any_of(
-            running, [](const Leftover &one) { return one.name.starts_with(kGatherer); });
-        if (gatherer_may_report_late_ || (!running.empty() && !is_found)) {
+        if (gatherer_may_report_late_ ||
+            (!running.empty() && std::ranges::none_of(running, is_taken_for_gatherer))) {
             end_gatherer();
         }
         gatherer_runs_ = library_.processes().has_gatherer();

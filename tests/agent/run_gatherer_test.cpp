@@ -311,6 +311,39 @@ TEST_F(RunGatherer, MayHaveTakenTheReportOfAnItemThatSeemsToHaveNone)
               "reported"));
 }
 
+TEST_F(RunGatherer, IsNoItemWhoseNameBeginsAsItsOwn)
+{
+    run_group({{"SensorProbe2", "ignore-stop sleep 30"},
+               {"Item", "report G 100 0 fine; /system/bin/SensorProbe2 sleep 60 &amp;"}},
+              {"--timeout", "0.5", "--grace", "0.3"});
+    EXPECT_THAT(outcomes(), ElementsAre("SensorProbe2: timed out", "Item: passed"));
+    EXPECT_THAT(reasons().at(0), StartsWith("killed after "));
+    EXPECT_THAT(end_of(1).at("left_running"), SizeIs(1));
+    EXPECT_THAT(processes_named("/system/bin/SensorProbe2"), IsEmpty());
+}
+
+TEST_F(RunGatherer, IsStartedThoughAnItemLeftAProcessWhoseNameBeginsAsItsOwn)
+{
+    const Items items = {{"Item", "report G 100 0 fine; /system/bin/SensorProbe2 sleep 60 &amp;"},
+                         {"SensorProbe", "--group G --seconds 0.1"}};
+    run_group(items, {"--as-group"});
+    EXPECT_THAT(outcomes(), ElementsAre("Item: passed", "SensorProbe: no result"));
+    EXPECT_THAT(reasons().at(1), StartsWith("the gatherer ended before it connected, or the "
+                                            "library took /system/bin/SensorProbe2 (pid "));
+    run_group(items);
+    EXPECT_THAT(outcomes(), ElementsAre("Item: passed", "SensorProbe: passed"));
+}
+
+TEST_F(RunGatherer, IsNotTheScriptThatRunsFptest)
+{
+    Lines words = with_group({{"SensorProbe", "--group G --seconds 0.1"}});
+    words.insert(words.begin(),
+                 {"sh", file("SensorProbe_bringup.sh", "\"$@\" && echo goes on"), FPTEST_PROGRAM});
+    const Ended ended = support::run({.arguments = words});
+    EXPECT_EQ(ended.status, 0) << ended.err;
+    EXPECT_THAT(ended.out, EndsWith("goes on\n"));
+}
+
 TEST_F(RunGatherer, IsWaitedForNoLongerOnceItHasReportedAResultThatThePlanHasNoTextFor)
 {
     const Gatherer gatherer("gather report G 100 7 seven sleep 60");
