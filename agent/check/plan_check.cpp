@@ -22,17 +22,18 @@ std::size_t root_of(const Plan &plan)
     return found != elements.end() ? plan.number(*found) : 0;
 }
 
-void check_items(const PlanCheck &in, const Group &group, ProgramChecker &programs)
+void check_items(const PlanCheck &in, const Elements &elements, const Group &group,
+                 ShellChecker &shell)
 {
     std::unordered_map<std::string, std::size_t> firsts;
     for (const Item &item : group.items) {
         const auto [first, is_first] = firsts.try_emplace(item.name, item.number);
         check_item_name(in, group, item, is_first ? nullptr : &first->second);
-        programs.check(item);
+        check_program(in, item, elements.item_names, shell);
     }
     for (const Item &item : group.nested) {
         check_nested(in, group, item);
-        programs.check(item);
+        check_program(in, item, elements.item_names, shell);
     }
 }
 
@@ -43,7 +44,7 @@ void check_plan(const CheckedPlan &read, const Plan &plan, Findings &findings)
     const SourceMap places(read.text, read.tags, plan);
     const PlanCheck in{plan, places, findings};
     Elements elements = elements_of(plan);
-    ProgramChecker programs(in, elements.item_names);
+    ShellChecker shell(in);
     check_tags(in);
     if (elements.groups.empty()) {
         findings.error(places.of(root_of(plan)),
@@ -53,13 +54,13 @@ void check_plan(const CheckedPlan &read, const Plan &plan, Findings &findings)
     }
     for (Group &group : elements.groups) {
         group.found = check_group_name(in, group);
-        check_items(in, group, programs);
+        check_items(in, elements, group, shell);
     }
     for (const Item &item : elements.stray) {
         findings.error(places.of(item.number),
                        "{} is in no group: no node path leads to it; put it into a <CmdGroup>",
                        words_for(item));
-        programs.check(item);
+        check_program(in, item, elements.item_names, shell);
     }
     for (const Group &group : elements.groups) {
         if (group.found) {

@@ -25,23 +25,9 @@ bool check_group_name(const PlanCheck &in, const Group &group);
 void check_item_name(const PlanCheck &in, const Group &group, const Item &item,
                      const std::size_t *first);
 
-// What the library and the shell make of the name and the args of an item.
-class ProgramChecker
-{
-  public:
-    // The names are those of all items.
-    ProgramChecker(const PlanCheck &in, const std::unordered_set<std::string> &names);
-
-    void check(const Item &item);
-
-  private:
-    void check_vendors(const Item &item);
-    void check_command_line(const Item &item);
-
-    const PlanCheck in_;
-    const std::unordered_set<std::string> &names_;
-    ShellChecker shell_checker_;
-};
+// What the library and the shell make of an item's name and args.
+void check_program(const PlanCheck &in, const Item &item,
+                   const std::unordered_set<std::string> &item_names, ShellChecker &shell);
 
 // An item in another element of its group.
 void check_nested(const PlanCheck &in, const Group &group, const Item &item);

@@ -34,63 +34,39 @@ std::optional<VendorName> vendor_name(std::string_view name)
     return std::nullopt;
 }
 
-} // namespace
-
-ProgramChecker::ProgramChecker(const PlanCheck &in, const std::unordered_set<std::string> &names)
-    : in_(in), names_(names), shell_checker_(in)
-{
-}
-
-void ProgramChecker::check(const Item &item)
+void check_vendors(const PlanCheck &in, const Item &item,
+                   const std::unordered_set<std::string> &item_names)
 {
     const std::string &name = item.name;
-    if (name.empty()) {
-        return;
-    }
-    if (name.size() > kStopLimit && name.size() <= kNameLimit) {
-        in_.findings.warning(in_.places.of(item.number, "name"),
-                             "item {} may not be found to be stopped: ps is asked for the first "
-                             "{} of the {} bytes of its name, and finds another or none; shorten "
-                             "it",
-                             quoted_name(name), kStopLimit, name.size());
-    }
-    shell_checker_.check(item);
-    check_vendors(item);
-    check_command_line(item);
-}
-
-void ProgramChecker::check_vendors(const Item &item)
-{
-    const std::string &name = item.name;
-    const std::size_t place = in_.places.of(item.number, "name");
+    const std::size_t place = in.places.of(item.number, "name");
     const auto vendor = vendor_name(name);
     if (name == std::string(kGatherer) + "_qsee" || (vendor && vendor->name == kGatherer)) {
-        in_.findings.warning(place,
-                             "item {} is not the gatherer: that is '{}', to which the library "
-                             "adds the vendor's suffix; leave it out",
-                             quoted_name(name), kGatherer);
-    } else if (vendor && names_.contains(vendor->name)) {
-        in_.findings.warning(place,
-                             "item {0} would be run as {1} under vendor {2}, and item {3} as {0}; "
-                             "rename one",
-                             quoted_name(name), quoted_name(name + vendor->suffix), vendor->vendor,
-                             quoted_name(vendor->name));
+        in.findings.warning(place,
+                            "item {} is not the gatherer: that is '{}', to which the library "
+                            "adds the vendor's suffix; leave it out",
+                            quoted_name(name), kGatherer);
+    } else if (vendor && item_names.contains(vendor->name)) {
+        in.findings.warning(place,
+                            "item {0} would be run as {1} under vendor {2}, and item {3} as {0}; "
+                            "rename one",
+                            quoted_name(name), quoted_name(name + vendor->suffix), vendor->vendor,
+                            quoted_name(vendor->name));
     } else if (vendor) {
-        in_.findings.warning(place,
-                             "item {} would be run as {} under vendor {}: the library adds the "
-                             "suffix; leave it out",
-                             quoted_name(name), quoted_name(name + vendor->suffix), vendor->vendor);
+        in.findings.warning(place,
+                            "item {} would be run as {} under vendor {}: the library adds the "
+                            "suffix; leave it out",
+                            quoted_name(name), quoted_name(name + vendor->suffix), vendor->vendor);
     }
 }
 
-void ProgramChecker::check_command_line(const Item &item)
+void check_command_line(const PlanCheck &in, const Item &item)
 {
     if (!item.args) {
         const std::string line = command_line(item.name, std::nullopt, "");
-        in_.findings.error(in_.places.of(item.number),
-                           "item {} has no args: its command line would be {}, which the shell "
-                           "refuses; add args=\"\"",
-                           quoted_name(item.name), quoted_name(line));
+        in.findings.error(in.places.of(item.number),
+                          "item {} has no args: its command line would be {}, which the shell "
+                          "refuses; add args=\"\"",
+                          quoted_name(item.name), quoted_name(line));
         return;
     }
     std::vector<std::string> excesses;
@@ -102,11 +78,31 @@ void ProgramChecker::check_command_line(const Item &item)
         }
     }
     if (!excesses.empty()) {
-        in_.findings.error(in_.places.of(item.number, "args"),
-                           "the command line of item {} is cut to {} bytes, by {}; shorten its {}",
-                           quoted_name(item.name), kCommandLimit, join_and(excesses),
-                           item.args->empty() ? "name" : "args");
+        in.findings.error(in.places.of(item.number, "args"),
+                          "the command line of item {} is cut to {} bytes, by {}; shorten its {}",
+                          quoted_name(item.name), kCommandLimit, join_and(excesses),
+                          item.args->empty() ? "name" : "args");
     }
+}
+} // namespace
+
+void check_program(const PlanCheck &in, const Item &item,
+                   const std::unordered_set<std::string> &item_names, ShellChecker &shell)
+{
+    const std::string &name = item.name;
+    if (name.empty()) {
+        return;
+    }
+    if (name.size() > kStopLimit && name.size() <= kNameLimit) {
+        in.findings.warning(in.places.of(item.number, "name"),
+                            "item {} may not be found to be stopped: ps is asked for the first "
+                            "{} of the {} bytes of its name, and finds another or none; shorten "
+                            "it",
+                            quoted_name(name), kStopLimit, name.size());
+    }
+    shell.check(item);
+    check_vendors(in, item, item_names);
+    check_command_line(in, item);
 }
 
 } // namespace fptest

@@ -95,7 +95,8 @@ class LineScanner
     // The first of these that is here.
     std::string_view pass_any(std::initializer_list<std::string_view> marks)
     {
-        const auto found = std::ranges::find_if(marks, [this](auto mark) { return pass(mark); });
+        const auto *const found =
+            std::ranges::find_if(marks, [this](auto mark) { return pass(mark); });
         return found != marks.end() ? *found : "";
     }
     void pass_blanks()
