@@ -25,27 +25,27 @@ TEST_F(OldCopy, BringsBackNoResultOfAnEarlierRun)
     unlink(work("runs").c_str());
     unlink(work("written").c_str());
 
-    start_program({"/system/bin/Fourth",
-                   "report-here",
-                   "Other",
-                   "Other",
-                   "1",
-                   "-2",
-                   "a copy",
-                   "note",
-                   work("loaded"),
-                   "await",
-                   work("runs"),
-                   "report-here",
-                   "Other",
-                   "Other",
-                   "2",
-                   "-2",
-                   "the copy again",
-                   "note",
-                   work("written"),
-                   "sleep",
-                   "60"});
+    start_item_program({"/system/bin/Fourth",
+                        "report-here",
+                        "Other",
+                        "Other",
+                        "1",
+                        "-2",
+                        "a copy",
+                        "note",
+                        work("loaded"),
+                        "await",
+                        work("runs"),
+                        "report-here",
+                        "Other",
+                        "Other",
+                        "2",
+                        "-2",
+                        "the copy again",
+                        "note",
+                        work("written"),
+                        "sleep",
+                        "60"});
     ASSERT_TRUE(wait_for_file("loaded"));
     const Ended ended = run_fptest({"run", "--json", work("json"), "P/G"});
     EXPECT_THAT(read_file(kPlanFile), HasSubstr("the copy again"));

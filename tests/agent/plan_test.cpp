@@ -390,8 +390,8 @@ TEST(PlanWithReports, NeedsAWholeTextThatTheLibraryLoads)
     }
 }
 
-// The report of the one item of a plan, with these attributes.
-std::optional<ItemReport> report_of(const std::string &attributes)
+// As it is read from a plan.
+std::optional<ItemReport> item_report_with(const std::string &attributes)
 {
     const auto plan = Plan::parse_annotated("<P><CmdGroup name=\"A\"><Cmd name=\"x\" " +
                                             attributes + "/></CmdGroup></P>");
@@ -400,19 +400,20 @@ std::optional<ItemReport> report_of(const std::string &attributes)
 
 TEST(PlanWithReports, ShowsWhatNoPlanCanHoldAndKeepsTheRest)
 {
-    EXPECT_EQ(report_of("description=\"a\x01\x1B\xFF"
-                        "b\0c\""s)
+    EXPECT_EQ(item_report_with("description=\"a\x01\x1B\xFF"
+                               "b\0c\""s)
                   ->description,
               "a\u2401\u241B\uFFFD"
               "b\u2400c");
-    EXPECT_EQ(report_of("description=\"a\n\tb\r\"")->description, "a\n\tb\r");
+    EXPECT_EQ(item_report_with("description=\"a\n\tb\r\"")->description, "a\n\tb\r");
 }
 
 TEST(PlanWithReports, TellsAValueThatIsEmptyFromOneThatIsMissing)
 {
-    EXPECT_EQ(report_of("result=\"\""), (ItemReport{std::nullopt, "", false, std::nullopt}));
-    EXPECT_EQ(report_of("result"), (ItemReport{std::nullopt, std::nullopt, true, std::nullopt}));
-    EXPECT_EQ(report_of("progress"), (ItemReport{"", std::nullopt, false, std::nullopt}));
+    EXPECT_EQ(item_report_with("result=\"\""), (ItemReport{std::nullopt, "", false, std::nullopt}));
+    EXPECT_EQ(item_report_with("result"),
+              (ItemReport{std::nullopt, std::nullopt, true, std::nullopt}));
+    EXPECT_EQ(item_report_with("progress"), (ItemReport{"", std::nullopt, false, std::nullopt}));
     EXPECT_EQ(Plan::parse_annotated("<P><CmdGroup name=\"A\"><Cmd name=\"x\" args/></CmdGroup></P>")
                   ->groups()
                   .at(0)

@@ -336,7 +336,7 @@ TEST_F(Refusal, WhereAReportIsFullStoresNothing)
 
 TEST_F(Refusal, BesideAnItemOfAnEarlierRun)
 {
-    const pid_t left = start_program({"/system/bin/Item", "sleep", "60"});
+    const pid_t left = start_item_program({"/system/bin/Item", "sleep", "60"});
     expect_refusal(3,
                    "fptest: /system/bin/Item of an earlier run is still running, as process " +
                        std::to_string(left) + ", and would report into this one: end it first",

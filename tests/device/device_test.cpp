@@ -247,7 +247,7 @@ std::size_t count_open(const std::string &kind)
         open, [&](const auto &descriptor) { return descriptor.second.starts_with(kind); }));
 }
 
-pid_t start_program(const std::vector<std::string> &arguments)
+pid_t start_item_program(const std::vector<std::string> &arguments)
 {
     std::vector<char *> argv;
     for (const std::string &argument : arguments) {

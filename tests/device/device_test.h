@@ -109,8 +109,9 @@ std::vector<std::pair<int, std::string>> descriptors();
 // How many of them refer to that kind, as "socket:".
 std::size_t count_open(const std::string &kind);
 
-// Starts a program by its whole path, and expects that it is there.
-pid_t start_program(const std::vector<std::string> &arguments);
+// Starts an item's program without the library, by its whole path, and expects that it
+// is there.
+pid_t start_item_program(const std::vector<std::string> &arguments);
 
 } // namespace device
 

@@ -26,7 +26,7 @@ class FailingGatherer : public DeviceTest
     void SetUp() override
     {
         DeviceTest::SetUp();
-        start_program({kHolder, "--sleep", "60"}); // so that none is started
+        start_item_program({kHolder, "--sleep", "60"}); // so that none is started
         write_file(kPlanFile, kPlan);
     }
 

@@ -102,7 +102,7 @@ TEST_F(Gatherer, IsAnOrdinaryItemUnderVendorTwo)
 
 TEST_F(Gatherer, ClientOfEachCommandGetsThirteenBytesAndKeepsItsConnection)
 {
-    start_program({kHolder, "--sleep", "60"});
+    start_item_program({kHolder, "--sleep", "60"});
     store_plan();
     const std::size_t before = count_open("socket:");
     for (std::size_t round = 1; round <= 3; ++round) {
@@ -115,7 +115,7 @@ TEST_F(Gatherer, ClientOfEachCommandGetsThirteenBytesAndKeepsItsConnection)
 
 TEST_F(Gatherer, IsAwaitedOnEveryLocalAddressForAsLongAsItTakes)
 {
-    start_program({kHolder, "--sleep", "60"});
+    start_item_program({kHolder, "--sleep", "60"});
     store_plan();
     bool returned = false;
     std::thread command([&] {
@@ -141,7 +141,7 @@ TEST_F(Gatherer, ItemsAfterItInAGroupRunOnceItIsTriggered)
 
 TEST_F(Gatherer, TakenPortGoesUnnoticedAndTheCommandWaitsElsewhere)
 {
-    start_program({kHolder, "--sleep", "60"});
+    start_item_program({kHolder, "--sleep", "60"});
     store_plan();
     const Socket other = listen_on(kTriggerPort);
     log_lines();

@@ -14,8 +14,8 @@ namespace
 
 using Report = DeviceTest;
 
-// What a process of its own, with a plan cache of its own, reports.
-void report_elsewhere(const std::string &arguments)
+// It has a copy of the plan of its own.
+void another_process_reports(const std::string &arguments)
 {
     EXPECT_EQ(std::system(("/system/bin/Note --report " + arguments).c_str()), 0);
 }
@@ -57,7 +57,7 @@ TEST_F(Report, ProcessWithAStaleCopyWritesOverWhatOthersHaveSaved)
 {
     store(group_of({{"a", ""}, {"b", ""}}));
     FPTEST_SetTransation("G", "a", 1, 0, "here"); // loads this process's copy
-    report_elsewhere("G b 50 1 elsewhere");
+    another_process_reports("G b 50 1 elsewhere");
     EXPECT_THAT(read_back(), HasSubstr("elsewhere"));
 
     FPTEST_SetTransation("G", "a", 2, 0, "here again");
@@ -72,7 +72,7 @@ TEST_F(Report, OtherResultCodeLeavesAPlanThatIsNotLoadedAgain)
     EXPECT_THAT(read_back(), HasSubstr(" result "));
 
     ::testing::internal::CaptureStderr();
-    report_elsewhere("G a 100 0 again");
+    another_process_reports("G a 100 0 again");
     EXPECT_THAT(::testing::internal::GetCapturedStderr(), HasSubstr("Missing value for attribute"));
     EXPECT_THAT(read_back(), HasSubstr(" result "));
 }

@@ -125,7 +125,7 @@ TEST_F(MissingShell, OfTheLauncherStopsNoItem)
     store(kPlan);
     load_plan();
     run_path("P/G/Note");
-    const pid_t running = start_program({"/system/bin/Note", "--sleep", "60"});
+    const pid_t running = start_item_program({"/system/bin/Note", "--sleep", "60"});
     hide_the_launchers();
     log_lines();
 

@@ -67,7 +67,7 @@ TEST_F(Suspension, NameIsCutTo28CharactersForTheListing)
 {
     // only the longer one runs: the cut name of the other finds it
     const std::string program = std::string("/system/bin/") + kLonger;
-    const pid_t pid = start_program({program, "--sleep", "60"});
+    const pid_t pid = start_item_program({program, "--sleep", "60"});
     store(group_of({{kLong, ""}}));
     run_path("P/G");
     log_lines();
@@ -81,8 +81,8 @@ TEST_F(Suspension, NameIsCutTo28CharactersForTheListing)
 
 TEST_F(Suspension, OnlyTheFirstListedOfTwoIsStopped)
 {
-    const pid_t first = start_program({"/system/bin/ab", "--sleep", "60"});
-    const pid_t second = start_program({"/system/bin/ab", "--sleep", "60"});
+    const pid_t first = start_item_program({"/system/bin/ab", "--sleep", "60"});
+    const pid_t second = start_item_program({"/system/bin/ab", "--sleep", "60"});
     store(group_of({{"ab", ""}}));
     run_path("P/G");
 
@@ -127,7 +127,7 @@ void put_listing_in_front(const std::string &output)
 
 TEST_F(Suspension, BeforeAnyItemEveryProcessIsListedAndTheFirstIsStopped)
 {
-    const pid_t victim = start_program({"/system/bin/ab", "--sleep", "60"});
+    const pid_t victim = start_item_program({"/system/bin/ab", "--sleep", "60"});
     put_listing_in_front("USER PID\nroot     " + std::to_string(victim) +
                          "   1 x\nroot 1 1 init\n");
 
@@ -155,7 +155,7 @@ TEST_F(Suspension, StandardKillTakesTheNineForAProcess)
     // the same text that the library runs, with a process that is there in the
     // place of the nobody that process 9 is
     EXPECT_NE(kill(9, 0), 0) << "process 9 must be nobody on the device";
-    const pid_t victim = start_program({"/system/bin/ab", "--sleep", "60"});
+    const pid_t victim = start_item_program({"/system/bin/ab", "--sleep", "60"});
     EXPECT_NE(std::system(("kill 9 " + std::to_string(victim) + " 2>/dev/null").c_str()), 0);
     EXPECT_EQ(signal_that_ends(victim), SIGTERM) << "not 9: that would be SIGKILL";
 }
