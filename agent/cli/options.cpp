@@ -10,6 +10,8 @@
 #include <algorithm>
 #include <charconv>
 #include <fmt/core.h>
+#include <system_error>
+#include <type_traits>
 #include <utility>
 
 namespace fptest
@@ -35,7 +37,9 @@ template <typename Number> CLI::Validator number_in(Number least, Number most)
                     text = fmt::format("{}", number); // CLI11 reads 010 as octal
                     return std::string();
                 }
-                return refused(text, fmt::format("is not a number from {} to {}", least, most));
+                return refused(text, fmt::format("is not a {}number from {} to {}",
+                                                 std::is_integral_v<Number> ? "whole " : "", least,
+                                                 most));
             },
             ""};
 }

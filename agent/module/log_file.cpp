@@ -13,6 +13,7 @@
 #include <fcntl.h>
 #include <fmt/core.h>
 #include <string_view>
+#include <sys/stat.h>
 #include <unistd.h>
 
 namespace fptest
@@ -34,6 +35,10 @@ std::string for_all_processes(const std::string &file)
     }
     return file;
 }
+
+// Kept open, or a FIFO's reader would see an end before the library begins.
+Descriptor opened{-1};
+std::string opened_label;
 
 } // namespace
 
@@ -66,9 +71,22 @@ void choose_log(const std::string &option)
         throw Failure(Cause::device, "{} cannot be written: {}; name another file", label(file),
                       std::strerror(errno));
     }
-    static Descriptor held(-1); // or a FIFO's reader would see an end before the library begins
-    held = std::move(log);
+    opened = std::move(log);
+    opened_label = label(file);
     setenv(kLogVariable, path.c_str(), 1);
+}
+
+std::string log_loss()
+{
+    struct stat status {
+    };
+    // asks for room for one byte more, which stays unwritten
+    if (!opened.is_open() || fstat(opened.get(), &status) != 0 || !S_ISREG(status.st_mode) ||
+        fallocate(opened.get(), FALLOC_FL_KEEP_SIZE, status.st_size, 1) == 0 || errno != ENOSPC) {
+        return {};
+    }
+    return fmt::format("{} lacks its end: {}; make room, or name another file", opened_label,
+                       std::strerror(ENOSPC));
 }
 
 } // namespace fptest

@@ -322,9 +322,14 @@ class JunitReport : public Listener
 
 std::string junit_obstacle(const std::string &path)
 {
-    const std::string opened = is_replaceable(path) ? aside_of(end_of_links(path)) : path;
-    const int error = path == "-" ? 0 : Writer::obstacle(opened);
-    return error == 0 ? "" : failure_of(path, error);
+    if (path == "-") {
+        return "";
+    }
+    if (const int error = Writer::obstacle(path); error != 0) { // also one that is read-only
+        return failure_of(path, error);
+    }
+    const int error = is_replaceable(path) ? Writer::obstacle(aside_of(end_of_links(path))) : 0;
+    return error == 0 ? "" : failure_of(path + ": beside it", error);
 }
 
 std::unique_ptr<Listener> junit_report(const std::string &path)

@@ -13,6 +13,7 @@
 #include <algorithm>
 #include <cctype>
 #include <chrono>
+#include <ctime>
 #include <filesystem>
 #include <iterator>
 #include <map>
@@ -369,9 +370,9 @@ TEST(CheckedPlan, OfTenThousandItemsTakesNoTime)
     }
     for (const std::string &content : {group("A", comments), group("A", nested), groups,
                                        group("A", others) + group("B", others)}) {
-        const auto start = std::chrono::steady_clock::now();
+        const std::clock_t start = std::clock(); // of this process alone
         EXPECT_NE(findings_in("<P>" + content + "</P>", Storing::as_file).size(), 0U);
-        EXPECT_LT(std::chrono::steady_clock::now() - start, std::chrono::seconds(2));
+        EXPECT_LT(std::clock() - start, 2 * CLOCKS_PER_SEC);
     }
 }
 

@@ -320,6 +320,20 @@ TEST_F(Refusal, WhereAReportCannotBeWritten)
            {"--log", "/dev/full", "--plan", path, "P/Bringup"});
 }
 
+TEST_F(Refusal, ReplacesNoReportThatIsReadOnly)
+{
+    const std::string report = file("report", "golden");
+    chmod(report.c_str(), 0444);
+    if (access(report.c_str(), W_OK) == 0) {
+        GTEST_SKIP() << "in place, root may write everything";
+    }
+    for (const char *option : {"--json", "--junit"}) {
+        expect(3, "fptest: " + report + ": Permission denied; nothing was run",
+               {option, report, "--plan", plan(kTwoGroups), "P/Bringup"});
+        EXPECT_EQ(read_file(report), "golden");
+    }
+}
+
 TEST_F(Refusal, WhereAReportIsFullStoresNothing)
 {
     write_file(kPlanFile, kOnePasses);
@@ -393,6 +407,17 @@ TEST_F(FullDisk, LeavesTheStoredPlanAsItWas)
            "plan is still there",
            {"P/G"});
     EXPECT_EQ(read_file(kPlanFile), reported);
+}
+
+TEST_F(FullDisk, SaysThatTheLogLacksItsEnd)
+{
+    fill_disk();
+    const std::string log = "/data/vorlane/log";
+    const Ended ended = run_fptest({"send", "--log", log, "pingtest"});
+    EXPECT_EQ(ended.status, 3);
+    EXPECT_EQ(ended.err, "fptest: --log " + log +
+                             " lacks its end: No space left on device; make room, or name "
+                             "another file\n");
 }
 
 TEST_F(FullDisk, StoresAPlanInTheRoomOfTheOldOne)

@@ -120,7 +120,7 @@ TEST_F(Usage, SaysWhatIsWrongWithAValue)
          "is not a number from 0.001 to 1000000"},
         {{"run", "--plan", path, "P/G", "--repeat"},
          {"0", "-1", "x", "1.5"},
-         "is not a number from 1 to 1000000"},
+         "is not a whole number from 1 to 1000000"},
         {{"run", "--plan", path, "P/G", "--pass-code"},
          {"2", "7", "-1", "x"},
          "is none of 0, 1 and -2"},
@@ -134,7 +134,7 @@ TEST_F(Usage, SaysWhatIsWrongWithAValue)
         // of more, the plan would hold the first 9 characters
         {{"report", "G", "Item", "--result", "0", "--progress"},
          {"1000000000", "-100000000", "50%", "half", "1.5"},
-         "is not a number from -99999999 to 999999999"},
+         "is not a whole number from -99999999 to 999999999"},
     };
     for (const auto &[before, values, what] : wrong) {
         const std::string end = "; see fptest " + before.front() + " --help";

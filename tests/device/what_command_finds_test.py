@@ -45,6 +45,16 @@ def test_a_program_that_the_device_lacks_is_named(name):
     assert err.splitlines()[-1] == f"device/run: {name}: no such program on the device"
 
 
+def test_a_program_that_is_not_executable_is_named_so(tmp_path):
+    (tmp_path / "mine").write_text("echo\n")
+
+    status, _, err = on_device("./mine", cwd=tmp_path)
+
+    assert status == 127
+    assert err.splitlines()[-1].endswith(
+        "./mine: not an executable file: chmod +x makes it one")
+
+
 def test_three_variables_are_set_and_the_others_left():
     assert shell("echo $PATH; echo $TMPDIR; echo $QUILLMARK_DEVICE; echo $COLOUR",
                  env={"COLOUR": "green", "TMPDIR": "/var/tmp"}).out == (
