@@ -72,7 +72,7 @@ void choose_log(const std::string &option)
                       std::strerror(errno));
     }
     opened = std::move(log);
-    opened_label = label(file);
+    opened_label = option.empty() ? "" : label(file);
     setenv(kLogVariable, path.c_str(), 1);
 }
 
@@ -81,12 +81,13 @@ std::string log_loss()
     struct stat status {
     };
     // asks for room for one byte more, which stays unwritten
-    if (!opened.is_open() || fstat(opened.get(), &status) != 0 || !S_ISREG(status.st_mode) ||
-        fallocate(opened.get(), FALLOC_FL_KEEP_SIZE, status.st_size, 1) == 0 || errno != ENOSPC) {
+    if (opened_label.empty() || fstat(opened.get(), &status) != 0 || !S_ISREG(status.st_mode) ||
+        fallocate(opened.get(), FALLOC_FL_KEEP_SIZE, status.st_size, 1) == 0 ||
+        (errno != ENOSPC && errno != EDQUOT)) {
         return {};
     }
     return fmt::format("{} lacks its end: {}; make room, or name another file", opened_label,
-                       std::strerror(ENOSPC));
+                       std::strerror(errno));
 }
 
 } // namespace fptest

@@ -22,8 +22,8 @@ NamedFile log_file(const std::string &option);
 // Sees to that. To be called before the library is.
 void choose_log(const std::string &option);
 
-// What keeps the library from logging there, once it has: it says nothing of that itself.
-// Empty where nothing does.
+// What keeps the library from logging to --log's file, which it says nothing of; empty
+// if nothing does. An item that reports has its run's log, and cannot help it.
 std::string log_loss();
 
 } // namespace fptest

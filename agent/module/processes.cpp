@@ -7,6 +7,8 @@
 #include "util/files.h"
 
 #include <algorithm>
+#include <array>
+#include <cctype>
 #include <charconv>
 #include <csignal>
 #include <cstdlib>
@@ -16,6 +18,7 @@
 #include <map>
 #include <optional>
 #include <system_error>
+#include <unistd.h>
 
 namespace fptest
 {
@@ -28,11 +31,13 @@ struct Process {
     char state = '?';
     std::string program; // as it was started, or the kernel's name for it
     std::string name;    // without the path
-    std::string script;  // that a shell runs, as it was started
+    std::string script;  // that an interpreter runs, as it was started
     bool gathers = false;
 };
 
 using Processes = std::map<pid_t, Process>;
+
+constexpr std::size_t kKernelsName = 15; // characters; of a script it is the script's
 
 std::string last_part(const std::string &path)
 {
@@ -56,12 +61,16 @@ std::optional<Process> read_process(const std::filesystem::path &directory)
     const std::string command = arguments.c_str();
     process.program = command.empty() ? stat.substr(open + 1, close - open - 1) : command;
     process.name = last_part(process.program);
-    if (process.name.ends_with("sh")) {
-        std::size_t at = command.size() + 1;
-        while (at < arguments.size() && arguments[at] == '-') { // its options
-            at += std::strlen(&arguments[at]) + 1;
-        }
-        process.script = at < arguments.size() ? &arguments[at] : "";
+    std::size_t at = command.size() + 1;
+    while (at < arguments.size() && arguments[at] == '-') { // options
+        at += std::strlen(&arguments[at]) + 1;
+    }
+    const std::string script = at < arguments.size() ? &arguments[at] : "";
+    constexpr std::array kShells{"sh", "mksh", "ksh", "ash", "dash", "bash"};
+    const std::string kernels_name = stat.substr(open + 1, close - open - 1);
+    if (std::ranges::find(kShells, process.name) != kShells.end() ||
+        (!script.empty() && last_part(script).substr(0, kKernelsName) == kernels_name)) {
+        process.script = script;
     }
     return process;
 }
@@ -104,10 +113,9 @@ bool lives(const Process &process)
     return process.state != 'Z' && process.state != 'X';
 }
 
-// All but the ancestor and what that comes of: fptest's caller may have any name. Where
-// the vendor was another one, an earlier run may have left its gatherer, which the
-// library finds.
-Processes read_processes(pid_t ancestor, int vendor)
+// All processes except the ancestor and its own ancestors: fptest's caller may have any
+// name.
+Processes read_others(pid_t ancestor)
 {
     Processes processes = read_processes();
     for (auto found = processes.find(ancestor); found != processes.end();) {
@@ -115,11 +123,29 @@ Processes read_processes(pid_t ancestor, int vendor)
         processes.erase(found);
         found = processes.find(parent);
     }
+    return processes;
+}
+
+// A program that has run another one, or has changed its arguments, is the gatherer
+// still: "/system/bin/SensorProbe.real", "/system/bin/SensorProbe: idle".
+bool continues(const std::string &program, const std::string &gatherer)
+{
+    return program.starts_with(gatherer) && program.size() > gatherer.size() &&
+           std::isalnum(static_cast<unsigned char>(program[gatherer.size()])) == 0 &&
+           program[gatherer.size()] != '_';
+}
+
+// Marks the gatherers. An earlier run may have left one of another vendor; among the
+// processes of this run an item may have a name that begins as the gatherer's.
+Processes read_family(pid_t ancestor, int vendor)
+{
+    Processes processes = read_others(ancestor);
     for (const int one : {0, 1}) {
         const std::string program = program_of(kGatherer, *vendor_suffix(one));
         for (auto &[pid, process] : processes) {
-            if ((process.program == program || process.script == program) &&
-                (one == vendor || !is_below(processes, pid, ancestor))) {
+            const bool is_exact = process.program == program || process.script == program;
+            if ((is_exact && one == vendor) || ((is_exact || continues(process.program, program)) &&
+                                                !is_below(processes, pid, ancestor))) {
                 process.gathers = true;
             }
         }
@@ -158,12 +184,13 @@ bool comes_of_gatherer(const Processes &processes, pid_t pid)
     return comes_of(processes, pid, [](const auto &entry) { return entry.second.gathers; });
 }
 
-} // namespace
-
-bool is_taken_for_gatherer(const Leftover &process)
+// As ps lists it and grep finds it.
+bool is_found_as_gatherer(const Process &process)
 {
-    return process.name.starts_with(kGatherer);
+    return lives(process) && process.program.starts_with(program_of(kGatherer, ""));
 }
+
+} // namespace
 
 bool runs_below(pid_t ancestor, const std::vector<std::string> &items)
 {
@@ -194,19 +221,26 @@ std::optional<pid_t> met_by_stop(const std::string &item)
 std::optional<std::pair<std::string, pid_t>>
 process_of_any(const std::vector<std::string> &programs)
 {
-    for (const auto &[pid, process] : read_processes()) {
-        if (lives(process) && std::ranges::find(programs, process.program) != programs.end()) {
-            return std::pair(process.program, pid);
+    for (const auto &[pid, process] : read_others(getpid())) {
+        for (const std::string &program : {process.program, process.script}) {
+            if (lives(process) && std::ranges::find(programs, program) != programs.end()) {
+                return std::pair(program, pid);
+            }
         }
     }
     return std::nullopt;
 }
 
-std::optional<std::pair<std::string, pid_t>> taken_for_gatherer()
+bool is_found_as_gatherer(pid_t process)
 {
-    const std::string program = program_of(kGatherer, "");
+    const auto found = read_process(fmt::format("/proc/{}", process));
+    return found && is_found_as_gatherer(*found);
+}
+
+std::optional<std::pair<std::string, pid_t>> found_as_gatherer()
+{
     for (const auto &[pid, process] : read_processes()) {
-        if (lives(process) && process.program.starts_with(program)) {
+        if (is_found_as_gatherer(process)) {
             return std::pair(process.program, pid);
         }
     }
@@ -216,7 +250,7 @@ std::optional<std::pair<std::string, pid_t>> taken_for_gatherer()
 std::vector<Leftover> ChildProcesses::of_items(const std::vector<Leftover> &left_out) const
 {
     std::vector<Leftover> all;
-    const Processes processes = read_processes(ancestor_, vendor_);
+    const Processes processes = read_family(ancestor_, vendor_);
     for (const auto &[pid, process] : processes) {
         if (lives(process) && pid != library_ && process.group != library_ &&
             is_below(processes, pid, ancestor_) && !comes_of_gatherer(processes, pid) &&
@@ -229,7 +263,7 @@ std::vector<Leftover> ChildProcesses::of_items(const std::vector<Leftover> &left
 
 void ChildProcesses::signal_all(int signal) const
 {
-    const Processes processes = read_processes(ancestor_, vendor_);
+    const Processes processes = read_family(ancestor_, vendor_);
     for (const auto &[pid, process] : processes) {
         if (lives(process) && pid != library_ &&
             (is_below(processes, pid, ancestor_) || comes_of_gatherer(processes, pid))) {
@@ -255,7 +289,7 @@ bool ChildProcesses::has_gatherer() const
 std::vector<Leftover> ChildProcesses::of_gatherer() const
 {
     std::vector<Leftover> all;
-    const Processes processes = read_processes(ancestor_, vendor_);
+    const Processes processes = read_family(ancestor_, vendor_);
     for (const auto &[pid, process] : processes) {
         if (lives(process) && pid != library_ &&
             (comes_of_gatherer(processes, pid) ||

@@ -21,10 +21,10 @@ struct Leftover {
     pid_t group = 0; // of processes
 };
 
-// Whether the library finds it where it looks for a running gatherer; and one that it
-// finds, by its whole path.
-bool is_taken_for_gatherer(const Leftover &process);
-std::optional<std::pair<std::string, pid_t>> taken_for_gatherer();
+// Whether the library takes it for a running gatherer; and the first that it takes for
+// one, with its whole path.
+bool is_found_as_gatherer(pid_t process);
+std::optional<std::pair<std::string, pid_t>> found_as_gatherer();
 
 // Whether one is running that a stop finds by one of the items' names: ps is
 // asked for the first characters of it.

@@ -28,7 +28,7 @@ class ReportReader
     ReportReader(Run &run, const std::vector<Listener *> &listeners, RunningJob &running);
 
     // What a stored plan says of gatherers before it goes: they may have kept a copy.
-    void note_gathered(const std::string &text);
+    void note_gathered(const std::string &text, int vendor);
 
     // Can be read once somebody has saved the plan. What two processes save between two
     // looks seems to be one change, so none is to be missed; where the system does not
@@ -68,6 +68,7 @@ class ReportReader
         std::vector<ItemReport> seen; // an old copy of the plan may bring one of them back
     };
 
+    bool take_saves();
     void read_report(RunningItem &active, const Plan &plan);
     void read_late_report(Judged &judged, const Plan &plan);
     bool is_stale(RunningItem &active, const Plan &plan, const ItemReport &report);
@@ -86,6 +87,8 @@ class ReportReader
     int gathered_in_ = 0;              // the round of the last gathering
     bool marks_are_gone_ = false;      // from items' elements
     unsigned look_ = 1;
+    bool is_saved_ = false; // and not read since
+    std::chrono::steady_clock::time_point next_look_;
     struct stat plan_status_ {
     };
     std::chrono::nanoseconds changed_{}; // the plan that poll() read, on the clock of files

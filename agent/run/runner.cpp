@@ -269,7 +269,7 @@ void Runner::poll_gatherer(RunningItem &active)
     active.gatherer_end = active.moved_on ? "the gatherer ended before it had reported"
                                           : "the gatherer ended before it connected";
     if (!active.moved_on) {
-        if (const auto other = taken_for_gatherer()) {
+        if (const auto other = found_as_gatherer()) {
             active.gatherer_end += fmt::format(", or the library took {} (pid {}) for it",
                                                one_line(other->first), other->second);
         }

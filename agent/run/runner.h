@@ -35,7 +35,7 @@ class Runner
     // The stored plan before the run: a gatherer may have kept a copy of it.
     void note_earlier_plan(const std::string &text)
     {
-        reader_.note_gathered(text);
+        reader_.note_gathered(text, vendor_);
     }
 
     // Runs a job and fills in its items. False where the run has come to its end: the run
@@ -74,7 +74,7 @@ class Runner
     // The gatherer's command returns when the gatherer has been told; its report comes in
     // its own time.
     static constexpr std::chrono::duration<double> kForGathering{10};
-    static constexpr std::chrono::milliseconds kTurn{25}; // between two looks at the plan
+    static constexpr std::chrono::milliseconds kTurn{25}; // at most, between two looks
     static constexpr std::size_t kNoElement = static_cast<std::size_t>(-1);
 
     TimePoint now() const;

@@ -309,14 +309,15 @@ void Runner::make_way_for(const Job &job)
         return target && is_gatherer(run_.suites[job.suite].items[target->item].name, vendor_);
     };
     if (std::ranges::any_of(job.targets, is_gatherers)) {
-        if (std::ranges::any_of(library_.processes().of_items(), is_taken_for_gatherer)) {
-            end_left_running(); // the library would start no gatherer beside it
-        }
-        reader_.note_gathered(read_stored_plan().value_or(""));
+        end_all([this] { // or the library would start no gatherer beside them
+            auto left = library_.processes().of_items();
+            std::erase_if(left, [](const auto &one) { return !is_found_as_gatherer(one.process); });
+            return left;
+        });
+        reader_.note_gathered(read_stored_plan().value_or(""), vendor_);
         // the library does not find one that is a script, and would start another beside it
         const std::vector<Leftover> running = library_.processes().of_gatherer();
-        if (gatherer_may_report_late_ ||
-            (!running.empty() && std::ranges::none_of(running, is_taken_for_gatherer))) {
+        if (gatherer_may_report_late_ || (!running.empty() && !found_as_gatherer())) {
             end_gatherer();
         }
         gatherer_runs_ = library_.processes().has_gatherer();
