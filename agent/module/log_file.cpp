@@ -85,7 +85,7 @@ std::string log_loss()
         fallocate(opened.get(), FALLOC_FL_KEEP_SIZE, status.st_size, 1) == 0 || errno != ENOSPC) {
         return {};
     }
-    return fmt::format("{} lacks its end: {}; make room, or name another file", opened_label,
+    return fmt::format("{} is incomplete: {}; make room, or name another file", opened_label,
                        std::strerror(ENOSPC));
 }
 
