@@ -114,7 +114,7 @@ CLI::Validator one_of(std::vector<std::string> words, std::string otherwise)
 
 CLI::Validator result_code()
 {
-    return one_of({"0", "1", "-2"}, "is none of 0, 1 and -2");
+    return one_of({"0", "1", "-2"}, "is not 0, 1 or -2");
 }
 
 CLI::Validator not_empty()

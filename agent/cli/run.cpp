@@ -19,11 +19,11 @@
 #include "util/write.h"
 
 #include <algorithm>
-#include <fmt/core.h>
+#include <cstdio>
 #include <iterator>
 #include <memory>
 #include <optional>
-#include <sstream>
+#include <poll.h>
 #include <string>
 #include <unistd.h>
 #include <utility>
@@ -82,85 +82,53 @@ CheckedPlan open_plan(const RunOptions &options)
 
 // --- before the run -----------------------------------------------------------
 
-std::vector<std::string> words_of(std::string text)
+std::vector<std::string> names_of(const RoundPlan &round)
 {
-    std::ranges::replace(text, '\0', ' ');
-    std::istringstream stream(text);
-    return {std::istream_iterator<std::string>(stream), {}};
+    std::vector<std::string> names;
+    for (const Suite &suite : round.suites) {
+        std::ranges::transform(suite.items, std::back_inserter(names), &ItemRun::name);
+    }
+    return names;
 }
 
-// The library starts none where one runs, whatever the plan says.
-void tell_of_running_gatherer(const Work &work, const Plan &plan, const std::string &suffix)
+// The library starts no gatherer beside one that runs, whatever the plan says.
+void report_other_gatherer(const RoundPlan &round, const Plan &plan, const std::string &suffix)
 {
-    const std::string program = program_of(kGatherer, suffix);
-    const auto running = process_of_any({program});
-    if (!running) {
-        return;
-    }
-    const std::string started =
-        read_file(fmt::format("/proc/{}/cmdline", running->second)).value_or("");
-    for (const Job &job : work.jobs) {
+    std::vector<std::string> args;
+    for (const Job &job : round.jobs) {
         for (const auto &target : job.targets) {
-            if (!target || work.suites[job.suite].items[target->item].name != kGatherer) {
-                continue;
-            }
-            const char *args = mxmlElementGetAttr(plan.elements()[target->element], "args");
-            if (words_of(started) !=
-                words_of(fmt::format("{} {}", program, args != nullptr ? args : ""))) {
-                std::string line = started.substr(0, started.find_last_not_of('\0') + 1);
-                std::ranges::replace(line, '\0', ' ');
-                say("a gatherer is running already, as {}: the library triggers that one, and "
-                    "starts none",
-                    in_quotes(line));
-                return;
+            if (target && round.suites[job.suite].items[target->item].name == kGatherer) {
+                args.push_back(attribute(plan.elements()[target->element], "args").value_or(""));
             }
         }
     }
-}
-
-void require_programs(const Work &work, int vendor, bool force)
-{
-    const std::string suffix = vendor_suffix(vendor).value_or("");
-    std::vector<std::string> programs;
-    std::vector<std::string> missing;
-    bool gatherer = false;
-    for (const Suite &suite : work.suites) {
-        for (const ItemRun &item : suite.items) {
-            const std::string program = program_of(item.name, suffix);
-            if (is_gatherer(item.name, vendor)) {
-                gatherer = true;
-            } else {
-                programs.push_back(program);
-            }
-            if (is_plain_name(item.name) && access(program.c_str(), X_OK) != 0 &&
-                std::ranges::find(missing, program) == missing.end()) {
-                missing.push_back(program);
-            }
-        }
-    }
-    if (!missing.empty() && !force) {
-        throw Failure(Cause::device,
-                      "no program {} on this device: install what is missing (device/run --bin DIR "
-                      "adds programs), or run the rest with --force",
-                      join_and(missing));
-    }
-    require_no_leftovers(programs);
-    if (gatherer) {
-        require_trigger_port();
+    if (const std::string other = other_gatherer(args, suffix); !other.empty()) {
+        say("a gatherer is running already, as {}: the library triggers that one, and starts none",
+            in_quotes(other));
     }
 }
 
-void store(LibraryProcess &library, const CheckedPlan &read)
+void list_items(const std::vector<Path> &paths, const Plan &plan, const std::string &suffix)
 {
-    send_and_wait(library, "XMLFile::" + read.text);
-    require_stored(library.read_back(), read.stored);
+    const auto items = commands_of(paths, plan, suffix);
+    std::size_t width = 0;
+    for (const auto &[path, command] : items) {
+        width = std::max(width, display_width(one_line(path)));
+    }
+    for (const auto &[path, command] : items) {
+        print_to(stdout, "{}  {}\n", pad_or_ellipsize(one_line(path), width), one_line(command));
+    }
 }
 
-// For a plan that is longer than what a command stores.
-void place(const std::string &text)
+// The running item is stopped by the library's process, which sees that this one is gone;
+// the reports stay as far as they were written.
+[[noreturn]] void exit_at_once()
 {
-    const Descriptor lock = lock_stored_plan();
-    replace_stored_plan(text);
+    pollfd errors{STDERR_FILENO, POLLOUT, 0};
+    if (poll(&errors, 1, 0) > 0) { // a terminal may be stopped
+        std::fputs("\nfptest: interrupted again: exiting now, stopping the running item\n", stderr);
+    }
+    _exit(static_cast<int>(Exit::interrupted));
 }
 
 void require_nothing_to_report_of_a_list(const RunOptions &options)
@@ -182,15 +150,16 @@ Descriptor ready_device()
     return lock_device();
 }
 
-Runner::Limits limits_of(const RunOptions &options)
+Runner::Options runner_options(const RunOptions &options)
 {
-    Runner::Limits limits;
+    Runner::Options runner;
     if (options.timeout) {
-        limits.item = std::chrono::duration<double>(*options.timeout);
+        runner.timeout = std::chrono::duration<double>(*options.timeout);
     }
-    limits.grace = std::chrono::duration<double>(options.grace);
-    limits.exit_status = options.exit_status;
-    return limits;
+    runner.grace = std::chrono::duration<double>(options.grace);
+    runner.fail_on_exit_status = options.fail_on_exit_status;
+    runner.on_second_interrupt = exit_at_once;
+    return runner;
 }
 
 Run run_of(const RunOptions &options, const std::string &plan, int vendor)
@@ -244,10 +213,10 @@ Exit run(RunOptions options)
         return Exit::success;
     }
 
-    const Work work = work_of(paths, plan, options.as_group);
-    require_programs(work, vendor, options.force);
+    const RoundPlan round = plan_round(paths, plan, options.as_group);
+    require_programs(names_of(round), vendor, options.force);
     if (!options.quiet) {
-        tell_of_running_gatherer(work, plan, vendor_suffix(vendor).value_or(""));
+        report_other_gatherer(round, plan, vendor_suffix(vendor).value_or(""));
     }
     const bool is_sent = read.storing != Storing::as_file;
     const bool is_placed = !is_sent && !options.plan.empty();
@@ -261,9 +230,10 @@ Exit run(RunOptions options)
     }
     const auto store_plan = [&] {
         if (is_sent) {
-            store(*library, read);
+            send_and_wait(*library, "XMLFile::" + read.text);
+            require_stored(library->read_back(), read.stored);
         } else if (is_placed) {
-            place(read.text);
+            store_as_file(read.text);
             library.emplace(); // the one before keeps the plan that was there when it was asked
         }
     };
@@ -273,7 +243,8 @@ Exit run(RunOptions options)
     for (const auto &listener : owned) {
         listeners.push_back(listener.get());
     }
-    if (!run_rounds(listeners, limits_of(options), *library, signals, run, work, store_plan)) {
+    if (!run_rounds(listeners, runner_options(options), *library, signals, run, round,
+                    store_plan)) {
         return Exit::interrupted;
     }
     const Counts counts = count(run);
@@ -308,7 +279,7 @@ void add_run(CLI::App &app, Action &chosen)
         ->type_name("SECONDS")
         ->capture_default_str()
         ->transform(range(0.0, 1000000.0));
-    command.add_flag("--exit-status", options->exit_status,
+    command.add_flag("--exit-status", options->fail_on_exit_status,
                      "an item that ends with a status other than\n"
                      "0 has failed");
     command.add_option("--repeat", options->repeat, "run everything N times")

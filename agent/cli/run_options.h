@@ -22,7 +22,7 @@ struct RunOptions {
     bool quiet = false;
     std::optional<double> timeout; // seconds for each item
     double grace = 2;              // seconds that a stopped item has to end
-    bool exit_status = false;      // one that is not 0 fails its item
+    bool fail_on_exit_status = false;
     std::optional<int> repeat;
     std::optional<double> time_limit; // seconds after which no round begins
     bool until_fail = false;

@@ -121,7 +121,7 @@ void LibraryProcess::stop(const std::string &item)
 
 void LibraryProcess::hold_at_ends()
 {
-    holds_ = true;
+    hold_requested_ = true;
     send_message(control_.get(), {MessageKind::hold, ""});
 }
 
@@ -140,7 +140,7 @@ void LibraryProcess::restart()
 {
     if (pid_ < 0) {
         start();
-        if (holds_) {
+        if (hold_requested_) {
             hold_at_ends();
         }
     }

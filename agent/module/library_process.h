@@ -118,7 +118,7 @@ class LibraryProcess
     pid_t leader_ = -1; // of the process group that it had
     Descriptor control_{-1};
     Descriptor output_{-1};
-    bool holds_ = false;
+    bool hold_requested_ = false;
     int vendor_ = 0; // of the item that the library came to last
     off_t taken_ = 0;
     std::deque<Event> events_;

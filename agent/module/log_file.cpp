@@ -86,7 +86,7 @@ std::string log_loss()
         (errno != ENOSPC && errno != EDQUOT)) {
         return {};
     }
-    return fmt::format("{} lacks its end: {}; make room, or name another file", opened_label,
+    return fmt::format("{} is incomplete: {}; make room, or name another file", opened_label,
                        std::strerror(errno));
 }
 

@@ -7,13 +7,18 @@
 #include "module/stored_plan.h"
 #include "plan/library_rules.h"
 #include "util/failure.h"
+#include "util/files.h"
 #include "util/text.h"
 
+#include <algorithm>
 #include <cerrno>
 #include <chrono>
 #include <cstring>
 #include <fcntl.h>
+#include <fmt/core.h>
+#include <iterator>
 #include <netinet/in.h>
+#include <sstream>
 #include <sys/file.h>
 #include <sys/socket.h>
 #include <sys/stat.h>
@@ -27,6 +32,12 @@ namespace
 {
 
 constexpr char kDataDirectory[] = "/data/vorlane";
+
+std::vector<std::string> words_of(const std::string &text)
+{
+    std::istringstream stream(text);
+    return {std::istream_iterator<std::string>(stream), {}};
+}
 
 } // namespace
 
@@ -96,14 +107,55 @@ void require_trigger_port()
     }
 }
 
-void require_no_leftovers(const std::vector<std::string> &programs)
+void require_programs(const std::vector<std::string> &items, int vendor, bool force)
 {
+    const std::string suffix = vendor_suffix(vendor).value_or("");
+    std::vector<std::string> programs;
+    std::vector<std::string> missing;
+    bool has_gatherer = false;
+    for (const std::string &item : items) {
+        const std::string program = program_of(item, suffix);
+        if (is_gatherer(item, vendor)) {
+            has_gatherer = true;
+        } else {
+            programs.push_back(program);
+        }
+        if (is_plain_name(item) && access(program.c_str(), X_OK) != 0 &&
+            std::ranges::find(missing, program) == missing.end()) {
+            missing.push_back(program);
+        }
+    }
+    if (!missing.empty() && !force) {
+        throw Failure(Cause::device,
+                      "no program {} on this device: install what is missing (device/run --bin DIR "
+                      "adds programs), or run the rest with --force",
+                      one_line(join_and(missing)));
+    }
     if (const auto found = process_of_any(programs)) {
         throw Failure(Cause::device,
                       "{} of an earlier run is still running, as process {}, and would report into "
                       "this one: end it first",
                       one_line(found->first), found->second);
     }
+    if (has_gatherer) {
+        require_trigger_port();
+    }
+}
+
+std::string other_gatherer(const std::vector<std::string> &args, const std::string &suffix)
+{
+    const std::string program = program_of(kGatherer, suffix);
+    const auto running = process_of_any({program});
+    if (!running) {
+        return {};
+    }
+    std::string started = read_file(fmt::format("/proc/{}/cmdline", running->second)).value_or("");
+    started.erase(started.find_last_not_of('\0') + 1);
+    std::ranges::replace(started, '\0', ' ');
+    const bool is_other = std::ranges::any_of(args, [&](const std::string &one) {
+        return words_of(started) != words_of(fmt::format("{} {}", program, one));
+    });
+    return is_other ? started : "";
 }
 
 } // namespace fptest

@@ -26,8 +26,12 @@ Descriptor lock_device();
 // That the library will be able to listen for the gatherer.
 void require_trigger_port();
 
-// That no program of an item is still running from an earlier run: it would report
-// into this one.
-void require_no_leftovers(const std::vector<std::string> &programs);
+// That the items' programs are there, unless forced; that none still runs from an earlier
+// run, as it would report into this one; and that a gatherer's trigger port is free.
+void require_programs(const std::vector<std::string> &items, int vendor, bool force);
+
+// The command line of a gatherer that runs already, if an item with one of these args would
+// start another one; empty if not.
+std::string other_gatherer(const std::vector<std::string> &args, const std::string &suffix);
 
 } // namespace fptest

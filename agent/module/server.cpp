@@ -7,7 +7,7 @@
 #include "module/item_shell.h"
 #include "module/processes.h"
 #include "module/protocol.h"
-#include "plan/plan.h"
+#include "module/stored_plan.h"
 #include "quillmark.h"
 
 #include <array>
@@ -68,7 +68,7 @@ class Server
                 answer_stop(message.text);
                 break;
             case MessageKind::hold:
-                holds_ = true;
+                hold_requested_ = true;
                 break;
             case MessageKind::go_on:
                 release();
@@ -90,7 +90,7 @@ class Server
         if (busy_) {
             stop(items_);
         }
-        if (busy_ || holds_) {
+        if (busy_ || hold_requested_) {
             end_items();
         }
         _exit(EXIT_SUCCESS);
@@ -158,7 +158,7 @@ class Server
 
     void tell_connected()
     {
-        if (holds_) {
+        if (hold_requested_) {
             hold_after({MessageKind::connected, moment()});
         }
     }
@@ -166,15 +166,15 @@ class Server
     void hold_after(const Message &message)
     {
         std::unique_lock lock(mutex_);
-        held_ = holds_;
+        is_held_ = hold_requested_;
         send_message(socket_, message);
-        released_.wait(lock, [this] { return !held_; });
+        released_.wait(lock, [this] { return !is_held_; });
     }
 
     void release()
     {
         const std::lock_guard lock(mutex_);
-        held_ = false;
+        is_held_ = false;
         released_.notify_all();
     }
 
@@ -265,12 +265,11 @@ class Server
 
     static std::string read_back()
     {
-        struct stat status {
-        };
-        if (stat(kStoredPlan, &status) != 0 || !S_ISREG(status.st_mode)) {
-            return {}; // what cannot be read is tried again without end
+        const auto status = stored_plan_status();
+        if (!status) {
+            return {}; // the library would try to read it for ever
         }
-        std::string text(static_cast<std::size_t>(status.st_size), '\0');
+        std::string text(static_cast<std::size_t>(status->st_size), '\0');
         FPTEST_ExtractResultMsg(text.data(), static_cast<int>(text.size()));
         return text;
     }
@@ -278,8 +277,8 @@ class Server
     int socket_;
     std::mutex mutex_;
     std::condition_variable released_;
-    bool held_ = false; // the library
-    std::atomic<bool> holds_ = false;
+    bool is_held_ = false; // the library
+    std::atomic<bool> hold_requested_ = false;
     std::thread command_;
     std::vector<std::string> items_;
     std::atomic<bool> busy_ = false;

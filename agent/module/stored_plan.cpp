@@ -3,6 +3,7 @@
 
 #include "module/stored_plan.h"
 
+#include "module/preflight.h"
 #include "plan/plan_text.h"
 #include "util/failure.h"
 #include "util/files.h"
@@ -13,12 +14,39 @@
 #include <cstdio>
 #include <cstring>
 #include <fcntl.h>
+#include <fmt/core.h>
 #include <sys/file.h>
 #include <sys/stat.h>
 #include <thread>
 
 namespace fptest
 {
+namespace
+{
+
+std::string new_mark()
+{
+    static unsigned count = 0;
+    const auto now = std::chrono::system_clock::now().time_since_epoch().count();
+    return fmt::format("{:x}-{:x}", now, ++count);
+}
+
+// Leaves the plan as it is if the disk is full.
+template <typename Make> void replace_if_possible(const Make &make)
+{
+    const Descriptor lock = lock_stored_plan();
+    std::string text;
+    const auto made = made_of_stored_plan(text, make);
+    try {
+        if (made && *made != text) {
+            replace_stored_plan(*made);
+        }
+    } catch (const Failure &) {
+        return;
+    }
+}
+
+} // namespace
 
 std::optional<std::string> read_stored_plan()
 {
@@ -38,22 +66,20 @@ std::string require_stored_plan(const std::string &what_to_do)
     throw Failure(Cause::device, "{} cannot be read: {}", kStoredPlan, why_unread());
 }
 
+std::optional<struct stat> stored_plan_status()
+{
+    struct stat status {
+    };
+    return stat(kStoredPlan, &status) == 0 && S_ISREG(status.st_mode) ? std::optional(status)
+                                                                      : std::nullopt;
+}
+
 void require_regular_plan()
 {
     struct stat plan {
     };
     if (stat(kStoredPlan, &plan) == 0 && !S_ISREG(plan.st_mode)) {
         throw Failure(Cause::device, "{} is not a regular file: remove it", kStoredPlan);
-    }
-}
-
-void require_stored(const std::string &found, const std::string &wanted)
-{
-    if (found != wanted) {
-        throw Failure(Cause::device,
-                      "the plan was not stored: {} of {} bytes are in {}; make room and store it "
-                      "again, or see why with --log FILE",
-                      found.size(), wanted.size(), kStoredPlan);
     }
 }
 
@@ -112,6 +138,60 @@ void replace_stored_plan(const std::string &text)
         throw Failure(Cause::device, "{} cannot be written: {}; the old plan is still there",
                       kStoredPlan, std::strerror(error));
     }
+}
+
+void store_as_file(const std::string &text)
+{
+    const Descriptor lock = lock_stored_plan();
+    replace_stored_plan(text);
+}
+
+void require_stored(const std::string &found, const std::string &wanted)
+{
+    if (found != wanted) {
+        throw Failure(Cause::device,
+                      "the plan was not stored: {} of {} bytes are in {}; make room and store it "
+                      "again, or see why with --log FILE",
+                      found.size(), wanted.size(), kStoredPlan);
+    }
+}
+
+std::string clear_reports(const std::vector<std::size_t> &elements)
+{
+    const std::string mark = new_mark();
+    const Descriptor lock = lock_stored_plan();
+    std::string text;
+    const auto cleared = made_of_stored_plan(
+        text, [&](const std::string &plan) { return without_reports(plan, elements, mark); });
+    if (!cleared && Plan::load_as_library(text)) {
+        return {}; // run with --force: nothing has reported into it
+    }
+    if (!cleared) {
+        throw Failure(Cause::device, "{} {}: store it again", kStoredPlan, kPlanLost);
+    }
+    try {
+        require_room(cleared->size());
+        replace_stored_plan(*cleared);
+    } catch (const Failure &) {
+        if (without_marks(*cleared) == without_marks(text)) {
+            return {};
+        }
+        throw;
+    }
+    return mark;
+}
+
+void mark_again(const std::vector<std::size_t> &elements, const std::string &mark)
+{
+    if (!elements.empty()) {
+        replace_if_possible(
+            [&](const std::string &text) { return without_reports(text, elements, mark); });
+    }
+}
+
+void remove_marks()
+{
+    replace_if_possible(without_marks);
 }
 
 } // namespace fptest

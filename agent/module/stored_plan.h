@@ -10,10 +10,15 @@
 #include <chrono>
 #include <optional>
 #include <string>
+#include <sys/stat.h>
 #include <thread>
+#include <vector>
 
 namespace fptest
 {
+
+// What is said of a plan that nobody can report into any more.
+inline constexpr char kPlanLost[] = "is gone, or not whole any more";
 
 // Its text as it is; nothing where it cannot be read, errno then says why.
 std::optional<std::string> read_stored_plan();
@@ -22,8 +27,8 @@ std::optional<std::string> read_stored_plan();
 // added to "no plan is stored in ...".
 std::string require_stored_plan(const std::string &what_to_do);
 
-// Throws a Failure where the plan found is not the one that was to be stored.
-void require_stored(const std::string &found, const std::string &wanted);
+// The status of its file; nullopt if there is no regular file.
+std::optional<struct stat> stored_plan_status();
 
 // Throws a Failure where something else is in its place, such as a FIFO: whoever opened
 // that could wait for ever.
@@ -66,8 +71,26 @@ void mend_stored_plan();
 // it then. A plan that is not there needs none.
 Descriptor lock_stored_plan();
 
-// Puts another text in the stored plan's place, whole or not at all. Throws a
-// Failure where it cannot.
+// Puts another text in the stored plan's place, whole or not at all; the caller holds the
+// lock. Throws a Failure if it cannot.
 void replace_stored_plan(const std::string &text);
+
+// The same, under the lock: for a plan that is longer than what a command stores.
+void store_as_file(const std::string &text);
+
+// Throws a Failure if the library has not stored the text.
+void require_stored(const std::string &found, const std::string &wanted);
+
+// Removes what these elements have reported, so that only this run counts. Returns the mark
+// that they bear from now on: a report that is written back from an old copy lacks it. It
+// is empty if nothing had to be removed and the plan cannot be marked: it is not
+// well-formed, or the disk is full. Otherwise throws a Failure.
+std::string clear_reports(const std::vector<std::size_t> &elements);
+
+// Clears these elements and gives them their mark again; does nothing if the disk is full.
+void mark_again(const std::vector<std::size_t> &elements, const std::string &mark);
+
+// If the disk is full, the marks stay, and the next run replaces them.
+void remove_marks();
 
 } // namespace fptest

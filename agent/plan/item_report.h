@@ -12,7 +12,7 @@ namespace fptest
 // What an item has reported, as the test plan has it.
 struct ItemReport {
     std::optional<std::string> progress;
-    // An attribute without a value is a result that is none of 0, 1 and -2.
+    // An attribute without a value is a result that is not 0, 1 or -2.
     std::optional<std::string> result;
     bool result_without_value = false;
     std::optional<std::string> description;

@@ -75,7 +75,7 @@ Json summary_of(const Run &run)
 {
     Json items = Json::array();
     for (const Summary &one : run.summary) {
-        const Times &times = one.times;
+        const DurationStats &times = one.times;
         Json json = {{"group", sanitize_utf8(one.group)},
                      {"item", sanitize_utf8(one.name)},
                      {"run", times.count()},

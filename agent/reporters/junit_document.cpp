@@ -188,7 +188,7 @@ std::string summary_properties(const Run &run, const std::string &indent)
 {
     std::string text;
     for (const Summary &one : run.summary) {
-        const Times &times = one.times;
+        const DurationStats &times = one.times;
         std::string value = fmt::format("{} of {} passed", one.passed, times.count());
         if (times.count() > 0) {
             value += fmt::format(", least {}, median {}, longest {}", fine_duration(times.least()),

@@ -162,7 +162,7 @@ std::vector<std::string> summary_table(const Run &run)
     }
     std::vector<std::vector<std::string>> rows = {{"ITEM", "PASSED", "LEAST", "MEDIAN", "LONGEST"}};
     for (const Summary &one : run.summary) {
-        const Times &times = one.times;
+        const DurationStats &times = one.times;
         rows.push_back({one_line(one.group) + "/" + one_line(one.name),
                         fmt::format("{} of {}", one.passed, times.count())});
         for (const double seconds : {times.least(), times.median(), times.longest()}) {

@@ -31,11 +31,20 @@ struct Job {
     std::vector<std::optional<Target>> targets;
     std::string mark = {}; // that their elements bear; empty for none
 
+    // The elements of its targets, from this one on.
+    std::vector<std::size_t> elements(std::size_t from = 0) const
+    {
+        std::vector<std::size_t> all;
+        for (std::size_t at = from; at < targets.size(); ++at) {
+            if (targets[at]) {
+                all.push_back(targets[at]->element);
+            }
+        }
+        return all;
+    }
     bool has(std::size_t element) const
     {
-        return std::ranges::any_of(targets, [element](const auto &target) {
-            return target && target->element == element;
-        });
+        return std::ranges::count(elements(), element) != 0;
     }
 };
 
@@ -54,8 +63,8 @@ struct RunningItem {
         bool undone = false;      // a result was there, and has gone
         bool in_another_plan = false;
         // At which look it has changed last, and another's report; 0 for none.
-        unsigned changed_at = 0;
-        unsigned other_changed_at = 0;
+        unsigned changed_at_poll = 0;
+        unsigned other_changed_at_poll = 0;
         bool from_a_copy = false; // the gatherer's own, which has no mark
         // The newest report, where one seen before it has come back since.
         std::optional<ItemReport> taken_back;
@@ -64,12 +73,12 @@ struct RunningItem {
         // Whether others have reported meanwhile, and so saved the plan as they know it.
         bool is_beside_others() const
         {
-            return other_changed_at != 0;
+            return other_changed_at_poll != 0;
         }
         // Whether they may have done so after it, before anybody saw more of it.
         bool is_uncertain() const
         {
-            return is_beside_others() && other_changed_at >= changed_at;
+            return is_beside_others() && other_changed_at_poll >= changed_at_poll;
         }
         bool is_written_over() const
         {

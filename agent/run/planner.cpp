@@ -5,10 +5,8 @@
 
 #include "util/failure.h"
 #include "util/text.h"
-#include "util/write.h"
 
 #include <algorithm>
-#include <cstdio>
 #include <fmt/core.h>
 #include <optional>
 #include <utility>
@@ -138,10 +136,10 @@ bool have_paths_of_their_own(const Plan &plan, const std::string &group,
     });
 }
 
-class WorkPlanner
+class RoundPlanner
 {
   public:
-    WorkPlanner(const Plan &plan, bool as_group) : plan_(plan), as_group_(as_group)
+    RoundPlanner(const Plan &plan, bool as_group) : plan_(plan), as_group_(as_group)
     {
     }
 
@@ -157,9 +155,9 @@ class WorkPlanner
         }
     }
 
-    Work take()
+    RoundPlan take()
     {
-        return std::move(work_);
+        return std::move(round_);
     }
 
   private:
@@ -169,13 +167,13 @@ class WorkPlanner
         if (std::ranges::none_of(items, runs_something)) {
             return;
         }
-        if (work_.suites.empty() || work_.suites.back().group != group) {
-            work_.suites.push_back({group, {}});
+        if (round_.suites.empty() || round_.suites.back().group != group) {
+            round_.suites.push_back({group, {}});
         }
-        Suite &suite = work_.suites.back();
+        Suite &suite = round_.suites.back();
         Job job;
         job.path = path;
-        job.suite = work_.suites.size() - 1;
+        job.suite = round_.suites.size() - 1;
         for (const auto &item : items) {
             if (!runs_something(item)) {
                 job.targets.emplace_back(std::nullopt);
@@ -187,12 +185,12 @@ class WorkPlanner
             run.name = *item->name;
             suite.items.push_back(run);
         }
-        work_.jobs.push_back(std::move(job));
+        round_.jobs.push_back(std::move(job));
     }
 
     const Plan &plan_;
     bool as_group_;
-    Work work_;
+    RoundPlan round_;
 };
 
 } // namespace
@@ -229,33 +227,29 @@ std::vector<Path> all_paths(const Plan &plan)
     return paths;
 }
 
-Work work_of(const std::vector<Path> &paths, const Plan &plan, bool as_group)
+RoundPlan plan_round(const std::vector<Path> &paths, const Plan &plan, bool as_group)
 {
-    WorkPlanner planner(plan, as_group);
+    RoundPlanner planner(plan, as_group);
     for (const Path &path : paths) {
         planner.add(path);
     }
     return planner.take();
 }
 
-void list_items(const std::vector<Path> &paths, const Plan &plan, const std::string &suffix)
+std::vector<std::pair<std::string, std::string>>
+commands_of(const std::vector<Path> &paths, const Plan &plan, const std::string &suffix)
 {
-    std::vector<std::pair<std::string, std::string>> lines;
-    std::size_t width = 0;
+    std::vector<std::pair<std::string, std::string>> commands;
     for (const Path &path : paths) {
         for (const auto &item : resolve(path, plan)) {
-            if (!runs_something(item)) {
-                continue;
+            if (runs_something(item)) {
+                commands.emplace_back(
+                    path.root + "/" + path.group + "/" + *item->name,
+                    command_line(*item->name, item->args, suffix).substr(0, kCommandLimit));
             }
-            lines.emplace_back(
-                one_line(path.root + "/" + path.group + "/" + *item->name),
-                one_line(command_line(*item->name, item->args, suffix).substr(0, kCommandLimit)));
-            width = std::max(width, display_width(lines.back().first));
         }
     }
-    for (const auto &[path, command] : lines) {
-        print_to(stdout, "{}  {}\n", pad_or_ellipsize(path, width), command);
-    }
+    return commands;
 }
 
 } // namespace fptest

@@ -9,6 +9,7 @@
 #include "run/results.h"
 
 #include <string>
+#include <utility>
 #include <vector>
 
 namespace fptest
@@ -21,8 +22,8 @@ struct Path {
     std::string item; // empty where it names a group
 };
 
-// A round: what is run in it, one job after another.
-struct Work {
+// What each round runs, one job after another.
+struct RoundPlan {
     std::vector<Suite> suites;
     std::vector<Job> jobs;
 };
@@ -40,9 +41,10 @@ std::vector<Path> all_paths(const Plan &plan);
 
 // A command for each item; for each path where that is wanted, or an item has no path
 // of its own. Throws a Failure where a path leads to nothing that can be run.
-Work work_of(const std::vector<Path> &paths, const Plan &plan, bool as_group);
+RoundPlan plan_round(const std::vector<Path> &paths, const Plan &plan, bool as_group);
 
-// Prints the items with the commands that would be run for them. Throws as work_of().
-void list_items(const std::vector<Path> &paths, const Plan &plan, const std::string &suffix);
+// The path of each item with the command line that runs it. Throws as plan_round().
+std::vector<std::pair<std::string, std::string>>
+commands_of(const std::vector<Path> &paths, const Plan &plan, const std::string &suffix);
 
 } // namespace fptest

@@ -5,7 +5,6 @@
 
 #include "module/stored_plan.h"
 #include "plan/plan_text.h"
-#include "util/failure.h"
 
 #include <algorithm>
 #include <array>
@@ -85,13 +84,12 @@ int ReportReader::descriptor() const
 void ReportReader::poll()
 {
     is_saved_ = take_saves() || is_saved_;
-    struct stat status {
-    };
-    if ((running_.items.empty() && judged_.empty()) || stat(kStoredPlan, &status) != 0 ||
-        !S_ISREG(status.st_mode) || std::chrono::steady_clock::now() < next_look_ ||
-        (!is_saved_ && status.st_mtim.tv_sec == plan_status_.st_mtim.tv_sec &&
-         status.st_mtim.tv_nsec == plan_status_.st_mtim.tv_nsec &&
-         status.st_size == plan_status_.st_size && status.st_ino == plan_status_.st_ino)) {
+    const auto status = stored_plan_status();
+    if ((running_.items.empty() && judged_.empty()) || !status ||
+        std::chrono::steady_clock::now() < next_look_ ||
+        (!is_saved_ && status->st_mtim.tv_sec == plan_status_.st_mtim.tv_sec &&
+         status->st_mtim.tv_nsec == plan_status_.st_mtim.tv_nsec &&
+         status->st_size == plan_status_.st_size && status->st_ino == plan_status_.st_ino)) {
         return;
     }
     // a large plan that is saved all the time takes no more than half of a core
@@ -99,9 +97,9 @@ void ReportReader::poll()
     is_saved_ = false;
     const std::string text = read_stored_plan().value_or("");
     if (const auto plan = Plan::parse_annotated(text)) {
-        plan_status_ = status;
-        changed_ = std::chrono::seconds(status.st_mtim.tv_sec) +
-                   std::chrono::nanoseconds(status.st_mtim.tv_nsec);
+        plan_status_ = *status;
+        changed_ = std::chrono::seconds(status->st_mtim.tv_sec) +
+                   std::chrono::nanoseconds(status->st_mtim.tv_nsec);
         read(plan);
         if (!Plan::load_as_library(text)) {
             mend_stored_plan(); // or who reports next could not
@@ -132,7 +130,7 @@ void ReportReader::read(const std::optional<Plan> &plan)
     if (!plan) {
         return;
     }
-    ++look_;
+    ++poll_count_;
     for (RunningItem &active : running_.items) {
         read_report(active, *plan);
     }
@@ -140,13 +138,13 @@ void ReportReader::read(const std::optional<Plan> &plan)
         read_late_report(judged, *plan);
     }
     if (std::exchange(marks_are_gone_, false)) {
-        std::vector<std::size_t> numbers = elements_to_come();
+        std::vector<std::size_t> numbers = running_.job.elements(running_.next);
         for (const RunningItem &active : running_.items) {
             if (active.reporting.overwritten) {
                 numbers.push_back(active.element);
             }
         }
-        mark_again(numbers);
+        mark_again(numbers, running_.job.mark);
     }
 }
 
@@ -163,34 +161,6 @@ bool ReportReader::is_stale(RunningItem &active, const Plan &plan, const ItemRep
     }
     active.reporting.from_a_copy = active.reporting.from_a_copy || !was_gathered(report);
     return !active.reporting.from_a_copy;
-}
-
-std::vector<std::size_t> ReportReader::elements_to_come() const
-{
-    std::vector<std::size_t> elements;
-    for (std::size_t at = running_.next; at < running_.job.targets.size(); ++at) {
-        if (const auto &target = running_.job.targets[at]) {
-            elements.push_back(target->element);
-        }
-    }
-    return elements;
-}
-
-// So that what these elements report from now on counts. What is there is cleared.
-void ReportReader::mark_again(const std::vector<std::size_t> &numbers)
-{
-    if (numbers.empty()) {
-        return;
-    }
-    const Descriptor lock = lock_stored_plan();
-    try {
-        if (const auto marked =
-                without_reports(whole_stored_plan().text, numbers, running_.job.mark)) {
-            replace_stored_plan(*marked);
-        }
-    } catch (const Failure &) {
-        return; // the disk is full
-    }
 }
 
 std::chrono::nanoseconds ReportReader::since_change() const
@@ -222,9 +192,9 @@ void ReportReader::begin_gathering()
     const bool has_mark = bears_mark(*plan, active.element, running_.job.mark);
     if (has_result(report) || !has_mark) {
         // where it is there still, what others have reported for items to come counts
-        auto numbers = has_mark ? std::vector<std::size_t>() : elements_to_come();
+        auto numbers = has_mark ? std::vector<std::size_t>() : running_.job.elements(running_.next);
         numbers.push_back(active.element);
-        mark_again(numbers);
+        mark_again(numbers, running_.job.mark);
     }
     active.reporting.overwritten = false;
 }
@@ -233,7 +203,7 @@ void ReportReader::begin_gathering()
 void ReportReader::tell_late(const Place &place, bool gathers, int round, const ItemReport &report)
 {
     for (RunningItem &active : running_.items) {
-        active.reporting.other_changed_at = look_;
+        active.reporting.other_changed_at_poll = poll_count_;
     }
     const int now = std::exchange(run_.round, round);
     for (Listener *listener : listeners_) {
@@ -324,10 +294,10 @@ void ReportReader::read_report(RunningItem &active, const Plan &plan)
         active.reporting.seen.erase(active.reporting.seen.begin());
     }
     active.reporting.seen.push_back(std::exchange(result.report, std::move(report)));
-    active.reporting.changed_at = look_;
+    active.reporting.changed_at_poll = poll_count_;
     for (RunningItem &other : running_.items) {
         if (other.place != active.place) {
-            other.reporting.other_changed_at = look_;
+            other.reporting.other_changed_at_poll = poll_count_;
         }
     }
     for (Listener *listener : listeners_) {

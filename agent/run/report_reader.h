@@ -72,8 +72,6 @@ class ReportReader
     void read_report(RunningItem &active, const Plan &plan);
     void read_late_report(Judged &judged, const Plan &plan);
     bool is_stale(RunningItem &active, const Plan &plan, const ItemReport &report);
-    std::vector<std::size_t> elements_to_come() const;
-    void mark_again(const std::vector<std::size_t> &numbers);
     void tell_late(const Place &place, bool gathers, int round, const ItemReport &report);
     void note_gathered(const ItemReport &report);
     bool was_gathered(const ItemReport &report) const;
@@ -86,7 +84,7 @@ class ReportReader
     std::vector<ItemReport> gathered_; // what an old copy may say of the gatherer
     int gathered_in_ = 0;              // the round of the last gathering
     bool marks_are_gone_ = false;      // from items' elements
-    unsigned look_ = 1;
+    unsigned poll_count_ = 1;
     bool is_saved_ = false; // and not read since
     std::chrono::steady_clock::time_point next_look_;
     struct stat plan_status_ {

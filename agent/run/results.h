@@ -7,7 +7,7 @@
 
 #include "module/processes.h"
 #include "plan/item_report.h"
-#include "util/times.h"
+#include "util/duration_stats.h"
 
 #include <chrono>
 #include <cstddef>
@@ -76,7 +76,7 @@ struct Summary {
     std::string group;
     std::string name;
     std::size_t passed = 0;
-    Times times; // of each time that it was run
+    DurationStats times; // of each time that it was run
 };
 
 // Holds one round, whatever their number.

@@ -3,10 +3,7 @@
 
 #include "run/rounds.h"
 
-#include "module/preflight.h"
 #include "module/stored_plan.h"
-#include "plan/plan.h"
-#include "plan/plan_text.h"
 #include "util/text.h"
 #include "util/write.h"
 
@@ -24,70 +21,14 @@ namespace
 
 using Clock = std::chrono::steady_clock;
 
-// --- the stored plan ----------------------------------------------------------
-
-std::string new_mark()
-{
-    static unsigned count = 0;
-    const auto now = std::chrono::system_clock::now().time_since_epoch().count();
-    return fmt::format("{:x}-{:x}", now, ++count);
-}
-
-// Shows only this run's results: removes old ones, and marks the items, to recognise
-// a stale report that is written back.
-void clear_reports(Job &job)
-{
-    std::vector<std::size_t> numbers;
-    for (const auto &target : job.targets) {
-        if (target) {
-            numbers.push_back(target->element);
-        }
-    }
-    const std::string mark = new_mark();
-    const Descriptor lock = lock_stored_plan();
-    std::string text;
-    const auto cleared = made_of_stored_plan(
-        text, [&](const std::string &plan) { return without_reports(plan, numbers, mark); });
-    if (!cleared && Plan::load_as_library(text)) {
-        return; // a forced one that is not well-formed: nobody has reported in it
-    }
-    if (!cleared) {
-        throw Failure(Cause::device, "{} is gone, or not whole any more: store it again",
-                      kStoredPlan);
-    }
-    try {
-        require_room(cleared->size());
-        replace_stored_plan(*cleared);
-    } catch (const Failure &) {
-        if (without_marks(*cleared) == without_marks(text)) {
-            return; // nothing has to go, and the disk has no room for the mark
-        }
-        throw;
-    }
-    job.mark = mark;
-}
-
-void clear_marks()
-{
-    const Descriptor lock = lock_stored_plan();
-    std::string text;
-    const auto cleared = made_of_stored_plan(text, without_marks);
-    try {
-        if (cleared && *cleared != text) {
-            replace_stored_plan(*cleared);
-        }
-    } catch (const Failure &) {
-        return; // the disk is full: they stay, and the next run replaces them
-    }
-}
-
 // --- rounds -------------------------------------------------------------------
 
 class Rounds
 {
   public:
-    Rounds(Runner &runner, Run &run, const std::vector<Listener *> &listeners, const Work &work)
-        : runner_(runner), run_(run), listeners_(listeners), work_(work)
+    Rounds(Runner &runner, Run &run, const std::vector<Listener *> &listeners,
+           const RoundPlan &plan)
+        : runner_(runner), run_(run), listeners_(listeners), plan_(plan)
     {
     }
 
@@ -114,9 +55,9 @@ class Rounds
     // Whether it has come to its end.
     bool run_one()
     {
-        for (Job job : work_.jobs) {
+        for (Job job : plan_.jobs) {
             runner_.make_way_for(job);
-            clear_reports(job);
+            job.mark = clear_reports(job.elements());
             if (!runner_.run(job)) {
                 return false;
             }
@@ -156,14 +97,14 @@ class Rounds
         for (const Suite &suite : run_.suites) {
             run_.before += count(suite.items);
         }
-        run_.suites = work_.suites;
+        run_.suites = plan_.suites;
         ++run_.round;
     }
 
     Runner &runner_;
     Run &run_;
     const std::vector<Listener *> &listeners_;
-    const Work &work_;
+    const RoundPlan &plan_;
 };
 
 // --- listeners ----------------------------------------------------------------
@@ -251,11 +192,11 @@ void begin(Run &run, const std::vector<Listener *> &listeners, Signals &signals)
 
 } // namespace
 
-bool run_rounds(const std::vector<Listener *> &listeners, const Runner::Limits &limits,
-                LibraryProcess &library, Signals &signals, Run &run, const Work &work,
+bool run_rounds(const std::vector<Listener *> &listeners, const Runner::Options &options,
+                LibraryProcess &library, Signals &signals, Run &run, const RoundPlan &plan,
                 const std::function<void()> &store)
 {
-    run.suites = work.suites;
+    run.suites = plan.suites;
     run.start = std::chrono::system_clock::now();
     begin(run, listeners, signals);
     const std::string earlier_plan = read_stored_plan().value_or("");
@@ -264,12 +205,12 @@ bool run_rounds(const std::vector<Listener *> &listeners, const Runner::Limits &
     } catch (const Failure &failure) {
         run_nothing(failure.what(), run, listeners, signals);
     }
-    Runner runner(library, signals, run, listeners, limits);
+    Runner runner(library, signals, run, listeners, options);
     runner.note_earlier_plan(earlier_plan);
     try {
-        run.finished = Rounds(runner, run, listeners, work).run_all();
+        run.finished = Rounds(runner, run, listeners, plan).run_all();
         if (!runner.broken()) {
-            clear_marks();
+            remove_marks();
         }
     } catch (const Failure &failure) {
         runner.break_off(failure.what());

@@ -57,8 +57,8 @@ int signal_of(int status)
 // --- a job --------------------------------------------------------------------
 
 Runner::Runner(LibraryProcess &library, Signals &signals, Run &run,
-               const std::vector<Listener *> &listeners, const Limits &limits)
-    : library_(library), signals_(signals), run_(run), listeners_(listeners), limits_(limits),
+               const std::vector<Listener *> &listeners, const Options &options)
+    : library_(library), signals_(signals), run_(run), listeners_(listeners), options_(options),
       reader_(run, listeners, running_)
 {
     signals_.take_suspensions();
@@ -162,8 +162,7 @@ void Runner::require_all_started()
 void Runner::require_plan()
 {
     if (!whole_stored_plan().is_usable) {
-        break_off(fmt::format("the stored plan {} is gone, or not whole any more: store it again",
-                              kStoredPlan));
+        break_off(fmt::format("the stored plan {} {}: store it again", kStoredPlan, kPlanLost));
     }
 }
 
@@ -246,7 +245,7 @@ void Runner::poll_gatherers()
         const bool has_ended = report.progress == "100" && has_result(report);
         if (active.moved_on && !active.done &&
             (has_ended || !active.gatherer_end.empty() ||
-             (!limits_.item && now() - active.moved_on_at > kForGathering))) {
+             (!options_.timeout && now() - active.moved_on_at > kForGathering))) {
             finish(active, has_ended ? std::max(active.moved_on_at, now() - reader_.since_change())
                                      : now());
         }
@@ -401,7 +400,7 @@ void Runner::finish(RunningItem &active, TimePoint end)
     ItemRun &result = item_at(run_, active.place);
     result.seconds = std::max(0.0, Seconds(end - active.start).count());
     result.stopping = false;
-    if (!active.stop && limits_.item && *result.seconds > limits_.item->count()) {
+    if (!active.stop && options_.timeout && *result.seconds > options_.timeout->count()) {
         active.stop = Outcome::timed_out; // over before that was seen
     }
     judge(active);

@@ -12,6 +12,7 @@
 
 #include <chrono>
 #include <cstddef>
+#include <functional>
 #include <optional>
 #include <string>
 #include <vector>
@@ -22,15 +23,16 @@ namespace fptest
 class Runner
 {
   public:
-    struct Limits {
-        std::optional<std::chrono::duration<double>> item; // then it is stopped
-        std::chrono::duration<double> grace{2};            // and after that it is killed
-        bool exit_status = false; // an item whose exit status is not 0 has failed
+    struct Options {
+        std::optional<std::chrono::duration<double>> timeout; // then an item is stopped
+        std::chrono::duration<double> grace{2};               // and after that it is killed
+        bool fail_on_exit_status = false;
+        std::function<void()> on_second_interrupt; // does not return
     };
 
     // All of them outlive the runner.
     Runner(LibraryProcess &library, Signals &signals, Run &run,
-           const std::vector<Listener *> &listeners, const Limits &limits);
+           const std::vector<Listener *> &listeners, const Options &options);
 
     // The stored plan before the run: a gatherer may have kept a copy of it.
     void note_earlier_plan(const std::string &text)
@@ -119,7 +121,7 @@ class Runner
     Signals &signals_;
     Run &run_;
     const std::vector<Listener *> &listeners_;
-    Limits limits_;
+    Options options_;
     RunningJob running_;
     ReportReader reader_;
     std::vector<Leftover> left_;             // by items of this round

@@ -12,12 +12,9 @@
 
 #include <algorithm>
 #include <csignal>
-#include <cstdio>
 #include <fmt/core.h>
-#include <poll.h>
 #include <set>
 #include <thread>
-#include <unistd.h>
 
 namespace fptest
 {
@@ -62,14 +59,7 @@ void Runner::read_signals()
             continue; // a shell that is left sends a job that it had stopped both
         }
         if (signal_ != 0) {
-            // the reports are as far as they were written; the library's process
-            // sees that this one is gone and stops what runs
-            pollfd errors{STDERR_FILENO, POLLOUT, 0};
-            if (poll(&errors, 1, 0) > 0) { // a terminal may be stopped
-                std::fputs("\nfptest: interrupted again: exiting now, stopping the running item\n",
-                           stderr);
-            }
-            _exit(static_cast<int>(128 + SIGINT));
+            options_.on_second_interrupt();
         }
         signal_ = signal;
         signal_taken_at_ = now();
@@ -107,7 +97,8 @@ void Runner::suspend()
 void Runner::stop_what_is_due()
 {
     for (RunningItem &active : running_.items) {
-        if (!active.done && !active.stop && limits_.item && now() - active.start > *limits_.item) {
+        if (!active.done && !active.stop && options_.timeout &&
+            now() - active.start > *options_.timeout) {
             active.stop = Outcome::timed_out;
             active.stop_wanted_at = now();
         }
@@ -131,9 +122,9 @@ void Runner::stop_what_is_due()
 bool Runner::is_stuck() const
 {
     const auto silent = now() - heard_of_at_;
-    return (signal_ != 0 && now() - signal_taken_at_ > limits_.grace + kBeforeGivingUp) ||
+    return (signal_ != 0 && now() - signal_taken_at_ > options_.grace + kBeforeGivingUp) ||
            (silent > kBeforeGivingUp && library_.is_suspended()) ||
-           (limits_.item && silent > *limits_.item + kForALongPlan);
+           (options_.timeout && silent > *options_.timeout + kForALongPlan);
 }
 
 // Through the library, again and again, as the item may only just be starting; and
@@ -142,7 +133,7 @@ void Runner::try_stop(RunningItem &active)
 {
     const auto waited = now() - active.stop_wanted_at;
     const bool gatherer = active.gathers;
-    if ((!gatherer || !active.moved_on) && waited > limits_.grace + kBeforeGivingUp) {
+    if ((!gatherer || !active.moved_on) && waited > options_.grace + kBeforeGivingUp) {
         if (gatherer || item_processes().empty()) {
             library_.kill_library(); // it is that which does not go on
         } else {
@@ -165,7 +156,7 @@ void Runner::try_stop(RunningItem &active)
     }
     if (gatherer) {
         stop_gatherer(active);
-    } else if (waited > limits_.grace && signal_each(item_processes(), SIGKILL)) {
+    } else if (waited > options_.grace && signal_each(item_processes(), SIGKILL)) {
         active.was_stopped = true;
         active.killed = true;
     }
@@ -201,7 +192,7 @@ void Runner::stop_gatherer(RunningItem &active)
         signal_each(left, SIGCONT); // one that is suspended would not see it
         active.was_stopped = true;
     }
-    if (waited > limits_.grace && signal_each(left, SIGKILL)) {
+    if (waited > options_.grace && signal_each(left, SIGKILL)) {
         active.was_stopped = true;
         active.killed = true;
     }
@@ -280,12 +271,12 @@ template <typename Find> void Runner::end_all(const Find &find)
     std::set<pid_t> asked;
     for (auto left = find_all(); !left.empty(); left = find_all()) {
         const auto waited = now() - begin;
-        if (waited > limits_.grace + kBeforeGivingUp) {
+        if (waited > options_.grace + kBeforeGivingUp) {
             break_off(fmt::format("{} cannot be killed, and would report into the next round",
                                   described(left)));
             return;
         }
-        if (waited > limits_.grace) {
+        if (waited > options_.grace) {
             signal_each(left, SIGKILL);
         }
         // once: another SIGTERM would start their clean-up anew

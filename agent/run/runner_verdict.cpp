@@ -18,12 +18,12 @@ namespace
 {
 
 constexpr char kOverwrittenAfter[] =
-    "; a process with an old copy of the plan has written it over meanwhile";
+    "; a process with an old copy of the plan has since overwritten it";
 
 std::string reported(const ItemReport &report)
 {
     return report.result_without_value
-               ? "reported a result that is none of 0, 1 and -2: the plan has no text for it"
+               ? "reported a result that is not 0, 1 or -2: the plan has no text for it"
                : fmt::format("reported the result {}", report.result.value_or(""));
 }
 
@@ -69,7 +69,7 @@ void Runner::judge(const RunningItem &active)
             active.gatherer_end.empty() ? " after " + fine_duration(kForGathering.count()) : "",
             though_reported(report, run_));
         result.overruled = true;
-    } else if (limits_.exit_status && result.exit_status.value_or(0) != 0) {
+    } else if (options_.fail_on_exit_status && result.exit_status.value_or(0) != 0) {
         result.outcome = Outcome::failed;
         result.reason = fmt::format("ended with exit status {}{}", *result.exit_status,
                                     though_reported(report, run_));
@@ -112,7 +112,7 @@ void Runner::judge_report(const RunningItem &active)
 std::string Runner::why_stopped(const RunningItem &active)
 {
     if (!active.was_stopped && !library_gone_.empty()) {
-        return fmt::format("past the limit of {}: {}", fine_duration(limits_.item->count()),
+        return fmt::format("past the limit of {}: {}", fine_duration(options_.timeout->count()),
                            library_gone_);
     }
     const double seconds = *item_at(run_, active.place).seconds;
@@ -120,7 +120,7 @@ std::string Runner::why_stopped(const RunningItem &active)
         return fmt::format("{} after {}, past the limit of {}",
                            active.gathers && active.gatherer_end.empty() ? "reported"
                                                                          : "ended by itself",
-                           fine_duration(seconds), fine_duration(limits_.item->count()));
+                           fine_duration(seconds), fine_duration(options_.timeout->count()));
     }
     const bool is_interrupted = active.stop == Outcome::stopped;
     if (!active.killed) {
@@ -160,7 +160,7 @@ std::string Runner::why_silent(const RunningItem &active)
         return active.gatherer_end;
     }
     if (active.reporting.lost) {
-        return "what it reported is lost: the stored plan is gone, or not whole any more";
+        return fmt::format("what it reported is lost: the stored plan {}", kPlanLost);
     }
     const std::string text = read_stored_plan().value_or("");
     if (text.empty()) {
@@ -178,9 +178,10 @@ std::string Runner::why_silent(const RunningItem &active)
         return "no report is there: there was none, or a process that has reported meanwhile "
                "has written over it with its old copy of the plan";
     }
-    return active.gathers ? fmt::format("no result was reported within {}",
-                                        fine_duration(limits_.item.value_or(kForGathering).count()))
-                          : "ended without reporting a result";
+    return active.gathers
+               ? fmt::format("no result was reported within {}",
+                             fine_duration(options_.timeout.value_or(kForGathering).count()))
+               : "ended without reporting a result";
 }
 
 } // namespace fptest

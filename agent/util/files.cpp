@@ -38,7 +38,7 @@ void fill_standard_descriptors()
 void require_standard_output(const std::string &who)
 {
     if (!standard_output_was_open) {
-        throw Failure(Cause::device, "{} wants standard output, which is closed: open it", who);
+        throw Failure(Cause::device, "{} needs standard output, which is closed: open it", who);
     }
 }
 

@@ -329,7 +329,7 @@ TEST_F(Fptest, SaysThatStandardOutputIsClosed)
         const Ended ended = run_program({"/system/bin/sh", "-c", "fptest " + command + " >&-"});
         EXPECT_EQ(ended.status, 3) << command;
         EXPECT_EQ(ended.out,
-                  "fptest: " + who + " wants standard output, which is closed: open it\n");
+                  "fptest: " + who + " needs standard output, which is closed: open it\n");
     }
     EXPECT_EQ(read_file(kPlanFile), before);
 }

@@ -416,7 +416,7 @@ TEST_F(FullDisk, SaysThatTheLogLacksItsEnd)
     const Ended ended = run_fptest({"send", "--log", log, "pingtest"});
     EXPECT_EQ(ended.status, 3);
     EXPECT_EQ(ended.err, "fptest: --log " + log +
-                             " lacks its end: No space left on device; make room, or name "
+                             " is incomplete: No space left on device; make room, or name "
                              "another file\n");
 }
 

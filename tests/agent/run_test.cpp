@@ -419,7 +419,7 @@ TEST_F(Run, RepairsAPlanThatAReportMadeUnloadableForTheNextItem)
     EXPECT_EQ(ended.status, 1);
     EXPECT_THAT(outcomes(), ElementsAre("Item: passed", "Other: failed", "Third: passed"));
     EXPECT_EQ(reasons().at(1),
-              "reported a result that is none of 0, 1 and -2: the plan has no text for it");
+              "reported a result that is not 0, 1 or -2: the plan has no text for it");
     EXPECT_EQ(description(1), "odd");
     EXPECT_THAT(without_times(ended.out), HasSubstr("G/Other: failed, result ?, T s: odd\n"));
 }

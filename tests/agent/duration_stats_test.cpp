@@ -1,7 +1,7 @@
 // SPDX-FileCopyrightText: 2026 The Quillmark authors
 // SPDX-License-Identifier: Apache-2.0
 
-#include "util/times.h"
+#include "util/duration_stats.h"
 
 #include <gtest/gtest.h>
 
@@ -10,11 +10,11 @@
 namespace
 {
 
-using fptest::Times;
+using fptest::DurationStats;
 
-TEST(Times, AreExactWhileTheyAreFew)
+TEST(DurationStats, AreExactWhileTheyAreFew)
 {
-    Times times;
+    DurationStats times;
     for (const double seconds : {0.5, 0.1, 0.4, 0.2}) {
         times.add(seconds);
     }
@@ -26,10 +26,10 @@ TEST(Times, AreExactWhileTheyAreFew)
     EXPECT_DOUBLE_EQ(times.median(), 0.4);
 }
 
-TEST(Times, HaveAMedianWithinOnePercentWhereTheyAreMany)
+TEST(DurationStats, HaveAMedianWithinOnePercentWhereTheyAreMany)
 {
     for (const double least : {0.01, 2.5, 4000.0}) {
-        Times times;
+        DurationStats times;
         for (int at = 100'000; at >= 0; --at) {
             times.add(least * (1 + at / 1000.0));
         }
@@ -40,14 +40,14 @@ TEST(Times, HaveAMedianWithinOnePercentWhereTheyAreMany)
     }
 }
 
-TEST(Times, StayWithinTheirOwnBounds)
+TEST(DurationStats, StayWithinTheirOwnBounds)
 {
-    Times times;
+    DurationStats times;
     for (int at = 0; at < 5000; ++at) {
         times.add(0);
     }
     EXPECT_EQ(times.median(), 0);
-    Times same;
+    DurationStats same;
     for (int at = 0; at < 5000; ++at) {
         same.add(1.2345);
     }

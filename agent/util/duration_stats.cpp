@@ -1,7 +1,7 @@
 // SPDX-FileCopyrightText: 2026 The Quillmark authors
 // SPDX-License-Identifier: Apache-2.0
 
-#include "util/times.h"
+#include "util/duration_stats.h"
 
 #include <algorithm>
 #include <cmath>
@@ -24,7 +24,7 @@ int bucket_of(double seconds)
 
 } // namespace
 
-void Times::add(double seconds)
+void DurationStats::add(double seconds)
 {
     least_ = count_ == 0 ? seconds : std::min(least_, seconds);
     longest_ = count_ == 0 ? seconds : std::max(longest_, seconds);
@@ -40,7 +40,7 @@ void Times::add(double seconds)
     ++buckets_[bucket_of(seconds)];
 }
 
-double Times::median() const
+double DurationStats::median() const
 {
     if (!few_.empty()) {
         return (few_[(count_ - 1) / 2] + few_[count_ / 2]) / 2;

@@ -11,7 +11,7 @@
 namespace fptest
 {
 
-class Times
+class DurationStats
 {
   public:
     void add(double seconds);
