@@ -3,6 +3,7 @@
 // The JSON lines that a run leaves.
 #include "reporters_test.h"
 
+#include <algorithm>
 #include <array>
 #include <chrono>
 #include <fcntl.h>
