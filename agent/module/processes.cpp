@@ -28,6 +28,7 @@ namespace
 struct Process {
     pid_t parent = 0;
     pid_t group = 0;
+    unsigned long long born = 0;
     char state = '?';
     std::string program; // as it was started, or the kernel's name for it
     std::string name;    // without the path
@@ -56,7 +57,10 @@ std::optional<Process> read_process(const std::filesystem::path &directory)
     process.state = stat[close + 2];
     char *end = nullptr;
     process.parent = static_cast<pid_t>(std::strtol(stat.c_str() + close + 3, &end, 10));
-    process.group = static_cast<pid_t>(std::strtol(end, nullptr, 10));
+    process.group = static_cast<pid_t>(std::strtol(end, &end, 10));
+    for (int field = 5; field < 22; ++field) {
+        process.born = std::strtoull(end, &end, 10);
+    }
     const std::string arguments = read_file(directory / "cmdline").value_or("");
     const std::string command = arguments.c_str();
     process.program = command.empty() ? stat.substr(open + 1, close - open - 1) : command;
@@ -255,7 +259,7 @@ std::vector<Leftover> ChildProcesses::of_items(const std::vector<Leftover> &left
         if (lives(process) && pid != library_ && process.group != library_ &&
             is_below(processes, pid, ancestor_) && !comes_of_gatherer(processes, pid) &&
             !comes_of_any(processes, pid, left_out)) {
-            all.push_back({process.name, pid, process.group});
+            all.push_back({process.name, pid, process.group, process.born});
         }
     }
     return all;
@@ -281,11 +285,6 @@ bool signal_each(const std::vector<Leftover> &processes, int signal)
     return found;
 }
 
-bool ChildProcesses::has_gatherer() const
-{
-    return !of_gatherer().empty();
-}
-
 std::vector<Leftover> ChildProcesses::of_gatherer() const
 {
     std::vector<Leftover> all;
@@ -294,10 +293,16 @@ std::vector<Leftover> ChildProcesses::of_gatherer() const
         if (lives(process) && pid != library_ &&
             (comes_of_gatherer(processes, pid) ||
              (process.group == library_ && is_below(processes, pid, ancestor_)))) {
-            all.push_back({process.name, pid, process.group});
+            all.push_back({process.name, pid, process.group, process.born});
         }
     }
     return all;
+}
+
+bool lives(const Leftover &process)
+{
+    const auto found = read_process(fmt::format("/proc/{}", process.process));
+    return found && lives(*found) && found->born == process.born;
 }
 
 char state_of(pid_t process)

@@ -18,7 +18,8 @@ namespace fptest
 struct Leftover {
     std::string name; // of its program, without the path
     pid_t process = 0;
-    pid_t group = 0; // of processes
+    pid_t group = 0;             // of processes
+    unsigned long long born = 0; // on the kernel's clock: its number may be another's later
 };
 
 // Whether the library takes it for a running gatherer; and the first that it takes for
@@ -58,10 +59,7 @@ class ChildProcesses
     // and the gatherer, an earlier run's as well.
     void signal_all(int signal) const;
 
-    // Whether the gatherer runs, or is being started; also one of an earlier run.
-    bool has_gatherer() const;
-
-    // Those of the gatherer, of an earlier run's as well.
+    // Those of the gatherer, also while it is being started, or of an earlier run.
     std::vector<Leftover> of_gatherer() const;
 
   private:
@@ -72,6 +70,9 @@ class ChildProcesses
 
 // Sends them a signal. False where none of them is there.
 bool signal_each(const std::vector<Leftover> &processes, int signal);
+
+// Whether it has not ended.
+bool lives(const Leftover &process);
 
 // "D", "S", ...: the state of a process as ps shows it; '?' where it has gone.
 char state_of(pid_t process);

@@ -261,7 +261,7 @@ void Runner::poll_gatherer(RunningItem &active)
         return;
     }
     active.gatherer_looked_for = now();
-    active.gatherer_missed = library_.processes().has_gatherer() ? 0 : active.gatherer_missed + 1;
+    active.gatherer_missed = note_gatherer() ? 0 : active.gatherer_missed + 1;
     if (active.gatherer_missed < 2 || now() - active.start < kBeforeMissed) {
         return;
     }
@@ -411,7 +411,7 @@ void Runner::finish(RunningItem &active, TimePoint end)
     }
     if (active.gathers && !(result.report.progress == "100" && has_result(result.report))) {
         gatherer_may_report_late_ = true;
-        signal_each(library_.processes().of_gatherer(), SIGTERM);
+        signal_each(gatherer_processes(), SIGTERM);
     }
     reader_.watch_for_late_reports(active);
     mend_stored_plan();

@@ -104,7 +104,9 @@ class Runner
     void end_stop(const LibraryProcess::Event &event);
     void cannot_stop(RunningItem &active);
     std::vector<Leftover> item_processes() const;
-    std::vector<Leftover> processes_of(const RunningItem &active) const;
+    std::vector<Leftover> processes_of(const RunningItem &active);
+    bool note_gatherer();
+    std::vector<Leftover> gatherer_processes();
     std::vector<Leftover> note_left_running(std::size_t element);
     void end_left_running();
     void end_gatherer();
@@ -125,6 +127,7 @@ class Runner
     RunningJob running_;
     ReportReader reader_;
     std::vector<Leftover> left_;             // by items of this round
+    std::vector<Leftover> gatherers_;        // also helpers that outlive the gatherer
     std::vector<std::size_t> left_elements_; // the items' elements
     SteadyClock::duration suspended_{};
     TimePoint last_suspension_;

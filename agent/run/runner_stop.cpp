@@ -187,7 +187,7 @@ void Runner::stop_gatherer(RunningItem &active)
         active.was_stopped = true;
         release_command();
     }
-    const std::vector<Leftover> left = library_.processes().of_gatherer();
+    const std::vector<Leftover> left = gatherer_processes();
     if (!is_last && !active.was_stopped && signal_each(left, SIGTERM)) {
         signal_each(left, SIGCONT); // one that is suspended would not see it
         active.was_stopped = true;
@@ -240,9 +240,28 @@ std::vector<Leftover> Runner::item_processes() const
     return library_.processes().of_items(left_);
 }
 
-std::vector<Leftover> Runner::processes_of(const RunningItem &active) const
+// Whether the gatherer runs. What comes of it is known from then on.
+bool Runner::note_gatherer()
 {
-    return active.gathers ? library_.processes().of_gatherer() : item_processes();
+    std::erase_if(gatherers_, [](const Leftover &one) { return !lives(one); });
+    const std::vector<Leftover> found = library_.processes().of_gatherer();
+    for (const Leftover &one : found) {
+        if (std::ranges::find(gatherers_, one.process, &Leftover::process) == gatherers_.end()) {
+            gatherers_.push_back(one);
+        }
+    }
+    return !found.empty();
+}
+
+std::vector<Leftover> Runner::gatherer_processes()
+{
+    note_gatherer();
+    return gatherers_;
+}
+
+std::vector<Leftover> Runner::processes_of(const RunningItem &active)
+{
+    return active.gathers ? gatherer_processes() : item_processes();
 }
 
 std::vector<Leftover> Runner::note_left_running(std::size_t element)
@@ -307,11 +326,11 @@ void Runner::make_way_for(const Job &job)
         });
         reader_.note_gathered(read_stored_plan().value_or(""), vendor_);
         // the library does not find one that is a script, and would start another beside it
-        const std::vector<Leftover> running = library_.processes().of_gatherer();
+        const std::vector<Leftover> running = gatherer_processes();
         if (gatherer_may_report_late_ || (!running.empty() && !found_as_gatherer())) {
             end_gatherer();
         }
-        gatherer_runs_ = library_.processes().has_gatherer();
+        gatherer_runs_ = note_gatherer();
         require_trigger_port(); // an item may have taken it
     }
     reader_.poll();
@@ -340,7 +359,7 @@ void Runner::end_left_running()
 
 void Runner::end_gatherer()
 {
-    end_all([this] { return library_.processes().of_gatherer(); });
+    end_all([this] { return gatherer_processes(); });
     gatherer_may_report_late_ = false;
 }
 

@@ -346,6 +346,20 @@ TEST_F(RunGatherer, MayRunAnotherProgramInItsOwnPlace)
     }
 }
 
+TEST_F(RunGatherer, OfAnEarlierRunIsEndedWithItsHelpers)
+{
+    const support::Process gatherer(
+        {.arguments = {"sh", "-c",
+                       "exec -a " + std::string(kProbe) +
+                           " sh -c '/system/bin/Item gather; /system/bin/Third ignore-stop sleep "
+                           "1.2 report-here G SensorProbe 100 0 helper & wait'"}});
+    ASSERT_TRUE(eventually([] { return !processes_named(kProbe).empty(); }));
+    run_group({{"SensorProbe", "--help; exec sleep 30"}},
+              {"--repeat", "2", "--timeout", "0.5", "--grace", "0.3"});
+    EXPECT_THAT(outcomes(), ElementsAre("SensorProbe: timed out", "SensorProbe: timed out"));
+    EXPECT_THAT(events("progress"), IsEmpty());
+}
+
 TEST_F(RunGatherer, IsNotTheScriptThatRunsFptest)
 {
     Lines words = with_group({{"SensorProbe", "--group G --seconds 0.1"}});
