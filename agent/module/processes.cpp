@@ -26,9 +26,9 @@ struct Process {
     pid_t parent = 0;
     pid_t group = 0;
     char state = '?';
-    std::string program; // as it was started, or the kernel's name for it
+    std::string program; // argv[0], or the kernel's name for it
     std::string name;    // without the path
-    std::string script;  // that a shell runs, as it was started
+    std::string script;  // the shell's first argument that is no option
     bool gathers = false;
 };
 
@@ -84,29 +84,36 @@ Processes read_processes()
     return processes;
 }
 
-bool is_below(const Processes &processes, pid_t pid, pid_t ancestor)
+bool lives(const Process &process)
+{
+    return process.state != 'Z' && process.state != 'X';
+}
+
+// Whether the predicate holds for the process or one of its ancestors.
+template <typename Predicate>
+bool comes_of(const Processes &processes, pid_t pid, const Predicate &predicate)
 {
     for (std::size_t steps = 0; steps < processes.size(); ++steps) {
         const auto found = processes.find(pid);
         if (found == processes.end()) {
             return false;
         }
-        pid = found->second.parent;
-        if (pid == ancestor) {
+        if (predicate(*found)) {
             return true;
         }
+        pid = found->second.parent;
     }
     return false;
 }
 
-bool lives(const Process &process)
+bool is_below(const Processes &processes, pid_t pid, pid_t ancestor)
 {
-    return process.state != 'Z' && process.state != 'X';
+    return comes_of(processes, pid,
+                    [ancestor](const auto &entry) { return entry.second.parent == ancestor; });
 }
 
-// All but the ancestor and what that comes of: fptest's caller may have any name. Where
-// the vendor was another one, an earlier run may have left its gatherer, which the
-// library finds.
+// All processes except the ancestor and its own ancestors: fptest's caller may be named like
+// a gatherer. The other vendor's gatherer counts only if an earlier run left it.
 Processes read_processes(pid_t ancestor, int vendor)
 {
     Processes processes = read_processes();
@@ -127,23 +134,6 @@ Processes read_processes(pid_t ancestor, int vendor)
     return processes;
 }
 
-// Whether that holds for a process, or for one that it comes of.
-template <typename Predicate>
-bool comes_of(const Processes &processes, pid_t pid, const Predicate &predicate)
-{
-    for (std::size_t steps = 0; steps < processes.size(); ++steps) {
-        const auto found = processes.find(pid);
-        if (found == processes.end()) {
-            return false;
-        }
-        if (predicate(*found)) {
-            return true;
-        }
-        pid = found->second.parent;
-    }
-    return false;
-}
-
 bool comes_of_any(const Processes &processes, pid_t pid, const std::vector<Leftover> &others)
 {
     return comes_of(processes, pid, [&](const auto &entry) {
@@ -156,6 +146,30 @@ bool comes_of_any(const Processes &processes, pid_t pid, const std::vector<Lefto
 bool comes_of_gatherer(const Processes &processes, pid_t pid)
 {
     return comes_of(processes, pid, [](const auto &entry) { return entry.second.gathers; });
+}
+
+template <typename Predicate>
+std::vector<Leftover> leftovers(const Processes &processes, pid_t left_out,
+                                const Predicate &predicate)
+{
+    std::vector<Leftover> all;
+    for (const auto &[pid, process] : processes) {
+        if (lives(process) && pid != left_out && predicate(pid, process)) {
+            all.push_back({process.name, pid, process.group});
+        }
+    }
+    return all;
+}
+
+template <typename Predicate>
+std::optional<std::pair<std::string, pid_t>> find_program(const Predicate &predicate)
+{
+    for (const auto &[pid, process] : read_processes()) {
+        if (lives(process) && predicate(process.program)) {
+            return std::pair(process.program, pid);
+        }
+    }
+    return std::nullopt;
 }
 
 } // namespace
@@ -194,48 +208,43 @@ std::optional<pid_t> met_by_stop(const std::string &item)
 std::optional<std::pair<std::string, pid_t>>
 process_of_any(const std::vector<std::string> &programs)
 {
-    for (const auto &[pid, process] : read_processes()) {
-        if (lives(process) && std::ranges::find(programs, process.program) != programs.end()) {
-            return std::pair(process.program, pid);
-        }
-    }
-    return std::nullopt;
+    return find_program([&](const std::string &program) {
+        return std::ranges::find(programs, program) != programs.end();
+    });
 }
 
 std::optional<std::pair<std::string, pid_t>> taken_for_gatherer()
 {
-    const std::string program = program_of(kGatherer, "");
-    for (const auto &[pid, process] : read_processes()) {
-        if (lives(process) && process.program.starts_with(program)) {
-            return std::pair(process.program, pid);
-        }
-    }
-    return std::nullopt;
+    return find_program([gatherer = program_of(kGatherer, "")](const std::string &program) {
+        return program.starts_with(gatherer);
+    });
 }
 
 std::vector<Leftover> ChildProcesses::of_items(const std::vector<Leftover> &left_out) const
 {
-    std::vector<Leftover> all;
     const Processes processes = read_processes(ancestor_, vendor_);
-    for (const auto &[pid, process] : processes) {
-        if (lives(process) && pid != library_ && process.group != library_ &&
-            is_below(processes, pid, ancestor_) && !comes_of_gatherer(processes, pid) &&
-            !comes_of_any(processes, pid, left_out)) {
-            all.push_back({process.name, pid, process.group});
-        }
-    }
-    return all;
+    return leftovers(processes, library_, [&](pid_t pid, const Process &process) {
+        return process.group != library_ && is_below(processes, pid, ancestor_) &&
+               !comes_of_gatherer(processes, pid) && !comes_of_any(processes, pid, left_out);
+    });
+}
+
+std::vector<Leftover> ChildProcesses::of_gatherer() const
+{
+    const Processes processes = read_processes(ancestor_, vendor_);
+    return leftovers(processes, library_, [&](pid_t pid, const Process &process) {
+        return comes_of_gatherer(processes, pid) ||
+               (process.group == library_ && is_below(processes, pid, ancestor_));
+    });
 }
 
 void ChildProcesses::signal_all(int signal) const
 {
     const Processes processes = read_processes(ancestor_, vendor_);
-    for (const auto &[pid, process] : processes) {
-        if (lives(process) && pid != library_ &&
-            (is_below(processes, pid, ancestor_) || comes_of_gatherer(processes, pid))) {
-            kill(pid, signal);
-        }
-    }
+    const auto all = leftovers(processes, library_, [&](pid_t pid, const Process & /* process */) {
+        return is_below(processes, pid, ancestor_) || comes_of_gatherer(processes, pid);
+    });
+    signal_each(all, signal);
 }
 
 bool signal_each(const std::vector<Leftover> &processes, int signal)
@@ -247,23 +256,16 @@ bool signal_each(const std::vector<Leftover> &processes, int signal)
     return found;
 }
 
+bool ask_to_end(const std::vector<Leftover> &processes)
+{
+    const bool found = signal_each(processes, SIGTERM);
+    signal_each(processes, SIGCONT);
+    return found;
+}
+
 bool ChildProcesses::has_gatherer() const
 {
     return !of_gatherer().empty();
-}
-
-std::vector<Leftover> ChildProcesses::of_gatherer() const
-{
-    std::vector<Leftover> all;
-    const Processes processes = read_processes(ancestor_, vendor_);
-    for (const auto &[pid, process] : processes) {
-        if (lives(process) && pid != library_ &&
-            (comes_of_gatherer(processes, pid) ||
-             (process.group == library_ && is_below(processes, pid, ancestor_)))) {
-            all.push_back({process.name, pid, process.group});
-        }
-    }
-    return all;
 }
 
 char state_of(pid_t process)
