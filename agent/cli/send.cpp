@@ -112,7 +112,7 @@ class Sender
             const auto event = library_.wait(100ms, {signals_.descriptor()});
             if (event) {
                 plan = Descriptor(-1); // it is loaded before the first item is told
-                library_.pass_output(stderr, event->output);
+                library_.output().pass(stderr, event->output);
             }
             if (event && event->kind == LibraryProcess::Event::Kind::item) {
                 print_to(stderr, "vendor = {}\n", event->value);

@@ -39,8 +39,8 @@ const char *shell()
 #endif
 }
 
-// What a shell gets of this process's signals: the mask as it was, and the default
-// for those that system() ignores meanwhile, unless they were ignored before.
+// The shell gets the caller's signal mask, and the defaults of those signals that only
+// system() ignores.
 class SpawnAttributes
 {
   public:
@@ -72,7 +72,7 @@ class SpawnAttributes
     posix_spawnattr_t attributes_{};
 };
 
-// The status of the command; that of an exit with 127 where there is no shell.
+// The command's status; that of an exit with 127 if there is no shell.
 int run_by_shell(const char *command, const SpawnAttributes &attributes)
 {
     const std::array<const char *, 4> arguments{"sh", "-c", command, nullptr};

@@ -1,9 +1,8 @@
 // SPDX-FileCopyrightText: 2026 The Quillmark authors
 // SPDX-License-Identifier: Apache-2.0
 
-// The library runs its items by system() and looks at no status. This program has a
-// system() of its own, which the library finds ahead of the C library's: it does the
-// same, and tells the status.
+// The library runs its items by system() and ignores the status. This program's own
+// system(), which the linker finds before the C library's, reports it.
 #pragma once
 
 #include <functional>
@@ -11,9 +10,9 @@
 namespace fptest
 {
 
-// What is called with each status, as waitpid() gives it, before system() returns. Each
-// command then runs in a process group of its own, so that an item which signals
-// its group does not meet the library.
+// The handler is called with each status, as waitpid() gives it, before system() returns.
+// Each command then has a process group of its own, so that an item that signals its group
+// does not hit the library.
 void set_status_handler(std::function<void(int)> handler);
 
 } // namespace fptest

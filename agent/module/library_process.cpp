@@ -9,20 +9,15 @@
 #include "plan/library_rules.h"
 #include "util/failure.h"
 
-#include <algorithm>
 #include <array>
 #include <cerrno>
 #include <csignal>
 #include <cstdio>
 #include <cstdlib>
-#include <fcntl.h>
 #include <fmt/core.h>
 #include <poll.h>
-#include <sys/mman.h>
 #include <sys/prctl.h>
 #include <sys/socket.h>
-#include <sys/stat.h>
-#include <sys/syscall.h>
 #include <sys/wait.h>
 #include <system_error>
 #include <unistd.h>
@@ -32,23 +27,9 @@ namespace fptest
 namespace
 {
 
-constexpr off_t kRoomLeft = off_t{1024} * 1024;
-
 [[noreturn]] void fail(const char *what)
 {
     throw std::system_error(errno, std::generic_category(), what);
-}
-
-int make_output()
-{
-    // not by the C library's name, which old Androids lack
-    const int fd = static_cast<int>(
-        syscall(SYS_memfd_create, "fptest-output", MFD_CLOEXEC | MFD_ALLOW_SEALING));
-    if (fd < 0) {
-        fail("no memory for what items print");
-    }
-    fcntl(fd, F_SETFL, O_APPEND);
-    return fd;
 }
 
 // "NANOSECONDS OUTPUT TEXT"
@@ -66,9 +47,9 @@ LibraryProcess::Event with_moment(LibraryProcess::Event::Kind kind, const std::s
 
 } // namespace
 
-LibraryProcess::LibraryProcess() : output_(make_output())
+LibraryProcess::LibraryProcess()
 {
-    // what outlives the library's process comes to this one, and can be found
+    // what outlives the library's process becomes a child of this one, and can be found
     prctl(PR_SET_CHILD_SUBREAPER, 1);
     start();
 }
@@ -89,13 +70,13 @@ void LibraryProcess::start()
     leader_ = pid_;
     if (pid_ == 0) {
         close(control_.get());
-        serve_library(their_control.get(), output_.get());
+        serve_library(their_control.get(), output_.descriptor());
     }
 }
 
 LibraryProcess::~LibraryProcess()
 {
-    leave_output();
+    output_.leave();
     shutdown(control_.get(), SHUT_RDWR);
     if (pid_ > 0) {
         kill(pid_, SIGCONT); // an item may have suspended it
@@ -158,7 +139,7 @@ bool LibraryProcess::is_suspended() const
     return pid_ > 0 && state_of(pid_) == 'T';
 }
 
-// The library first, or it would start another item meanwhile.
+// The library first, or it could start another item meanwhile.
 void LibraryProcess::suspend()
 {
     if (pid_ > 0) {
@@ -245,12 +226,8 @@ void LibraryProcess::read_control()
         plan_ = std::move(message.text);
         has_plan_ = true;
         return;
-    case MessageKind::command:
-    case MessageKind::stop:
-    case MessageKind::read_back:
-    case MessageKind::hold:
-    case MessageKind::go_on:
-        return; // it sends none of them
+    default:
+        return; // the library's process sends none of them
     }
     events_.push_back(std::move(event));
 }
@@ -266,60 +243,24 @@ void LibraryProcess::lose()
     event.text = WIFSIGNALED(status) ? fmt::format("by signal {}", WTERMSIG(status))
                                      : fmt::format("with status {}", WEXITSTATUS(status));
     event.time = std::chrono::steady_clock::now();
-    event.output = output_size();
+    event.output = output_.size();
     events_.push_back(std::move(event));
 }
 
-off_t LibraryProcess::output_size() const
-{
-    struct stat status {
-    };
-    return fstat(output_.get(), &status) == 0 ? status.st_size : 0;
-}
-
-// A limit of a file's size counts all that was ever printed, of every item. What is left
-// running may lose what it prints right now.
 void LibraryProcess::rewind_output()
 {
-    if (!has_events() && output_size() == taken_ && ftruncate(output_.get(), 0) == 0) {
-        taken_ = 0;
-    }
-}
-
-// A gatherer that stays keeps it for what it prints: that must neither fail from the
-// first byte on nor fill the memory.
-void LibraryProcess::leave_output()
-{
-    const off_t size = output_size();
-    fcntl(output_.get(), F_SETFL, 0);
-    lseek(output_.get(), size, SEEK_SET);
-    static_cast<void>(ftruncate(output_.get(), size + kRoomLeft));
-    fcntl(output_.get(), F_ADD_SEALS, F_SEAL_GROW);
-}
-
-// An item that opens /dev/stderr anew ("> /dev/stderr") truncates it: what has been
-// taken, and is zeros since, is something else then.
-void LibraryProcess::note_truncation(off_t end)
-{
-    std::array<char, 4096> bytes{};
-    const off_t data = taken_ > 0 ? lseek(output_.get(), 0, SEEK_DATA) : -1;
-    if (data >= 0 && data < taken_) {
-        const auto size = std::min(bytes.size(), static_cast<std::size_t>(taken_ - data));
-        static_cast<void>(pread(output_.get(), bytes.data(), size, data));
-    }
-    if (end < taken_ || std::ranges::any_of(bytes, [](char byte) { return byte != 0; })) {
-        taken_ = 0;
+    if (!has_events()) {
+        output_.rewind();
     }
 }
 
 std::string LibraryProcess::take_output()
 {
-    const off_t size = output_size();
-    return has_events() ? "" : take_output(size);
+    const off_t size = output_.size();
+    return has_events() ? "" : output_.take(size);
 }
 
-// What has been printed after an event that is still to come is not what was
-// printed before it.
+// What was printed after an event must not be taken before the event.
 bool LibraryProcess::has_events() const
 {
     return !events_.empty() || has_news(std::chrono::milliseconds(0));
@@ -327,34 +268,10 @@ bool LibraryProcess::has_events() const
 
 void LibraryProcess::pass_output(std::FILE *stream)
 {
-    const off_t size = output_size();
+    const off_t size = output_.size();
     if (!has_events()) {
-        pass_output(stream, size);
+        output_.pass(stream, size);
     }
-}
-
-void LibraryProcess::pass_output(std::FILE *stream, off_t end)
-{
-    note_truncation(end);
-    while (taken_ < end) {
-        const std::string piece = take_output(std::min(end, taken_ + kOutputKept));
-        std::fwrite(piece.data(), 1, piece.size(), stream);
-    }
-}
-
-std::string LibraryProcess::take_output(off_t end)
-{
-    note_truncation(end);
-    if (end <= taken_) {
-        return {};
-    }
-    const off_t begin = std::max(taken_, end - kOutputKept);
-    std::string text(static_cast<std::size_t>(end - begin), '\0');
-    const ssize_t got = pread(output_.get(), text.data(), text.size(), begin);
-    text.resize(static_cast<std::size_t>(std::max<ssize_t>(got, 0)));
-    taken_ = end;
-    fallocate(output_.get(), FALLOC_FL_PUNCH_HOLE | FALLOC_FL_KEEP_SIZE, 0, taken_);
-    return text;
 }
 
 std::string gone_text(const LibraryProcess::Event &event)
@@ -382,7 +299,7 @@ int send_and_wait(LibraryProcess &library, const std::string &command)
 
 int ask_vendor(LibraryProcess &library)
 {
-    // a path that leads nowhere: the selector is read and told before that shows
+    // the library prints the selector before it finds that the path leads nowhere
     const int vendor = send_and_wait(library, "XMLNodePath::-/fptest asks for the vendor/-");
     if (!vendor_suffix(vendor)) {
         throw Failure(Cause::device,

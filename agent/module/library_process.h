@@ -1,13 +1,13 @@
 // SPDX-FileCopyrightText: 2026 The Quillmark authors
 // SPDX-License-Identifier: Apache-2.0
 
-// The library in a process of its own, which the agent asks by messages. A
-// terminal's Ctrl-C reaches the agent and not the items, a library that dies
-// takes no results along, and while a command runs this process calls nothing:
-// the suspension goes through the other one.
+// The library in a process of its own, which the agent sends messages. So a terminal's
+// Ctrl-C reaches the agent only, results survive a library that dies, and the agent can stop
+// an item while the library's command blocks.
 #pragma once
 
 #include "common/descriptor.h"
+#include "module/item_output.h"
 #include "module/processes.h"
 
 #include <chrono>
@@ -28,80 +28,75 @@ class LibraryProcess
   public:
     struct Event {
         enum class Kind {
-            item,      // the command has come to an item; value is the vendor
-            ended,     // that item's process has ended; value is its wait status
-            connected, // the gatherer has, and is told to gather once go_on() is called
-            returned,  // the command has returned; text is its reply
-            stopped,   // a stop has returned; value is what it returned, or kNothingToStop
-            gone,      // the process has ended; text says how
+            item,      // the command has reached an item; value is the vendor
+            ended,     // that item's process; value is its wait status
+            connected, // the gatherer, which is triggered once go_on() is called
+            returned,  // the command; text is its reply
+            stopped,   // a stop has returned; value is its result, or kNothingToStop
+            gone,      // the library's process has ended; text says how
         };
         Kind kind;
         int value = 0;
         std::string text;
-        // when it happened, and how much had been printed by then; not of a stop
+        // when it happened, and how much was printed by then; not for stopped
         std::chrono::steady_clock::time_point time;
         off_t output = 0;
-        bool left_running = false; // of ended: whether there may be processes left
+        bool left_running = false; // for ended: there may be processes left
     };
 
-    // Throws std::system_error where the process cannot be made.
-    // What the library and its items print is kept for take_output(); input they get
-    // none.
+    // Throws std::system_error if the process cannot be started. The library and its items
+    // get no input.
     LibraryProcess();
-    // Ends the process. An item that it still runs is stopped.
+    // Ends the process, and stops its item.
     ~LibraryProcess();
     LibraryProcess(const LibraryProcess &) = delete;
     LibraryProcess &operator=(const LibraryProcess &) = delete;
 
-    // Starts a command that runs items of these names. The one before must have
-    // returned.
+    // Starts a command that runs items of these names. The last one must have returned.
     void command(const std::string &text, const std::vector<std::string> &items = {});
 
-    // Asks for FPTEST_SuspendItemExecute, which is called where a process of the
-    // item is there to be stopped: before any has been started, the library would
-    // stop the first process of the system.
+    // Has FPTEST_SuspendItemExecute called, if the item has a process: otherwise the
+    // library would stop the first process of the system.
     void stop(const std::string &item);
 
-    // Holds the library at the end of each item, and before it tells a gatherer to
-    // gather, from here on, until go_on() is called: what has been reported and left
-    // can be looked at before anything else starts.
+    // From here on, holds the library at the end of each item, and before it triggers a
+    // gatherer, until go_on(): so reports and processes left running can be read before
+    // anything else starts.
     void hold_at_ends();
     void go_on();
 
-    // What runs for the library; also what a library's process that has ended left.
+    // What runs for the library, or was left by a process of it that has ended.
     ChildProcesses processes() const;
 
-    // Takes another process for the library in place of one that has ended.
+    // Starts another process if the library's has ended.
     void restart();
 
-    // Ends the library's process, where that does not answer.
+    // For a library that does not answer.
     void kill_library() const;
 
-    // Whether something has suspended it: suspend() or another process.
+    // Whether suspend() or another process has suspended it.
     bool is_suspended() const;
 
-    // Suspends the library and its items, and lets them go on.
+    // Suspends and resumes the library and its items.
     void suspend();
     void resume();
 
-    // The next event, waited for that long, or until one of the others can be read.
+    // Waits for the next event, for that long or until one of the others is readable.
     std::optional<Event> wait(std::chrono::milliseconds longest,
                               std::initializer_list<int> others = {});
 
     // The stored plan, as FPTEST_ExtractResultMsg gives it. Only between commands.
     std::string read_back();
 
-    static constexpr off_t kOutputKept = off_t{64} * 1024;
-
-    // What was printed since the last call, up to now or up to where an event says,
-    // or the last 64 KiB of it. Nothing while there are events to come first.
+    // What the library and its items print.
+    ItemOutput &output()
+    {
+        return output_;
+    }
+    // Takes, or passes on, what was printed up to now; nothing while there are events, which
+    // come first.
     std::string take_output();
-    std::string take_output(off_t end);
-
-    // Writes what was printed since the last call, all of it, up to now or up to
-    // where an event says. Nothing while there are events to come first.
     void pass_output(std::FILE *stream);
-    void pass_output(std::FILE *stream, off_t end);
 
   private:
     void start();
@@ -109,18 +104,14 @@ class LibraryProcess
     bool has_events() const;
     void read_control();
     void lose();
-    off_t output_size() const;
     void rewind_output();
-    void leave_output();
-    void note_truncation(off_t end);
 
-    pid_t pid_ = -1;    // none when it has ended
+    pid_t pid_ = -1;    // -1 once it has ended
     pid_t leader_ = -1; // of the process group that it had
     Descriptor control_{-1};
-    Descriptor output_{-1};
+    ItemOutput output_;
     bool hold_requested_ = false;
-    int vendor_ = 0; // of the item that the library came to last
-    off_t taken_ = 0;
+    int vendor_ = 0; // of the library's last item
     std::deque<Event> events_;
     std::string plan_;
     bool has_plan_ = false;
@@ -129,12 +120,12 @@ class LibraryProcess
 // Says that the library's process has ended, and what to do.
 std::string gone_text(const LibraryProcess::Event &event);
 
-// Sends a command that runs nothing, and waits for its end. Gives the vendor that
-// the library read for it; 0 where it read none. Throws a Failure where the process ends.
+// Sends a command that runs nothing and waits for its end. Returns the vendor that the
+// library read, or 0. Throws a Failure if the process ends.
 int send_and_wait(LibraryProcess &library, const std::string &command);
 
-// The vendor that the library reads; nothing is run to learn it. Throws a Failure where
-// it is none that the library runs items for.
+// The vendor that the library reads, without running anything. Throws a Failure if the
+// library runs no items for it.
 int ask_vendor(LibraryProcess &library);
 
 } // namespace fptest

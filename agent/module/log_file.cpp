@@ -23,7 +23,7 @@ namespace
 
 constexpr char kLogVariable[] = "VR_LOG_FILE";
 
-// The library's process has other descriptors than this one.
+// The library's process has descriptors of its own.
 std::string for_all_processes(const std::string &file)
 {
     static constexpr std::pair<std::string_view, std::string_view> kOwn[] = {
@@ -36,7 +36,7 @@ std::string for_all_processes(const std::string &file)
     return file;
 }
 
-// Kept open, or a FIFO's reader would see an end before the library begins.
+// Kept open, or a FIFO's reader would see its end before the library writes.
 Descriptor opened{-1};
 std::string opened_label;
 
@@ -66,7 +66,7 @@ void choose_log(const std::string &option)
     const std::string path = for_all_processes(file.second);
     Descriptor log(
         open(path.c_str(), O_WRONLY | O_CREAT | O_APPEND | O_NONBLOCK | O_CLOEXEC, 0644));
-    // the library says nothing of what it cannot write
+    // the library does not report what it cannot write
     if (!log.is_open() || write(log.get(), "", 0) < 0) {
         throw Failure(Cause::device, "{} cannot be written: {}; name another file", label(file),
                       std::strerror(errno));
@@ -80,7 +80,7 @@ std::string log_loss()
 {
     struct stat status {
     };
-    // asks for room for one byte more, which stays unwritten
+    // is there room for one more byte?
     if (opened_label.empty() || fstat(opened.get(), &status) != 0 || !S_ISREG(status.st_mode) ||
         fallocate(opened.get(), FALLOC_FL_KEEP_SIZE, status.st_size, 1) == 0 ||
         (errno != ENOSPC && errno != EDQUOT)) {

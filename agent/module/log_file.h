@@ -15,15 +15,13 @@ using NamedFile = std::pair<std::string, std::string>;
 // "--log agent.log", "VR_LOG_FILE=agent.log"
 std::string label(const NamedFile &file);
 
-// Where the library's log goes: to the file that --log names, else where VR_LOG_FILE
-// says. Its name is empty where it goes nowhere.
+// The file that --log names, or else VR_LOG_FILE; its name is empty for no log.
 NamedFile log_file(const std::string &option);
 
-// Sees to that. To be called before the library is.
+// Sends the library's log there; to be called before the library is.
 void choose_log(const std::string &option);
 
-// What keeps the library from logging to --log's file, which it says nothing of; empty
-// if nothing does. An item that reports has its run's log, and cannot help it.
+// Why --log's file is incomplete, which the library does not report; empty if it is complete.
 std::string log_loss();
 
 } // namespace fptest

@@ -63,7 +63,7 @@ void require_room(std::size_t bytes)
     if (statvfs(kDataDirectory, &disk) != 0) {
         return;
     }
-    // the file that is there is overwritten, its blocks are as good as free
+    // the old file is overwritten
     const std::size_t freed =
         stat(kStoredPlan, &old) == 0 ? static_cast<std::size_t>(old.st_blocks) * 512 : 0;
     if (static_cast<std::size_t>(disk.f_bavail) * disk.f_frsize + freed < bytes) {
@@ -77,7 +77,7 @@ void require_room(std::size_t bytes)
 Descriptor lock_device()
 {
     Descriptor directory(open(kDataDirectory, O_RDONLY | O_DIRECTORY | O_CLOEXEC));
-    // one that has only just been killed has it for a moment still
+    // an fptest that was just killed holds it for another moment
     for (int tries = 0; directory.is_open() && flock(directory.get(), LOCK_EX | LOCK_NB) != 0 &&
                         errno == EWOULDBLOCK;
          ++tries) {

@@ -1,8 +1,8 @@
 // SPDX-FileCopyrightText: 2026 The Quillmark authors
 // SPDX-License-Identifier: Apache-2.0
 
-// What a device must have before something is run on it. What is called require_...()
-// throws a Failure that says what to do.
+// What must hold before something runs on a device. Each require_...() throws a Failure that
+// says what to do.
 #pragma once
 
 #include "common/descriptor.h"
@@ -14,13 +14,13 @@
 namespace fptest
 {
 
-// That this is a device at all.
+// That this is a device, and ready.
 void require_device();
 
-// That a plan of that size can be stored.
+// That there is room for a stored plan of that size.
 void require_room(std::size_t bytes);
 
-// That nobody else runs a plan here, for as long as the descriptor is open.
+// That nobody else runs a plan here while the descriptor is open.
 Descriptor lock_device();
 
 // That the library will be able to listen for the gatherer.

@@ -30,9 +30,9 @@ struct Process {
     pid_t group = 0;
     unsigned long long born = 0;
     char state = '?';
-    std::string program; // as it was started, or the kernel's name for it
+    std::string program; // argv[0], or the kernel's name for it
     std::string name;    // without the path
-    std::string script;  // that an interpreter runs, as it was started
+    std::string script;  // what an interpreter runs
     bool gathers = false;
 };
 
@@ -97,24 +97,32 @@ Processes read_processes()
     return processes;
 }
 
-bool is_below(const Processes &processes, pid_t pid, pid_t ancestor)
+bool lives(const Process &process)
+{
+    return process.state != 'Z' && process.state != 'X';
+}
+
+// Whether the predicate holds for the process or one of its ancestors.
+template <typename Predicate>
+bool comes_of(const Processes &processes, pid_t pid, const Predicate &predicate)
 {
     for (std::size_t steps = 0; steps < processes.size(); ++steps) {
         const auto found = processes.find(pid);
         if (found == processes.end()) {
             return false;
         }
-        pid = found->second.parent;
-        if (pid == ancestor) {
+        if (predicate(*found)) {
             return true;
         }
+        pid = found->second.parent;
     }
     return false;
 }
 
-bool lives(const Process &process)
+bool is_below(const Processes &processes, pid_t pid, pid_t ancestor)
 {
-    return process.state != 'Z' && process.state != 'X';
+    return comes_of(processes, pid,
+                    [ancestor](const auto &entry) { return entry.second.parent == ancestor; });
 }
 
 // All processes except the ancestor and its own ancestors: fptest's caller may have any
@@ -157,23 +165,6 @@ Processes read_family(pid_t ancestor, int vendor)
     return processes;
 }
 
-// Whether that holds for a process, or for one that it comes of.
-template <typename Predicate>
-bool comes_of(const Processes &processes, pid_t pid, const Predicate &predicate)
-{
-    for (std::size_t steps = 0; steps < processes.size(); ++steps) {
-        const auto found = processes.find(pid);
-        if (found == processes.end()) {
-            return false;
-        }
-        if (predicate(*found)) {
-            return true;
-        }
-        pid = found->second.parent;
-    }
-    return false;
-}
-
 bool comes_of_any(const Processes &processes, pid_t pid, const std::vector<Leftover> &others)
 {
     return comes_of(processes, pid, [&](const auto &entry) {
@@ -192,6 +183,19 @@ bool comes_of_gatherer(const Processes &processes, pid_t pid)
 bool is_found_as_gatherer(const Process &process)
 {
     return lives(process) && process.program.starts_with(program_of(kGatherer, ""));
+}
+
+template <typename Predicate>
+std::vector<Leftover> leftovers(const Processes &processes, pid_t left_out,
+                                const Predicate &predicate)
+{
+    std::vector<Leftover> all;
+    for (const auto &[pid, process] : processes) {
+        if (lives(process) && pid != left_out && predicate(pid, process)) {
+            all.push_back({process.name, pid, process.group, process.born});
+        }
+    }
+    return all;
 }
 
 } // namespace
@@ -253,27 +257,29 @@ std::optional<std::pair<std::string, pid_t>> found_as_gatherer()
 
 std::vector<Leftover> ChildProcesses::of_items(const std::vector<Leftover> &left_out) const
 {
-    std::vector<Leftover> all;
     const Processes processes = read_family(ancestor_, vendor_);
-    for (const auto &[pid, process] : processes) {
-        if (lives(process) && pid != library_ && process.group != library_ &&
-            is_below(processes, pid, ancestor_) && !comes_of_gatherer(processes, pid) &&
-            !comes_of_any(processes, pid, left_out)) {
-            all.push_back({process.name, pid, process.group, process.born});
-        }
-    }
-    return all;
+    return leftovers(processes, library_, [&](pid_t pid, const Process &process) {
+        return process.group != library_ && is_below(processes, pid, ancestor_) &&
+               !comes_of_gatherer(processes, pid) && !comes_of_any(processes, pid, left_out);
+    });
+}
+
+std::vector<Leftover> ChildProcesses::of_gatherer() const
+{
+    const Processes processes = read_family(ancestor_, vendor_);
+    return leftovers(processes, library_, [&](pid_t pid, const Process &process) {
+        return comes_of_gatherer(processes, pid) ||
+               (process.group == library_ && is_below(processes, pid, ancestor_));
+    });
 }
 
 void ChildProcesses::signal_all(int signal) const
 {
     const Processes processes = read_family(ancestor_, vendor_);
-    for (const auto &[pid, process] : processes) {
-        if (lives(process) && pid != library_ &&
-            (is_below(processes, pid, ancestor_) || comes_of_gatherer(processes, pid))) {
-            kill(pid, signal);
-        }
-    }
+    const auto all = leftovers(processes, library_, [&](pid_t pid, const Process & /* process */) {
+        return is_below(processes, pid, ancestor_) || comes_of_gatherer(processes, pid);
+    });
+    signal_each(all, signal);
 }
 
 bool signal_each(const std::vector<Leftover> &processes, int signal)
@@ -285,18 +291,11 @@ bool signal_each(const std::vector<Leftover> &processes, int signal)
     return found;
 }
 
-std::vector<Leftover> ChildProcesses::of_gatherer() const
+bool ask_to_end(const std::vector<Leftover> &processes)
 {
-    std::vector<Leftover> all;
-    const Processes processes = read_family(ancestor_, vendor_);
-    for (const auto &[pid, process] : processes) {
-        if (lives(process) && pid != library_ &&
-            (comes_of_gatherer(processes, pid) ||
-             (process.group == library_ && is_below(processes, pid, ancestor_)))) {
-            all.push_back({process.name, pid, process.group, process.born});
-        }
-    }
-    return all;
+    const bool found = signal_each(processes, SIGTERM);
+    signal_each(processes, SIGCONT);
+    return found;
 }
 
 bool lives(const Leftover &process)

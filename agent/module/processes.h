@@ -1,9 +1,11 @@
 // SPDX-FileCopyrightText: 2026 The Quillmark authors
 // SPDX-License-Identifier: Apache-2.0
 
-// The processes below the one that holds the library: an item's own, and those of
-// the gatherer, which stays when its item has ended.
+// The processes that the library has started, as /proc shows them: items, and the gatherer,
+// which goes on when its item has ended.
 #pragma once
+
+#include "module/leftover.h"
 
 #include <optional>
 #include <string>
@@ -14,67 +16,57 @@
 namespace fptest
 {
 
-// A process that an item has left running at its end.
-struct Leftover {
-    std::string name; // of its program, without the path
-    pid_t process = 0;
-    pid_t group = 0;             // of processes
-    unsigned long long born = 0; // on the kernel's clock: its number may be another's later
-};
-
-// Whether the library takes it for a running gatherer; and the first that it takes for
-// one, with its whole path.
+// Whether the library takes this process for a running gatherer.
 bool is_found_as_gatherer(pid_t process);
+// Any such process, started by its whole path.
 std::optional<std::pair<std::string, pid_t>> found_as_gatherer();
 
-// Whether one is running that a stop finds by one of the items' names: ps is
-// asked for the first characters of it.
+// Whether a stop would find a process by one of these names, of which it gives ps the first
+// characters.
 bool runs_below(pid_t ancestor, const std::vector<std::string> &items);
 
-// The one that a stop of this item meets: the first that ps lists by that name.
+// The process that a stop of this item hits: the first that ps lists by that name.
 std::optional<pid_t> met_by_stop(const std::string &item);
 
-// One that was started as one of these programs, by its whole path. All processes
-// are read once, however many programs there are.
+// A process that was started as one of these programs, by its whole path.
 std::optional<std::pair<std::string, pid_t>>
 process_of_any(const std::vector<std::string> &programs);
 
-// What a library's process has started and what came of that.
+// What a library's process has started, and what that has.
 class ChildProcesses
 {
   public:
-    // The library's process, which leads its own process group, and the one that
-    // inherits what it leaves behind when it dies; they may be the same.
+    // The ancestor inherits what the library's process leaves behind; it may be the same.
     ChildProcesses(pid_t library, pid_t ancestor, int vendor)
         : library_(library), ancestor_(ancestor), vendor_(vendor)
     {
     }
 
-    // Those of items: everything but the gatherer, which the library starts in its
-    // own process group, and what the gatherer has started. Some are left out, with
-    // all of their process groups and what they have started.
+    // Everything but the gatherer and what it has started. Those left out are so with their
+    // process groups and descendants.
     std::vector<Leftover> of_items(const std::vector<Leftover> &left_out = {}) const;
 
-    // Sends a signal to everything that a suspended run suspends: the items' processes
-    // and the gatherer, an earlier run's as well.
+    // Signals items and the gatherer, even an earlier run's.
     void signal_all(int signal) const;
 
-    // Those of the gatherer, also while it is being started, or of an earlier run.
+    // The gatherer, also while it is being started, or an earlier run's, and its descendants.
     std::vector<Leftover> of_gatherer() const;
 
   private:
     pid_t library_;
     pid_t ancestor_;
-    int vendor_; // by which the gatherer has its name
+    int vendor_; // decides the gatherer's name
 };
 
-// Sends them a signal. False where none of them is there.
+// Sends them a signal. False if all of them have gone.
 bool signal_each(const std::vector<Leftover> &processes, int signal);
 
-// Whether it has not ended.
+// As signal_each() with SIGTERM, which reaches suspended ones as well.
+bool ask_to_end(const std::vector<Leftover> &processes);
+
 bool lives(const Leftover &process);
 
-// "D", "S", ...: the state of a process as ps shows it; '?' where it has gone.
+// "D", "S", ...: the state of a process as ps shows it; '?' if it is gone.
 char state_of(pid_t process);
 
 } // namespace fptest

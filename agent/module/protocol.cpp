@@ -3,33 +3,18 @@
 
 #include "module/protocol.h"
 
+#include "util/write.h"
+
 #include <array>
 #include <cerrno>
 #include <cstdint>
 #include <cstring>
-#include <sys/socket.h>
 #include <unistd.h>
 
 namespace fptest
 {
 namespace
 {
-
-bool send_all(int fd, const char *data, std::size_t size)
-{
-    while (size > 0) {
-        const ssize_t written = ::send(fd, data, size, MSG_NOSIGNAL);
-        if (written < 0 && errno == EINTR) {
-            continue;
-        }
-        if (written < 0) {
-            return false;
-        }
-        data += written;
-        size -= static_cast<std::size_t>(written);
-    }
-    return true;
-}
 
 bool receive_all(int fd, char *data, std::size_t size)
 {
@@ -55,8 +40,8 @@ bool send_message(int socket, const Message &message)
     std::array<char, 5> head{static_cast<char>(message.kind)};
     const auto length = static_cast<std::uint32_t>(message.text.size());
     std::memcpy(head.data() + 1, &length, sizeof length);
-    return send_all(socket, head.data(), head.size()) &&
-           send_all(socket, message.text.data(), message.text.size());
+    return write_text(socket, {head.data(), head.size()}) == head.size() &&
+           write_text(socket, message.text) == message.text.size();
 }
 
 bool receive_message(int socket, Message &message)

@@ -9,7 +9,7 @@
 namespace fptest
 {
 
-// What a stop returns that found nothing to stop.
+// The result of a stop that found nothing to stop.
 inline constexpr int kNothingToStop = -2;
 
 enum class MessageKind : char {
@@ -17,14 +17,14 @@ enum class MessageKind : char {
     command = 'c',   // the command and the names of its items, a zero byte between each
     stop = 's',      // the item's name
     read_back = 'b', // nothing
-    hold = 'h',      // nothing: from here on the library is held at the two below that say so
+    hold = 'h',      // nothing: from here on the library is held at ended and connected
     go_on = 'g',     // nothing: it may go on
     // from it
-    item = 'i',      // "MOMENT VENDOR": the command has come to an item
-    ended = 'e',     // "MOMENT STATUS LEFT": its process has; whether any are left; held
-    connected = 'n', // "MOMENT": the gatherer has, and is told when the library goes on; held
+    item = 'i',      // "MOMENT VENDOR": the command has reached an item
+    ended = 'e',     // "MOMENT STATUS LEFT": the item's process; LEFT is 1 if others may be left
+    connected = 'n', // "MOMENT": the gatherer, which is triggered once the library goes on
     returned = 'r',  // "MOMENT REPLY"
-    stopped = 'd',   // what the stop returned
+    stopped = 'd',   // the result of the stop
     plan = 'p',      // the stored plan
 };
 
@@ -33,7 +33,7 @@ struct Message {
     std::string text;
 };
 
-// Both return false where the other side is gone.
+// Both return false if the other side is gone.
 bool send_message(int socket, const Message &message);
 bool receive_message(int socket, Message &message);
 

@@ -50,12 +50,12 @@ class Server
     explicit Server(int socket) : socket_(socket)
     {
         intercept_library_output(*this);
-        set_status_handler([this](int status) { tell_ended(status); });
-        on_connection = [this] { tell_connected(); };
+        set_status_handler([this](int status) { send_ended(status); });
+        on_connection = [this] { send_connected(); };
     }
 
-    // Ends with the agent, whatever has become of it; an item that is running
-    // then is stopped, so that nothing goes on without anybody who knows.
+    // Ends when the agent is gone, for whatever reason, and stops its item, so that nothing
+    // runs on unattended.
     [[noreturn]] void serve()
     {
         Message message;
@@ -76,16 +76,11 @@ class Server
             case MessageKind::read_back:
                 answer({MessageKind::plan, read_back()});
                 break;
-            case MessageKind::item:
-            case MessageKind::ended:
-            case MessageKind::connected:
-            case MessageKind::returned:
-            case MessageKind::stopped:
-            case MessageKind::plan:
+            default:
                 break; // the agent sends none of them
             }
         }
-        // held to the end, so that the command comes to no further item
+        // never released, so that the command reaches no further item
         const std::lock_guard lock(mutex_);
         if (busy_) {
             stop(items_);
@@ -103,16 +98,16 @@ class Server
         send_message(socket_, message);
     }
 
-    // An item that has been stopped ends at once, but its end is told after this.
+    // A stopped item ends at once, but its end must be sent after this answer.
     void answer_stop(const std::string &item)
     {
         const std::lock_guard lock(mutex_);
         send_message(socket_, {MessageKind::stopped, std::to_string(stop({item}))});
     }
 
-    // What the library itself prints, "vendor = N" for each item that it comes to,
-    // goes to the agent, which learns by it when the item began and what of the
-    // output was before. The items are started with descriptor 1.
+    // The library's own stdout, "vendor = N" for each item that it reaches, goes to the
+    // agent as a message: that is when the item begins, and what was printed before is not
+    // its output. Items print to descriptor 1, which stays.
     static void intercept_library_output(Server &server)
     {
         std::fflush(stdout);
@@ -120,7 +115,7 @@ class Server
         std::FILE *own = funopen(
             &server, nullptr,
             [](void *user, const char *text, int size) {
-                static_cast<Server *>(user)->tell_item(
+                static_cast<Server *>(user)->send_item(
                     std::string(text, static_cast<size_t>(size)));
                 return size;
             },
@@ -128,7 +123,7 @@ class Server
 #else
         cookie_io_functions_t functions{};
         functions.write = [](void *user, const char *text, std::size_t size) {
-            static_cast<Server *>(user)->tell_item(std::string(text, size));
+            static_cast<Server *>(user)->send_item(std::string(text, size));
             return static_cast<ssize_t>(size);
         };
         std::FILE *own = fopencookie(&server, "w", functions);
@@ -140,7 +135,7 @@ class Server
         stdout = own;
     }
 
-    void tell_item(const std::string &line)
+    void send_item(const std::string &line)
     {
         const auto number = line.find_first_of("-0123456789");
         const std::string vendor = number == std::string::npos ? "0" : line.substr(number);
@@ -148,15 +143,13 @@ class Server
         answer({MessageKind::item, moment() + vendor});
     }
 
-    // Where that is wanted, the library is held until the agent has read what the item
-    // reported, and looked for what it has left running.
-    void tell_ended(int status)
+    void send_ended(int status)
     {
         hold_after({MessageKind::ended,
                     moment() + std::to_string(status) + (reap_children() ? " 1" : " 0")});
     }
 
-    void tell_connected()
+    void send_connected()
     {
         if (hold_requested_) {
             hold_after({MessageKind::connected, moment()});
@@ -178,8 +171,8 @@ class Server
         released_.notify_all();
     }
 
-    // What an item has left running is this process's own by now. The finished ones
-    // among them, and those that stops have left behind, are nobody's to wait for.
+    // What items and stops leave behind becomes a child of this process. True if any of it
+    // still runs.
     static bool reap_children()
     {
         pid_t child = 0;
@@ -189,19 +182,18 @@ class Server
         return child == 0;
     }
 
-    // This moment on the clock that all processes share, and in the output.
+    // "NANOSECONDS OUTPUT": the time, and how much was printed so far.
     static std::string moment()
     {
         using namespace std::chrono;
         struct stat output {
         };
-        fstat(STDOUT_FILENO, &output); // the other one is elsewhere during a stop
+        fstat(STDOUT_FILENO, &output); // a stop redirects standard error
         const auto now = steady_clock::now().time_since_epoch();
         return fmt::format("{} {} ", duration_cast<nanoseconds>(now).count(), output.st_size);
     }
 
-    // The stop's shell complains that there is no process 9: that is kept out of the
-    // item's output.
+    // The stop's shell complains that there is no process 9: not into the item's output.
     static int stop(const std::vector<std::string> &items)
     {
         if (!runs_below(getpid(), items)) {
@@ -218,8 +210,7 @@ class Server
         return stopped;
     }
 
-    // Again and again, because a script may just be starting another program; and
-    // in the end without asking.
+    // Again and again, because a script may be just starting another program.
     void end_items() const
     {
         using namespace std::chrono_literals;
@@ -235,7 +226,6 @@ class Server
         }
     }
 
-    // The command and the names of its items, a zero byte between each.
     void start(const std::string &message)
     {
         std::istringstream fields(message);
@@ -248,8 +238,7 @@ class Server
         if (command_.joinable()) {
             command_.join();
         }
-        // Nobody else waits for the gatherer and for what stops left behind, and a
-        // finished process of an item's name would be found in place of the item.
+        // a zombie with an item's name would be taken for the item
         static_cast<void>(reap_children());
         busy_ = true;
         command_ = std::thread([this, command] { run(command); });
@@ -277,12 +266,12 @@ class Server
     int socket_;
     std::mutex mutex_;
     std::condition_variable released_;
-    bool is_held_ = false; // the library
+    bool is_held_ = false;
     std::atomic<bool> hold_requested_ = false;
     std::thread command_;
     std::vector<std::string> items_;
     std::atomic<bool> busy_ = false;
-    std::atomic<int> vendor_ = 0; // of the item that the library came to last
+    std::atomic<int> vendor_ = 0; // of the library's last item
 };
 
 void move_descriptor(int from, int to)
@@ -294,11 +283,11 @@ void move_descriptor(int from, int to)
     }
 }
 
-// Signals as in a program that was just started: the items inherit them.
+// Items inherit the signals, and expect them as in a new program.
 void reset_signals()
 {
     for (const int signal : {SIGINT, SIGQUIT, SIGTERM, SIGHUP, SIGTSTP, SIGWINCH}) {
-        std::signal(signal, SIG_IGN); // one that came before, for the agent, is forgotten
+        std::signal(signal, SIG_IGN); // drops a pending one, which was meant for the agent
         std::signal(signal, SIG_DFL);
     }
     // not ignored, because items would inherit that
@@ -309,7 +298,7 @@ void reset_signals()
     sigprocmask(SIG_SETMASK, &none, nullptr);
 }
 
-// The library leaves descriptors open with each trigger and each stop.
+// The library leaks descriptors with each trigger and each stop.
 void raise_descriptor_limit()
 {
     rlimit limit{};
@@ -323,11 +312,11 @@ void raise_descriptor_limit()
 
 void serve_library(int socket, int output)
 {
-    setsid(); // first: what a terminal sends to the agent is still blocked
+    setsid(); // first, while the terminal's signals are still blocked
     reset_signals();
     raise_descriptor_limit();
-    prctl(PR_SET_CHILD_SUBREAPER, 1); // what an item leaves behind stays below
-    // a suspended agent suspends this process; one that is killed then cannot resume it
+    prctl(PR_SET_CHILD_SUBREAPER, 1); // what an item leaves running stays below this process
+    // a suspended agent suspends this process, and if it is killed then cannot resume it
     prctl(PR_SET_PDEATHSIG, SIGCONT);
     const int null = open("/dev/null", O_RDONLY | O_CLOEXEC);
     move_descriptor(null, STDIN_FILENO);
@@ -338,8 +327,8 @@ void serve_library(int socket, int output)
 
 } // namespace fptest
 
-// The library's call comes here, ahead of the platform's: nobody else knows when the
-// gatherer is about to be told.
+// The linker finds this before the platform's: it is the only sign that the gatherer is about
+// to be triggered.
 extern "C" int Accept(int descriptor, struct sockaddr *address, socklen_t *length)
 {
     static const auto platforms = reinterpret_cast<decltype(&Accept)>(dlsym(RTLD_NEXT, "Accept"));

@@ -7,9 +7,8 @@
 namespace fptest
 {
 
-// Turns this process, which was just made, into the library's: it calls the library
-// as the messages on the socket say, until their sender is gone. What the library
-// starts prints into the output and gets no input.
+// Turns this new process into the library's: it calls the library as the messages on the
+// socket say, until their sender is gone. Items print into the output and get no input.
 [[noreturn]] void serve_library(int socket, int output);
 
 } // namespace fptest

@@ -50,7 +50,7 @@ template <typename Make> void replace_if_possible(const Make &make)
 
 std::optional<std::string> read_stored_plan()
 {
-    // an item may have put a FIFO in its place
+    // an item may have replaced it by a FIFO
     return read_file(kStoredPlan, O_NONBLOCK);
 }
 
@@ -111,11 +111,11 @@ Descriptor lock_stored_plan()
         if (!plan.is_open()) {
             return plan;
         }
-        // one that hangs while it has it is not waited for without end
+        // the holder may hang
         for (int tries = 0; flock(plan.get(), LOCK_EX | LOCK_NB) != 0 && tries < 5000; ++tries) {
             std::this_thread::sleep_for(std::chrono::milliseconds(2));
         }
-        // it may have been replaced while this waited
+        // the file may have been replaced meanwhile
         struct stat held {
         };
         struct stat named {

@@ -1,7 +1,7 @@
 // SPDX-FileCopyrightText: 2026 The Quillmark authors
 // SPDX-License-Identifier: Apache-2.0
 
-// The stored plan, into which items report while it is read.
+// The stored plan, into which items report at any time.
 #pragma once
 
 #include "common/descriptor.h"
@@ -20,22 +20,21 @@ namespace fptest
 // What is said of a plan that nobody can report into any more.
 inline constexpr char kPlanLost[] = "is gone, or not whole any more";
 
-// Its text as it is; nothing where it cannot be read, errno then says why.
+// Its text; nullopt if it cannot be read, with the reason in errno.
 std::optional<std::string> read_stored_plan();
 
-// Its text; throws a Failure where it cannot be read. What to do where there is none is
-// added to "no plan is stored in ...".
+// Its text; throws a Failure if it cannot be read. The advice is added to "no plan is stored
+// in ...".
 std::string require_stored_plan(const std::string &what_to_do);
 
 // The status of its file; nullopt if there is no regular file.
 std::optional<struct stat> stored_plan_status();
 
-// Throws a Failure where something else is in its place, such as a FIFO: whoever opened
-// that could wait for ever.
+// Throws a Failure if something else is in its place: opening a FIFO could block for ever.
 void require_regular_plan();
 
-// What is made of its text. That is read again for a while where nothing can be made of
-// it: somebody may just be writing it.
+// What make() returns for its text. As long as that is empty, the text is read again for
+// half a second: somebody may be writing it.
 template <typename Make> auto made_of_stored_plan(std::string &text, const Make &make)
 {
     using Clock = std::chrono::steady_clock;
@@ -43,7 +42,7 @@ template <typename Make> auto made_of_stored_plan(std::string &text, const Make 
     for (int tries = 1;; ++tries) {
         text = read_stored_plan().value_or("");
         auto made = make(text);
-        // of a large one that is damaged each try takes its time
+        // each try takes long if the plan is large and damaged
         if (made || (tries > 1 && Clock::now() - begin > std::chrono::milliseconds(500))) {
             return made;
         }
@@ -53,22 +52,20 @@ template <typename Make> auto made_of_stored_plan(std::string &text, const Make 
 
 struct StoredPlan {
     std::string text;
-    std::optional<Plan> annotated; // nothing where it is not whole
+    std::optional<Plan> annotated; // nullopt if it is not whole
     bool is_usable = false;        // it is whole, or loads
 };
 
-// One that is not whole, and does not load, is read again for half a second.
+// Reads it again for half a second if it is not usable.
 StoredPlan whole_stored_plan();
 
-// Makes one load again that a report has spoiled, so that the next items can
-// report: a result that the library has no text for, or a null description, is left
-// without a value, and control characters and bytes that are no UTF-8 are kept as
-// they came. Throws a Failure where it cannot be written.
+// Makes it load again after a report that spoiled it, so that the next items can report: the
+// library writes a result that it has no text for, and a null description, without a value,
+// and keeps control characters and invalid UTF-8. Throws a Failure if it cannot be written.
 void mend_stored_plan();
 
-// The lock that those who report take on the stored plan, so that none writes
-// what another has just overwritten. Waits for it, 10 seconds at most, and goes on without
-// it then. A plan that is not there needs none.
+// The lock that everybody who reports takes on the stored plan, so that no report undoes
+// another. Goes on without it after 10 seconds, or if there is no plan.
 Descriptor lock_stored_plan();
 
 // Puts another text in the stored plan's place, whole or not at all; the caller holds the

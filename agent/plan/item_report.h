@@ -9,10 +9,10 @@
 namespace fptest
 {
 
-// What an item has reported, as the test plan has it.
+// What an item has reported into the plan.
 struct ItemReport {
     std::optional<std::string> progress;
-    // An attribute without a value is a result that is not 0, 1 or -2.
+    // For a result that is not 0, 1 or -2 the library writes no value.
     std::optional<std::string> result;
     bool result_without_value = false;
     std::optional<std::string> description;
@@ -23,6 +23,11 @@ struct ItemReport {
 inline bool has_result(const ItemReport &report)
 {
     return report.result || report.result_without_value;
+}
+
+inline bool has_finished(const ItemReport &report)
+{
+    return report.progress == "100" && has_result(report);
 }
 
 } // namespace fptest

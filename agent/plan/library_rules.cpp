@@ -17,14 +17,14 @@ namespace fptest
 namespace
 {
 
-constexpr std::size_t kProgramLimit = 1023; // characters of a name that are run
+constexpr std::size_t kProgramLimit = 1023; // characters of a program's name
 
 std::string up_to_any(std::string_view text, std::string_view ends)
 {
     return std::string(text.substr(0, text.find_first_of(ends)));
 }
 
-// The name as it is run, without a suffix.
+// The name without the vendor's suffix.
 std::string program_name(std::string_view name)
 {
     return up_to_any(name.substr(0, kProgramLimit), std::string_view("\t\n\0", 3));

@@ -20,9 +20,8 @@ bool is_blank(char c)
     return kXmlBlanks.find(c) != std::string_view::npos;
 }
 
-// Tags end where Mini-XML sees their end, so that its elements and these tags
-// go together: also at the first '>' of a declaration, and not at the end of a
-// comment that has nothing in it.
+// Tags end where Mini-XML ends them, so that they match its elements: a declaration at its
+// first '>', an empty comment not at its own end.
 class Scanner
 {
   public:
@@ -67,7 +66,7 @@ class Scanner
         at_ = std::min(text_.find_first_not_of(kXmlBlanks, at_), text_.size());
     }
 
-    // Passes over what comes before the first of these characters, and gives it.
+    // Skips to the first of these characters, and returns what was skipped.
     std::string read_until_any(std::string_view characters)
     {
         const std::size_t begin = at_;
@@ -75,7 +74,6 @@ class Scanner
         return std::string(text_.substr(begin, at_ - begin));
     }
 
-    // Ends the tag after the next such text.
     void end_after(std::string_view mark, std::size_t from)
     {
         const std::size_t place = text_.find(mark, from);
@@ -171,7 +169,7 @@ class Scanner
             const std::size_t close = text_.find(text_[at_], at_ + 1);
             at_ = close != text_.npos ? close + 1 : text_.size();
         } else {
-            // the first character, whatever it is, so that it goes on
+            // at least one character, or the scanner would stand still
             at_ = std::min(text_.find_first_of(" \t\r\n=/>?", at_ + 1), text_.size());
         }
         attribute.name = text_.substr(attribute.begin, at_ - attribute.begin);
@@ -207,7 +205,7 @@ class Scanner
     std::vector<Tag> tags_;
 };
 
-// Bytes of the text's first character; 1 for what is no UTF-8.
+// Bytes of the text's first character; 1 if it is not UTF-8.
 std::size_t character_length(std::string_view text)
 {
     text = text.substr(0, 4);
@@ -219,7 +217,7 @@ std::size_t character_length(std::string_view text)
     return static_cast<std::size_t>(next - text.data());
 }
 
-// Bytes of UTF-8 that an entity stands for, from its '&' to its ';'.
+// Bytes of UTF-8 that an entity ("&...;") stands for.
 std::size_t entity_length(std::string_view entity)
 {
     if (!entity.starts_with("&#")) {
@@ -246,7 +244,7 @@ std::size_t place_in_value(std::string_view text, const Attribute &attribute, st
         const std::string_view left = text.substr(at, attribute.value_end - at);
         std::size_t taken = 1;
         std::size_t read = 1;
-        if (left.starts_with(kByteOrderMark)) { // it is left out anywhere
+        if (left.starts_with(kByteOrderMark)) { // Mini-XML drops it anywhere
             taken = kByteOrderMark.size();
             read = 0;
         } else if (left.starts_with('&') && left.find(';') != left.npos) {

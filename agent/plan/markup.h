@@ -1,8 +1,7 @@
 // SPDX-FileCopyrightText: 2026 The Quillmark authors
 // SPDX-License-Identifier: Apache-2.0
 
-// Where things are in a test plan's text. The scanner takes what comes, a
-// document that is half written or breaks off included, and judges nothing.
+// Finds tags and attributes in a plan's text, even if it is malformed or half written.
 #pragma once
 
 #include <cstddef>
@@ -29,15 +28,14 @@ struct Tag {
     std::string name;      // of an element or an instruction
     std::size_t begin = 0; // offset of its '<', or of a text's first word
     std::size_t end = 0;   // after its '>', or after a text's last word
-    bool complete = true;  // whether the text goes on to its end
+    bool complete = true;  // false if the document breaks off in it
     std::vector<Attribute> attributes;
 };
 
-// The tags of a text in order; white space alone is no text.
+// The tags in order; white space alone is no text.
 std::vector<Tag> scan(std::string_view text);
 
-// Where the byte of an attribute's value is that comes that many after its first
-// one as Mini-XML reads it; for its end, after its last.
+// The offset in the text of a byte of the attribute's value, counted as Mini-XML decodes it.
 std::size_t place_in_value(std::string_view text, const Attribute &attribute, std::size_t byte);
 
 inline constexpr std::string_view kByteOrderMark = "\xEF\xBB\xBF";
@@ -46,10 +44,10 @@ inline constexpr std::string_view kByteOrderMark = "\xEF\xBB\xBF";
 struct Position {
     std::size_t line = 1;
     std::size_t column = 1;
-    std::size_t begin = 0; // of the character that the place is in
+    std::size_t begin = 0; // of its character
 };
 
-// Of places in a text that are asked for in its order.
+// Fast if places are asked for in the text's order.
 class Positions
 {
   public:
@@ -62,7 +60,7 @@ class Positions
     Position last_;
 };
 
-// The text with an empty value for each attribute of its tags that has none.
+// The text with an empty value for each attribute that has none.
 std::string with_empty_values(std::string_view text, const std::vector<Tag> &tags);
 
 } // namespace fptest

@@ -4,6 +4,7 @@
 #include "plan/plan.h"
 
 #include "common/descriptor.h"
+#include "util/files.h"
 #include "util/text.h"
 #include "util/write.h"
 
@@ -12,8 +13,6 @@
 #include <cerrno>
 #include <cstdlib>
 #include <cstring>
-#include <sys/mman.h>
-#include <sys/syscall.h>
 #include <system_error>
 #include <unistd.h>
 #include <utility>
@@ -24,8 +23,8 @@ namespace fptest
 namespace
 {
 
-// The components that the library sees in the path of this group, or of this
-// item. A name that holds a '/' is two; an empty one is no component.
+// The components that the library sees in the path of this group or item. A name with a '/'
+// is two of them, an empty one none.
 std::vector<std::string> components(const std::string &names)
 {
     std::string path = ("root/" + names).substr(0, kPathLimit);
@@ -40,9 +39,7 @@ std::vector<std::string> components(const std::string &names)
     return parts;
 }
 
-// --- Mini-XML ---------------------------------------------------------------
-
-// What Mini-XML says while this exists, which it would print otherwise.
+// Catches Mini-XML's messages, which it would print otherwise.
 class LibraryErrors
 {
   public:
@@ -69,8 +66,7 @@ class LibraryErrors
     }
 };
 
-// Mini-XML counts a line end that it has read ahead: its line is not always the
-// one that is meant.
+// Mini-XML's line number may be too high, as it counts line ends that it reads ahead.
 std::string without_line(std::string message)
 {
     constexpr std::string_view kLine = " on line ";
@@ -81,12 +77,12 @@ std::string without_line(std::string message)
     return message;
 }
 
-// A descriptor that reads this text: Mini-XML takes a text in memory for
-// ended where a file is not, and reads after the end of one in UTF-16.
+// The library has Mini-XML read a file. From memory it ends some texts elsewhere, and reads
+// beyond the end of those in UTF-16.
 Descriptor descriptor_of(std::string_view text)
 {
-    Descriptor file(static_cast<int>(syscall(SYS_memfd_create, "fptest-plan", MFD_CLOEXEC)));
-    if (file.get() < 0 || write_text(file.get(), text) < text.size() ||
+    Descriptor file = memory_file("fptest-plan");
+    if (!file.is_open() || write_text(file.get(), text) < text.size() ||
         lseek(file.get(), 0, SEEK_SET) != 0) {
         throw std::system_error(errno, std::generic_category(), "no memory for a test plan");
     }
@@ -125,14 +121,12 @@ bool has_name(mxml_node_t *node)
     return name != nullptr && *name != '\0';
 }
 
-// --- reading what is being written -------------------------------------------
-
 bool makes_element(const Tag &tag)
 {
     return tag.kind != Tag::Kind::close && tag.kind != Tag::Kind::text;
 }
 
-// Whether the text goes on to the end of its first element.
+// Whether the first element is closed.
 bool is_whole(const std::vector<Tag> &tags)
 {
     std::size_t depth = 0;
@@ -150,27 +144,20 @@ bool belongs(const Tag &tag, mxml_node_t *node)
 {
     const std::string_view name = mxmlGetElement(node);
     switch (tag.kind) {
-    case Tag::Kind::open:
-    case Tag::Kind::empty:
-        return name == tag.name;
     case Tag::Kind::comment:
-        return name.substr(0, 3) == "!--";
+        return name.starts_with("!--");
     case Tag::Kind::cdata:
-        return name.substr(0, 8) == "![CDATA[";
+        return name.starts_with("![CDATA[");
     case Tag::Kind::instruction:
-        return name.substr(0, 1) == "?";
+        return name.starts_with('?');
     case Tag::Kind::declaration:
-        return name.substr(0, 1) == "!";
-    case Tag::Kind::close:
-    case Tag::Kind::text:
-        break;
+        return name.starts_with('!');
+    default:
+        return name == tag.name;
     }
-    return false;
 }
 
 } // namespace
-
-// --- plans ----------------------------------------------------------------------
 
 std::optional<Plan> Plan::load_as_library(const std::string &text, std::string *why)
 {
@@ -204,8 +191,7 @@ Plan::Plan(Tree tree) : tree_(std::move(tree))
     note_positions();
 }
 
-// Mini-XML finds an element by going through the whole tree, and a position by
-// going from node to node: too slow for asking after every item of a long plan.
+// Mini-XML's own searches walk the tree: too slow for every item of a long plan.
 void Plan::note_names()
 {
     for (mxml_node_t *&place : elements_) {
@@ -270,7 +256,7 @@ std::optional<Plan> Plan::parse_annotated(std::string_view text)
     if (!plan) {
         return std::nullopt;
     }
-    // as the library has them in its tree: these two it leaves without a value
+    // the library leaves these two without a value in its tree
     const std::vector<Tag> places = element_tags(*plan, tags);
     for (std::size_t number = 0; number < places.size(); ++number) {
         for (const Attribute &place : places[number].attributes) {
@@ -280,16 +266,6 @@ std::optional<Plan> Plan::parse_annotated(std::string_view text)
         }
     }
     return plan;
-}
-
-mxml_node_t *Plan::top() const
-{
-    return tree_.get();
-}
-
-const std::vector<mxml_node_t *> &Plan::elements() const
-{
-    return elements_;
 }
 
 std::size_t Plan::number(mxml_node_t *node) const
@@ -379,7 +355,7 @@ std::vector<std::optional<Plan::Element>> Plan::resolve_group(const std::string 
     if (group == nullptr) {
         return run;
     }
-    mxml_node_t *item = after(group, items_); // the first item, of whatever group
+    mxml_node_t *item = after(group, items_); // which may belong to a later group
     for (mxml_node_t *child = mxmlGetFirstChild(group); child != nullptr;
          child = mxmlGetNextSibling(child)) {
         run.push_back(item != nullptr && has_name(item) ? std::optional(element(item))
@@ -401,7 +377,8 @@ std::optional<Plan::Element> Plan::resolve_item(const std::string &group,
     if (named == nullptr) {
         return std::nullopt;
     }
-    // as many steps from the first item as the named one is after its siblings
+    // the library's rule: from the first item, as many siblings on as the named item has
+    // siblings before it
     mxml_node_t *const first = after(start, items_);
     const auto &siblings = children_[number(mxmlGetParent(first))];
     const std::size_t position = positions_[number(first)] + positions_[number(named)];

@@ -1,8 +1,8 @@
 // SPDX-FileCopyrightText: 2026 The Quillmark authors
 // SPDX-License-Identifier: Apache-2.0
 
-// Test plans as the library sees them: Mini-XML loads them, and the same lookups tell
-// which item a command really runs.
+// Test plans as the library sees them: loaded by Mini-XML, with the lookups that decide which
+// item a command runs.
 #pragma once
 
 #include "plan/item_report.h"
@@ -27,19 +27,18 @@ class Plan
     // One element, as the library reads it.
     struct Element {
         std::string tag;                 // "Cmd" for an item
-        std::optional<std::string> name; // nothing where it has no such attribute
+        std::optional<std::string> name; // nullopt without such an attribute
         std::optional<std::string> args;
         ItemReport report;
         std::size_t number = 0; // among all elements of the document, comments included
     };
 
-    // Nothing where Mini-XML does not load it; why then says what it has
-    // against it, in Mini-XML's words.
+    // nullopt if Mini-XML does not load it; why then has its message.
     static std::optional<Plan> load_as_library(const std::string &text, std::string *why = nullptr);
 
-    // As load_as_library(), but for reading results: control characters and bytes that are
-    // no UTF-8 are made visible first, and attributes may lack their value.
-    // Nothing where the text is not whole, as while it is being written.
+    // For reading results: accepts attributes without a value, and makes control characters
+    // and invalid UTF-8 visible first. nullopt if the text is not whole, as while it is being
+    // written.
     static std::optional<Plan> parse_annotated(std::string_view text);
 
     struct Group {
@@ -47,30 +46,34 @@ class Plan
         std::vector<Element> items; // its direct children named Cmd
         std::size_t number = 0;
     };
-    // In document order; groups and items without a name are left out.
+    // In document order, without groups and items that have no name.
     std::vector<Group> groups() const;
 
-    // The first group of that name; null where there is none.
+    // The first group of that name, or null.
     mxml_node_t *find_group(const std::string &group) const;
 
-    // What the library runs for root/group: an entry for each of its calls,
-    // nothing where a call would find nothing to run. The path is taken as the
-    // library takes it: a '/' in the name makes one of an item.
+    // What the library runs for root/group: an entry for each of its calls, nullopt for a
+    // call that runs nothing. A '/' in the name makes it the path of an item.
     std::vector<std::optional<Element>> resolve(const std::string &group) const;
 
-    // What the library runs for root/group/item, nothing where that is nothing.
+    // What the library runs for root/group/item, if anything.
     std::optional<Element> resolve(const std::string &group, const std::string &item) const;
 
     // Every element of the document in order, comments and the like included.
-    const std::vector<mxml_node_t *> &elements() const;
+    const std::vector<mxml_node_t *> &elements() const
+    {
+        return elements_;
+    }
 
-    // What an element has reported.
     ItemReport report(std::size_t number) const;
 
-    // The place of an element of this plan in that order.
+    // An element's index in elements().
     std::size_t number(mxml_node_t *node) const;
 
-    mxml_node_t *top() const;
+    mxml_node_t *top() const
+    {
+        return tree_.get();
+    }
 
   private:
     using Tree = std::unique_ptr<mxml_node_t, void (*)(mxml_node_t *)>;
@@ -81,7 +84,7 @@ class Plan
     void note_names();
     void note_positions();
     Element element(mxml_node_t *node) const;
-    // The first of these after the start of that group.
+    // The first of these items after the start of the group.
     mxml_node_t *after(mxml_node_t *group, const Numbers &items) const;
     std::vector<std::optional<Element>> resolve_group(const std::string &name) const;
     std::optional<Element> resolve_item(const std::string &group, const std::string &name) const;
@@ -95,15 +98,13 @@ class Plan
     std::unordered_map<std::string, Numbers> items_named_;
 };
 
-// An attribute of an element; nothing where it has none.
 std::optional<std::string> attribute(mxml_node_t *node, const char *name);
 
-// An attribute's value as Mini-XML gives it back once it is saved: it drops
-// characters that it writes.
+// An attribute's value after Mini-XML has saved and loaded it: some characters get lost.
 std::string as_loaded(const std::string &value);
 
-// Those of a text's tags that a plan's elements were read from, in the same order; none
-// where the text has others than Mini-XML has seen.
+// Those of the text's tags from which the plan's elements were read, in the same order; empty
+// if they do not match.
 std::vector<Tag> element_tags(const Plan &plan, std::vector<Tag> tags);
 
 } // namespace fptest

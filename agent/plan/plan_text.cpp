@@ -14,11 +14,11 @@ namespace fptest
 namespace
 {
 
-// Copies a text, leaving out attributes with the blanks in front of them.
-class AttributeEraser
+// Copies a text. An attribute that is erased goes with the blanks in front of it.
+class AttributeEditor
 {
   public:
-    explicit AttributeEraser(const std::string &text) : text_(text)
+    explicit AttributeEditor(const std::string &text) : text_(text)
     {
     }
     void erase(const Attribute &place)
@@ -44,7 +44,7 @@ class AttributeEraser
     std::size_t done_ = 0;
 };
 
-// The tags of the text's elements; nothing where it is not whole.
+// The tags of the text's elements; nullopt if it is not whole.
 std::optional<std::vector<Tag>> whole_tags(const std::string &text)
 {
     const std::optional<Plan> plan = Plan::parse_annotated(text);
@@ -61,22 +61,22 @@ std::optional<std::string> without_reports(const std::string &text,
     if (!tags) {
         return std::nullopt;
     }
-    AttributeEraser eraser(text);
+    AttributeEditor editor(text);
     for (std::size_t number = 0; number < tags->size(); ++number) {
         const Tag &tag = (*tags)[number];
         if (tag.kind > Tag::Kind::empty || std::ranges::find(numbers, number) == numbers.end()) {
             continue;
         }
-        eraser.insert(tag.begin + 1 + tag.name.size(),
+        editor.insert(tag.begin + 1 + tag.name.size(),
                       std::string(" ") + kMark + "=\"" + mark + "\"");
         for (const Attribute &place : tag.attributes) {
             if (place.name == "progress" || place.name == "result" || place.name == "description" ||
                 place.name == kMark) {
-                eraser.erase(place);
+                editor.erase(place);
             }
         }
     }
-    return eraser.rest();
+    return editor.rest();
 }
 
 std::optional<std::string> made_loadable(const std::string &text)
@@ -94,15 +94,15 @@ std::optional<std::string> without_marks(const std::string &text)
     if (!tags) {
         return std::nullopt;
     }
-    AttributeEraser eraser(text);
+    AttributeEditor editor(text);
     for (const Tag &tag : *tags) {
         for (const Attribute &place : tag.attributes) {
             if (place.name == kMark) {
-                eraser.erase(place);
+                editor.erase(place);
             }
         }
     }
-    return eraser.rest();
+    return editor.rest();
 }
 
 } // namespace fptest

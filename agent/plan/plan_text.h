@@ -1,7 +1,7 @@
 // SPDX-FileCopyrightText: 2026 The Quillmark authors
 // SPDX-License-Identifier: Apache-2.0
 
-// The text of a plan, edited: byte for byte as it was but for what is meant.
+// Edits a plan's text, and leaves everything else byte for byte as it is.
 #pragma once
 
 #include <cstddef>
@@ -12,23 +12,21 @@
 namespace fptest
 {
 
-// An attribute by which an item's element is known to be as fptest has left it: a
-// process that saves an old copy of the plan brings back one without.
+// fptest gives this attribute to an item's element before the item runs. If it is gone, a
+// process has saved an old copy of the plan.
 inline constexpr char kMark[] = "fptest-run";
 
-// The text without the progress, result and description of these elements, which
-// get the mark; otherwise byte for byte as it was. Nothing where the text is not
-// whole.
+// The text without progress, result and description of these elements, and with the mark on
+// them; nullopt if the text is not whole.
 std::optional<std::string> without_reports(const std::string &text,
                                            const std::vector<std::size_t> &numbers,
                                            const std::string &mark);
 
-// The text made loadable, where it is whole but does not load: attributes without a
-// value get an empty one, what no plan can hold is made visible. Nothing where it
-// need not or cannot be done.
+// A text that is whole but does not load, with an empty value for attributes that have none,
+// and with invalid characters made visible; nullopt for any other text.
 std::optional<std::string> made_loadable(const std::string &text);
 
-// The text without any marks. Nothing where it is not whole.
+// The text without any marks; nullopt if it is not whole.
 std::optional<std::string> without_marks(const std::string &text);
 
 } // namespace fptest

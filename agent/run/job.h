@@ -1,7 +1,7 @@
 // SPDX-FileCopyrightText: 2026 The Quillmark authors
 // SPDX-License-Identifier: Apache-2.0
 
-// A command, and how far its items are.
+// A command, and the state of its items.
 #pragma once
 
 #include "plan/item_report.h"
@@ -18,7 +18,7 @@
 namespace fptest
 {
 
-// One command and the items that the library comes to in it.
+// One command and the items that the library reaches in it.
 struct Job {
     struct Target {
         std::size_t item = 0;    // in the suite
@@ -27,9 +27,9 @@ struct Job {
 
     std::string path;
     std::size_t suite = 0;
-    // nothing where the library comes to what it cannot run
+    // nullopt for an element that the library cannot run
     std::vector<std::optional<Target>> targets;
-    std::string mark = {}; // that their elements bear; empty for none
+    std::string mark = {}; // of the targets' elements in the stored plan; may be empty
 
     // The elements of its targets, from this one on.
     std::vector<std::size_t> elements(std::size_t from = 0) const
@@ -48,34 +48,34 @@ struct Job {
     }
 };
 
-// An item from its start until its end has been told. It runs; the library moves on, so
-// that only a gatherer is still at work; it is done; its end is told, in the order of
-// the starts.
+// An item from its start until listeners hear of its end. Its states: it runs; the library
+// has moved on, and only a gatherer still works; it is done, but one that started earlier
+// is not, and ends are announced in the order of the starts.
 struct RunningItem {
-    // The time of the run: it stands still while the run is suspended.
+    // On the run's clock, which stands still while the run is suspended.
     using TimePoint = std::chrono::steady_clock::time_point;
 
-    // How far the stored plan's report of it can be relied on.
+    // How far its report in the stored plan can be trusted.
     struct Reporting {
-        bool expected = true;     // false until a gatherer that already ran is told
-        bool overwritten = false; // an old copy of the plan has erased it; none has come since
+        bool expected = true;     // false until a gatherer that already ran is triggered
+        bool overwritten = false; // by an old copy of the plan, and nothing was reported since
         bool lost = false;        // the stored plan is gone
-        bool undone = false;      // a result was there, and has gone
+        bool undone = false;      // a result was there, and is gone
         bool in_another_plan = false;
-        // At which look it has changed last, and another's report; 0 for none.
+        // The last polls at which its report, and another item's, changed; 0 for none.
         unsigned changed_at_poll = 0;
         unsigned other_changed_at_poll = 0;
-        bool from_a_copy = false; // the gatherer's own, which has no mark
-        // The newest report, where one seen before it has come back since.
+        bool from_a_copy = false; // that the gatherer keeps, without the mark
+        // Its newest report, if an older one has replaced it.
         std::optional<ItemReport> taken_back;
         std::vector<ItemReport> seen;
 
-        // Whether others have reported meanwhile, and so saved the plan as they know it.
+        // Whether others have saved the plan meanwhile, from their own copies.
         bool is_beside_others() const
         {
             return other_changed_at_poll != 0;
         }
-        // Whether they may have done so after it, before anybody saw more of it.
+        // Whether that may have undone a report of it that nobody saw.
         bool is_uncertain() const
         {
             return is_beside_others() && other_changed_at_poll >= changed_at_poll;
@@ -96,9 +96,9 @@ struct RunningItem {
     bool done = false;
     Reporting reporting;
 
-    std::optional<Outcome> stop; // timed_out or stopped, once that is wanted
-    bool meets_other = false;    // the library's stop, not the item
-    bool was_stopped = false;    // a stop has met it
+    std::optional<Outcome> stop; // timed_out or stopped, once it has to stop
+    bool meets_other = false;    // the library's stop hits another process
+    bool was_stopped = false;    // a stop or signal has reached it
     bool killed = false;
     TimePoint stop_wanted_at;
     TimePoint stop_tried_at;
@@ -112,7 +112,7 @@ struct RunningJob {
     Job job;
     bool command_runs = false; // the library has not returned from it
     std::size_t next = 0;      // of its targets
-    // The last one is the library's current item, those before it are gatherers.
+    // The last one is the library's current item; those before it are gatherers.
     std::deque<RunningItem> items;
 };
 

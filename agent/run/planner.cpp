@@ -16,8 +16,6 @@ namespace fptest
 namespace
 {
 
-// --- paths --------------------------------------------------------------------
-
 std::vector<std::string> group_names(const Plan &plan)
 {
     std::vector<std::string> names;
@@ -103,14 +101,12 @@ void require_known(const Path &path, const Plan &plan, const std::string &plan_n
                   instead(path.item, items, "items of the group"));
 }
 
-// --- jobs ---------------------------------------------------------------------
-
 bool runs_something(const std::optional<Plan::Element> &element)
 {
     return element && element->name && !element->name->empty();
 }
 
-// What the library runs for it; a Failure where that is nothing.
+// Throws a Failure if the library runs nothing for it.
 std::vector<std::optional<Plan::Element>> resolve(const Path &path, const Plan &plan)
 {
     auto items = path.item.empty() ? plan.resolve(path.group)
@@ -123,7 +119,7 @@ std::vector<std::optional<Plan::Element>> resolve(const Path &path, const Plan &
     return items;
 }
 
-// Whether every item of the group is what a path with its name runs.
+// Whether a path with an item's name runs that item, for every item of the group.
 bool have_paths_of_their_own(const Plan &plan, const std::string &group,
                              const std::vector<std::optional<Plan::Element>> &items)
 {

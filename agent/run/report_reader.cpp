@@ -20,11 +20,11 @@ namespace fptest
 namespace
 {
 
-constexpr std::size_t kSeen = 100; // reports that are kept of an item
+constexpr std::size_t kSeen = 100; // reports kept for an item
 constexpr std::string_view kPlanName =
     std::string_view(kStoredPlan).substr(std::string_view(kStoredPlan).rfind('/') + 1);
 
-// What an element has reported. A result that is empty has been made loadable.
+// mend_stored_plan() leaves an empty result for one without a value.
 ItemReport report_of(const Plan &plan, std::size_t number)
 {
     ItemReport report = plan.report(number);
@@ -35,7 +35,7 @@ ItemReport report_of(const Plan &plan, std::size_t number)
     return report;
 }
 
-// A plan that has been made loadable has a description where there was none.
+// mend_stored_plan() leaves an empty description for one without a value.
 bool is_same(const ItemReport &one, const ItemReport &other)
 {
     return one.progress == other.progress && one.result == other.result &&
@@ -49,7 +49,7 @@ bool is_among(const std::vector<ItemReport> &reports, const ItemReport &report)
                                [&](const ItemReport &one) { return is_same(one, report); });
 }
 
-// Whether that element is the item still, and not one of another plan.
+// False if another plan has been stored meanwhile.
 bool is_item(const Plan &plan, std::size_t number, const std::string &name)
 {
     if (number >= plan.elements().size()) {
@@ -59,7 +59,7 @@ bool is_item(const Plan &plan, std::size_t number, const std::string &name)
     return found != nullptr && name == found;
 }
 
-// One without it is as a process with an old copy of the plan has written it.
+// An element without the mark was saved from an old copy of the plan.
 bool bears_mark(const Plan &plan, std::size_t number, const std::string &mark)
 {
     const char *found = mxmlElementGetAttr(plan.elements()[number], kMark);
@@ -74,11 +74,6 @@ ReportReader::ReportReader(Run &run, const std::vector<Listener *> &listeners, R
 {
     const std::string folder = std::filesystem::path(kStoredPlan).parent_path();
     inotify_add_watch(saves_.get(), folder.c_str(), IN_CLOSE_WRITE | IN_MOVED_TO);
-}
-
-int ReportReader::descriptor() const
-{
-    return saves_.get();
 }
 
 void ReportReader::poll()
@@ -102,7 +97,7 @@ void ReportReader::poll()
                    std::chrono::nanoseconds(status->st_mtim.tv_nsec);
         read(plan);
         if (!Plan::load_as_library(text)) {
-            mend_stored_plan(); // or who reports next could not
+            mend_stored_plan(); // or nobody else could report
         }
     }
     const auto end = std::chrono::steady_clock::now();
@@ -148,8 +143,8 @@ void ReportReader::read(const std::optional<Plan> &plan)
     }
 }
 
-// What a process with an old copy of the plan says of items is older than they are. A
-// gatherer's own copy is always old: what is new in it is what it has to report.
+// What an old copy of the plan says of items is older than this run of them. But a gatherer
+// always saves an old copy: a new report in it is its own.
 bool ReportReader::is_stale(RunningItem &active, const Plan &plan, const ItemReport &report)
 {
     if (bears_mark(plan, active.element, running_.job.mark)) {
@@ -187,11 +182,11 @@ void ReportReader::begin_gathering()
         active.reporting.seen.clear();
         active.reporting.taken_back.reset();
     } else if (has_result(report) && !was_gathered(report)) {
-        tell_late(active.place, true, gathered_in_ != 0 ? gathered_in_ : run_.round, report);
+        report_late(active.place, true, gathered_in_ != 0 ? gathered_in_ : run_.round, report);
     }
     const bool has_mark = bears_mark(*plan, active.element, running_.job.mark);
     if (has_result(report) || !has_mark) {
-        // where it is there still, what others have reported for items to come counts
+        // if the mark is still there, reports for later items count
         auto numbers = has_mark ? std::vector<std::size_t>() : running_.job.elements(running_.next);
         numbers.push_back(active.element);
         mark_again(numbers, running_.job.mark);
@@ -199,8 +194,9 @@ void ReportReader::begin_gathering()
     active.reporting.overwritten = false;
 }
 
-// As of the round of its item.
-void ReportReader::tell_late(const Place &place, bool gathers, int round, const ItemReport &report)
+// In the round in which the item ran.
+void ReportReader::report_late(const Place &place, bool gathers, int round,
+                               const ItemReport &report)
 {
     for (RunningItem &active : running_.items) {
         active.reporting.other_changed_at_poll = poll_count_;
@@ -313,7 +309,7 @@ void ReportReader::read_late_report(Judged &judged, const Plan &plan)
     }
     const auto &items = running_.items;
     if (std::ranges::find(items, judged.place, &RunningItem::place) != items.end()) {
-        plan_status_ = {}; // its end is told first: look again then
+        plan_status_ = {}; // its end is announced first: read again then
         return;
     }
     const ItemReport report = report_of(plan, number);
@@ -325,7 +321,7 @@ void ReportReader::read_late_report(Judged &judged, const Plan &plan)
         return;
     }
     judged.seen.push_back(report);
-    tell_late(judged.place, judged.gathers, judged.round, report);
+    report_late(judged.place, judged.gathers, judged.round, report);
 }
 
 } // namespace fptest

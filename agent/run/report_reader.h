@@ -1,8 +1,7 @@
 // SPDX-FileCopyrightText: 2026 The Quillmark authors
 // SPDX-License-Identifier: Apache-2.0
 
-// Reads from the stored plan what items report: while they run, and after they have
-// been judged.
+// Reads what items report from the stored plan, also after they were judged.
 #pragma once
 
 #include "common/descriptor.h"
@@ -27,38 +26,36 @@ class ReportReader
     // All of them outlive it.
     ReportReader(Run &run, const std::vector<Listener *> &listeners, RunningJob &running);
 
-    // What a stored plan says of gatherers before it goes: they may have kept a copy.
+    // What a plan that is about to be replaced says of gatherers, which may have a copy.
     void note_gathered(const std::string &text, int vendor);
 
-    // Can be read once somebody has saved the plan. What two processes save between two
-    // looks seems to be one change, so none is to be missed; where the system does not
-    // tell of them, -1.
-    int descriptor() const;
+    // Readable once somebody has saved the plan, so that two changes are not taken for one;
+    // -1 if the system does not report them.
+    int descriptor() const
+    {
+        return saves_.get();
+    }
 
-    // Reads the plan where it has changed; one that is being written is left for the
-    // next time.
+    // Reads the plan if it has changed; skips one that is just being written.
     void poll();
 
-    // Reads it, where it is whole.
     void read(const std::optional<Plan> &plan);
 
-    // How long ago the plan changed that poll() read last.
+    // The age of the change that poll() read last.
     std::chrono::nanoseconds since_change() const;
 
-    // The gatherer is about to be told: what is there is of an earlier gathering, or how
-    // a gatherer that has just been started gets on.
+    // The gatherer is about to be triggered: any report so far is of an earlier gathering,
+    // or progress of its start.
     void begin_gathering();
 
-    // The item has been judged.
     void watch_for_late_reports(RunningItem &active);
 
-    // Watches for late reports of these items no longer. A gatherer is watched across
-    // rounds.
+    // Stop watching for late reports; forget_round() keeps watching gatherers.
     void forget(const Job &job);
     void forget_round();
 
   private:
-    // An item that has been judged, and may be reported still.
+    // An item that may still report after it was judged.
     struct Judged {
         Place place;
         std::size_t element = 0;
@@ -72,7 +69,7 @@ class ReportReader
     void read_report(RunningItem &active, const Plan &plan);
     void read_late_report(Judged &judged, const Plan &plan);
     bool is_stale(RunningItem &active, const Plan &plan, const ItemReport &report);
-    void tell_late(const Place &place, bool gathers, int round, const ItemReport &report);
+    void report_late(const Place &place, bool gathers, int round, const ItemReport &report);
     void note_gathered(const ItemReport &report);
     bool was_gathered(const ItemReport &report) const;
 
@@ -81,7 +78,7 @@ class ReportReader
     RunningJob &running_;
     Descriptor saves_;
     std::vector<Judged> judged_;       // of this round, and gatherers
-    std::vector<ItemReport> gathered_; // what an old copy may say of the gatherer
+    std::vector<ItemReport> gathered_; // what an old copy may say of gatherers
     int gathered_in_ = 0;              // the round of the last gathering
     bool marks_are_gone_ = false;      // from items' elements
     unsigned poll_count_ = 1;
@@ -89,7 +86,7 @@ class ReportReader
     std::chrono::steady_clock::time_point next_look_;
     struct stat plan_status_ {
     };
-    std::chrono::nanoseconds changed_{}; // the plan that poll() read, on the clock of files
+    std::chrono::nanoseconds changed_{}; // of the plan that poll() read, by the file's clock
 };
 
 } // namespace fptest

@@ -26,20 +26,9 @@ Counts count(const std::vector<ItemRun> &items)
 {
     Counts counts;
     for (const ItemRun &item : items) {
-        switch (item.outcome) {
-        case Outcome::not_run:
-            ++counts.not_run;
-            break;
-        case Outcome::passed:
-            ++counts.passed;
-            break;
-        case Outcome::failed:
-        case Outcome::no_result:
-        case Outcome::timed_out:
-        case Outcome::stopped:
-            ++counts.failed;
-            break;
-        }
+        ++(item.outcome == Outcome::not_run  ? counts.not_run
+           : item.outcome == Outcome::passed ? counts.passed
+                                             : counts.failed);
     }
     return counts;
 }

@@ -1,11 +1,10 @@
 // SPDX-FileCopyrightText: 2026 The Quillmark authors
 // SPDX-License-Identifier: Apache-2.0
 
-// What a run is to do and what has become of it: filled in by the runner, read
-// by everything that shows or writes results.
+// A run and its results: the runner fills them in, listeners show or write them.
 #pragma once
 
-#include "module/processes.h"
+#include "module/leftover.h"
 #include "plan/item_report.h"
 #include "util/duration_stats.h"
 
@@ -19,12 +18,12 @@ namespace fptest
 {
 
 enum class Outcome {
-    not_run,   // and nothing was started of it
-    passed,    // it reported the code that means so
-    failed,    // it reported another one
-    no_result, // it ended and has reported no result
-    timed_out, // it took too long, however it ended
-    stopped,   // it was stopped because the run was
+    not_run,
+    passed,    // it reported the pass code
+    failed,    // it reported another code
+    no_result, // it ended without reporting a result
+    timed_out, // it took too long
+    stopped,   // with the run
 };
 
 // One item of a run.
@@ -33,21 +32,20 @@ struct ItemRun {
     std::string name;
     Outcome outcome = Outcome::not_run;
     ItemReport report;
-    std::string reason; // in words, where it has been run and has not passed; may be empty
+    std::string reason; // why it did not pass, on one line; may be empty
     std::optional<std::chrono::system_clock::time_point> start;
     std::optional<double> seconds; // how long it ran, once it has ended
-    std::string output;            // what it printed: the end of it, where that is long
+    std::string output;            // what it printed, or the end of it
     double running = 0;            // seconds so far, while it runs; a paused run does not count
-    bool stopping = false;         // it runs, and is being stopped
-    // How its process ended: at most one of both, none of the gatherer's and of what
-    // was not started.
+    bool stopping = false;         // it still runs, and is being stopped
+    // How its process ended: neither is set for a gatherer, or if nothing was started.
     std::optional<int> exit_status = std::nullopt;
     int signal = 0;
-    bool overruled = false; // it failed whatever it reported, as the reason says
+    bool overruled = false; // it failed whatever it reported; see the reason
     std::vector<Leftover> left_running = {};
 };
 
-// Items that are run in a row and belong to one group.
+// Items of one group that run in a row.
 struct Suite {
     std::string group;
     std::vector<ItemRun> items;
@@ -76,26 +74,26 @@ struct Summary {
     std::string group;
     std::string name;
     std::size_t passed = 0;
-    DurationStats times; // of each time that it was run
+    DurationStats times; // of each run of it
 };
 
-// Holds one round, whatever their number.
+// Holds the current round only.
 struct Run {
     std::string plan; // the file that the plan came from
     int round = 1;
-    std::optional<int> rounds = 1;    // at most; nothing where their number ends no run
-    std::optional<double> time_limit; // in seconds: no round begins after that
-    bool until_fail = false;          // it ends with the first item that does not pass
+    std::optional<int> rounds = 1;    // at most; nullopt for no limit
+    std::optional<double> time_limit; // seconds after which no round begins
+    bool until_fail = false;          // end with the first item that does not pass
     int pass_code = 0;
     int vendor = 0;
     std::vector<Suite> suites;    // of the round
     Counts before;                // of the rounds before it
-    std::vector<Summary> summary; // in the order of the items, once a round is over
+    std::vector<Summary> summary; // of each item; empty until a round is over
     std::chrono::system_clock::time_point start;
-    double seconds = 0;         // since the start, when last looked at
-    bool finished = false;      // all that was asked for has been done
-    std::string why_unfinished; // once it has ended without that
-    std::string why_ended;      // once it has ended within a round, as was asked for
+    double seconds = 0;         // since the start, at the last tick
+    bool finished = false;      // everything that was asked for ran
+    std::string why_unfinished; // otherwise, once it has ended
+    std::string why_ended;      // if it finished within a round
 };
 
 // Where in a run something happened.
@@ -110,22 +108,21 @@ ItemRun &item_at(Run &run, Place place);
 const ItemRun &item_at(const Run &run, Place place);
 
 Counts count(const std::vector<ItemRun> &items);
-// Of all rounds. What is left of this round, and those to come, are not run.
+// Of all rounds, those to come included.
 Counts count(const Run &run);
 
 bool has_ended(const Run &run);
-// Why some of its items have not been run: nothing while it goes on.
+// Why some of its items did not run; empty while it goes on.
 const std::string &why_not_all(const Run &run);
 
-// Whether it is, or was to be, of more than one round.
+// Whether more than one round was asked for.
 bool has_rounds(const Run &run);
 // Whether the number of rounds was known when it began.
 bool has_fixed_rounds(const Run &run);
-// The rounds that have not begun, as far as their number is known; those of a run
-// that has finished have not been asked for.
+// The rounds that have not begun, if their number is known; none once the run has finished.
 std::size_t rounds_to_come(const Run &run);
 
-// Counts the round that is over in the summary.
+// Adds the current round to the summary.
 void summarize(Run &run);
 
 // "passed", "failed", "no result", "timed out", "stopped", "not run"
@@ -134,16 +131,15 @@ const char *word(Outcome outcome);
 // "SIGSEGV", "signal 40"
 std::string name_of_signal(int signal);
 
-// " (round 2)" where there is more than one.
+// " (round 2)" if there are several.
 std::string of_round(const Run &run);
 
 // "Bringup", or "Bringup (round 2)"
 std::string title(const Run &run, const Suite &suite);
 
-// Gets told what happens, in this order: begin, then for each item started, any
-// number of progressed, ended; round_over between one round and the next; then
-// finish, also where items were not run. What is told is already in the run. None
-// may wait for its reader.
+// Is called in this order: begin; for each item started, any number of progressed, ended;
+// round_over between two rounds; finish, even if items did not run. The run is up to date at
+// each call. No call may wait for the reader of what the listener writes.
 class Listener
 {
   public:
@@ -158,19 +154,17 @@ class Listener
     virtual void ended(const Run &run, Place place) = 0;
     virtual void finish(const Run &run) = 0;
 
-    // All of a round has ended, and another one follows: the run still holds what is
-    // over.
+    // Another round follows; the run still holds the one that is over.
     virtual void round_over(const Run & /* run */)
     {
     }
 
-    // An item that had ended already has reported: that changes no outcome, and the
-    // item keeps the report that it was judged by.
+    // An item reported after it was judged. Its outcome and its report in the run stay.
     virtual void late(const Run & /* run */, Place /* place */, const ItemReport & /* report */)
     {
     }
 
-    // The run is suspended (Ctrl-Z), and goes on.
+    // Ctrl-Z suspends the run, and it goes on.
     virtual void paused(const Run & /* run */)
     {
     }
@@ -178,20 +172,19 @@ class Listener
     {
     }
 
-    // Several times a second while the run lasts.
+    // Several times a second during the run.
     virtual void tick(const Run & /* run */)
     {
     }
 
-    // Goes on with what waits for its reader, and does not wait for that. Whether
-    // all of it is written, or never will be.
+    // Writes as much as the reader takes. True once all is written, or never will be.
     virtual bool flush()
     {
         return true;
     }
 
-    // What keeps it from writing, in words: "out.json: No space left on device";
-    // empty while nothing does. A listener that has failed stays quiet.
+    // Why it cannot write, as in "out.json: No space left on device", or empty. A listener
+    // that has failed writes no more.
     virtual std::string failure() const
     {
         return {};

@@ -21,8 +21,6 @@ namespace
 
 using Clock = std::chrono::steady_clock;
 
-// --- rounds -------------------------------------------------------------------
-
 class Rounds
 {
   public:
@@ -32,7 +30,7 @@ class Rounds
     {
     }
 
-    // Whether all has been done that was asked for, and nothing of it runs any more.
+    // Whether everything ran, and nothing of it still does.
     bool run_all()
     {
         while (run_one()) {
@@ -52,7 +50,7 @@ class Rounds
     }
 
   private:
-    // Whether it has come to its end.
+    // False if the run was cut short.
     bool run_one()
     {
         for (Job job : plan_.jobs) {
@@ -83,8 +81,8 @@ class Rounds
             return false;
         }
         const ItemRun &item = item_at(run_, {job.suite, (*failed)->item});
-        run_.why_ended = fmt::format("{}/{}{} did not pass (--until-fail)", item.group, item.name,
-                                     of_round(run_));
+        run_.why_ended = fmt::format("{}{} did not pass (--until-fail)",
+                                     one_line(item.group + "/" + item.name), of_round(run_));
         return true;
     }
 
@@ -107,8 +105,6 @@ class Rounds
     const RoundPlan &plan_;
 };
 
-// --- listeners ----------------------------------------------------------------
-
 std::string failures(const std::vector<Listener *> &listeners)
 {
     std::vector<std::string> all;
@@ -120,7 +116,7 @@ std::string failures(const std::vector<Listener *> &listeners)
     return join_and(all);
 }
 
-// Nothing where standard error has no reader any more.
+// Standard error may have lost its reader.
 void say_at_end(const std::string &text)
 {
     pollfd errors{STDERR_FILENO, POLLOUT, 0};
@@ -129,8 +125,8 @@ void say_at_end(const std::string &text)
     }
 }
 
-// Now that nothing runs any more, readers are waited for: not for long where the run
-// was interrupted. False where a signal has come first, or the time is over.
+// Waits for the reports' readers, but not for long after an interrupt. False if a signal
+// comes first, or the time is up.
 bool flush(const std::vector<Listener *> &listeners, Signals &signals, bool is_interrupted)
 {
     const auto begin = Clock::now();
@@ -159,7 +155,7 @@ void finish(Run &run, const std::vector<Listener *> &listeners)
     }
 }
 
-// A terminal that closes is met as an error as well: its signal is what counts.
+// A terminal that closes causes a write error as well; its signal is what counts.
 bool is_interrupted(const Signals &signals)
 {
     pollfd signal{signals.descriptor(), POLLIN, 0};
@@ -175,8 +171,7 @@ bool is_interrupted(const Signals &signals)
     throw Failure(Cause::device, "{}", why);
 }
 
-// The view first: it writes nothing over. Where one of them fails, those that have begun
-// say so.
+// The view first, as it overwrites nothing. If one fails, those that have begun say so.
 void begin(Run &run, const std::vector<Listener *> &listeners, Signals &signals)
 {
     std::vector<Listener *> begun;

@@ -1,7 +1,7 @@
 // SPDX-FileCopyrightText: 2026 The Quillmark authors
 // SPDX-License-Identifier: Apache-2.0
 
-// Runs the rounds of a run, and tells of them.
+// Runs all rounds of a run.
 #pragma once
 
 #include "module/library_process.h"
@@ -15,9 +15,8 @@
 namespace fptest
 {
 
-// False where it was interrupted. Throws a Failure where the run, or one of its reports,
-// could not be carried through. The plan is stored once each report has been begun; where
-// that throws a Failure, they are ended.
+// Calls store() once every report has begun. False if the run was interrupted. Throws a
+// Failure if it broke off, the plan was not stored, or a report is incomplete.
 bool run_rounds(const std::vector<Listener *> &listeners, const Runner::Options &options,
                 LibraryProcess &library, Signals &signals, Run &run, const RoundPlan &plan,
                 const std::function<void()> &store);

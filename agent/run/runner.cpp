@@ -6,6 +6,7 @@
 #include "module/preflight.h"
 #include "module/stored_plan.h"
 #include "plan/plan.h"
+#include "run/verdict.h"
 #include "util/text.h"
 
 #include <algorithm>
@@ -27,18 +28,18 @@ using Seconds = std::chrono::duration<double>;
 void append_output(std::string &output, const std::string &text)
 {
     output += text;
-    constexpr auto kKept = static_cast<std::size_t>(LibraryProcess::kOutputKept);
+    constexpr auto kKept = static_cast<std::size_t>(ItemOutput::kKept);
     if (output.size() > kKept) {
         output.erase(0, output.size() - kKept);
     }
 }
 
-// A gatherer that is being started may not be there yet.
+// A gatherer that is just starting may not be visible yet.
 constexpr auto kBeforeMissed = 500ms;
 constexpr auto kBetweenPolls = 250ms;
 
-// What the item died by; 0 where it ended by itself. A shell that has not become the
-// item, as for quotes in its arguments, says so by its own exit status.
+// The signal that killed the item, or 0. A shell that did not exec the item (because of
+// quotes in its arguments, say) reports it by its own exit status.
 int signal_of(int status)
 {
     if (WIFSIGNALED(status)) {
@@ -53,8 +54,6 @@ int signal_of(int status)
 }
 
 } // namespace
-
-// --- a job --------------------------------------------------------------------
 
 Runner::Runner(LibraryProcess &library, Signals &signals, Run &run,
                const std::vector<Listener *> &listeners, const Options &options)
@@ -72,7 +71,7 @@ Runner::TimePoint Runner::now() const
 
 Runner::TimePoint Runner::on_run_clock(TimePoint time) const
 {
-    // what happened before the last suspension may be heard of after it
+    // an event may arrive after a suspension that it preceded
     return time - (time < last_suspension_ ? suspended_ - last_suspended_ : suspended_);
 }
 
@@ -108,9 +107,9 @@ bool Runner::run(const Job &job)
         }
     }
     drain_events();
-    library_.restart(); // if something has ended it since the last job: that costs nothing
-    // a process that reports, such as a gatherer, truncates the plan before it writes it:
-    // the library may load it until it has come to the first item
+    library_.restart(); // if something ended it since the last job
+    // the library loads the plan until it reaches the first item, and a process that
+    // reports meanwhile, such as a gatherer, truncates the plan before it writes it
     Descriptor plan = lock_stored_plan();
     library_.command("XMLNodePath::" + job.path, names);
     heard_of_at_ = now();
@@ -133,8 +132,7 @@ bool Runner::run(const Job &job)
     return run_.why_unfinished.empty();
 }
 
-// A command that returns without having come to its items has run nothing, for
-// whatever cause: that is no success.
+// A command that returns without reaching its items is no success, whatever the cause.
 void Runner::require_all_started()
 {
     for (; running_.next < running_.job.targets.size() && signal_ == 0; ++running_.next) {
@@ -158,7 +156,7 @@ void Runner::require_all_started()
     }
 }
 
-// Without a stored plan nothing that comes can report.
+// Without a stored plan no later item can report.
 void Runner::require_plan()
 {
     if (!whole_stored_plan().is_usable) {
@@ -194,7 +192,8 @@ void Runner::handle(const LibraryProcess::Event &event)
     }
 }
 
-// Its end between two jobs: what it has started comes to this process then.
+// The library's process may end between two jobs: what it started is this process's
+// child then.
 void Runner::drain_events()
 {
     while (const auto event = library_.wait(0ms)) {
@@ -206,14 +205,14 @@ void Runner::drain_events()
     }
 }
 
-// It costs the items that it was running; the next ones get another.
+// Only the items that it was running are lost.
 void Runner::lose_library(const LibraryProcess::Event &event)
 {
     library_gone_ = gone_text(event);
     stop_asked_ = false;
     if (!running_.items.empty()) {
         append_output(item_at(run_, running_.items.back().place).output,
-                      library_.take_output(event.output));
+                      library_.output().take(event.output));
     }
     reader_.read(whole_stored_plan().annotated);
     for (RunningItem &active : running_.items) {
@@ -236,24 +235,22 @@ void Runner::watch()
     tick();
 }
 
-// What the gatherer reports comes in its own time.
 void Runner::poll_gatherers()
 {
     for (RunningItem &active : running_.items) {
         poll_gatherer(active);
         const ItemReport &report = item_at(run_, active.place).report;
-        const bool has_ended = report.progress == "100" && has_result(report);
         if (active.moved_on && !active.done &&
-            (has_ended || !active.gatherer_end.empty() ||
+            (has_finished(report) || !active.gatherer_end.empty() ||
              (!options_.timeout && now() - active.moved_on_at > kForGathering))) {
-            finish(active, has_ended ? std::max(active.moved_on_at, now() - reader_.since_change())
-                                     : now());
+            finish(active, has_finished(report)
+                               ? std::max(active.moved_on_at, now() - reader_.since_change())
+                               : now());
         }
     }
 }
 
-// Without it the library would wait at its port without end, and what has died
-// reports no more.
+// Without a gatherer the library would wait at the trigger port for ever.
 void Runner::poll_gatherer(RunningItem &active)
 {
     if (active.done || !active.gatherer_end.empty() || !active.gathers ||
@@ -292,8 +289,6 @@ void Runner::tick()
     }
 }
 
-// --- an item's start and end --------------------------------------------------
-
 void Runner::start_next(const LibraryProcess::Event &event)
 {
     vendor_ = event.value;
@@ -328,15 +323,14 @@ void Runner::start_next(const LibraryProcess::Event &event)
     }
 }
 
-// The item's process has ended, and the library waits: what is in the plan now is
-// what the item has reported.
+// The library is held, so the plan has what the item reported, and nothing newer.
 void Runner::end_item(const LibraryProcess::Event &event)
 {
-    const std::string output = library_.take_output(event.output);
+    const std::string output = library_.output().take(event.output);
     const bool is_watched = !running_.items.empty() && !running_.items.back().moved_on;
     if (is_watched) {
         const auto plan = whole_stored_plan().annotated;
-        reader_.read(plan); // before what it has left can report again
+        reader_.read(plan); // before anything that it left running can report again
         running_.items.back().reporting.lost = !plan;
     }
     const std::vector<Leftover> left =
@@ -352,7 +346,7 @@ void Runner::end_item(const LibraryProcess::Event &event)
         const int signal = signal_of(event.value);
         if (signal == 0) {
             result.exit_status = WEXITSTATUS(event.value);
-        } else if (!active.was_stopped) { // else it is fptest's own, or the library's
+        } else if (!active.was_stopped) { // else fptest or the library sent it
             result.signal = signal;
         }
         result.left_running = left;
@@ -366,11 +360,11 @@ void Runner::end_item(const LibraryProcess::Event &event)
     }
 }
 
-// The library has gone on to its next item, or has returned: it was with the
-// gatherer, or with an item that it could not start.
+// The library went on or returned without the end of an item: that was the gatherer, or
+// could not be started.
 void Runner::move_on(const LibraryProcess::Event &event)
 {
-    const std::string output = library_.take_output(event.output);
+    const std::string output = library_.output().take(event.output);
     if (running_.items.empty()) {
         return;
     }
@@ -401,15 +395,20 @@ void Runner::finish(RunningItem &active, TimePoint end)
     result.seconds = std::max(0.0, Seconds(end - active.start).count());
     result.stopping = false;
     if (!active.stop && options_.timeout && *result.seconds > options_.timeout->count()) {
-        active.stop = Outcome::timed_out; // over before that was seen
+        active.stop = Outcome::timed_out; // ended before the limit was checked
     }
-    judge(active);
-    // the library may be at the next item of its command already, which has not been left
+    const Verdict verdict = judge(active, result,
+                                  {run_.pass_code, vendor_, options_.timeout,
+                                   options_.fail_on_exit_status, signal_, library_gone_});
+    result.outcome = verdict.outcome;
+    result.reason = verdict.reason;
+    result.overruled = verdict.overruled;
+    // the library may be at the command's next item already, which is not left running
     if (active.gathers && running_.items.size() == 1 && !active.stop &&
         running_.next >= running_.job.targets.size()) {
         result.left_running = note_left_running(active.element);
     }
-    if (active.gathers && !(result.report.progress == "100" && has_result(result.report))) {
+    if (active.gathers && !has_finished(result.report)) {
         gatherer_may_report_late_ = true;
         signal_each(gatherer_processes(), SIGTERM);
     }
@@ -417,7 +416,7 @@ void Runner::finish(RunningItem &active, TimePoint end)
     mend_stored_plan();
 }
 
-// In the order of their starts, because that is the order of their numbers.
+// In the order of their starts, which is that of their numbers.
 void Runner::notify_ended()
 {
     while (!running_.items.empty() && running_.items.front().done) {

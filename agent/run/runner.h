@@ -1,7 +1,7 @@
 // SPDX-FileCopyrightText: 2026 The Quillmark authors
 // SPDX-License-Identifier: Apache-2.0
 
-// Runs what is to be run, watches it, stops it.
+// Runs jobs, watches their items, stops them.
 #pragma once
 
 #include "module/library_process.h"
@@ -34,53 +34,48 @@ class Runner
     Runner(LibraryProcess &library, Signals &signals, Run &run,
            const std::vector<Listener *> &listeners, const Options &options);
 
-    // The stored plan before the run: a gatherer may have kept a copy of it.
+    // The stored plan before the run, of which a gatherer may have kept a copy.
     void note_earlier_plan(const std::string &text)
     {
         reader_.note_gathered(text, vendor_);
     }
 
-    // Runs a job and fills in its items. False where the run has come to its end: the run
-    // then says why.
+    // Runs a job and fills in its items. False if the run is over; the run says why.
     bool run(const Job &job);
 
-    // Whether the run goes on: no signal has come, and nothing has ended it.
     bool goes_on();
 
-    // Before the reports of its items are cleared from the plan: what an earlier
-    // run of them left running would report into this one, and is ended.
+    // Ends what earlier items left running and would report into this job. To be called
+    // before its reports are cleared from the plan.
     void make_way_for(const Job &job);
 
-    // Ends all that items have left running.
+    // Ends whatever items have left running.
     void end_round();
 
-    // The signal that interrupted the run; 0 where none has.
+    // The signal that interrupted the run, or 0.
     int signal() const
     {
         return signal_;
     }
-    // Whether the run ended because the device is not as it should be.
+    // Whether the device broke the run off.
     bool broken() const
     {
         return broken_;
     }
-    // Ends the run early: what was not run stays so, for this reason.
+    // Ends the run early; the reason is given for all that was not run.
     void give_up(const std::string &why);
-    // The same, as the device is not as it should be.
+    // The same, because of the device.
     void break_off(const std::string &why);
 
   private:
     using SteadyClock = std::chrono::steady_clock;
     using TimePoint = RunningItem::TimePoint;
 
-    // The gatherer's command returns when the gatherer has been told; its report comes in
-    // its own time.
-    static constexpr std::chrono::duration<double> kForGathering{10};
-    static constexpr std::chrono::milliseconds kTurn{25}; // at most, between two looks
+    static constexpr std::chrono::milliseconds kTurn{25}; // at most, between two polls
     static constexpr std::size_t kNoElement = static_cast<std::size_t>(-1);
 
     TimePoint now() const;
-    TimePoint on_run_clock(TimePoint time) const; // of a moment on the steady clock
+    TimePoint on_run_clock(TimePoint time) const; // of a time on the steady clock
 
     void watch();
     void handle(const LibraryProcess::Event &event);
@@ -112,10 +107,6 @@ class Runner
     void end_gatherer();
     template <typename Find> void end_all(const Find &find);
     void finish(RunningItem &active, TimePoint end);
-    void judge(const RunningItem &active);
-    void judge_report(const RunningItem &active);
-    std::string why_silent(const RunningItem &active);
-    std::string why_stopped(const RunningItem &active);
     void notify_ended();
     void tick();
 
@@ -134,13 +125,13 @@ class Runner
     SteadyClock::duration last_suspended_{};
     TimePoint began_ = now();
     TimePoint heard_of_at_ = began_; // the library
-    int vendor_ = run_.vendor;       // which the library read for the item that it came to last
+    int vendor_ = run_.vendor;       // which the library read for its last item
     int signal_ = 0;
     TimePoint signal_taken_at_;
     bool stop_asked_ = false;               // and not yet answered
     bool gatherer_runs_ = false;            // before the job's next item
-    bool gatherer_may_report_late_ = false; // it may still report what it was told in vain
-    std::string library_gone_;              // why, in the job in which its process ended
+    bool gatherer_may_report_late_ = false; // it was triggered and has not reported
+    std::string library_gone_;              // why, if its process ended in this job
     bool broken_ = false;
 };
 

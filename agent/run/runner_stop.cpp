@@ -1,8 +1,8 @@
 // SPDX-FileCopyrightText: 2026 The Quillmark authors
 // SPDX-License-Identifier: Apache-2.0
 
-// What the runner stops: an item that takes too long, all where the run is
-// interrupted, what items have left running.
+// How the runner stops items: at the time limit, at an interrupt, and what they leave
+// running.
 #include "run/runner.h"
 
 #include "module/preflight.h"
@@ -27,7 +27,7 @@ constexpr auto kBetweenStops = 250ms;
 constexpr auto kBeforeRelease = 300ms;
 constexpr auto kBeforeGivingUp = 5s; // on what was killed: device/run waits for 10 s in all
 constexpr auto kForALongPlan = 60s;  // to load and save a large plan, between two items
-// What only takes a moment longer to end has not been left running.
+// A process that ends within this was not left running.
 constexpr auto kEnding = 100ms;
 
 // "sh (pid 812, state D)"
@@ -73,8 +73,7 @@ void Runner::read_signals()
     }
 }
 
-// Nobody would watch them meanwhile, so the items stop as well, and no time passes
-// for them.
+// Nobody watches the items meanwhile, so they are suspended too, and their clock stops.
 void Runner::suspend()
 {
     for (Listener *listener : listeners_) {
@@ -107,9 +106,9 @@ void Runner::stop_what_is_due()
         try_stop(running_.items.back());
     }
     if (running_.items.empty() && running_.command_runs && is_stuck()) {
-        library_.kill_library(); // it comes to no item, and does not return
+        library_.kill_library(); // it reaches no item, and does not return
     }
-    // the library stops only what it started last: an earlier gatherer gets signals alone
+    // the library stops only what it started last: earlier gatherers are just signalled
     for (RunningItem &active : running_.items) {
         if (&active != &running_.items.back() && !active.done && active.stop) {
             stop_gatherer(active);
@@ -117,8 +116,8 @@ void Runner::stop_what_is_due()
     }
 }
 
-// Between two items: an item may have suspended the library, or put something into the
-// plan's place that is never read to its end.
+// Between two items: one may have suspended the library, or replaced the plan by something
+// that has no end.
 bool Runner::is_stuck() const
 {
     const auto silent = now() - heard_of_at_;
@@ -127,15 +126,15 @@ bool Runner::is_stuck() const
            (options_.timeout && silent > *options_.timeout + kForALongPlan);
 }
 
-// Through the library, again and again, as the item may only just be starting; and
-// by a signal that nothing can ignore where that does not help in time.
+// Asks the library again and again, as the item may be just starting; kills after the
+// grace time.
 void Runner::try_stop(RunningItem &active)
 {
     const auto waited = now() - active.stop_wanted_at;
     const bool gatherer = active.gathers;
     if ((!gatherer || !active.moved_on) && waited > options_.grace + kBeforeGivingUp) {
         if (gatherer || item_processes().empty()) {
-            library_.kill_library(); // it is that which does not go on
+            library_.kill_library(); // not an item, but the library hangs
         } else {
             cannot_stop(active);
         }
@@ -145,7 +144,7 @@ void Runner::try_stop(RunningItem &active)
         return;
     }
     active.stop_tried_at = now();
-    // once: another SIGTERM would start its clean-up anew
+    // once: a second SIGTERM would restart its clean-up
     if (!stop_asked_ && !active.was_stopped) {
         const auto met = met_by_stop(item_at(run_, active.place).name);
         active.meets_other =
@@ -162,7 +161,7 @@ void Runner::try_stop(RunningItem &active)
     }
 }
 
-// The command waits for a gatherer that does not come.
+// The command waits for a gatherer that will not connect.
 void Runner::release_command()
 {
     if (starts_no_more()) {
@@ -172,8 +171,8 @@ void Runner::release_command()
     }
 }
 
-// Whether the items that the command would come to next are not to be started: only the
-// end of the library's process keeps it from them.
+// Whether the command's next items must not start. Only the end of the library's process
+// prevents that.
 bool Runner::starts_no_more() const
 {
     return signal_ != 0 && running_.next < running_.job.targets.size();
@@ -188,8 +187,7 @@ void Runner::stop_gatherer(RunningItem &active)
         release_command();
     }
     const std::vector<Leftover> left = gatherer_processes();
-    if (!is_last && !active.was_stopped && signal_each(left, SIGTERM)) {
-        signal_each(left, SIGCONT); // one that is suspended would not see it
+    if (!is_last && !active.was_stopped && ask_to_end(left)) {
         active.was_stopped = true;
     }
     if (waited > options_.grace && signal_each(left, SIGKILL)) {
@@ -202,8 +200,8 @@ void Runner::stop_gatherer(RunningItem &active)
     }
 }
 
-// A stop does not find an item whose process has another name, as a script's is its
-// shell's, and meets another process whose name begins as the item's.
+// The library finds the process by name: it misses a script, whose process is its shell,
+// and may hit another process whose name begins like the item's.
 void Runner::end_stop(const LibraryProcess::Event &event)
 {
     stop_asked_ = false;
@@ -214,8 +212,7 @@ void Runner::end_stop(const LibraryProcess::Event &event)
     const std::vector<Leftover> processes = processes_of(active);
     if (event.value == 0 && !active.meets_other) {
         active.was_stopped = true;
-    } else if (signal_each(processes, SIGTERM)) {
-        signal_each(processes, SIGCONT); // one that is suspended would not see it
+    } else if (ask_to_end(processes)) {
         active.was_stopped = true;
     }
 }
@@ -223,18 +220,18 @@ void Runner::end_stop(const LibraryProcess::Event &event)
 void Runner::cannot_stop(RunningItem &active)
 {
     const std::vector<Leftover> left = item_processes();
-    break_off(fmt::format("{}/{} cannot be killed: {} goes on running",
-                          item_at(run_, active.place).group, item_at(run_, active.place).name,
-                          described(left)));
+    ItemRun &result = item_at(run_, active.place);
+    break_off(fmt::format("{} cannot be killed: {} goes on running",
+                          one_line(result.group + "/" + result.name), described(left)));
     active.was_stopped = true;
     active.killed = true;
     finish(active, now());
-    item_at(run_, active.place).reason += ", and goes on running";
+    result.reason += ", and goes on running";
 }
 
 // --- what they leave running ---------------------------------------------------
 
-// Those of the item that runs, and of no other that has left some.
+// Without those that earlier items left running.
 std::vector<Leftover> Runner::item_processes() const
 {
     return library_.processes().of_items(left_);
@@ -279,7 +276,7 @@ std::vector<Leftover> Runner::note_left_running(std::size_t element)
     return found;
 }
 
-// Ends the processes that are found, until none is.
+// Ends the processes found, until none is left.
 template <typename Find> void Runner::end_all(const Find &find)
 {
     const auto begin = now();
@@ -298,10 +295,9 @@ template <typename Find> void Runner::end_all(const Find &find)
         if (waited > options_.grace) {
             signal_each(left, SIGKILL);
         }
-        // once: another SIGTERM would start their clean-up anew
+        // once: a second SIGTERM would restart their clean-up
         std::erase_if(left, [&](const Leftover &one) { return !asked.insert(one.process).second; });
-        signal_each(left, SIGTERM);
-        signal_each(left, SIGCONT);
+        ask_to_end(left);
         std::this_thread::sleep_for(kTurn);
         read_signals();
         reader_.poll();
@@ -325,7 +321,7 @@ void Runner::make_way_for(const Job &job)
             return left;
         });
         reader_.note_gathered(read_stored_plan().value_or(""), vendor_);
-        // the library does not find one that is a script, and would start another beside it
+        // the library does not see one that is a script, and would start another beside it
         const std::vector<Leftover> running = gatherer_processes();
         if (gatherer_may_report_late_ || (!running.empty() && !found_as_gatherer())) {
             end_gatherer();

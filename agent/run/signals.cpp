@@ -30,7 +30,7 @@ Signals::~Signals()
     sigprocmask(SIG_SETMASK, &before_, nullptr);
 }
 
-// A signal that is blocked comes though it is ignored.
+// A blocked signal would be received even if it is ignored.
 void Signals::add(int signal)
 {
     struct sigaction now {
@@ -50,11 +50,6 @@ void Signals::receive()
     if (!descriptor_.is_open()) {
         descriptor_ = Descriptor(fd);
     }
-}
-
-int Signals::descriptor() const
-{
-    return descriptor_.get();
 }
 
 int Signals::take()

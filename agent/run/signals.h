@@ -1,7 +1,7 @@
 // SPDX-FileCopyrightText: 2026 The Quillmark authors
 // SPDX-License-Identifier: Apache-2.0
 
-// The signals that end or suspend a run, as something to wait for.
+// The signals that end or suspend a run, as a descriptor to poll.
 #pragma once
 
 #include "common/descriptor.h"
@@ -12,27 +12,28 @@
 namespace fptest
 {
 
-// SIGINT, SIGTERM and SIGHUP of this process; on request Ctrl-Z's SIGTSTP, too. One
-// that this process was started to ignore, as by nohup, stays ignored.
+// SIGINT, SIGTERM and SIGHUP, and on request Ctrl-Z's SIGTSTP; without those that the
+// caller ignores, such as nohup.
 class Signals
 {
   public:
     Signals();
-    // From here on they do again what they do by themselves; one that has come and was
-    // not taken is forgotten.
+    // Restores what they do by themselves, and drops those that were not taken.
     ~Signals();
     Signals(const Signals &) = delete;
     Signals &operator=(const Signals &) = delete;
 
-    int descriptor() const;
-    // The number of one that has come; 0 where none has.
+    int descriptor() const
+    {
+        return descriptor_.get();
+    }
+    // The number of the next one that was received, or 0.
     int take();
 
-    // From here on SIGTSTP is taken as well, and suspends nothing by itself.
+    // From here on take() returns SIGTSTP as well, which no longer suspends by itself.
     void take_suspensions();
 
-    // Does what SIGTSTP does by itself: returns when this process goes on, at once
-    // where the system lets nothing suspend it as nobody could resume it.
+    // Suspends this process and returns when it is resumed; at once if nobody could resume it.
     static void suspend();
 
   private:

@@ -23,7 +23,7 @@ void release_trigger()
     address.sin_addr.s_addr = htonl(INADDR_LOOPBACK);
     static_cast<void>(
         connect(connection.get(), reinterpret_cast<const sockaddr *>(&address), sizeof address));
-    // long enough to be accepted; nothing depends on what is read
+    // long enough to be accepted
     std::this_thread::sleep_for(std::chrono::milliseconds(25));
 }
 

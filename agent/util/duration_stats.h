@@ -1,7 +1,7 @@
 // SPDX-FileCopyrightText: 2026 The Quillmark authors
 // SPDX-License-Identifier: Apache-2.0
 
-// Least, median and longest of any number of times, in bounded memory.
+// Least, median and longest of any number of durations, in bounded memory.
 #pragma once
 
 #include <cstddef>
@@ -20,8 +20,7 @@ class DurationStats
     {
         return count_;
     }
-    // Where there are any. The median is exact while they are few, and then within
-    // 1 %, or a millisecond.
+    // Only if there are any. The median is exact for few; then within 1 %, or a millisecond.
     double least() const
     {
         return least_;
@@ -36,8 +35,8 @@ class DurationStats
     std::size_t count_ = 0;
     double least_ = 0;
     double longest_ = 0;
-    std::vector<double> few_;            // all of them, sorted; empty once they are many
-    std::map<int, std::size_t> buckets_; // then: how many, by the logarithm
+    std::vector<double> few_;            // sorted; empty once there are many
+    std::map<int, std::size_t> buckets_; // then their numbers, by the logarithm
 };
 
 } // namespace fptest

@@ -1,7 +1,7 @@
 // SPDX-FileCopyrightText: 2026 The Quillmark authors
 // SPDX-License-Identifier: Apache-2.0
 
-// What makes the program end early.
+// Errors that end the program.
 #pragma once
 
 #include <fmt/core.h>
@@ -13,10 +13,10 @@ namespace fptest
 
 enum class Cause {
     input,  // the command line, or an error in the plan
-    device, // it is not ready for it
+    device, // which is not ready
 };
 
-// One line for people: what is wrong, where, and what to do.
+// A message of one line: what is wrong, where, and what to do.
 class Failure : public std::runtime_error
 {
   public:

@@ -3,7 +3,6 @@
 
 #include "util/files.h"
 
-#include "common/descriptor.h"
 #include "util/failure.h"
 #include "util/text.h"
 

@@ -3,31 +3,43 @@
 
 #pragma once
 
+#include "common/descriptor.h"
+
 #include <cstddef>
 #include <optional>
 #include <string>
+#include <sys/mman.h>
+#include <sys/syscall.h>
+#include <unistd.h>
 
 namespace fptest
 {
 
-// What is opened later would get the number of a standard stream that is closed, and
-// what is meant for that: they are all opened.
+// Opens closed standard streams, or a file opened later would take such a stream's number,
+// and what is printed there.
 void fill_standard_descriptors();
-// Throws a Failure where standard output was closed before; who wants it is named.
+// Throws a Failure if standard output was closed; it names who needs it.
 void require_standard_output(const std::string &who);
 
-// The whole file, "-" for standard input; nothing where it cannot be read, or is
-// longer than kFileLimit, errno then says why. Flags are those of open().
+// The whole file, "-" for standard input; nullopt if it cannot be read or is longer than
+// kFileLimit, with the reason in errno. Flags are those of open().
 inline constexpr std::size_t kFileLimit = 16U << 20U;
 std::optional<std::string> read_file(const std::string &path, int flags = 0);
 
-// Why read_file() has just failed, for people.
+// An empty file in memory; not open if that fails, with the reason in errno.
+inline Descriptor memory_file(const char *name, unsigned flags = 0)
+{
+    // not by the C library's name, which old Androids lack
+    return Descriptor(static_cast<int>(syscall(SYS_memfd_create, name, MFD_CLOEXEC | flags)));
+}
+
+// Why read_file() has just failed, for a message.
 std::string why_unread();
 
-// As read_file(), but throws a Failure where it cannot be read.
+// As read_file(), but throws a Failure.
 std::string require_file(const std::string &path);
 
-// Where a path leads through symbolic links, also to a file that is not there yet.
+// Follows symbolic links, even to a file that does not exist yet.
 std::string end_of_links(const std::string &path);
 
 } // namespace fptest

@@ -1,9 +1,8 @@
 // SPDX-FileCopyrightText: 2026 The Quillmark authors
 // SPDX-License-Identifier: Apache-2.0
 
-// fmt, compiled once: as a header alone it would be compiled into every object, which
-// takes longer than all else. Of its archive Debian has none, and its shared library
-// would be one more for a phone.
+// fmt, compiled once: header-only it would slow down every object's build. Debian has no
+// static library of it, and the shared one would have to be installed on the phone.
 #include <fmt/format-inl.h>
 
 FMT_BEGIN_NAMESPACE

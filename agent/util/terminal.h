@@ -1,7 +1,7 @@
 // SPDX-FileCopyrightText: 2026 The Quillmark authors
 // SPDX-License-Identifier: Apache-2.0
 
-// The terminal that a stream may be.
+// What a stream's terminal can do.
 #pragma once
 
 #include <cstddef>
@@ -13,7 +13,7 @@ namespace fptest
 // Whether the stream is a terminal that can move its cursor.
 bool is_smart_terminal(std::FILE *stream);
 
-// In columns, as it is at this moment; 80 where nothing tells.
+// The current width in columns, or 80 if it is unknown.
 std::size_t terminal_width(std::FILE *stream);
 
 // Unless NO_COLOR is set to anything.

@@ -23,8 +23,8 @@ constexpr char32_t kReplacement = 0xFFFD;
 
 // --- UTF-8 -------------------------------------------------------------------
 
-// Hands over each character with the bytes that it takes: a byte that is no UTF-8 as
-// one U+FFFD.
+// Calls use() with each character and its number of bytes, and with U+FFFD for an invalid
+// byte.
 template <typename Use> void for_each_character(std::string_view text, const Use &use)
 {
     const char *at = text.data();
@@ -43,7 +43,7 @@ template <typename Use> void for_each_character(std::string_view text, const Use
     }
 }
 
-// What stands for a character that does something instead of being seen.
+// What stands for a control character.
 char32_t visible(char32_t code)
 {
     if (code < 0x20) {
@@ -55,8 +55,7 @@ char32_t visible(char32_t code)
     return code >= 0x80 && code < 0xA0 ? kReplacement : code;
 }
 
-// On a terminal, one that turns the direction of what follows would turn the rest
-// of the line as well.
+// A change of direction would turn the rest of a terminal's line as well.
 char32_t visible_on_line(char32_t code)
 {
     const bool turns = (code >= 0x202A && code <= 0x202E) || (code >= 0x2066 && code <= 0x2069);
@@ -74,40 +73,15 @@ template <typename Shown> std::string cleaned(std::string_view bytes, const Show
 
 // --- columns -----------------------------------------------------------------
 
-// A locale that knows the widths of characters, whatever the process's is.
-class Utf8Locale
-{
-  public:
-    Utf8Locale() : locale_(newlocale(LC_CTYPE_MASK, "C.UTF-8", nullptr))
-    {
-    }
-    Utf8Locale(const Utf8Locale &) = delete;
-    Utf8Locale &operator=(const Utf8Locale &) = delete;
-    ~Utf8Locale()
-    {
-        if (locale_ != nullptr) {
-            freelocale(locale_);
-        }
-    }
-
-    [[nodiscard]] locale_t get() const
-    {
-        return locale_;
-    }
-
-  private:
-    locale_t locale_;
-};
-
-// Tells widths while it lives; the thread's own locale is back afterwards. Where
-// the C library has no such locale the thread's own is asked.
+// While it lives, the thread has a locale that knows the widths of all characters, or its own
+// if the C library has none.
 class Widths
 {
   public:
     Widths()
     {
-        static const Utf8Locale utf8;
-        before_ = uselocale(utf8.get());
+        static const locale_t utf8 = newlocale(LC_CTYPE_MASK, "C.UTF-8", nullptr);
+        before_ = uselocale(utf8);
     }
     Widths(const Widths &) = delete;
     Widths &operator=(const Widths &) = delete;
@@ -116,7 +90,7 @@ class Widths
         uselocale(before_);
     }
 
-    // A character that the C library has no width for is one box on most screens.
+    // Most screens show one box for a character that the C library does not know.
     [[nodiscard]] std::size_t of(char32_t code) const
     {
         const int width = wcwidth(static_cast<wchar_t>(code));
@@ -165,8 +139,7 @@ std::size_t exchange(char32_t one, char32_t other)
     return lower(one) == lower(other) ? kCase : kEdit;
 }
 
-// What it costs to make one word of the other; neighbours that have changed
-// places are one edit.
+// The cost of turning one word into the other; swapped neighbours are one edit.
 std::size_t distance(const std::u32string &one, const std::u32string &other)
 {
     using Row = std::vector<std::size_t>;
@@ -196,8 +169,7 @@ std::size_t edits_allowed(std::size_t length)
     return length < 4 ? 1 : std::max<std::size_t>(2, length / 3);
 }
 
-// Whether a word is meant by another that is that far from it: something of it
-// must have been hit.
+// Whether a word of that length may be meant: part of it must be right.
 bool near(std::size_t edits, std::size_t length)
 {
     return edits <= edits_allowed(length) && edits < length;
@@ -324,7 +296,7 @@ std::string join_and(const std::vector<std::string> &words)
 
 std::string duration(double seconds)
 {
-    // what lasts longer than centuries has been measured wrong
+    // more than centuries is an error
     const double sane = seconds > 0 ? std::min(seconds, 1e10) : 0;
     const long long tenths = std::llround(sane * 10);
     if (tenths < 600) {

@@ -1,8 +1,8 @@
 // SPDX-FileCopyrightText: 2026 The Quillmark authors
 // SPDX-License-Identifier: Apache-2.0
 
-// Text for people and for files: whatever bytes an item reports, what is shown
-// or written is valid UTF-8 in which no byte moves the cursor.
+// Text for terminals and files: valid UTF-8 in which nothing moves the cursor, whatever
+// bytes an item reports.
 #pragma once
 
 #include <chrono>
@@ -15,16 +15,15 @@
 namespace fptest
 {
 
-// Valid UTF-8 with every control character but tab, line feed and carriage
-// return made visible: as its picture (U+2400 and on, U+2421 for DEL), C1
-// controls and bytes that are no UTF-8 as U+FFFD.
+// Replaces control characters but tab, line feed and carriage return by their pictures
+// (U+2400 and on, U+2421 for DEL), C1 controls and invalid UTF-8 by U+FFFD.
 std::string sanitize_utf8(std::string_view bytes);
 
-// As sanitize_utf8(), and on one line: tabs and line ends are pictures, too, and what
-// turns the direction of a text (overrides, embeddings, isolates) is U+FFFD.
+// As sanitize_utf8(), and on one line: replaces tabs and line ends by pictures as well, and
+// what changes the direction of text (overrides, embeddings, isolates) by U+FFFD.
 std::string one_line(std::string_view bytes);
 
-// In quotes and on one line; cut where it takes more columns than that.
+// In quotes and on one line, cut to that many columns.
 std::string in_quotes(std::string_view text, std::size_t width = std::string::npos);
 
 struct Replacement {
@@ -32,31 +31,27 @@ struct Replacement {
     std::string_view to;
 };
 
-// The text with each character, or run of bytes, of the list replaced.
 std::string replaced(std::string_view text, std::span<const Replacement> list);
 
-// The offset of the first byte that is no UTF-8; npos where there is none.
+// The offset of the first invalid byte, or npos.
 std::size_t first_not_utf8(std::string_view bytes);
 
 // Terminal columns that a clean text takes.
 std::size_t display_width(std::string_view text);
 
-// The text in exactly that many columns: padded with blanks, or cut and ended
-// by "..." (by dots alone where there is no room for more).
+// The text in exactly that many columns: padded with blanks, or cut and ended by "...".
 std::string pad_or_ellipsize(std::string_view text, std::size_t width);
 
 // As pad_or_ellipsize(), but a shorter text is not padded.
 std::string ellipsize(std::string_view text, std::size_t width);
 
-// The candidate that is spelled most like the word; empty where none is near
-// enough to be meant.
+// The candidate that is spelled most like the word; empty if none is near enough.
 std::string nearest(std::string_view word, const std::vector<std::string> &candidates);
 
-// "; did you mean 'near'?"; empty where none is near.
+// "; did you mean 'near'?", or empty.
 std::string did_you_mean(const std::string &near);
 
-// "; did you mean 'x'? The groups are x, y and z", where "the groups are" introduces the
-// names of which none is the word.
+// "; did you mean 'x'? The groups are x, y and z", with "the groups are" as introduction.
 std::string known_names(const std::string &word, const std::vector<std::string> &names,
                         const std::string &introduction);
 
@@ -69,19 +64,19 @@ std::string plural(std::size_t count, std::string_view thing);
 // "a", "a and b", "a, b and c"
 std::string join_and(const std::vector<std::string> &words);
 
-// Seconds for people: "0.3 s", "12.0 s", "3:05", "1:02:05".
+// "0.3 s", "12.0 s", "3:05", "1:02:05"
 std::string duration(double seconds);
 
-// As duration(), with milliseconds under ten seconds: "0.012 s".
+// As duration(), but with milliseconds under ten seconds: "0.012 s".
 std::string fine_duration(double seconds);
 
-// The rows as lines, their columns two blanks apart: words to the left, numbers to
-// the right. The first column is cut where a line would be wider than that.
+// The rows as lines of aligned columns, numbers to the right. The first column is cut if a
+// line would be wider than that.
 std::vector<std::string> aligned(const std::vector<std::vector<std::string>> &rows,
                                  const std::vector<bool> &is_number,
                                  std::size_t width = std::string::npos);
 
-// A point in time for files, in UTC: "2024-05-06T07:08:09.123Z".
+// In UTC: "2024-05-06T07:08:09.123Z".
 std::string timestamp(std::chrono::system_clock::time_point time);
 
 } // namespace fptest

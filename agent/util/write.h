@@ -18,8 +18,8 @@
 namespace fptest
 {
 
-// Writes the whole text, waiting where it has to. Gives the bytes written: fewer
-// than there are where that fails, errno then says why.
+// Writes the whole text, waiting for the reader. Returns the bytes written: fewer if that
+// fails, with the reason in errno.
 inline std::size_t write_text(int descriptor, std::string_view text)
 {
     std::size_t done = 0;
@@ -43,7 +43,7 @@ inline std::string failure_of(const std::string &file, int error)
     return fmt::format("{}: {}", file, std::strerror(error));
 }
 
-// As fmt::print(), which throws where a stream cannot be written.
+// As fmt::print(), which would throw if the stream cannot be written.
 template <typename... Values>
 void print_to(std::FILE *stream, fmt::format_string<Values...> text, Values &&...values)
 {
