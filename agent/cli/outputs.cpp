@@ -157,21 +157,21 @@ void require_log_of_its_own(const std::string &log, Beside beside)
     }
 }
 
-std::vector<std::unique_ptr<Listener>> make_listeners(const RunOptions &options)
+std::vector<std::unique_ptr<Reporter>> make_reporters(const RunOptions &options)
 {
-    std::vector<std::unique_ptr<Listener>> listeners;
+    std::vector<std::unique_ptr<Reporter>> reporters;
     if (!options.json.empty()) {
-        listeners.push_back(json_report(options.json));
+        reporters.push_back(make_json_reporter(options.json));
     }
     if (!options.junit.empty()) {
-        listeners.push_back(junit_report(options.junit));
+        reporters.push_back(make_junit_reporter(options.junit));
     }
     if (options.tap) {
-        listeners.push_back(tap_report(stdout));
+        reporters.push_back(make_tap_reporter(stdout));
     } else if (reports_on_standard_output(options).empty()) {
-        listeners.push_back(suitable_view(stdout, options.quiet));
+        reporters.push_back(suitable_view(stdout, options.quiet));
     }
-    return listeners;
+    return reporters;
 }
 
 } // namespace fptest

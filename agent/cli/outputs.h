@@ -29,6 +29,6 @@ enum class Beside { nothing, view, results };
 void require_log_of_its_own(const std::string &log, Beside beside);
 
 // The reports, and the view where none of them is standard output.
-std::vector<std::unique_ptr<Listener>> make_listeners(const RunOptions &options);
+std::vector<std::unique_ptr<Reporter>> make_reporters(const RunOptions &options);
 
 } // namespace fptest

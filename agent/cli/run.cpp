@@ -238,12 +238,12 @@ Exit run(RunOptions options)
         }
     };
     Run run = run_of(options, read.name, vendor);
-    const auto owned = make_listeners(options);
-    std::vector<Listener *> listeners;
-    for (const auto &listener : owned) {
-        listeners.push_back(listener.get());
+    const auto owned = make_reporters(options);
+    std::vector<Reporter *> reporters;
+    for (const auto &reporter : owned) {
+        reporters.push_back(reporter.get());
     }
-    if (!run_rounds(listeners, runner_options(options), *library, signals, run, round,
+    if (!run_rounds(reporters, runner_options(options), *library, signals, run, round,
                     store_plan)) {
         return Exit::interrupted;
     }

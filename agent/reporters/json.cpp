@@ -89,10 +89,10 @@ Json summary_of(const Run &run)
     return items;
 }
 
-class JsonReport : public Listener
+class JsonReporter : public Reporter
 {
   public:
-    explicit JsonReport(std::string path) : path_(std::move(path))
+    explicit JsonReporter(std::string path) : path_(std::move(path))
     {
     }
 
@@ -257,9 +257,9 @@ std::string json_obstacle(const std::string &path)
     return error == 0 ? "" : failure_of(path, error);
 }
 
-std::unique_ptr<Listener> json_report(const std::string &path)
+std::unique_ptr<Reporter> make_json_reporter(const std::string &path)
 {
-    return std::make_unique<JsonReport>(path);
+    return std::make_unique<JsonReporter>(path);
 }
 
 } // namespace fptest

@@ -122,10 +122,10 @@ std::string directory_of(const std::string &path)
     return slash == std::string::npos ? "." : path.substr(0, slash + 1);
 }
 
-class JunitReport : public Listener
+class JunitReporter : public Reporter
 {
   public:
-    explicit JunitReport(std::string path) : path_(std::move(path))
+    explicit JunitReporter(std::string path) : path_(std::move(path))
     {
     }
 
@@ -332,9 +332,9 @@ std::string junit_obstacle(const std::string &path)
     return error == 0 ? "" : failure_of(path + ": beside it", error);
 }
 
-std::unique_ptr<Listener> junit_report(const std::string &path)
+std::unique_ptr<Reporter> make_junit_reporter(const std::string &path)
 {
-    return std::make_unique<JunitReport>(path);
+    return std::make_unique<JunitReporter>(path);
 }
 
 } // namespace fptest

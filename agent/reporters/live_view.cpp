@@ -39,7 +39,7 @@ Colour colour_of(Outcome outcome)
     }
 }
 
-class LiveView : public Listener
+class LiveView : public Reporter
 {
   public:
     LiveView(std::FILE *terminal, bool coloured) : printer_(terminal, coloured)
@@ -259,12 +259,12 @@ class LiveView : public Listener
 
 } // namespace
 
-std::unique_ptr<Listener> live_view(std::FILE *terminal, bool colour)
+std::unique_ptr<Reporter> live_view(std::FILE *terminal, bool colour)
 {
     return std::make_unique<LiveView>(terminal, colour);
 }
 
-std::unique_ptr<Listener> suitable_view(std::FILE *stream, bool quiet)
+std::unique_ptr<Reporter> suitable_view(std::FILE *stream, bool quiet)
 {
     if (quiet || !is_smart_terminal(stream) || terminal_width(stream) < kNarrowest) {
         return plain_view(stream, quiet);

@@ -22,7 +22,7 @@ using Clock = std::chrono::steady_clock;
 
 constexpr std::chrono::seconds kBetweenProgressLines(10);
 
-class PlainView : public Listener
+class PlainView : public Reporter
 {
   public:
     PlainView(std::FILE *stream, bool quiet)
@@ -158,7 +158,7 @@ class PlainView : public Listener
 
 } // namespace
 
-std::unique_ptr<Listener> plain_view(std::FILE *stream, bool quiet)
+std::unique_ptr<Reporter> plain_view(std::FILE *stream, bool quiet)
 {
     return std::make_unique<PlainView>(stream, quiet);
 }

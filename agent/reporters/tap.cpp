@@ -129,10 +129,10 @@ std::string suite_point(const Run &run, const Suite &suite, std::size_t number)
     return text + "\n";
 }
 
-class TapReport : public Listener
+class TapReporter : public Reporter
 {
   public:
-    explicit TapReport(std::FILE *stream) : writer_("the TAP output", fileno(stream))
+    explicit TapReporter(std::FILE *stream) : writer_("the TAP output", fileno(stream))
     {
     }
 
@@ -266,9 +266,9 @@ class TapReport : public Listener
 
 } // namespace
 
-std::unique_ptr<Listener> tap_report(std::FILE *stream)
+std::unique_ptr<Reporter> make_tap_reporter(std::FILE *stream)
 {
-    return std::make_unique<TapReport>(stream);
+    return std::make_unique<TapReporter>(stream);
 }
 
 } // namespace fptest

@@ -48,7 +48,7 @@ struct Job {
     }
 };
 
-// An item from its start until listeners hear of its end. Its states: it runs; the library
+// An item from its start until reporters hear of its end. Its states: it runs; the library
 // has moved on, and only a gatherer still works; it is done, but one that started earlier
 // is not, and ends are announced in the order of the starts.
 struct RunningItem {

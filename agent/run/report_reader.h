@@ -24,7 +24,7 @@ class ReportReader
 {
   public:
     // All of them outlive it.
-    ReportReader(Run &run, const std::vector<Listener *> &listeners, RunningJob &running);
+    ReportReader(Run &run, const std::vector<Reporter *> &reporters, RunningJob &running);
 
     // What a plan that is about to be replaced says of gatherers, which may have a copy.
     void note_gathered(const std::string &text, int vendor);
@@ -74,7 +74,7 @@ class ReportReader
     bool was_gathered(const ItemReport &report) const;
 
     Run &run_;
-    const std::vector<Listener *> &listeners_;
+    const std::vector<Reporter *> &reporters_;
     RunningJob &running_;
     Descriptor saves_;
     std::vector<Judged> judged_;       // of this round, and gatherers

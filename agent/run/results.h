@@ -1,7 +1,7 @@
 // SPDX-FileCopyrightText: 2026 The Quillmark authors
 // SPDX-License-Identifier: Apache-2.0
 
-// A run and its results: the runner fills them in, listeners show or write them.
+// A run and its results: the runner fills them in, reporters show or write them.
 #pragma once
 
 #include "module/leftover.h"
@@ -139,14 +139,14 @@ std::string title(const Run &run, const Suite &suite);
 
 // Is called in this order: begin; for each item started, any number of progressed, ended;
 // round_over between two rounds; finish, even if items did not run. The run is up to date at
-// each call. No call may wait for the reader of what the listener writes.
-class Listener
+// each call. No call may wait for the reader of what the reporter writes.
+class Reporter
 {
   public:
-    Listener() = default;
-    Listener(const Listener &) = delete;
-    Listener &operator=(const Listener &) = delete;
-    virtual ~Listener() = default;
+    Reporter() = default;
+    Reporter(const Reporter &) = delete;
+    Reporter &operator=(const Reporter &) = delete;
+    virtual ~Reporter() = default;
 
     virtual void begin(const Run &run) = 0;
     virtual void started(const Run &run, Place place) = 0;
@@ -183,7 +183,7 @@ class Listener
         return true;
     }
 
-    // Why it cannot write, as in "out.json: No space left on device", or empty. A listener
+    // Why it cannot write, as in "out.json: No space left on device", or empty. A reporter
     // that has failed writes no more.
     virtual std::string failure() const
     {

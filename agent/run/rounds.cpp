@@ -24,9 +24,9 @@ using Clock = std::chrono::steady_clock;
 class Rounds
 {
   public:
-    Rounds(Runner &runner, Run &run, const std::vector<Listener *> &listeners,
+    Rounds(Runner &runner, Run &run, const std::vector<Reporter *> &reporters,
            const RoundPlan &plan)
-        : runner_(runner), run_(run), listeners_(listeners), plan_(plan)
+        : runner_(runner), run_(run), reporters_(reporters), plan_(plan)
     {
     }
 
@@ -89,8 +89,8 @@ class Rounds
     void begin_next()
     {
         summarize(run_);
-        for (Listener *listener : listeners_) {
-            listener->round_over(run_);
+        for (Reporter *reporter : reporters_) {
+            reporter->round_over(run_);
         }
         for (const Suite &suite : run_.suites) {
             run_.before += count(suite.items);
@@ -101,15 +101,15 @@ class Rounds
 
     Runner &runner_;
     Run &run_;
-    const std::vector<Listener *> &listeners_;
+    const std::vector<Reporter *> &reporters_;
     const RoundPlan &plan_;
 };
 
-std::string failures(const std::vector<Listener *> &listeners)
+std::string failures(const std::vector<Reporter *> &reporters)
 {
     std::vector<std::string> all;
-    for (const Listener *listener : listeners) {
-        if (std::string failure = listener->failure(); !failure.empty()) {
+    for (const Reporter *reporter : reporters) {
+        if (std::string failure = reporter->failure(); !failure.empty()) {
             all.push_back(std::move(failure));
         }
     }
@@ -127,11 +127,11 @@ void say_at_end(const std::string &text)
 
 // Waits for the reports' readers, but not for long after an interrupt. False if a signal
 // comes first, or the time is up.
-bool flush(const std::vector<Listener *> &listeners, Signals &signals, bool is_interrupted)
+bool flush(const std::vector<Reporter *> &reporters, Signals &signals, bool is_interrupted)
 {
     const auto begin = Clock::now();
-    const auto is_done = [](Listener *listener) { return listener->flush(); };
-    while (!std::ranges::all_of(listeners, is_done)) {
+    const auto is_done = [](Reporter *reporter) { return reporter->flush(); };
+    while (!std::ranges::all_of(reporters, is_done)) {
         if (is_interrupted && Clock::now() - begin > std::chrono::seconds(2)) {
             return false;
         }
@@ -147,11 +147,11 @@ bool flush(const std::vector<Listener *> &listeners, Signals &signals, bool is_i
     return true;
 }
 
-void finish(Run &run, const std::vector<Listener *> &listeners)
+void finish(Run &run, const std::vector<Reporter *> &reporters)
 {
     summarize(run);
-    for (Listener *listener : listeners) {
-        listener->finish(run);
+    for (Reporter *reporter : reporters) {
+        reporter->finish(run);
     }
 }
 
@@ -163,7 +163,7 @@ bool is_interrupted(const Signals &signals)
 }
 
 [[noreturn]] void run_nothing(const std::string &why, Run &run,
-                              const std::vector<Listener *> &begun, Signals &signals)
+                              const std::vector<Reporter *> &begun, Signals &signals)
 {
     run.why_unfinished = why;
     finish(run, begun);
@@ -172,13 +172,13 @@ bool is_interrupted(const Signals &signals)
 }
 
 // The view first, as it overwrites nothing. If one fails, those that have begun say so.
-void begin(Run &run, const std::vector<Listener *> &listeners, Signals &signals)
+void begin(Run &run, const std::vector<Reporter *> &reporters, Signals &signals)
 {
-    std::vector<Listener *> begun;
-    for (Listener *listener : std::vector(listeners.rbegin(), listeners.rend())) {
-        listener->begin(run);
-        begun.push_back(listener);
-        const std::string failure = listener->failure();
+    std::vector<Reporter *> begun;
+    for (Reporter *reporter : std::vector(reporters.rbegin(), reporters.rend())) {
+        reporter->begin(run);
+        begun.push_back(reporter);
+        const std::string failure = reporter->failure();
         if (!failure.empty() && !is_interrupted(signals)) {
             run_nothing(fmt::format("{}; nothing was run", failure), run, begun, signals);
         }
@@ -187,35 +187,35 @@ void begin(Run &run, const std::vector<Listener *> &listeners, Signals &signals)
 
 } // namespace
 
-bool run_rounds(const std::vector<Listener *> &listeners, const Runner::Options &options,
+bool run_rounds(const std::vector<Reporter *> &reporters, const Runner::Options &options,
                 LibraryProcess &library, Signals &signals, Run &run, const RoundPlan &plan,
                 const std::function<void()> &store)
 {
     run.suites = plan.suites;
     run.start = std::chrono::system_clock::now();
-    begin(run, listeners, signals);
+    begin(run, reporters, signals);
     const std::string earlier_plan = read_stored_plan().value_or("");
     try {
         store();
     } catch (const Failure &failure) {
-        run_nothing(failure.what(), run, listeners, signals);
+        run_nothing(failure.what(), run, reporters, signals);
     }
-    Runner runner(library, signals, run, listeners, options);
+    Runner runner(library, signals, run, reporters, options);
     runner.note_earlier_plan(earlier_plan);
     try {
-        run.finished = Rounds(runner, run, listeners, plan).run_all();
+        run.finished = Rounds(runner, run, reporters, plan).run_all();
         if (!runner.broken()) {
             remove_marks();
         }
     } catch (const Failure &failure) {
         runner.break_off(failure.what());
     }
-    finish(run, listeners);
-    if (!flush(listeners, signals, runner.signal() != 0)) {
+    finish(run, reporters);
+    if (!flush(reporters, signals, runner.signal() != 0)) {
         say_at_end("a report is not whole: it was not read to its end");
         return false;
     }
-    const std::string failure = failures(listeners);
+    const std::string failure = failures(reporters);
     if (runner.signal() != 0 && !run.finished) {
         say_at_end(failure);
         return false;

@@ -32,7 +32,7 @@ class Runner
 
     // All of them outlive the runner.
     Runner(LibraryProcess &library, Signals &signals, Run &run,
-           const std::vector<Listener *> &listeners, const Options &options);
+           const std::vector<Reporter *> &reporters, const Options &options);
 
     // The stored plan before the run, of which a gatherer may have kept a copy.
     void note_earlier_plan(const std::string &text)
@@ -113,7 +113,7 @@ class Runner
     LibraryProcess &library_;
     Signals &signals_;
     Run &run_;
-    const std::vector<Listener *> &listeners_;
+    const std::vector<Reporter *> &reporters_;
     Options options_;
     RunningJob running_;
     ReportReader reader_;

@@ -76,8 +76,8 @@ void Runner::read_signals()
 // Nobody watches the items meanwhile, so they are suspended too, and their clock stops.
 void Runner::suspend()
 {
-    for (Listener *listener : listeners_) {
-        listener->paused(run_);
+    for (Reporter *reporter : reporters_) {
+        reporter->paused(run_);
     }
     const auto begin = SteadyClock::now();
     library_.suspend();
@@ -86,8 +86,8 @@ void Runner::suspend()
     last_suspension_ = begin;
     last_suspended_ = SteadyClock::now() - begin;
     suspended_ += last_suspended_;
-    for (Listener *listener : listeners_) {
-        listener->resumed(run_);
+    for (Reporter *reporter : reporters_) {
+        reporter->resumed(run_);
     }
 }
 

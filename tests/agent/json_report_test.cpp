@@ -17,7 +17,7 @@ using namespace std::chrono_literals;
 namespace
 {
 
-TEST_F(JsonReport, BeginsWithWhatIsPlanned)
+TEST_F(JsonReporter, BeginsWithWhatIsPlanned)
 {
     RunOfItems run = run_of({suite("Bringup", {passed("SpiCheck"), failed("DeadPixel")}),
                              suite("Gather", {passed("SensorProbe")})});
@@ -35,9 +35,9 @@ TEST_F(JsonReport, BeginsWithWhatIsPlanned)
                   {"group": "Gather", "item": "SensorProbe"}]})"));
 }
 
-TEST_F(JsonReport, TellsEveryEventOfAnItem)
+TEST_F(JsonReporter, TellsEveryEventOfAnItem)
 {
-    const auto report = json_report(path("json"));
+    const auto report = make_json_reporter(path("json"));
     Playback playback(*report, run_of({suite("Bringup", {passed("SpiCheck")}),
                                        suite("Pixels", {passed("x"), failed("DeadPixel")})}));
     playback.begin();
@@ -65,9 +65,9 @@ TEST_F(JsonReport, TellsEveryEventOfAnItem)
         "signal": null, "left_running": [], "output": "row 7\nrow 9\n"})"));
 }
 
-TEST_F(JsonReport, ProgressIsTimedByTheClock)
+TEST_F(JsonReporter, ProgressIsTimedByTheClock)
 {
-    const auto report = json_report(path("json"));
+    const auto report = make_json_reporter(path("json"));
     Playback playback(*report, run_of({suite("G", {passed("a")})}));
     playback.begin();
     playback.start({0, 0});
@@ -80,7 +80,7 @@ TEST_F(JsonReport, ProgressIsTimedByTheClock)
     EXPECT_LT(std::chrono::abs(told - before), 30s);
 }
 
-TEST_F(JsonReport, HasNullForWhatIsNotKnown)
+TEST_F(JsonReporter, HasNullForWhatIsNotKnown)
 {
     ItemRun one = item("a", Outcome::no_result);
     one.seconds.reset();
@@ -93,7 +93,7 @@ TEST_F(JsonReport, HasNullForWhatIsNotKnown)
     EXPECT_EQ(end.at("output"), "");
 }
 
-TEST_F(JsonReport, NamesEveryOutcome)
+TEST_F(JsonReporter, NamesEveryOutcome)
 {
     std::vector<std::string> words;
     for (const Json &end : events_of(json_of(mixed_run()), "end")) {
@@ -103,7 +103,7 @@ TEST_F(JsonReport, NamesEveryOutcome)
                 ElementsAre("passed", "failed", "no result", "timed out", "stopped", "not run"));
 }
 
-TEST_F(JsonReport, EndsWithTheCounts)
+TEST_F(JsonReporter, EndsWithTheCounts)
 {
     EXPECT_EQ(events_of(json_of(run_of({suite("G", {passed("a"), failed("b")})}))).back(),
               Json::parse(R"({"event": "finish", "finished": true, "reason": null, "rounds": 1,
@@ -122,7 +122,7 @@ TEST_F(JsonReport, EndsWithTheCounts)
                   "not_run": 1, "seconds": 2.5})"));
 }
 
-TEST_F(JsonReport, HasOneEndForEachItemAlsoForThoseNotRun)
+TEST_F(JsonReporter, HasOneEndForEachItemAlsoForThoseNotRun)
 {
     const std::string text = json_of(mixed_run());
     std::vector<std::size_t> ended;
@@ -136,7 +136,7 @@ TEST_F(JsonReport, HasOneEndForEachItemAlsoForThoseNotRun)
     EXPECT_EQ(events_of(text, "start").size(), 5U);
 }
 
-TEST_F(JsonReport, ReadsBackWhateverIsReported)
+TEST_F(JsonReporter, ReadsBackWhateverIsReported)
 {
     for (const Text &text : hostile_texts_for_json()) {
         const std::string json = json_of(run_with(text.reported));
@@ -154,9 +154,9 @@ TEST_F(JsonReport, ReadsBackWhateverIsReported)
     }
 }
 
-TEST_F(JsonReport, WritesEveryLineAtOnce)
+TEST_F(JsonReporter, WritesEveryLineAtOnce)
 {
-    const auto report = json_report(path("json"));
+    const auto report = make_json_reporter(path("json"));
     Playback playback(*report, mixed_run());
     const auto lines = [&] { return events_of(read_file(path("json"))).size(); };
     playback.begin();
@@ -169,10 +169,10 @@ TEST_F(JsonReport, WritesEveryLineAtOnce)
     EXPECT_EQ(lines(), 4U);
 }
 
-TEST_F(JsonReport, LeavesWholeLinesAndNoFinishWhenItsProcessIsKilled)
+TEST_F(JsonReporter, LeavesWholeLinesAndNoFinishWhenItsProcessIsKilled)
 {
     EXPECT_EQ(in_a_child([&] {
-                  const auto report = json_report(path("json"));
+                  const auto report = make_json_reporter(path("json"));
                   Playback playback(*report, mixed_run());
                   playback.begin();
                   playback.run_item({0, 0});
@@ -187,15 +187,15 @@ TEST_F(JsonReport, LeavesWholeLinesAndNoFinishWhenItsProcessIsKilled)
     EXPECT_TRUE(events_of(read_file(path("json")), "finish").empty());
 }
 
-TEST_F(JsonReport, TakesThePlaceOfAnOlderFile)
+TEST_F(JsonReporter, TakesThePlaceOfAnOlderFile)
 {
     write_file(path("json"), std::string(100000, 'x'));
     EXPECT_EQ(events_of(json_of(run_of({suite("G", {passed("a")})}))).size(), 5U);
 }
 
-TEST_F(JsonReport, IsNotInheritedByPrograms)
+TEST_F(JsonReporter, IsNotInheritedByPrograms)
 {
-    const auto report = json_report(path("json"));
+    const auto report = make_json_reporter(path("json"));
     Playback(*report, mixed_run()).begin();
     const std::string command = "for f in /proc/$$/fd/*; do readlink \"$f\"; done | grep -c '" +
                                 path("json") + "' >" + path("count");
@@ -212,10 +212,10 @@ int with_output(int descriptor, const std::function<void()> &what)
     });
 }
 
-TEST_F(JsonReport, GoesToStandardOutputOnRequest)
+TEST_F(JsonReporter, GoesToStandardOutputOnRequest)
 {
     const int file = open(path("out").c_str(), O_WRONLY | O_CREAT | O_CLOEXEC, 0666);
-    EXPECT_EQ(with_output(file, [&] { play(*json_report("-"), mixed_run()); }), 0);
+    EXPECT_EQ(with_output(file, [&] { play(*make_json_reporter("-"), mixed_run()); }), 0);
     close(file);
     EXPECT_EQ(events_of(read_file(path("out"))).back().at("event"), "finish");
     EXPECT_THAT(directory_.names(), ElementsAre("out"));
@@ -231,7 +231,7 @@ std::string read_late(int flags, const std::string &long_text, const std::functi
         ASSERT_EQ(dup2(ends[1], STDOUT_FILENO), STDOUT_FILENO);
         close(ends[0]);
         before();
-        play(*json_report("-"), run_with(long_text));
+        play(*make_json_reporter("-"), run_with(long_text));
     });
     close(ends[1]);
     std::this_thread::sleep_for(200ms);
@@ -247,14 +247,14 @@ std::string read_late(int flags, const std::string &long_text, const std::functi
     return text;
 }
 
-TEST_F(JsonReport, WaitsForAReaderOfANonBlockingPipe)
+TEST_F(JsonReporter, WaitsForAReaderOfANonBlockingPipe)
 {
     const std::string long_text(300000, 'x');
     const std::string text = read_late(O_NONBLOCK, long_text, [] {});
     EXPECT_EQ(events_of(text).back().at("reason"), long_text);
 }
 
-TEST_F(JsonReport, GoesOnWhereASignalHasComeBetween)
+TEST_F(JsonReporter, GoesOnWhereASignalHasComeBetween)
 {
     const auto set_alarms = [] {
         struct sigaction action {
@@ -269,14 +269,14 @@ TEST_F(JsonReport, GoesOnWhereASignalHasComeBetween)
     EXPECT_EQ(events_of(text).back().at("reason"), long_text);
 }
 
-TEST_F(JsonReport, SaysThatNobodyReadsItsOutput)
+TEST_F(JsonReporter, SaysThatNobodyReadsItsOutput)
 {
     std::array<int, 2> ends{};
     ASSERT_EQ(pipe2(ends.data(), O_CLOEXEC), 0);
     close(ends[0]);
     EXPECT_EQ(with_output(ends[1],
                           [&] {
-                              const auto report = json_report("-");
+                              const auto report = make_json_reporter("-");
                               Playback(*report, mixed_run()).begin();
                               EXPECT_EQ(report->failure(), "standard output: Broken pipe");
                           }),
@@ -284,18 +284,18 @@ TEST_F(JsonReport, SaysThatNobodyReadsItsOutput)
     close(ends[1]);
 }
 
-TEST_F(JsonReport, SaysThatTheDiskIsFullAndStaysQuiet)
+TEST_F(JsonReporter, SaysThatTheDiskIsFullAndStaysQuiet)
 {
-    const auto report = json_report("/dev/full");
+    const auto report = make_json_reporter("/dev/full");
     Playback(*report, mixed_run()).play();
     EXPECT_EQ(report->failure(), "/dev/full: No space left on device");
 }
 
-TEST_F(JsonReport, TakesBackALineThatFoundNoRoom)
+TEST_F(JsonReporter, TakesBackALineThatFoundNoRoom)
 {
     EXPECT_EQ(in_a_child([&] {
                   const Limit limit(RLIMIT_FSIZE, 2000);
-                  const auto report = json_report(path("json"));
+                  const auto report = make_json_reporter(path("json"));
                   Playback playback(*report, mixed_run());
                   playback.play();
                   EXPECT_EQ(report->failure(), path("json") + ": File too large");
@@ -309,12 +309,12 @@ TEST_F(JsonReport, TakesBackALineThatFoundNoRoom)
     EXPECT_TRUE(events_of(read_file(path("json")), "finish").empty());
 }
 
-TEST_F(JsonReport, WritesNoMoreOnceALineHasFoundNoRoom)
+TEST_F(JsonReporter, WritesNoMoreOnceALineHasFoundNoRoom)
 {
     // the short line after the long one would fit
     EXPECT_EQ(in_a_child([&] {
                   const Limit limit(RLIMIT_FSIZE, 1500);
-                  const auto report = json_report(path("json"));
+                  const auto report = make_json_reporter(path("json"));
                   ItemRun loud = passed("a");
                   loud.output = std::string(2000, 'x');
                   Playback(*report, run_of({suite("G", {loud, passed("b")})})).play();

@@ -142,16 +142,16 @@ class Reports : public ::testing::Test
     using How = std::function<void(Playback &)>;
     std::string json_of(const RunOfItems &run, const How &how = play_all) const
     {
-        return left_by(*json_report(path("json")), "json", run, how);
+        return left_by(*make_json_reporter(path("json")), "json", run, how);
     }
     std::string junit_of(const RunOfItems &run, const How &how = play_all) const
     {
-        return left_by(*junit_report(path("xml")), "xml", run, how);
+        return left_by(*make_junit_reporter(path("xml")), "xml", run, how);
     }
     std::string tap_of(const RunOfItems &run, const How &how = play_all) const
     {
         const Stream stream = open_stream("tap");
-        return left_by(*tap_report(stream.get()), "tap", run, how);
+        return left_by(*make_tap_reporter(stream.get()), "tap", run, how);
     }
     std::string plain_of(const RunOfItems &run, const How &how = play_all, bool quiet = false) const
     {
@@ -173,7 +173,7 @@ class Reports : public ::testing::Test
     TemporaryDirectory directory_;
 
   private:
-    std::string left_by(Listener &report, const std::string &name, const RunOfItems &run,
+    std::string left_by(Reporter &report, const std::string &name, const RunOfItems &run,
                         const How &how) const
     {
         Playback playback(report, run);
@@ -183,9 +183,9 @@ class Reports : public ::testing::Test
     }
 };
 
-using JsonReport = Reports;
-using JunitReport = Reports;
-using TapReport = Reports;
+using JsonReporter = Reports;
+using JunitReporter = Reports;
+using TapReporter = Reports;
 using RoundReports = Reports;
 
 // Its exit status, or minus the signal.

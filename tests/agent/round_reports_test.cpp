@@ -239,7 +239,7 @@ TEST_F(RoundReports, GoThroughAPipeThatHoldsLessThanTheJunitDocument)
     std::string text;
     std::thread reader([&] { text = read_file(path("pipe")); });
     {
-        const auto report = junit_report(path("pipe"));
+        const auto report = make_junit_reporter(path("pipe"));
         Playback playback(*report, run);
         playback.play(2);
         EXPECT_EQ(report->failure(), "");
