@@ -19,7 +19,7 @@ namespace fptest
 {
 
 // A plan, and where to say what is wrong with it.
-struct PlanCheck {
+struct CheckContext {
     const Plan &plan;
     const SourceMap &places;
     Findings &findings;

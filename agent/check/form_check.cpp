@@ -1,7 +1,7 @@
 // SPDX-FileCopyrightText: 2026 The Quillmark authors
 // SPDX-License-Identifier: Apache-2.0
 
-#include "check/checks.h"
+#include "check/document_checks.h"
 #include "check/wellformed.h"
 #include "plan/markup.h"
 #include "util/text.h"
@@ -50,8 +50,8 @@ std::string open_at(const std::vector<Tag> &tags, std::size_t offset)
 class FormChecker
 {
   public:
-    FormChecker(const CheckedPlan &read, Findings &findings)
-        : read_(read), text_(read.text), tags_(read.tags), findings_(findings)
+    FormChecker(const CheckedPlan &checked, Findings &findings)
+        : checked_(checked), text_(checked.text), tags_(checked.tags), findings_(findings)
     {
     }
 
@@ -72,9 +72,9 @@ class FormChecker
         if (!given_.empty()) {
             repaired.emplace(repaired_);
         }
-        const Loaded &loaded = repaired ? *repaired : read_.whole();
+        const Loaded &loaded = repaired ? *repaired : checked_.whole();
         if (loaded.plan) {
-            check_plan(read_, *loaded.plan, findings_);
+            check_plan(checked_, *loaded.plan, findings_);
         } else if (!endless) {
             report_refusal(loaded.why);
         }
@@ -130,13 +130,13 @@ class FormChecker
             findings_.error(offset,
                             "an entity is declared here: the library would not {}; write its text "
                             "where it is used",
-                            read_.loaded.plan ? "know it" : "load the plan");
+                            checked_.loaded.plan ? "know it" : "load the plan");
             return;
         }
         findings_.error(offset, "not well-formed, {}: the library would {}; {}",
                         reason(flaw.error, offset),
-                        read_.loaded.plan ? "load it all the same, and run what it took from it"
-                                          : "not load it",
+                        checked_.loaded.plan ? "load it all the same, and run what it took from it"
+                                             : "not load it",
                         advice(flaw.error, offset));
     }
 
@@ -338,7 +338,7 @@ class FormChecker
 
     static constexpr std::string_view kValue = "=\"\"";
 
-    const CheckedPlan &read_;
+    const CheckedPlan &checked_;
     const std::string &text_;
     const std::vector<Tag> &tags_;
     std::string repaired_;
@@ -348,9 +348,9 @@ class FormChecker
 
 } // namespace
 
-void check_form(const CheckedPlan &read, Findings &findings)
+void check_form(const CheckedPlan &checked, Findings &findings)
 {
-    FormChecker(read, findings).check();
+    FormChecker(checked, findings).check();
 }
 
 } // namespace fptest

@@ -1,6 +1,7 @@
 // SPDX-FileCopyrightText: 2026 The Quillmark authors
 // SPDX-License-Identifier: Apache-2.0
 
+#include "check/document_checks.h"
 #include "check/plan_checks.h"
 
 #include <cctype>
@@ -35,7 +36,8 @@ std::string likeness(std::string_view name)
 class LaterGroupsCheck
 {
   public:
-    LaterGroupsCheck(const PlanCheck &in, const std::vector<Group> &groups) : in_(in)
+    LaterGroupsCheck(const CheckContext &context, const std::vector<Group> &groups)
+        : context_(context)
     {
         for (const Group &group : groups) {
             if (group.found) {
@@ -73,8 +75,8 @@ class LaterGroupsCheck
         std::size_t more = 0;
         for (const Item *item : entry.items) {
             const Group *earlier = earlier_group(item->name);
-            const auto run =
-                earlier != nullptr ? in_.plan.resolve(earlier->name, item->name) : std::nullopt;
+            const auto run = earlier != nullptr ? context_.plan.resolve(earlier->name, item->name)
+                                                : std::nullopt;
             if (!run || run->number == item->number) {
                 continue;
             }
@@ -89,8 +91,8 @@ class LaterGroupsCheck
                                path_of(earlier->name, item->name), names_of({run}));
         }
         if (first != nullptr) {
-            in_.findings.warning(in_.places.of(first->number, "name"), "{}{}", text,
-                                 more > 0 ? fmt::format(", and to {} more here", more) : "");
+            context_.findings.warning(context_.places.of(first->number, "name"), "{}{}", text,
+                                      more > 0 ? fmt::format(", and to {} more here", more) : "");
         }
     }
 
@@ -107,7 +109,7 @@ class LaterGroupsCheck
                                                                : nullptr;
     }
 
-    const PlanCheck in_;
+    const CheckContext context_;
     std::vector<Entry> groups_;
     std::size_t at_ = 0;
     std::unordered_map<std::string, std::size_t> uses_;
@@ -117,9 +119,9 @@ class LaterGroupsCheck
 
 } // namespace
 
-void check_later_groups(const PlanCheck &in, const std::vector<Group> &groups)
+void check_later_groups(const CheckContext &context, const std::vector<Group> &groups)
 {
-    LaterGroupsCheck(in, groups).check();
+    LaterGroupsCheck(context, groups).check();
 }
 
 } // namespace fptest

@@ -3,6 +3,7 @@
 
 #include "check/shell_check.h"
 
+#include "check/document_checks.h"
 #include "plan/plan.h"
 
 #include <algorithm>
@@ -65,7 +66,7 @@ std::string without_escapes(const std::string &text, std::string_view escaped)
 
 } // namespace
 
-ShellChecker::ShellChecker(const PlanCheck &in) : in_(in)
+ShellChecker::ShellChecker(const CheckContext &context) : context_(context)
 {
 }
 
@@ -97,10 +98,10 @@ void ShellChecker::check(const Item &item)
         return effect.mark == "\n" && line[effect.at - 1] == '\r';
     });
     if (const std::size_t at = args.find('\r'); at != args.npos && !ends_line) {
-        in_.findings.warning(args_place(item, at),
-                             "the shell takes the carriage return here for a character like any "
-                             "other, and would hand it to item {}; leave it out",
-                             quoted_name(item.name));
+        context_.findings.warning(args_place(item, at),
+                                  "the shell takes the carriage return here for a character like "
+                                  "any other, and would hand it to item {}; leave it out",
+                                  quoted_name(item.name));
     }
 }
 
@@ -117,11 +118,10 @@ ShellChecker::Verdict ShellChecker::judge(const Item &item, const std::string &l
                                       : answer == DeviceShell::Answer::refused;
         if (answer == DeviceShell::Answer::unknown && shell_.is_out_of_time() && !is_limit_told_) {
             is_limit_told_ = true;
-            in_.findings.warning(
-                in_.places.of(item.number, "name"),
-                "the device's shell has been asked for as long as fptest waits for "
-                "it: from item {} on, what it would refuse may be missed; check the "
-                "rest as a plan of its own",
+            context_.findings.warning(
+                context_.places.of(item.number, "name"),
+                "the device's shell has been asked for as long as fptest waits for it: from item "
+                "{} on, what it would refuse may be missed; check the rest as a plan of its own",
                 quoted_name(item.name));
         }
     }
@@ -147,25 +147,24 @@ bool ShellChecker::is_substitution_refused(const Effect &substitution, std::stri
 
 std::size_t ShellChecker::args_place(const Item &item, std::size_t at) const
 {
-    return in_.places.inside(item.number, "args", at);
+    return context_.places.inside(item.number, "args", at);
 }
 
 void ShellChecker::report_name(const Item &item, const std::string &characters,
                                bool is_line_refused)
 {
-    in_.findings.add(is_line_refused ? Finding::Severity::error : Finding::Severity::warning,
-                     in_.places.of(item.number, "name"),
-                     "item {} has {} in its name, which the shell reads as its own: it would {}; "
-                     "rename it",
-                     quoted_name(item.name), characters,
-                     is_line_refused ? "refuse the command line"
-                                     : "not run a program of that name");
+    context_.findings.add(
+        is_line_refused ? Finding::Severity::error : Finding::Severity::warning,
+        context_.places.of(item.number, "name"),
+        "item {} has {} in its name, which the shell reads as its own: it would {}; rename it",
+        quoted_name(item.name), characters,
+        is_line_refused ? "refuse the command line" : "not run a program of that name");
 }
 
 void ShellChecker::report_refusal(const Item &item, const Verdict &verdict, std::size_t args_begin)
 {
     const auto &fault = verdict.reading.fault;
-    in_.findings.error(
+    context_.findings.error(
         args_place(item, fault ? fault->at - args_begin : 0),
         "the shell would refuse the command line of item {}: {}", quoted_name(item.name),
         fault ? reason(*fault) : fmt::format("{}; fix its args", one_line(verdict.why)));
@@ -183,54 +182,50 @@ void ShellChecker::report_effect(const Item &item, const Effect &effect, std::si
         break;
     case Effect::Kind::expansion:
         if (shell_.ask_to_expand(effect.text, why) == DeviceShell::Answer::refused) {
-            in_.findings.error(place,
-                               "the shell would refuse the command line of item {}: {}; put a '\\' "
-                               "before the '$' here if it is meant for the item",
-                               name, one_line(why));
+            context_.findings.error(place,
+                                    "the shell would refuse the command line of item {}: {}; put a "
+                                    "'\\' before the '$' here if it is meant for the item",
+                                    name, one_line(why));
         }
         break;
     case Effect::Kind::substitution:
         if (is_substitution_refused(effect, why)) {
-            in_.findings.error(
-                place,
-                "the shell would refuse the command line of item {}: in {} here, {}; put a "
-                "'\\' before {} if it is meant for the item",
-                name, effect.mark == "`" ? "the backticks" : text, one_line(why), mark);
+            context_.findings.error(place,
+                                    "the shell would refuse the command line of item {}: in {} "
+                                    "here, {}; put a '\\' before {} if it is meant for the item",
+                                    name, effect.mark == "`" ? "the backticks" : text,
+                                    one_line(why), mark);
             break;
         }
-        in_.findings.warning(
+        context_.findings.warning(
             place,
-            "the shell would run {} as a command of its own before item {}, and put "
-            "what that prints here; put a '\\' before it if it is meant for the item",
+            "the shell would run {} as a command of its own before item {}, and put what that "
+            "prints here; put a '\\' before it if it is meant for the item",
             text, name);
         break;
     case Effect::Kind::redirection:
-        in_.findings.warning(
-            place,
-            "the shell would redirect item {} by {}, and not hand it that; put the "
-            "{} in quotes if it is meant for the item",
-            name, text, mark);
+        context_.findings.warning(place,
+                                  "the shell would redirect item {} by {}, and not hand it that; "
+                                  "put the {} in quotes if it is meant for the item",
+                                  name, text, mark);
         break;
     case Effect::Kind::comment:
-        in_.findings.warning(
-            place,
-            "the shell would take {} for a comment, and not hand it to item {}; put "
-            "the {} in quotes if it is meant for the item",
-            text, name, mark);
+        context_.findings.warning(place,
+                                  "the shell would take {} for a comment, and not hand it to item "
+                                  "{}; put the {} in quotes if it is meant for the item",
+                                  text, name, mark);
         break;
     case Effect::Kind::continuation:
-        in_.findings.warning(
-            place,
-            "the shell would take away the {} and the line feed here, and join what "
-            "is before and after them; leave them out",
-            mark);
+        context_.findings.warning(place,
+                                  "the shell would take away the {} and the line feed here, and "
+                                  "join what is before and after them; leave them out",
+                                  mark);
         break;
     case Effect::Kind::function:
-        in_.findings.error(
-            place,
-            "the shell would make a function of item {} here, and run nothing; put the "
-            "{} in quotes if it is meant for the item",
-            name, mark);
+        context_.findings.error(place,
+                                "the shell would make a function of item {} here, and run nothing; "
+                                "put the {} in quotes if it is meant for the item",
+                                name, mark);
         break;
     }
 }
@@ -242,36 +237,33 @@ void ShellChecker::report_command(const Item &item, const Effect &effect, std::s
     const std::string text = quoted_name(effect.text);
     const std::string mark = quoted_name(effect.mark);
     if (effect.mark == "\n") {
-        in_.findings.error(
-            place,
-            "the shell would end the command of item {} at the line feed here, and run "
-            "{} as a command of its own; write a blank in its place",
-            name, text);
+        context_.findings.error(place,
+                                "the shell would end the command of item {} at the line feed here, "
+                                "and run {} as a command of its own; write a blank in its place",
+                                name, text);
     } else if (effect.mark == "&" || effect.mark == "|&") {
-        in_.findings.warning(place,
-                             "the shell would run item {} in the background, {}; put the {} in "
-                             "quotes if it is meant for the item",
-                             name,
-                             effect.text.empty()
-                                 ? "so that it ends at once for the library"
-                                 : fmt::format("and run {} as a command of its own", text),
-                             mark);
+        context_.findings.warning(place,
+                                  "the shell would run item {} in the background, {}; put the {} "
+                                  "in quotes if it is meant for the item",
+                                  name,
+                                  effect.text.empty()
+                                      ? "so that it ends at once for the library"
+                                      : fmt::format("and run {} as a command of its own", text),
+                                  mark);
     } else if (effect.text.empty()) {
-        in_.findings.warning(
-            place,
-            "the shell would end the command of item {0} here, and not hand it the "
-            "{1}; put the {1} in quotes if it is meant for the item",
-            name, mark);
+        context_.findings.warning(place,
+                                  "the shell would end the command of item {0} here, and not hand "
+                                  "it the {1}; put the {1} in quotes if it is meant for the item",
+                                  name, mark);
     } else {
         const std::string when = effect.mark == "&&" ? fmt::format(" where item {} succeeds", name)
                                  : effect.mark == "||" ? fmt::format(" where item {} fails", name)
                                  : effect.mark == "|" ? fmt::format(" on what item {} prints", name)
                                                       : fmt::format(", after item {}", name);
-        in_.findings.warning(
-            place,
-            "the shell would run {} as a command of its own{}; put the {} in quotes "
-            "if it is meant for the item",
-            text, when, mark);
+        context_.findings.warning(place,
+                                  "the shell would run {} as a command of its own{}; put the {} in "
+                                  "quotes if it is meant for the item",
+                                  text, when, mark);
     }
 }
 

@@ -19,7 +19,7 @@ namespace fptest
 class ShellChecker
 {
   public:
-    explicit ShellChecker(const PlanCheck &in);
+    explicit ShellChecker(const CheckContext &context);
 
     void check(const Item &item);
 
@@ -39,7 +39,7 @@ class ShellChecker
     void report_effect(const Item &item, const ShellReading::Effect &effect, std::size_t place);
     void report_command(const Item &item, const ShellReading::Effect &effect, std::size_t place);
 
-    const PlanCheck in_;
+    const CheckContext context_;
     DeviceShell shell_;
     bool is_limit_told_ = false;
     std::unordered_map<std::string, Verdict> verdicts_; // by the line

@@ -66,8 +66,8 @@ bool bears_mark(const Plan &plan, std::size_t number, const std::string &mark)
 
 } // namespace
 
-ReportReader::ReportReader(Run &run, const std::vector<Listener *> &listeners, RunningJob &running)
-    : run_(run), listeners_(listeners), running_(running),
+ReportReader::ReportReader(Run &run, const std::vector<Reporter *> &reporters, RunningJob &running)
+    : run_(run), reporters_(reporters), running_(running),
       saves_(inotify_init1(IN_NONBLOCK | IN_CLOEXEC))
 {
     const std::string folder = std::filesystem::path(kStoredPlan).parent_path();
@@ -214,8 +214,8 @@ void ReportReader::tell_late(const Place &place, bool gathers, int round, const 
         active.reporting.other_changed_at = look_;
     }
     const int now = std::exchange(run_.round, round);
-    for (Listener *listener : listeners_) {
-        listener->late(run_, place, report);
+    for (Reporter *reporter : reporters_) {
+        reporter->late(run_, place, report);
     }
     run_.round = now;
     if (gathers) {
@@ -308,8 +308,8 @@ void ReportReader::read_report(RunningItem &active, const Plan &plan)
             other.reporting.other_changed_at = look_;
         }
     }
-    for (Listener *listener : listeners_) {
-        listener->progressed(run_, active.place);
+    for (Reporter *reporter : reporters_) {
+        reporter->progressed(run_, active.place);
     }
 }
 

@@ -25,7 +25,7 @@ class ReportReader
 {
   public:
     // All of them outlive it.
-    ReportReader(Run &run, const std::vector<Listener *> &listeners, RunningJob &running);
+    ReportReader(Run &run, const std::vector<Reporter *> &reporters, RunningJob &running);
 
     // What a stored plan says of gatherers before it goes: they may have kept a copy.
     void note_gathered(const std::string &text);
@@ -78,7 +78,7 @@ class ReportReader
     bool was_gathered(const ItemReport &report) const;
 
     Run &run_;
-    const std::vector<Listener *> &listeners_;
+    const std::vector<Reporter *> &reporters_;
     RunningJob &running_;
     Descriptor saves_;
     std::vector<Judged> judged_;       // of this round, and gatherers

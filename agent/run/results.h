@@ -134,23 +134,25 @@ const char *word(Outcome outcome);
 // "SIGSEGV", "signal 40"
 std::string name_of_signal(int signal);
 
-// " (round 2)" where there is more than one.
+// " (round 2)" if there is more than one.
 std::string of_round(const Run &run);
 
 // "Bringup", or "Bringup (round 2)"
 std::string title(const Run &run, const Suite &suite);
+// "Bringup/SpiCheck", or "Bringup/SpiCheck (round 2)"
+std::string title(const Run &run, const ItemRun &item);
 
 // Gets told what happens, in this order: begin, then for each item started, any
 // number of progressed, ended; round_over between one round and the next; then
 // finish, also where items were not run. What is told is already in the run. None
 // may wait for its reader.
-class Listener
+class Reporter
 {
   public:
-    Listener() = default;
-    Listener(const Listener &) = delete;
-    Listener &operator=(const Listener &) = delete;
-    virtual ~Listener() = default;
+    Reporter() = default;
+    Reporter(const Reporter &) = delete;
+    Reporter &operator=(const Reporter &) = delete;
+    virtual ~Reporter() = default;
 
     virtual void begin(const Run &run) = 0;
     virtual void started(const Run &run, Place place) = 0;
@@ -191,7 +193,7 @@ class Listener
     }
 
     // What keeps it from writing, in words: "out.json: No space left on device";
-    // empty while nothing does. A listener that has failed stays quiet.
+    // empty while nothing does. A reporter that has failed stays quiet.
     virtual std::string failure() const
     {
         return {};

@@ -86,8 +86,8 @@ void clear_marks()
 class Rounds
 {
   public:
-    Rounds(Runner &runner, Run &run, const std::vector<Listener *> &listeners, const Work &work)
-        : runner_(runner), run_(run), listeners_(listeners), work_(work)
+    Rounds(Runner &runner, Run &run, const std::vector<Reporter *> &reporters, const Work &work)
+        : runner_(runner), run_(run), reporters_(reporters), work_(work)
     {
     }
 
@@ -142,16 +142,15 @@ class Rounds
             return false;
         }
         const ItemRun &item = item_at(run_, {job.suite, (*failed)->item});
-        run_.why_ended = fmt::format("{}/{}{} did not pass (--until-fail)", item.group, item.name,
-                                     of_round(run_));
+        run_.why_ended = title(run_, item) + " did not pass (--until-fail)";
         return true;
     }
 
     void begin_next()
     {
         summarize(run_);
-        for (Listener *listener : listeners_) {
-            listener->round_over(run_);
+        for (Reporter *reporter : reporters_) {
+            reporter->round_over(run_);
         }
         for (const Suite &suite : run_.suites) {
             run_.before += count(suite.items);
@@ -162,17 +161,17 @@ class Rounds
 
     Runner &runner_;
     Run &run_;
-    const std::vector<Listener *> &listeners_;
+    const std::vector<Reporter *> &reporters_;
     const Work &work_;
 };
 
-// --- listeners ----------------------------------------------------------------
+// --- reporters ----------------------------------------------------------------
 
-std::string failures(const std::vector<Listener *> &listeners)
+std::string failures(const std::vector<Reporter *> &reporters)
 {
     std::vector<std::string> all;
-    for (const Listener *listener : listeners) {
-        if (std::string failure = listener->failure(); !failure.empty()) {
+    for (const Reporter *reporter : reporters) {
+        if (std::string failure = reporter->failure(); !failure.empty()) {
             all.push_back(std::move(failure));
         }
     }
@@ -190,11 +189,11 @@ void say_at_end(const std::string &text)
 
 // Now that nothing runs any more, readers are waited for: not for long where the run
 // was interrupted. False where a signal has come first, or the time is over.
-bool flush(const std::vector<Listener *> &listeners, Signals &signals, bool is_interrupted)
+bool flush(const std::vector<Reporter *> &reporters, Signals &signals, bool is_interrupted)
 {
     const auto begin = Clock::now();
-    const auto is_done = [](Listener *listener) { return listener->flush(); };
-    while (!std::ranges::all_of(listeners, is_done)) {
+    const auto is_done = [](Reporter *reporter) { return reporter->flush(); };
+    while (!std::ranges::all_of(reporters, is_done)) {
         if (is_interrupted && Clock::now() - begin > std::chrono::seconds(2)) {
             return false;
         }
@@ -210,11 +209,11 @@ bool flush(const std::vector<Listener *> &listeners, Signals &signals, bool is_i
     return true;
 }
 
-void finish(Run &run, const std::vector<Listener *> &listeners)
+void finish(Run &run, const std::vector<Reporter *> &reporters)
 {
     summarize(run);
-    for (Listener *listener : listeners) {
-        listener->finish(run);
+    for (Reporter *reporter : reporters) {
+        reporter->finish(run);
     }
 }
 
@@ -226,7 +225,7 @@ bool is_interrupted(const Signals &signals)
 }
 
 [[noreturn]] void run_nothing(const std::string &why, Run &run,
-                              const std::vector<Listener *> &begun, Signals &signals)
+                              const std::vector<Reporter *> &begun, Signals &signals)
 {
     run.why_unfinished = why;
     finish(run, begun);
@@ -236,13 +235,13 @@ bool is_interrupted(const Signals &signals)
 
 // The view first: it writes nothing over. Where one of them fails, those that have begun
 // say so.
-void begin(Run &run, const std::vector<Listener *> &listeners, Signals &signals)
+void begin(Run &run, const std::vector<Reporter *> &reporters, Signals &signals)
 {
-    std::vector<Listener *> begun;
-    for (Listener *listener : std::vector(listeners.rbegin(), listeners.rend())) {
-        listener->begin(run);
-        begun.push_back(listener);
-        const std::string failure = listener->failure();
+    std::vector<Reporter *> begun;
+    for (Reporter *reporter : std::vector(reporters.rbegin(), reporters.rend())) {
+        reporter->begin(run);
+        begun.push_back(reporter);
+        const std::string failure = reporter->failure();
         if (!failure.empty() && !is_interrupted(signals)) {
             run_nothing(fmt::format("{}; nothing was run", failure), run, begun, signals);
         }
@@ -251,35 +250,35 @@ void begin(Run &run, const std::vector<Listener *> &listeners, Signals &signals)
 
 } // namespace
 
-bool run_rounds(const std::vector<Listener *> &listeners, const Runner::Limits &limits,
+bool run_rounds(const std::vector<Reporter *> &reporters, const Runner::Limits &limits,
                 LibraryProcess &library, Signals &signals, Run &run, const Work &work,
                 const std::function<void()> &store)
 {
     run.suites = work.suites;
     run.start = std::chrono::system_clock::now();
-    begin(run, listeners, signals);
+    begin(run, reporters, signals);
     const std::string earlier_plan = read_stored_plan().value_or("");
     try {
         store();
     } catch (const Failure &failure) {
-        run_nothing(failure.what(), run, listeners, signals);
+        run_nothing(failure.what(), run, reporters, signals);
     }
-    Runner runner(library, signals, run, listeners, limits);
+    Runner runner(library, signals, run, reporters, limits);
     runner.note_earlier_plan(earlier_plan);
     try {
-        run.finished = Rounds(runner, run, listeners, work).run_all();
+        run.finished = Rounds(runner, run, reporters, work).run_all();
         if (!runner.broken()) {
             clear_marks();
         }
     } catch (const Failure &failure) {
         runner.break_off(failure.what());
     }
-    finish(run, listeners);
-    if (!flush(listeners, signals, runner.signal() != 0)) {
-        say_at_end("a report is not whole: it was not read to its end");
+    finish(run, reporters);
+    if (!flush(reporters, signals, runner.signal() != 0)) {
+        say_at_end("a result file is incomplete: its reader stopped reading");
         return false;
     }
-    const std::string failure = failures(listeners);
+    const std::string failure = failures(reporters);
     if (runner.signal() != 0 && !run.finished) {
         say_at_end(failure);
         return false;

@@ -18,7 +18,7 @@ namespace fptest
 // False where it was interrupted. Throws a Failure where the run, or one of its reports,
 // could not be carried through. The plan is stored once each report has been begun; where
 // that throws a Failure, they are ended.
-bool run_rounds(const std::vector<Listener *> &listeners, const Runner::Limits &limits,
+bool run_rounds(const std::vector<Reporter *> &reporters, const Runner::Limits &limits,
                 LibraryProcess &library, Signals &signals, Run &run, const Work &work,
                 const std::function<void()> &store);
 

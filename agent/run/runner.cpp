@@ -57,9 +57,9 @@ int signal_of(int status)
 // --- a job --------------------------------------------------------------------
 
 Runner::Runner(LibraryProcess &library, Signals &signals, Run &run,
-               const std::vector<Listener *> &listeners, const Limits &limits)
-    : library_(library), signals_(signals), run_(run), listeners_(listeners), limits_(limits),
-      reader_(run, listeners, running_)
+               const std::vector<Reporter *> &reporters, const Limits &limits)
+    : library_(library), signals_(signals), run_(run), reporters_(reporters), limits_(limits),
+      reader_(run, reporters, running_)
 {
     signals_.take_suspensions();
     library_.hold_at_ends();
@@ -144,16 +144,16 @@ void Runner::require_all_started()
         const Place place{running_.job.suite, running_.job.targets[running_.next]->item};
         ItemRun &result = item_at(run_, place);
         result.start = std::chrono::system_clock::now();
-        for (Listener *listener : listeners_) {
-            listener->started(run_, place);
+        for (Reporter *reporter : reporters_) {
+            reporter->started(run_, place);
         }
         result.seconds = 0;
         result.outcome = Outcome::no_result;
         result.reason = library_gone_.empty()
                             ? "the library never reached it; run with --log FILE to see why"
                             : fmt::format("the library never reached it: {}", library_gone_);
-        for (Listener *listener : listeners_) {
-            listener->ended(run_, place);
+        for (Reporter *reporter : reporters_) {
+            reporter->ended(run_, place);
         }
     }
 }
@@ -288,8 +288,8 @@ void Runner::tick()
         item_at(run_, active.place).running = std::max(0.0, Seconds(now() - active.start).count());
         item_at(run_, active.place).stopping = active.stop.has_value();
     }
-    for (Listener *listener : listeners_) {
-        listener->tick(run_);
+    for (Reporter *reporter : reporters_) {
+        reporter->tick(run_);
     }
 }
 
@@ -320,8 +320,8 @@ void Runner::start_next(const LibraryProcess::Event &event)
         std::chrono::system_clock::now() -
         std::chrono::duration_cast<std::chrono::system_clock::duration>(SteadyClock::now() -
                                                                         event.time);
-    for (Listener *listener : listeners_) {
-        listener->started(run_, active.place);
+    for (Reporter *reporter : reporters_) {
+        reporter->started(run_, active.place);
     }
     if (vendor_ != run_.vendor) {
         append_output(item_at(run_, active.place).output,
@@ -424,8 +424,8 @@ void Runner::notify_ended()
     while (!running_.items.empty() && running_.items.front().done) {
         const Place place = running_.items.front().place;
         running_.items.pop_front();
-        for (Listener *listener : listeners_) {
-            listener->ended(run_, place);
+        for (Reporter *reporter : reporters_) {
+            reporter->ended(run_, place);
         }
     }
 }

@@ -30,7 +30,7 @@ class Runner
 
     // All of them outlive the runner.
     Runner(LibraryProcess &library, Signals &signals, Run &run,
-           const std::vector<Listener *> &listeners, const Limits &limits);
+           const std::vector<Reporter *> &reporters, const Limits &limits);
 
     // The stored plan before the run: a gatherer may have kept a copy of it.
     void note_earlier_plan(const std::string &text)
@@ -118,7 +118,7 @@ class Runner
     LibraryProcess &library_;
     Signals &signals_;
     Run &run_;
-    const std::vector<Listener *> &listeners_;
+    const std::vector<Reporter *> &reporters_;
     Limits limits_;
     RunningJob running_;
     ReportReader reader_;

@@ -87,8 +87,8 @@ void Runner::read_signals()
 // for them.
 void Runner::suspend()
 {
-    for (Listener *listener : listeners_) {
-        listener->paused(run_);
+    for (Reporter *reporter : reporters_) {
+        reporter->paused(run_);
     }
     const auto begin = SteadyClock::now();
     library_.suspend();
@@ -97,8 +97,8 @@ void Runner::suspend()
     last_suspension_ = begin;
     last_suspended_ = SteadyClock::now() - begin;
     suspended_ += last_suspended_;
-    for (Listener *listener : listeners_) {
-        listener->resumed(run_);
+    for (Reporter *reporter : reporters_) {
+        reporter->resumed(run_);
     }
 }
 

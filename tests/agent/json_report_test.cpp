@@ -16,7 +16,7 @@ using namespace std::chrono_literals;
 namespace
 {
 
-TEST_F(JsonReport, BeginsWithWhatIsPlanned)
+TEST_F(JsonReporter, BeginsWithWhatIsPlanned)
 {
     RunOfItems run = run_of({suite("Bringup", {passed("SpiCheck"), failed("DeadPixel")}),
                              suite("Gather", {passed("SensorProbe")})});
@@ -34,9 +34,9 @@ TEST_F(JsonReport, BeginsWithWhatIsPlanned)
                   {"group": "Gather", "item": "SensorProbe"}]})"));
 }
 
-TEST_F(JsonReport, TellsEveryEventOfAnItem)
+TEST_F(JsonReporter, TellsEveryEventOfAnItem)
 {
-    const auto report = json_report(path("json"));
+    const auto report = make_json_reporter(path("json"));
     Playback playback(*report, run_of({suite("Bringup", {passed("SpiCheck")}),
                                        suite("Pixels", {passed("x"), failed("DeadPixel")})}));
     playback.begin();
@@ -64,9 +64,9 @@ TEST_F(JsonReport, TellsEveryEventOfAnItem)
         "signal": null, "left_running": [], "output": "row 7\nrow 9\n"})"));
 }
 
-TEST_F(JsonReport, ProgressIsTimedByTheClock)
+TEST_F(JsonReporter, ProgressIsTimedByTheClock)
 {
-    const auto report = json_report(path("json"));
+    const auto report = make_json_reporter(path("json"));
     Playback playback(*report, run_of({suite("G", {passed("a")})}));
     playback.begin();
     playback.start({0, 0});
@@ -79,7 +79,7 @@ TEST_F(JsonReport, ProgressIsTimedByTheClock)
     EXPECT_LT(std::chrono::abs(told - before), 30s);
 }
 
-TEST_F(JsonReport, HasNullForWhatIsNotKnown)
+TEST_F(JsonReporter, HasNullForWhatIsNotKnown)
 {
     ItemRun one = item("a", Outcome::no_result);
     one.seconds.reset();
@@ -92,14 +92,14 @@ TEST_F(JsonReport, HasNullForWhatIsNotKnown)
     EXPECT_EQ(end.at("output"), "");
 }
 
-TEST_F(JsonReport, TellsOfAResultWithoutAValueByAnEmptyText)
+TEST_F(JsonReporter, TellsOfAResultWithoutAValueByAnEmptyText)
 {
     ItemRun one = item("a", Outcome::failed);
     one.report.result_without_value = true;
     EXPECT_EQ(events(json_lines_of(run_of({suite("G", {one})})), "end").at(0).at("result"), "");
 }
 
-TEST_F(JsonReport, NamesEveryOutcome)
+TEST_F(JsonReporter, NamesEveryOutcome)
 {
     std::vector<std::string> words;
     for (const Json &end : events(json_lines_of(mixed_run()), "end")) {
@@ -109,7 +109,7 @@ TEST_F(JsonReport, NamesEveryOutcome)
                 ElementsAre("passed", "failed", "no result", "timed out", "stopped", "not run"));
 }
 
-TEST_F(JsonReport, EndsWithTheCounts)
+TEST_F(JsonReporter, EndsWithTheCounts)
 {
     EXPECT_EQ(json_lines_of(run_of({suite("G", {passed("a"), failed("b")})})).back(),
               Json::parse(R"({"event": "finish", "finished": true, "reason": null, "rounds": 1,
@@ -128,7 +128,7 @@ TEST_F(JsonReport, EndsWithTheCounts)
                   "not_run": 1, "seconds": 2.5})"));
 }
 
-TEST_F(JsonReport, HasOneEndForEachItemAlsoForThoseNotRun)
+TEST_F(JsonReporter, HasOneEndForEachItemAlsoForThoseNotRun)
 {
     const std::vector<Json> lines = json_lines_of(mixed_run());
     std::vector<std::size_t> ended;
@@ -142,7 +142,7 @@ TEST_F(JsonReport, HasOneEndForEachItemAlsoForThoseNotRun)
     EXPECT_EQ(events(lines, "start").size(), 5U);
 }
 
-TEST_F(JsonReport, ReadsBackWhateverIsReported)
+TEST_F(JsonReporter, ReadsBackWhateverIsReported)
 {
     for (const Text &text : hostile_texts_for_json()) {
         const std::vector<Json> lines = json_lines_of(run_with(text.reported));
@@ -159,9 +159,9 @@ TEST_F(JsonReport, ReadsBackWhateverIsReported)
     }
 }
 
-TEST_F(JsonReport, WritesEveryLineAtOnce)
+TEST_F(JsonReporter, WritesEveryLineAtOnce)
 {
-    const auto report = json_report(path("json"));
+    const auto report = make_json_reporter(path("json"));
     Playback playback(*report, mixed_run());
     const auto lines = [&] { return events_of(read_file(path("json"))).size(); };
     playback.begin();
@@ -174,10 +174,10 @@ TEST_F(JsonReport, WritesEveryLineAtOnce)
     EXPECT_EQ(lines(), 4U);
 }
 
-TEST_F(JsonReport, LeavesWholeLinesAndNoFinishWhenItsProcessIsKilled)
+TEST_F(JsonReporter, LeavesWholeLinesAndNoFinishWhenItsProcessIsKilled)
 {
     EXPECT_EQ(in_a_child([&] {
-                  const auto report = json_report(path("json"));
+                  const auto report = make_json_reporter(path("json"));
                   Playback playback(*report, mixed_run());
                   playback.begin();
                   playback.run_item({0, 0});
@@ -192,15 +192,15 @@ TEST_F(JsonReport, LeavesWholeLinesAndNoFinishWhenItsProcessIsKilled)
     EXPECT_TRUE(events(lines, "finish").empty());
 }
 
-TEST_F(JsonReport, TakesThePlaceOfAnOlderFile)
+TEST_F(JsonReporter, TakesThePlaceOfAnOlderFile)
 {
     write_file(path("json"), std::string(100000, 'x'));
     EXPECT_EQ(json_lines_of(run_of({suite("G", {passed("a")})})).size(), 5U);
 }
 
-TEST_F(JsonReport, IsNotInheritedByPrograms)
+TEST_F(JsonReporter, IsNotInheritedByPrograms)
 {
-    const auto report = json_report(path("json"));
+    const auto report = make_json_reporter(path("json"));
     Playback(*report, mixed_run()).begin();
     const std::string command = "for f in /proc/$$/fd/*; do readlink \"$f\"; done | grep -c '" +
                                 path("json") + "' >" + path("count");
@@ -217,10 +217,10 @@ int with_output(int descriptor, const std::function<void()> &what)
     });
 }
 
-TEST_F(JsonReport, GoesToStandardOutputOnRequest)
+TEST_F(JsonReporter, GoesToStandardOutputOnRequest)
 {
     const int file = open(path("out").c_str(), O_WRONLY | O_CREAT | O_CLOEXEC, 0666);
-    EXPECT_EQ(with_output(file, [&] { play(*json_report("-"), mixed_run()); }), 0);
+    EXPECT_EQ(with_output(file, [&] { play(*make_json_reporter("-"), mixed_run()); }), 0);
     close(file);
     EXPECT_EQ(events_of(read_file(path("out"))).back().at("event"), "finish");
     EXPECT_THAT(directory_.names(), ElementsAre("out"));
@@ -236,7 +236,7 @@ std::string read_late(int flags, const std::string &long_text, const std::functi
         ASSERT_EQ(dup2(ends[1], STDOUT_FILENO), STDOUT_FILENO);
         close(ends[0]);
         before();
-        play(*json_report("-"), run_with(long_text));
+        play(*make_json_reporter("-"), run_with(long_text));
     });
     close(ends[1]);
     std::this_thread::sleep_for(200ms);
@@ -252,14 +252,14 @@ std::string read_late(int flags, const std::string &long_text, const std::functi
     return text;
 }
 
-TEST_F(JsonReport, WaitsForAReaderOfANonBlockingPipe)
+TEST_F(JsonReporter, WaitsForAReaderOfANonBlockingPipe)
 {
     const std::string long_text(300000, 'x');
     const std::string text = read_late(O_NONBLOCK, long_text, [] {});
     EXPECT_EQ(events_of(text).back().at("reason"), long_text);
 }
 
-TEST_F(JsonReport, GoesOnWhereASignalHasComeBetween)
+TEST_F(JsonReporter, GoesOnWhereASignalHasComeBetween)
 {
     const auto set_alarms = [] {
         struct sigaction action {
@@ -274,14 +274,14 @@ TEST_F(JsonReport, GoesOnWhereASignalHasComeBetween)
     EXPECT_EQ(events_of(text).back().at("reason"), long_text);
 }
 
-TEST_F(JsonReport, SaysThatNobodyReadsItsOutput)
+TEST_F(JsonReporter, SaysThatNobodyReadsItsOutput)
 {
     std::array<int, 2> ends{};
     ASSERT_EQ(pipe2(ends.data(), O_CLOEXEC), 0);
     close(ends[0]);
     EXPECT_EQ(with_output(ends[1],
                           [&] {
-                              const auto report = json_report("-");
+                              const auto report = make_json_reporter("-");
                               Playback(*report, mixed_run()).begin();
                               EXPECT_EQ(report->failure(), "standard output: Broken pipe");
                           }),
@@ -289,18 +289,18 @@ TEST_F(JsonReport, SaysThatNobodyReadsItsOutput)
     close(ends[1]);
 }
 
-TEST_F(JsonReport, SaysThatTheDiskIsFullAndStaysQuiet)
+TEST_F(JsonReporter, SaysThatTheDiskIsFullAndStaysQuiet)
 {
-    const auto report = json_report("/dev/full");
+    const auto report = make_json_reporter("/dev/full");
     Playback(*report, mixed_run()).play();
     EXPECT_EQ(report->failure(), "/dev/full: No space left on device");
 }
 
-TEST_F(JsonReport, TakesBackALineThatFoundNoRoom)
+TEST_F(JsonReporter, TakesBackALineThatFoundNoRoom)
 {
     EXPECT_EQ(in_a_child([&] {
                   const Limit limit(RLIMIT_FSIZE, 2000);
-                  const auto report = json_report(path("json"));
+                  const auto report = make_json_reporter(path("json"));
                   Playback playback(*report, mixed_run());
                   playback.play();
                   EXPECT_EQ(report->failure(), path("json") + ": File too large");
@@ -314,12 +314,12 @@ TEST_F(JsonReport, TakesBackALineThatFoundNoRoom)
     EXPECT_TRUE(events(lines, "finish").empty());
 }
 
-TEST_F(JsonReport, WritesNoMoreOnceALineHasFoundNoRoom)
+TEST_F(JsonReporter, WritesNoMoreOnceALineHasFoundNoRoom)
 {
     // the short line after the long one would fit
     EXPECT_EQ(in_a_child([&] {
                   const Limit limit(RLIMIT_FSIZE, 1500);
-                  const auto report = json_report(path("json"));
+                  const auto report = make_json_reporter(path("json"));
                   ItemRun loud = passed("a");
                   loud.output = std::string(2000, 'x');
                   Playback(*report, run_of({suite("G", {loud, passed("b")})})).play();
@@ -333,7 +333,7 @@ TEST_F(Reports, BadPathIsToldBeforeAnythingRuns)
 {
     write_file(path("file"), "x");
     const std::string bad = path("file") + "/report";
-    for (const auto &make : {json_report, junit_report}) {
+    for (const auto &make : {make_json_reporter, make_junit_reporter}) {
         const auto report = make(bad);
         Playback playback(*report, mixed_run());
         playback.begin();

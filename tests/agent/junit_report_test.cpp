@@ -16,7 +16,7 @@ using namespace std::chrono_literals;
 namespace
 {
 
-TEST_F(JunitReport, WritesTheExpectedDocument)
+TEST_F(JunitReporter, WritesTheExpectedDocument)
 {
     RunOfItems run =
         run_of({suite("Bringup", {passed("SpiCheck"), failed("DeadPixel"),
@@ -68,7 +68,7 @@ Attributes counts_of(const Element &element)
     return counts;
 }
 
-TEST_F(JunitReport, CountsEveryOutcome)
+TEST_F(JunitReporter, CountsEveryOutcome)
 {
     const Element top = parse_xml(junit_of(mixed_run()));
     EXPECT_EQ(counts_of(top), (Attributes{
@@ -86,7 +86,7 @@ TEST_F(JunitReport, CountsEveryOutcome)
     EXPECT_EQ(top.children.at(1).attributes.at("time"), "0.602");
 }
 
-TEST_F(JunitReport, HasAnElementForEveryOutcome)
+TEST_F(JunitReporter, HasAnElementForEveryOutcome)
 {
     std::vector<std::string> verdicts;
     for (const Element &group : parse_xml(junit_of(mixed_run())).all("testsuite")) {
@@ -112,7 +112,7 @@ TEST_F(JunitReport, HasAnElementForEveryOutcome)
                             "Last 0.000 error message=interrupted by Ctrl-C type=not run"));
 }
 
-TEST_F(JunitReport, HasAMessageAlsoWhereNoReasonIsKnown)
+TEST_F(JunitReporter, HasAMessageAlsoWhereNoReasonIsKnown)
 {
     RunOfItems run =
         run_of({suite("G", {item("a", Outcome::stopped), item("b", Outcome::not_run)})});
@@ -123,7 +123,7 @@ TEST_F(JunitReport, HasAMessageAlsoWhereNoReasonIsKnown)
     EXPECT_EQ(group.all("testcase").at(1).all("error").at(0).attributes.at("message"), "SIGTERM");
 }
 
-TEST_F(JunitReport, TellsOnEverySuiteWhetherTheRunEnded)
+TEST_F(JunitReporter, TellsOnEverySuiteWhetherTheRunEnded)
 {
     for (const Element &group : parse_xml(junit_of(mixed_run())).all("testsuite")) {
         EXPECT_EQ(group.properties().at("finished"), "false");
@@ -136,7 +136,7 @@ TEST_F(JunitReport, TellsOnEverySuiteWhetherTheRunEnded)
     }
 }
 
-TEST_F(JunitReport, TellsOfAResultWithoutAValueByAnEmptyProperty)
+TEST_F(JunitReporter, TellsOfAResultWithoutAValueByAnEmptyProperty)
 {
     ItemRun one = item("a", Outcome::failed);
     one.report.result_without_value = true;
@@ -145,7 +145,7 @@ TEST_F(JunitReport, TellsOfAResultWithoutAValueByAnEmptyProperty)
     EXPECT_EQ(test.properties(), (Attributes{{"result", ""}}));
 }
 
-TEST_F(JunitReport, ReadsBackWhateverIsReported)
+TEST_F(JunitReporter, ReadsBackWhateverIsReported)
 {
     for (const Text &text : hostile_texts_for_xml()) {
         const Element group = parse_xml(junit_of(run_with(text.reported))).children.at(0);
@@ -171,9 +171,9 @@ TEST_F(JunitReport, ReadsBackWhateverIsReported)
     }
 }
 
-TEST_F(JunitReport, IsAWholeDocumentFromTheBeginningOn)
+TEST_F(JunitReporter, IsAWholeDocumentFromTheBeginningOn)
 {
-    const auto report = junit_report(path("xml"));
+    const auto report = make_junit_reporter(path("xml"));
     Playback(*report, mixed_run()).begin();
     EXPECT_EQ(report->failure(), "");
     const Element top = parse_xml(read_file(path("xml")));
@@ -186,9 +186,9 @@ TEST_F(JunitReport, IsAWholeDocumentFromTheBeginningOn)
               (Attributes{{"type", "not run"}, {"message", "not run yet when this was written"}}));
 }
 
-TEST_F(JunitReport, IsReplacedOnceASecondWhileTheRunLasts)
+TEST_F(JunitReporter, IsReplacedOnceASecondWhileTheRunLasts)
 {
-    const auto report = junit_report(path("xml"));
+    const auto report = make_junit_reporter(path("xml"));
     Playback playback(*report, mixed_run());
     playback.begin();
     const ino_t first = inode(path("xml"));
@@ -223,10 +223,10 @@ TEST_F(JunitReport, IsReplacedOnceASecondWhileTheRunLasts)
     EXPECT_THAT(directory_.names(), ElementsAre("xml"));
 }
 
-TEST_F(JunitReport, LeavesAWholeDocumentWhenItsProcessIsKilled)
+TEST_F(JunitReporter, LeavesAWholeDocumentWhenItsProcessIsKilled)
 {
     EXPECT_EQ(in_a_child([&] {
-                  const auto report = junit_report(path("xml"));
+                  const auto report = make_junit_reporter(path("xml"));
                   Playback playback(*report, mixed_run());
                   playback.begin();
                   std::this_thread::sleep_for(1100ms);
@@ -243,7 +243,7 @@ TEST_F(JunitReport, LeavesAWholeDocumentWhenItsProcessIsKilled)
     }
 }
 
-TEST_F(JunitReport, KeepsALinkToItsFile)
+TEST_F(JunitReporter, KeepsALinkToItsFile)
 {
     write_file(path("target"), "old");
     ASSERT_EQ(symlink(path("target").c_str(), path("xml").c_str()), 0);
@@ -256,7 +256,7 @@ TEST_F(JunitReport, KeepsALinkToItsFile)
     EXPECT_THAT(directory_.names(), ElementsAre("target", "xml"));
 }
 
-TEST_F(JunitReport, GoesWhereALinkLeadsThoughThatIsNotThereYet)
+TEST_F(JunitReporter, GoesWhereALinkLeadsThoughThatIsNotThereYet)
 {
     ASSERT_EQ(symlink("next", path("xml").c_str()), 0);
     ASSERT_EQ(symlink("target", path("next").c_str()), 0);
@@ -265,7 +265,7 @@ TEST_F(JunitReport, GoesWhereALinkLeadsThoughThatIsNotThereYet)
     EXPECT_THAT(directory_.names(), ElementsAre("next", "target", "xml"));
 }
 
-TEST_F(JunitReport, KeepsThePermissionsOfItsFile)
+TEST_F(JunitReporter, KeepsThePermissionsOfItsFile)
 {
     write_file(path("xml"), "old");
     ASSERT_EQ(chmod(path("xml").c_str(), 0604), 0);
@@ -276,7 +276,7 @@ TEST_F(JunitReport, KeepsThePermissionsOfItsFile)
     EXPECT_EQ(status.st_mode & 07777, 0604U);
 }
 
-TEST_F(JunitReport, HasThePermissionsOfAnyNewFile)
+TEST_F(JunitReporter, HasThePermissionsOfAnyNewFile)
 {
     const mode_t mask = umask(0027);
     junit_of(mixed_run());
@@ -287,12 +287,12 @@ TEST_F(JunitReport, HasThePermissionsOfAnyNewFile)
     EXPECT_EQ(status.st_mode & 07777U, 0640U);
 }
 
-TEST_F(JunitReport, GoesIntoAPipeOnceAtTheEnd)
+TEST_F(JunitReporter, GoesIntoAPipeOnceAtTheEnd)
 {
     ASSERT_EQ(mkfifo(path("pipe").c_str(), 0666), 0);
     const int reader = open(path("pipe").c_str(), O_RDONLY | O_NONBLOCK | O_CLOEXEC);
     ASSERT_GE(reader, 0);
-    const auto report = junit_report(path("pipe"));
+    const auto report = make_junit_reporter(path("pipe"));
     Playback playback(*report, mixed_run());
     playback.begin();
     std::this_thread::sleep_for(1100ms);
@@ -311,21 +311,21 @@ TEST_F(JunitReport, GoesIntoAPipeOnceAtTheEnd)
     EXPECT_THAT(directory_.names(), ElementsAre("pipe"));
 }
 
-TEST_F(JunitReport, GoesIntoAnOpenDescriptorWithoutReplacingItsFile)
+TEST_F(JunitReporter, GoesIntoAnOpenDescriptorWithoutReplacingItsFile)
 {
     const int file = open(path("out").c_str(), O_RDWR | O_CREAT | O_CLOEXEC, 0666);
     ASSERT_EQ(write(file, "before\n", 7), 7);
     const ino_t before = inode(path("out"));
-    play(*junit_report("/dev/fd/" + std::to_string(file)), mixed_run());
+    play(*make_junit_reporter("/dev/fd/" + std::to_string(file)), mixed_run());
     close(file);
     EXPECT_EQ(inode(path("out")), before);
     EXPECT_THAT(read_file(path("out")), StartsWith("before\n<?xml"));
     EXPECT_THAT(directory_.names(), ElementsAre("out"));
 }
 
-TEST_F(JunitReport, SaysWhyItCannotBeReplaced)
+TEST_F(JunitReporter, SaysWhyItCannotBeReplaced)
 {
-    const auto report = junit_report(path("xml"));
+    const auto report = make_junit_reporter(path("xml"));
     Playback playback(*report, mixed_run());
     playback.begin();
     std::filesystem::create_directory(path("xml." + std::to_string(getpid()) + ".tmp"));
@@ -335,13 +335,13 @@ TEST_F(JunitReport, SaysWhyItCannotBeReplaced)
 
 // No device of /dev is named here: a report that replaced what it should write
 // into would take it from the machine.
-TEST_F(JunitReport, SaysThatWhatItWritesIntoHasNoRoom)
+TEST_F(JunitReporter, SaysThatWhatItWritesIntoHasNoRoom)
 {
     EXPECT_EQ(in_a_child([&] {
                   const int file = open(path("out").c_str(), O_RDWR | O_CREAT | O_CLOEXEC, 0666);
                   const std::string name = "/dev/fd/" + std::to_string(file);
                   const Limit limit(RLIMIT_FSIZE, 1000);
-                  const auto report = junit_report(name);
+                  const auto report = make_junit_reporter(name);
                   Playback playback(*report, mixed_run());
                   playback.begin();
                   playback.run_item({0, 0});
@@ -353,13 +353,13 @@ TEST_F(JunitReport, SaysThatWhatItWritesIntoHasNoRoom)
     EXPECT_EQ(read_file(path("out")).size(), 1000U);
 }
 
-TEST_F(JunitReport, KeepsTheLastWholeDocumentWhereTheNextFindsNoRoom)
+TEST_F(JunitReporter, KeepsTheLastWholeDocumentWhereTheNextFindsNoRoom)
 {
     EXPECT_EQ(in_a_child([&] {
                   RunOfItems run = mixed_run();
                   run.suites[0].items[0].output = std::string(10000, 'x');
                   const Limit limit(RLIMIT_FSIZE, 5000);
-                  const auto report = junit_report(path("xml"));
+                  const auto report = make_junit_reporter(path("xml"));
                   Playback(*report, run).play();
                   EXPECT_EQ(report->failure(), path("xml") + ": File too large");
               }),

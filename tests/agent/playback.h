@@ -1,7 +1,7 @@
 // SPDX-FileCopyrightText: 2026 The Quillmark authors
 // SPDX-License-Identifier: Apache-2.0
 
-// Runs that are not run: what listeners are told of them.
+// Runs that are not run: what reporters are told of them.
 #pragma once
 
 #include "run/results.h"
@@ -86,12 +86,12 @@ inline RunOfItems mixed_run()
     return run;
 }
 
-// Tells listeners of a run as the runner does: what has not happened yet is not
+// Tells reporters of a run as the runner does: what has not happened yet is not
 // in the run either.
 class Playback
 {
   public:
-    Playback(Listener &listener, const RunOfItems &end) : listener_(listener), end_(end), now_(end)
+    Playback(Reporter &reporter, const RunOfItems &end) : reporter_(reporter), end_(end), now_(end)
     {
         now_.finished = false;
         now_.why_unfinished.clear();
@@ -101,26 +101,26 @@ class Playback
 
     void begin()
     {
-        listener_.begin(now_);
+        reporter_.begin(now_);
     }
     void start(Place place)
     {
         now(place).start = end(place).start;
-        listener_.started(now_, place);
+        reporter_.started(now_, place);
     }
     void progress(Place place, const ItemReport &report)
     {
         now(place).report = report;
-        listener_.progressed(now_, place);
+        reporter_.progressed(now_, place);
     }
     void end_item(Place place)
     {
         now(place) = end(place);
-        listener_.ended(now_, place);
+        reporter_.ended(now_, place);
     }
     void report_late(Place place, const ItemReport &report)
     {
-        listener_.late(now_, place, report);
+        reporter_.late(now_, place, report);
     }
     void run_item(Place place)
     {
@@ -130,13 +130,13 @@ class Playback
     }
     void tick()
     {
-        listener_.tick(now_);
+        reporter_.tick(now_);
     }
     // Which ends as the one before.
     void begin_next_round()
     {
         summarize(now_);
-        listener_.round_over(now_);
+        reporter_.round_over(now_);
         for (const Suite &one : now_.suites) {
             now_.before += count(one.items);
         }
@@ -156,8 +156,8 @@ class Playback
         last.summary = now_.summary;
         now_ = last;
         summarize(now_);
-        listener_.finish(now_);
-        while (!listener_.flush()) {
+        reporter_.finish(now_);
+        while (!reporter_.flush()) {
             std::this_thread::sleep_for(std::chrono::milliseconds(1));
         }
     }
@@ -175,11 +175,11 @@ class Playback
     }
     void pause()
     {
-        listener_.paused(now_);
+        reporter_.paused(now_);
     }
     void resume()
     {
-        listener_.resumed(now_);
+        reporter_.resumed(now_);
     }
 
     void play_round()
@@ -214,15 +214,15 @@ class Playback
         return end_.suites[place.suite].items[place.item];
     }
 
-    Listener &listener_;
+    Reporter &reporter_;
     RunOfItems end_;
     RunOfItems now_;
 };
 
-inline void play(Listener &listener, const RunOfItems &run)
+inline void play(Reporter &reporter, const RunOfItems &run)
 {
-    Playback(listener, run).play();
-    EXPECT_EQ(listener.failure(), "");
+    Playback(reporter, run).play();
+    EXPECT_EQ(reporter.failure(), "");
 }
 
 } // namespace playback

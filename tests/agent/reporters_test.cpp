@@ -85,7 +85,7 @@ TEST_F(Reports, AreReadableAndUnfinishedWhereTheRunWasCutOff)
     for (int round = 0; round < 100 && !HasFailure(); ++round) {
         const RunOfItems run = random_run(random);
         const std::size_t stop = random() % 6;
-        const auto play_a_part = [&](Listener &report) {
+        const auto play_a_part = [&](Reporter &report) {
             Playback playback(report, run);
             playback.begin();
             for (std::size_t suite = 0; suite < run.suites.size() && suite < stop; ++suite) {
@@ -97,9 +97,9 @@ TEST_F(Reports, AreReadableAndUnfinishedWhereTheRunWasCutOff)
                 }
             }
         };
-        play_a_part(*json_report(path("json")));
+        play_a_part(*make_json_reporter(path("json")));
         EXPECT_TRUE(events(events_of(read_file(path("json"))), "finish").empty());
-        play_a_part(*junit_report(path("xml")));
+        play_a_part(*make_junit_reporter(path("xml")));
         for (const Element &group : parse_xml(read_file(path("xml"))).all("testsuite")) {
             if (group.attributes.at("name") != "end of the run") {
                 EXPECT_EQ(group.properties().at("finished"), "false");

@@ -149,7 +149,7 @@ class Reports : public ::testing::Test
 
     std::string json_of(const RunOfItems &run) const
     {
-        play(*json_report(path("json")), run);
+        play(*make_json_reporter(path("json")), run);
         return read_file(path("json"));
     }
     std::vector<Json> json_lines_of(const RunOfItems &run) const
@@ -158,20 +158,20 @@ class Reports : public ::testing::Test
     }
     std::string junit_of(const RunOfItems &run) const
     {
-        play(*junit_report(path("xml")), run);
+        play(*make_junit_reporter(path("xml")), run);
         return read_file(path("xml"));
     }
     std::string tap_of(const RunOfItems &run) const
     {
-        play_tap([&](Listener &tap) { play(tap, run); });
+        play_tap([&](Reporter &tap) { play(tap, run); });
         return read_file(path("tap"));
     }
 
-    void play_tap(const std::function<void(Listener &)> &what) const
+    void play_tap(const std::function<void(Reporter &)> &what) const
     {
         const Stream stream(std::fopen(path("tap").c_str(), "w"), &std::fclose);
         ASSERT_NE(stream, nullptr);
-        what(*tap_report(stream.get()));
+        what(*make_tap_reporter(stream.get()));
     }
 
     using Stream = std::unique_ptr<std::FILE, decltype(&std::fclose)>;
@@ -179,9 +179,9 @@ class Reports : public ::testing::Test
     TemporaryDirectory directory_;
 };
 
-using JsonReport = Reports;
-using JunitReport = Reports;
-using TapReport = Reports;
+using JsonReporter = Reports;
+using JunitReporter = Reports;
+using TapReporter = Reports;
 
 // Its exit status, or minus the signal.
 inline int in_a_child(const std::function<void()> &what)

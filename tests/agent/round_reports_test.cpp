@@ -85,7 +85,7 @@ class RoundReports : public Test
     std::string tap(const RunOfItems &run, const std::function<void(Playback &)> &what) const
     {
         return written([&](std::FILE *stream) {
-            const auto report = tap_report(stream);
+            const auto report = make_tap_reporter(stream);
             Playback playback(*report, run);
             what(playback);
         });
@@ -94,7 +94,7 @@ class RoundReports : public Test
     std::string plain(const RunOfItems &run, const std::function<void(Playback &)> &what) const
     {
         return written([&](std::FILE *stream) {
-            const auto view = plain_view(stream, false);
+            const auto view = make_plain_view(stream, false);
             Playback playback(*view, run);
             what(playback);
         });
@@ -117,7 +117,7 @@ void play_two(Playback &playback)
 
 TEST_F(RoundReports, NumberTheEventsOfAllRoundsInJson)
 {
-    const auto report = json_report(path("json"));
+    const auto report = make_json_reporter(path("json"));
     Playback playback(*report, two_items(3));
     play_into_third(playback);
     std::vector<std::string> ends;
@@ -133,7 +133,7 @@ TEST_F(RoundReports, NumberTheEventsOfAllRoundsInJson)
 TEST_F(RoundReports, EndTheRestOfABrokenRoundAndCountTheOthersInJson)
 {
     const RunOfItems run = two_items(1'000'000);
-    const auto report = json_report(path("json"));
+    const auto report = make_json_reporter(path("json"));
     Playback playback(*report, run);
     play_into_third(playback);
     playback.end_as(interrupted(run));
@@ -155,7 +155,7 @@ TEST_F(RoundReports, SayInJsonWhatEndsTheRun)
     run.time_limit = 7200;
     run.until_fail = true;
     run.why_ended = "H/b did not pass (--until-fail)";
-    const auto report = json_report(path("json"));
+    const auto report = make_json_reporter(path("json"));
     Playback(*report, run).play();
     const std::string text = read_file(path("json"));
     const Json begin = events_of(text, "run").at(0);
@@ -233,7 +233,7 @@ std::vector<std::string> verdicts(const Element &top)
 
 TEST_F(RoundReports, NameTheTestCasesOfEachRoundInJunit)
 {
-    const auto report = junit_report(path("xml"));
+    const auto report = make_junit_reporter(path("xml"));
     Playback playback(*report, two_items(4));
     play_into_third(playback);
     playback.play_round();
@@ -256,7 +256,7 @@ TEST_F(RoundReports, NameTheTestCasesOfEachRoundInJunit)
 TEST_F(RoundReports, TellTheRoundsThatHaveNotBegunAsOneErrorInJunit)
 {
     const RunOfItems run = two_items(1'000'000);
-    const auto report = junit_report(path("xml"));
+    const auto report = make_junit_reporter(path("xml"));
     Playback playback(*report, run);
     play_into_third(playback);
     playback.end_as(interrupted(run));
@@ -280,7 +280,7 @@ TEST_F(RoundReports, TellTheRoundsThatHaveNotBegunAsOneErrorInJunit)
 
 TEST_F(RoundReports, AreRedInJunitFromTheFirstMomentOn)
 {
-    const auto report = junit_report(path("xml"));
+    const auto report = make_junit_reporter(path("xml"));
     Playback playback(*report, two_items(2));
     playback.begin();
     const Element top = parse_xml(read_file(path("xml")));
@@ -295,7 +295,7 @@ TEST_F(RoundReports, AreRedInJunitWhereAnOpenRunIsCutOffBetweenItsRounds)
     run.time_limit = 3600;
     run.finished = false;
     run.why_unfinished = "interrupted by SIGTERM";
-    const auto report = junit_report(path("xml"));
+    const auto report = make_junit_reporter(path("xml"));
     Playback(*report, run).play();
     const Element top = parse_xml(read_file(path("xml")));
     EXPECT_EQ(verdicts(top).back(), "rounds/round 2: not run");
@@ -310,7 +310,7 @@ TEST_F(RoundReports, SkipWhatIsLeftAfterTheItemThatWasWaitedForInJunit)
     run.suites[1].items[0] = item("b", Outcome::not_run);
     run.suites[1].items[0].group = "H";
     run.why_ended = "G/a did not pass (--until-fail)";
-    const auto report = junit_report(path("xml"));
+    const auto report = make_junit_reporter(path("xml"));
     Playback(*report, run).play();
     const Element top = parse_xml(read_file(path("xml")));
     EXPECT_THAT(verdicts(top), ElementsAre("G/a (round 1): passed", "H/b (round 1): skipped"));
@@ -328,7 +328,7 @@ TEST_F(RoundReports, GoThroughAPipeThatHoldsLessThanTheJunitDocument)
     std::string text;
     std::thread reader([&] { text = read_file(path("pipe")); });
     {
-        const auto report = junit_report(path("pipe"));
+        const auto report = make_junit_reporter(path("pipe"));
         Playback playback(*report, run);
         playback.play(2);
         EXPECT_EQ(report->failure(), "");
@@ -356,7 +356,7 @@ RunOfItems crashed_run()
 
 TEST_F(RoundReports, TellInJsonHowAnItemEnded)
 {
-    const auto report = json_report(path("json"));
+    const auto report = make_json_reporter(path("json"));
     Playback(*report, crashed_run()).play();
     const auto ends = events_of(read_file(path("json")), "end");
     EXPECT_EQ(ends.at(0).at("exit_status"), Json());
@@ -370,7 +370,7 @@ TEST_F(RoundReports, TellInJsonHowAnItemEnded)
 
 TEST_F(RoundReports, TellInJunitHowAnItemEnded)
 {
-    const auto report = junit_report(path("xml"));
+    const auto report = make_junit_reporter(path("xml"));
     Playback(*report, crashed_run()).play();
     const Element group = parse_xml(read_file(path("xml"))).children.at(0);
     const Element crash = group.all("testcase").at(0);
@@ -443,13 +443,13 @@ TEST_F(RoundReports, TellALateReportOnALineOfItsOwn)
                 HasSubstr(std::string("\n") + kLate + "\nH/b: failed"));
     EXPECT_EQ(parse_tap(tap(two_items(1), play_with_a_late_report)).comments.at(0), kLate);
 
-    const auto junit = junit_report(path("xml"));
+    const auto junit = make_junit_reporter(path("xml"));
     Playback in_junit(*junit, two_items(1));
     play_with_a_late_report(in_junit);
     EXPECT_EQ(parse_xml(read_file(path("xml"))).children.at(0).properties().at("late_report"),
               kLate);
 
-    const auto json = json_report(path("json"));
+    const auto json = make_json_reporter(path("json"));
     Playback in_json(*json, two_items(1));
     play_with_a_late_report(in_json);
     Json late = events_of(read_file(path("json")), "late").at(0);
@@ -507,7 +507,7 @@ TEST_F(RoundReports, AreQuietButForWhatIsWrong)
     left.left_running = {{"sh", 812}};
     const RunOfItems run = run_of({suite("G", {passed("a"), left, failed("c")})});
     EXPECT_EQ(written([&run](std::FILE *stream) {
-                  const auto view = plain_view(stream, true);
+                  const auto view = make_plain_view(stream, true);
                   Playback(*view, run).play(2);
               }),
               "G/b: passed, result 0, 0.3 s: chip answers\n"
@@ -525,7 +525,7 @@ TEST_F(RoundReports, AreQuietButForWhatIsWrong)
 TEST_F(RoundReports, LeaveTheShellsLinesAloneAfterAPause)
 {
     const std::string text = written([](std::FILE *stream) {
-        const auto view = live_view(stream, false);
+        const auto view = make_live_view(stream, false);
         Playback playback(*view, two_items(1));
         playback.begin();
         playback.start({0, 0});

@@ -21,7 +21,7 @@ const std::string kPassedBlock = "      ---\n"
                                  "      duration_ms: 301\n"
                                  "      ...\n";
 
-TEST_F(TapReport, WritesTheExpectedDocument)
+TEST_F(TapReporter, WritesTheExpectedDocument)
 {
     EXPECT_EQ(tap_of(mixed_run()), R"(TAP version 14
 1..2
@@ -72,7 +72,7 @@ Bail out!  interrupted by Ctrl-C
 )");
 }
 
-TEST_F(TapReport, DoesNotBailOutOfARunThatEnded)
+TEST_F(TapReporter, DoesNotBailOutOfARunThatEnded)
 {
     const Tap tap = parse_tap(tap_of(run_of({suite("G", {passed("a"), failed("b")})})));
     EXPECT_FALSE(tap.bail_out);
@@ -80,14 +80,14 @@ TEST_F(TapReport, DoesNotBailOutOfARunThatEnded)
     EXPECT_THAT(tap.comments, ElementsAre("1 passed, 1 failed, 0 not run in 2.5 s"));
 }
 
-TEST_F(TapReport, BailsOutAlsoWhereNobodyKnowsWhy)
+TEST_F(TapReporter, BailsOutAlsoWhereNobodyKnowsWhy)
 {
     RunOfItems run = mixed_run();
     run.why_unfinished.clear();
     EXPECT_EQ(parse_tap(tap_of(run)).bail_out, "the run did not finish");
 }
 
-TEST_F(TapReport, IsVersion13UnderAHarness)
+TEST_F(TapReporter, IsVersion13UnderAHarness)
 {
     const std::string usual = tap_of(mixed_run());
     setenv("HARNESS_ACTIVE", "1", 1);
@@ -97,7 +97,7 @@ TEST_F(TapReport, IsVersion13UnderAHarness)
     EXPECT_EQ(usual.substr(15), harnessed.substr(15));
 }
 
-TEST_F(TapReport, HasEveryPlannedPointOnceAlsoWhereTheRunWasInterrupted)
+TEST_F(TapReporter, HasEveryPlannedPointOnceAlsoWhereTheRunWasInterrupted)
 {
     RunOfItems run = mixed_run();
     run.suites.push_back(
@@ -113,9 +113,9 @@ TEST_F(TapReport, HasEveryPlannedPointOnceAlsoWhereTheRunWasInterrupted)
     EXPECT_EQ(tap.points[1].skipped, std::nullopt);
 }
 
-TEST_F(TapReport, WritesAPointWhenItsItemHasEnded)
+TEST_F(TapReporter, WritesAPointWhenItsItemHasEnded)
 {
-    play_tap([&](Listener &report) {
+    play_tap([&](Reporter &report) {
         Playback playback(report, mixed_run());
         const auto text = [&] { return read_file(path("tap")); };
         playback.begin();
@@ -134,9 +134,9 @@ TEST_F(TapReport, WritesAPointWhenItsItemHasEnded)
     });
 }
 
-TEST_F(TapReport, KeepsItsOrderWhereItemsEndInAnother)
+TEST_F(TapReporter, KeepsItsOrderWhereItemsEndInAnother)
 {
-    play_tap([&](Listener &report) {
+    play_tap([&](Reporter &report) {
         Playback playback(
             report, run_of({suite("G", {passed("a"), passed("b")}), suite("H", {passed("c")})}));
         playback.begin();
@@ -155,7 +155,7 @@ TEST_F(TapReport, KeepsItsOrderWhereItemsEndInAnother)
     EXPECT_EQ(parse_tap(read_file(path("tap"))).points.size(), 2U);
 }
 
-TEST_F(TapReport, SkipsWhatIsLeftAfterTheItemThatWasWaitedFor)
+TEST_F(TapReporter, SkipsWhatIsLeftAfterTheItemThatWasWaitedFor)
 {
     RunOfItems run = run_of({suite("G", {passed("a"), item("b", Outcome::not_run)})});
     run.why_ended = "G/a did not pass";
@@ -164,7 +164,7 @@ TEST_F(TapReport, SkipsWhatIsLeftAfterTheItemThatWasWaitedFor)
                           "    ok 2 - b # SKIP not run: G/a did not pass\nok 1 - G\n"));
 }
 
-TEST_F(TapReport, SkipsWhatHasNoItems)
+TEST_F(TapReporter, SkipsWhatHasNoItems)
 {
     EXPECT_EQ(tap_of(run_of({suite("Empty", {}), suite("G", {passed("a")})})), R"(TAP version 14
 1..2
@@ -199,7 +199,7 @@ std::string on_one_line(const std::string &text)
     return line;
 }
 
-TEST_F(TapReport, ReadsBackWhateverIsReported)
+TEST_F(TapReporter, ReadsBackWhateverIsReported)
 {
     for (const Text &text : hostile_texts_for_json()) {
         const Tap tap = parse_tap(tap_of(run_with(text.reported)));
@@ -222,7 +222,7 @@ TEST_F(TapReport, ReadsBackWhateverIsReported)
     }
 }
 
-TEST_F(TapReport, HasNothingThatYamlCannotHold)
+TEST_F(TapReporter, HasNothingThatYamlCannotHold)
 {
     // line ends and marks beside the usual ones, and characters that are none
     for (const char *text :
@@ -233,7 +233,7 @@ TEST_F(TapReport, HasNothingThatYamlCannotHold)
     }
 }
 
-TEST_F(TapReport, TellsOfAResultWithoutAValueByAnEmptyText)
+TEST_F(TapReporter, TellsOfAResultWithoutAValueByAnEmptyText)
 {
     ItemRun one = item("a", Outcome::failed);
     one.report.result_without_value = true;
@@ -241,12 +241,12 @@ TEST_F(TapReport, TellsOfAResultWithoutAValueByAnEmptyText)
     EXPECT_EQ(tap.points.at(0).inside.at(0).diagnosis.at("result"), "");
 }
 
-class Prove : public TapReport
+class Prove : public TapReporter
 {
   protected:
     void SetUp() override
     {
-        TapReport::SetUp();
+        TapReporter::SetUp();
         setenv("HARNESS_ACTIVE", "1", 1);
     }
     Ended proved(const RunOfItems &run) const
@@ -291,7 +291,7 @@ TEST_F(Prove, SeesThatARunWasInterrupted)
 
 TEST_F(Prove, SeesThatARunWasCutOff)
 {
-    play_tap([&](Listener &report) {
+    play_tap([&](Reporter &report) {
         Playback playback(
             report, run_of({suite("G", {passed("a")}), suite("H", {passed("b"), passed("c")})}));
         playback.begin();
@@ -334,11 +334,11 @@ TEST_F(Prove, ReadsALongDescriptionsBeginning)
     }
 }
 
-TEST_F(TapReport, SaysThatTheDiskIsFullAndStaysQuiet)
+TEST_F(TapReporter, SaysThatTheDiskIsFullAndStaysQuiet)
 {
     const Stream stream(std::fopen("/dev/full", "w"), &std::fclose);
     ASSERT_NE(stream, nullptr);
-    const auto report = tap_report(stream.get());
+    const auto report = make_tap_reporter(stream.get());
     Playback playback(*report, mixed_run());
     playback.begin();
     EXPECT_EQ(report->failure(), "the TAP output: No space left on device");
@@ -347,12 +347,12 @@ TEST_F(TapReport, SaysThatTheDiskIsFullAndStaysQuiet)
     EXPECT_EQ(report->failure(), "the TAP output: No space left on device");
 }
 
-TEST_F(TapReport, SaysThatNobodyReads)
+TEST_F(TapReporter, SaysThatNobodyReads)
 {
     std::array<int, 2> ends{};
     ASSERT_EQ(pipe2(ends.data(), O_CLOEXEC), 0);
     const Stream stream(fdopen(ends[1], "w"), &std::fclose);
-    const auto report = tap_report(stream.get());
+    const auto report = make_tap_reporter(stream.get());
     Playback playback(*report, mixed_run());
     playback.begin();
     EXPECT_EQ(report->failure(), "");
@@ -361,11 +361,11 @@ TEST_F(TapReport, SaysThatNobodyReads)
     EXPECT_EQ(report->failure(), "the TAP output: Broken pipe");
 }
 
-TEST_F(TapReport, WritesNoMoreOnceItHasFoundNoRoom)
+TEST_F(TapReporter, WritesNoMoreOnceItHasFoundNoRoom)
 {
     EXPECT_EQ(in_a_child([&] {
                   const Stream stream(std::fopen(path("tap").c_str(), "w"), &std::fclose);
-                  const auto report = tap_report(stream.get());
+                  const auto report = make_tap_reporter(stream.get());
                   Playback playback(*report, mixed_run());
                   {
                       const Limit limit(RLIMIT_FSIZE, 60);
