@@ -15,8 +15,8 @@ namespace fptest
 namespace
 {
 
-// Spelled alike but for case, numbers and signs: one for another in a path is an
-// easy mistake.
+// The same for names that differ only in case, numbers and signs, and so are easily
+// confused.
 std::string likeness(std::string_view name)
 {
     std::string letters;
@@ -29,10 +29,10 @@ std::string likeness(std::string_view name)
     return letters;
 }
 
-// An item that its group lacks is looked for in the groups after it, and its
-// position there is run here. That is so with every item of every later group:
-// said is where the wrong path comes easily, because another group has an item of
-// that name, or the earlier group one like it.
+// The library looks for an item that its group lacks in the groups after it, and then runs
+// its position here. That is true of every item of every later group; it is reported only
+// where the mistake is easy: another group has an item of that name, or the earlier group
+// has a similar one.
 class LaterGroupsCheck
 {
   public:
@@ -96,7 +96,7 @@ class LaterGroupsCheck
         }
     }
 
-    // One before this group whose path with that name leads here.
+    // A group before this one whose path with that name leads here.
     [[nodiscard]] const Group *earlier_group(const std::string &name) const
     {
         const auto last = after_last_.find(name);

@@ -14,7 +14,7 @@ namespace fptest
 namespace
 {
 
-// One that a path splits or cuts.
+// Reports a name that a path splits or cuts.
 void report_unaddressable(const CheckContext &context, std::size_t place, std::string_view what,
                           const std::string &name, const std::string &path, const Resolution &run)
 {
@@ -33,7 +33,7 @@ void report_unaddressable(const CheckContext &context, std::size_t place, std::s
         names_of(run));
 }
 
-// A name without a value has been reported as that.
+// Except for a name without a value, which is reported already.
 void report_unnamed(const CheckContext &context, std::size_t element, const char *text)
 {
     if (!context.places.is_valueless(element, "name")) {

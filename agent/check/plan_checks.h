@@ -18,10 +18,10 @@ namespace fptest
 // Elements named almost like groups or items.
 void check_tags(const CheckContext &context);
 
-// False where no path finds the group.
+// False if no path finds the group.
 bool check_group_name(const CheckContext &context, const Group &group);
 
-// first is the element that has the name in this group before it; null for none.
+// first is an earlier element of this group with the same name; null if there is none.
 void check_item_name(const CheckContext &context, const Group &group, const Item &item,
                      const std::size_t *first);
 
@@ -32,10 +32,10 @@ void check_program(const CheckContext &context, const Item &item,
 // An item in another element of its group.
 void check_nested(const CheckContext &context, const Group &group, const Item &item);
 
-// What else is in a group, by which the library counts on to its items.
+// Other nodes in a group, which shift the positions of its items.
 void check_positions(const CheckContext &context, const Group &group);
 
-// Says where a path of a group leads into a later one that is easily meant.
+// Paths of a group that lead into a later one, if the mistake is easy.
 void check_later_groups(const CheckContext &context, const std::vector<Group> &groups);
 
 } // namespace fptest

@@ -24,7 +24,7 @@ bool is_other_of(const CheckContext &context, const Group &group, const Plan::El
            mxmlGetParent(context.plan.elements()[element.number]) == group.node;
 }
 
-// Those that a group command takes for items; false where there are none.
+// Reports elements that a group command takes for items; false if there are none.
 bool report_run_others(const CheckContext &context, const Group &group, const Resolution &run)
 {
     bool found = false;
@@ -78,7 +78,7 @@ std::size_t place_of_others(const CheckContext &context, const Group &group)
     return place != kNone ? place : context.places.of(group.number);
 }
 
-// All in their order, and at most elements of the group beside them.
+// All of them in order, and nothing else but other elements of the group.
 bool runs_its_items(const CheckContext &context, const Group &group, const Resolution &run)
 {
     std::vector<std::size_t> meant;
@@ -96,7 +96,7 @@ bool runs_its_items(const CheckContext &context, const Group &group, const Resol
     return found == meant;
 }
 
-// What paths run that is not what they name.
+// Which paths run something else than they name.
 std::vector<std::string> shifts_of(const CheckContext &context, const Group &group,
                                    const Resolution &run)
 {

@@ -22,7 +22,7 @@ struct VendorName {
     int vendor = 0;
 };
 
-// An item's name that has a vendor's suffix in it.
+// An item's name with a vendor's suffix in it.
 std::optional<VendorName> vendor_name(std::string_view name)
 {
     for (const int vendor : {2, 1}) {

@@ -18,7 +18,7 @@ namespace
 using Fault = ShellReading::Fault;
 using Effect = ShellReading::Effect;
 
-// The characters of a program's name that the shell does not take as they are.
+// The characters of a program's name that mean something to the shell.
 std::string shell_characters(std::string_view name)
 {
     constexpr std::string_view kTaken = " \"'\\$`;&|<>()*?[{";
@@ -31,7 +31,7 @@ std::string shell_characters(std::string_view name)
     return join_and(found);
 }
 
-// Whether the shell may read more in it than words.
+// Whether it may hold more than words.
 bool may_hold_syntax(std::string_view line)
 {
     return line.size() <= kCommandLimit && // else it is cut, and what is left of it changes
@@ -52,7 +52,7 @@ std::string reason(const Fault &fault)
     return {};
 }
 
-// What the shell runs for the text between backticks, where a '\' may be before these.
+// What the shell runs for the text between backticks, in which a '\' escapes these.
 std::string without_escapes(const std::string &text, std::string_view escaped)
 {
     std::string plain;
@@ -93,7 +93,7 @@ void ShellChecker::check(const Item &item)
             }
         }
     }
-    // before a line feed that is reported it is the same mistake
+    // with a line feed after it that is reported, it is the same mistake
     const bool ends_line = std::ranges::any_of(verdict.reading.effects, [&](const Effect &effect) {
         return effect.mark == "\n" && line[effect.at - 1] == '\r';
     });
@@ -105,7 +105,7 @@ void ShellChecker::check(const Item &item)
     }
 }
 
-// The shell's word counts where there is one.
+// If there is a shell, its word counts.
 ShellChecker::Verdict ShellChecker::judge(const Item &item, const std::string &line)
 {
     const auto [place, is_new] = verdicts_.try_emplace(line);
@@ -128,8 +128,8 @@ ShellChecker::Verdict ShellChecker::judge(const Item &item, const std::string &l
     return verdict;
 }
 
-// With -n the shell does not look between backticks. What is between those in others
-// costs only what these print.
+// With -n the shell does not look between backticks. A fault in nested ones only costs
+// what the outer ones print.
 bool ShellChecker::is_substitution_refused(const Effect &substitution, std::string &why)
 {
     const std::string &text = substitution.text;
@@ -140,7 +140,7 @@ bool ShellChecker::is_substitution_refused(const Effect &substitution, std::stri
                           is_substitution_refused(effect, why);
                });
     }
-    // a '\' before a '"' is an escape where quotes are round it
+    // within double quotes a '\' escapes a '"' as well
     return shell_.ask(without_escapes(text, "$`\\"), why) == DeviceShell::Answer::refused &&
            shell_.ask(without_escapes(text, "$`\\\""), why) == DeviceShell::Answer::refused;
 }
@@ -230,7 +230,7 @@ void ShellChecker::report_effect(const Item &item, const Effect &effect, std::si
     }
 }
 
-// What ends the item's own command.
+// Reports what ends the item's own command.
 void ShellChecker::report_command(const Item &item, const Effect &effect, std::size_t place)
 {
     const std::string name = quoted_name(item.name);

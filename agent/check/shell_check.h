@@ -1,8 +1,7 @@
 // SPDX-FileCopyrightText: 2026 The Quillmark authors
 // SPDX-License-Identifier: Apache-2.0
 
-// The part of the plan checker that looks at what the shell makes of an item's
-// name and args.
+// Checks what the shell makes of an item's name and args.
 #pragma once
 
 #include "check/device_shell.h"
@@ -32,7 +31,7 @@ class ShellChecker
 
     Verdict judge(const Item &item, const std::string &line);
     bool is_substitution_refused(const ShellReading::Effect &substitution, std::string &why);
-    // Of a byte of its args.
+    // The place of a byte of its args.
     [[nodiscard]] std::size_t args_place(const Item &item, std::size_t at) const;
     void report_name(const Item &item, const std::string &characters, bool is_line_refused);
     void report_refusal(const Item &item, const Verdict &verdict, std::size_t args_begin);

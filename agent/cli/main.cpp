@@ -126,13 +126,13 @@ int main(int argc, char **argv)
     } catch (const std::exception &error) {
         status = complain(Exit::environment, error.what());
     }
-    // whether an error has been reported already: failed items and a plan's errors are none
-    const bool is_told = status != Exit::success && status != Exit::items_failed;
+    // failed items and errors in a plan are results, not failures of fptest
+    const bool has_failed = status != Exit::success && status != Exit::items_failed;
     const bool is_unwritten = std::fflush(stdout) != 0 || std::ferror(stdout) != 0;
     const std::string loss = fptest::log_loss();
     if (!loss.empty()) {
-        status = complain(is_told ? status : Exit::environment, loss);
-    } else if (is_unwritten && !is_told) {
+        status = complain(has_failed ? status : Exit::environment, loss);
+    } else if (is_unwritten && !has_failed) {
         status = complain(Exit::environment, "standard output cannot be written");
     }
     return static_cast<int>(status);
