@@ -1,14 +1,13 @@
 // SPDX-FileCopyrightText: 2026 The Quillmark authors
 // SPDX-License-Identifier: Apache-2.0
 
-// Finds in a test plan what the library would make something else of than its
-// author meant.
+// Finds what the library would take differently from what a test plan's author meant.
 #pragma once
 
+#include "check/findings.h"
 #include "plan/markup.h"
 #include "plan/plan.h"
 
-#include <cstddef>
 #include <optional>
 #include <string>
 #include <vector>
@@ -16,19 +15,10 @@
 namespace fptest
 {
 
-struct Finding {
-    enum class Severity { error, warning };
-
-    Severity severity = Severity::error;
-    std::size_t offset = 0; // in the text
-    std::string text;
-};
-
-// How a plan comes to its place.
+// How a plan is stored.
 enum class Storing {
-    by_command,      // which may cut it
-    by_command_only, // the same, where --as-sent asks for that
-    as_file,         // whole, or it is there already
+    by_command, // which may cut it
+    as_file,    // whole, or it is there already
 };
 
 // What Mini-XML makes of a text.
@@ -37,18 +27,18 @@ struct Loaded {
     {
     }
 
-    std::string why;          // it does not load, in Mini-XML's words
-    std::optional<Plan> plan; // nothing then
+    std::string why;          // why it does not load, in Mini-XML's words
+    std::optional<Plan> plan; // nullopt then
 };
 
-// A plan that was read, and what is known of it.
+// A plan and what check() has found.
 struct CheckedPlan {
     std::string name; // of the file, for people
     std::string text;
     Storing storing;
-    std::string stored;            // what of the text the library gets
-    Loaded loaded;                 // of that
-    std::optional<Loaded> uncut;   // of the text, where that is more
+    std::string stored;            // the part of the text that the library gets
+    Loaded loaded;                 // from that part
+    std::optional<Loaded> uncut;   // from the whole text, if that is more
     std::vector<Tag> tags;         // of the text
     std::vector<Finding> findings; // in the order of the text
 
@@ -59,7 +49,4 @@ struct CheckedPlan {
 };
 
 CheckedPlan check(std::string name, std::string text, Storing storing);
-
-bool has_errors(const std::vector<Finding> &findings);
-
 } // namespace fptest

@@ -25,8 +25,7 @@ namespace
 
 using Clock = std::chrono::steady_clock;
 
-// What a process writes until it closes its end, or nothing where that takes
-// longer.
+// What a process writes until it closes its end; nullopt if that takes longer.
 std::optional<std::string> read_all(int descriptor, double seconds)
 {
     const auto end = Clock::now() + std::chrono::duration<double>(seconds);
@@ -56,10 +55,9 @@ bool may_be_in_a_name(unsigned char byte)
     return std::isalpha(byte) != 0 || byte == '_' || byte >= 0x80;
 }
 
-// Whether it stays an expansion between double quotes, in which nothing is run. What could
-// be an end of it, a quote or an expansion within it is refused: the shell expands a
-// subscript in arithmetic once more than it is read. Nor may a variable decide what becomes
-// of arithmetic: it may be set on the device.
+// Whether it stays a mere expansion between double quotes, and runs nothing. No end, quote
+// or expansion inside it is allowed, because the shell expands a subscript in arithmetic
+// twice. Nor may arithmetic depend on a variable, which may be set on the device.
 bool is_safe_to_expand(std::string_view expansion)
 {
     const bool is_arithmetic = expansion.starts_with("$((");

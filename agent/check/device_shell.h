@@ -8,23 +8,23 @@
 namespace fptest
 {
 
-// The device's own shell, which is asked without running anything.
+// Asks the device's own shell about command lines, without running anything.
 class DeviceShell
 {
   public:
     enum class Answer { accepted, refused, unknown };
 
-    // It is asked for so long in all, its start and end included.
+    // For all questions together, the shell's start and end included.
     explicit DeviceShell(double seconds = 5) : left_(seconds)
     {
     }
 
-    // unknown where there is no such shell, or it has taken too long in all; why
-    // then is as it was, else what the shell says against the line.
+    // unknown if there is no such shell, or the time is up; why is set if the shell refuses
+    // the line, to its complaint.
     Answer ask(const std::string &line, std::string &why);
 
-    // The same of an expansion, which has to be tried: with no variables set, and
-    // unknown where that could make a difference, or something would be run.
+    // The same for an expansion, which has to be tried, with no variables set: unknown if
+    // variables matter, or if it would run something.
     Answer ask_to_expand(const std::string &expansion, std::string &why);
 
     [[nodiscard]] bool is_out_of_time() const

@@ -3,7 +3,7 @@
 
 #include "check/elements.h"
 
-#include "check/checks.h"
+#include "check/document_checks.h"
 #include "util/text.h"
 
 #include <string_view>

@@ -1,7 +1,7 @@
 // SPDX-FileCopyrightText: 2026 The Quillmark authors
 // SPDX-License-Identifier: Apache-2.0
 
-// Groups and items as the checks look at them, and the words for them.
+// Groups and items as the checks see them, and the words for them.
 #pragma once
 
 #include "check/findings.h"
@@ -18,8 +18,8 @@
 namespace fptest
 {
 
-// A plan, and where to say what is wrong with it.
-struct PlanCheck {
+// What the checks of one plan share.
+struct CheckContext {
     const Plan &plan;
     const SourceMap &places;
     Findings &findings;
@@ -28,14 +28,14 @@ struct PlanCheck {
 struct Item {
     mxml_node_t *node = nullptr;
     std::size_t number = 0;
-    std::string name; // empty where it has none
+    std::string name; // empty if it has none
     std::optional<std::string> args;
 };
 
 struct Group {
     mxml_node_t *node = nullptr;
     std::size_t number = 0;
-    std::string name;   // empty where it has none
+    std::string name;   // empty if it has none
     bool found = false; // by its name
     std::vector<Item> items;
     std::vector<Item> nested; // in other elements of it
@@ -50,7 +50,7 @@ struct Elements {
 
 Elements elements_of(const Plan &plan);
 
-// Those that a path of the group can lead to: the first of each name.
+// Items that a path can reach: the first of each name.
 std::vector<const Item *> addressable_items(const Group &group);
 
 // "a comment", "<TAG>"
@@ -59,7 +59,7 @@ std::string kind_of(mxml_node_t *node);
 // "item 'NAME'"
 std::string words_for(const Item &item);
 
-// What a path leads to, one for each of the library's calls.
+// What a path leads to, an entry for each of the library's calls.
 using Resolution = std::vector<std::optional<Plan::Element>>;
 
 // 'root/GROUP' and 'root/GROUP/ITEM'

@@ -18,7 +18,7 @@ namespace fptest
 namespace
 {
 
-// Whether a byte goes on with a character.
+// Whether a byte continues a character.
 bool continues(char byte)
 {
     return (static_cast<unsigned char>(byte) & 0xC0U) == 0x80U;
@@ -48,8 +48,8 @@ std::string shown(std::string_view source)
     return one_line(text);
 }
 
-// The line that the place is in: what is before it, and the rest; of a long one
-// what is near it, which is more than is shown.
+// The line around the place: what is before it, and the rest; of a long line only what
+// is near, which is more than is shown.
 std::pair<std::string, std::string> source_line(std::string_view text, std::size_t offset)
 {
     constexpr std::size_t kNear = 512; // bytes
@@ -96,25 +96,21 @@ std::string FindingPrinter::printed(const Finding &finding)
         before = "..." + std::string(end_of(before, kWidth - 3 - display_width(after)));
     }
     return fmt::format("{}:{}:{}: {}: {}\n{}\n{:>{}}\n", file_, place.line, place.column,
-                       finding.severity == Finding::Severity::error ? "error" : "warning",
-                       finding.text, ellipsize(before + after, kWidth), '^',
-                       display_width(before) + 1);
+                       finding.is_error() ? "error" : "warning", finding.text,
+                       ellipsize(before + after, kWidth), '^', display_width(before) + 1);
 }
 
 void print(std::FILE *stream, const CheckedPlan &plan)
 {
     constexpr std::size_t kShown = 1000;
-    const auto is_error = [](const Finding &one) {
-        return one.severity == Finding::Severity::error;
-    };
     FindingPrinter printer(plan.name, plan.text);
-    // no warning in an error's place
+    // warnings get the room that errors leave
     std::size_t errors =
-        std::min<std::size_t>(std::ranges::count_if(plan.findings, is_error), kShown);
+        std::min<std::size_t>(std::ranges::count_if(plan.findings, &Finding::is_error), kShown);
     std::size_t warnings = kShown - errors;
     std::size_t hidden = 0;
     for (const Finding &finding : plan.findings) {
-        if (std::size_t &left = is_error(finding) ? errors : warnings; left > 0) {
+        if (std::size_t &left = finding.is_error() ? errors : warnings; left > 0) {
             --left;
             std::fputs(printer.printed(finding).c_str(), stream);
         } else {

@@ -1,7 +1,7 @@
 // SPDX-FileCopyrightText: 2026 The Quillmark authors
 // SPDX-License-Identifier: Apache-2.0
 
-// The findings of the plan checker as they are printed.
+// How the checker's findings are printed.
 #pragma once
 
 #include "check/check.h"
@@ -14,7 +14,7 @@
 namespace fptest
 {
 
-// For a file's findings in the order of its text, which they come to quickly.
+// Fast for findings in the order of the text.
 class FindingPrinter
 {
   public:
@@ -32,7 +32,7 @@ class FindingPrinter
     Positions positions_;
 };
 
-// Prints the messages of a plan's findings, the first thousand of them.
+// Prints a plan's findings, at most 1000, errors before warnings.
 void print(std::FILE *stream, const CheckedPlan &plan);
 
 } // namespace fptest

@@ -1,22 +1,36 @@
 // SPDX-FileCopyrightText: 2026 The Quillmark authors
 // SPDX-License-Identifier: Apache-2.0
 
-// What the parts of the plan checker share.
+// What the checks report.
 #pragma once
-
-#include "check/check.h"
-#include "util/text.h"
 
 #include <algorithm>
 #include <cstddef>
 #include <fmt/core.h>
 #include <string>
-#include <string_view>
 #include <utility>
 #include <vector>
 
 namespace fptest
 {
+
+struct Finding {
+    enum class Severity { error, warning };
+
+    Severity severity = Severity::error;
+    std::size_t offset = 0; // in the text
+    std::string text;
+
+    [[nodiscard]] bool is_error() const
+    {
+        return severity == Severity::error;
+    }
+};
+
+inline bool has_errors(const std::vector<Finding> &findings)
+{
+    return std::ranges::any_of(findings, &Finding::is_error);
+}
 
 class Findings
 {
@@ -48,13 +62,5 @@ class Findings
   private:
     std::vector<Finding> list_;
 };
-
-inline constexpr std::size_t kShownName = 63; // columns
-
-// A name, or what stands for one, in a message.
-inline std::string quoted_name(std::string_view name)
-{
-    return in_quotes(name, kShownName);
-}
 
 } // namespace fptest

@@ -1,7 +1,7 @@
 // SPDX-FileCopyrightText: 2026 The Quillmark authors
 // SPDX-License-Identifier: Apache-2.0
 
-#include "check/checks.h"
+#include "check/document_checks.h"
 #include "check/wellformed.h"
 #include "plan/markup.h"
 #include "util/text.h"
@@ -30,7 +30,7 @@ bool is_name(std::string_view name)
            });
 }
 
-// The name of the innermost element that is open there; empty where none is.
+// The name of the innermost element that is open there; empty if none is.
 std::string open_at(const std::vector<Tag> &tags, std::size_t offset)
 {
     std::vector<const std::string *> open;
@@ -50,8 +50,8 @@ std::string open_at(const std::vector<Tag> &tags, std::size_t offset)
 class FormChecker
 {
   public:
-    FormChecker(const CheckedPlan &read, Findings &findings)
-        : read_(read), text_(read.text), tags_(read.tags), findings_(findings)
+    FormChecker(const CheckedPlan &checked, Findings &findings)
+        : checked_(checked), text_(checked.text), tags_(checked.tags), findings_(findings)
     {
     }
 
@@ -72,16 +72,16 @@ class FormChecker
         if (!given_.empty()) {
             repaired.emplace(repaired_);
         }
-        const Loaded &loaded = repaired ? *repaired : read_.whole();
+        const Loaded &loaded = repaired ? *repaired : checked_.whole();
         if (loaded.plan) {
-            check_plan(read_, *loaded.plan, findings_);
+            check_plan(checked_, *loaded.plan, findings_);
         } else if (!endless) {
             report_refusal(loaded.why);
         }
     }
 
   private:
-    // The rest can be looked at only once every attribute has a value.
+    // The other checks need a value for every attribute.
     void give_values()
     {
         std::size_t done = 0;
@@ -98,7 +98,7 @@ class FormChecker
         repaired_.append(text_, done);
     }
 
-    // The place in the text itself.
+    // The offset in the original text.
     [[nodiscard]] std::size_t original(std::size_t offset) const
     {
         for (const Attribute *attribute : given_) {
@@ -130,18 +130,18 @@ class FormChecker
             findings_.error(offset,
                             "an entity is declared here: the library would not {}; write its text "
                             "where it is used",
-                            read_.loaded.plan ? "know it" : "load the plan");
+                            checked_.loaded.plan ? "know it" : "load the plan");
             return;
         }
         findings_.error(offset, "not well-formed, {}: the library would {}; {}",
                         reason(flaw.error, offset),
-                        read_.loaded.plan ? "load it all the same, and run what it took from it"
-                                          : "not load it",
+                        checked_.loaded.plan ? "load it all the same, and run what it took from it"
+                                             : "not load it",
                         advice(flaw.error, offset));
     }
 
-    // Where a person looks for it: the parser names the tag for an entity in it,
-    // and the end of the text for what lacks its own.
+    // Where a person would look: for an entity the parser names its tag, and for a missing
+    // end the end of the text.
     [[nodiscard]] std::size_t place_of(const Flaw &flaw) const
     {
         const std::size_t last = text_.find_last_not_of(" \t\r\n");
@@ -232,18 +232,18 @@ class FormChecker
         return "fix it here";
     }
 
-    // Mini-XML ignores the declaration: it takes every text for UTF-8.
+    // Mini-XML ignores the declaration and takes every text for UTF-8.
     void report_encoding()
     {
         const std::size_t offset = first_not_utf8(text_);
-        // zero bytes are another finding
+        // zero bytes are a finding of their own
         if (offset != kNone && text_.find('\0') == kNone) {
             findings_.error(offset, "not UTF-8: the library looks at no encoding declaration, and "
                                     "would read something else here; save it as UTF-8");
         }
     }
 
-    // As a byte order mark, wherever it is.
+    // Mini-XML takes U+FEFF for a byte order mark anywhere.
     void report_dropped_character()
     {
         for (const Tag &tag : tags_) {
@@ -258,7 +258,7 @@ class FormChecker
         }
     }
 
-    // Mini-XML ends one at its first '>', and takes the rest for text.
+    // Mini-XML ends a declaration at its first '>', and takes the rest for text.
     void report_cut_declaration()
     {
         const Tag *declaration = nullptr;
@@ -278,7 +278,7 @@ class FormChecker
         }
     }
 
-    // Mini-XML sees the end of a comment only after something in it.
+    // Mini-XML looks for the end of a comment only after its first character.
     bool report_endless_comments()
     {
         constexpr std::string_view kEmpty = "<!---->";
@@ -317,8 +317,7 @@ class FormChecker
                         ellipsize(one_line(why), kShownWhy));
     }
 
-    // What is beside the root element, where Mini-XML takes that for a
-    // second root.
+    // Something beside the root element that Mini-XML takes for a second root.
     [[nodiscard]] std::size_t beside_root() const
     {
         std::size_t depth = 0;
@@ -338,7 +337,7 @@ class FormChecker
 
     static constexpr std::string_view kValue = "=\"\"";
 
-    const CheckedPlan &read_;
+    const CheckedPlan &checked_;
     const std::string &text_;
     const std::vector<Tag> &tags_;
     std::string repaired_;
@@ -348,9 +347,9 @@ class FormChecker
 
 } // namespace
 
-void check_form(const CheckedPlan &read, Findings &findings)
+void check_form(const CheckedPlan &checked, Findings &findings)
 {
-    FormChecker(read, findings).check();
+    FormChecker(checked, findings).check();
 }
 
 } // namespace fptest

@@ -1,6 +1,7 @@
 // SPDX-FileCopyrightText: 2026 The Quillmark authors
 // SPDX-License-Identifier: Apache-2.0
 
+#include "check/document_checks.h"
 #include "check/plan_checks.h"
 
 #include <cctype>
@@ -14,8 +15,8 @@ namespace fptest
 namespace
 {
 
-// Spelled alike but for case, numbers and signs: one for another in a path is an
-// easy mistake.
+// The same for names that differ only in case, numbers and signs, and so are easily
+// confused.
 std::string likeness(std::string_view name)
 {
     std::string letters;
@@ -28,14 +29,15 @@ std::string likeness(std::string_view name)
     return letters;
 }
 
-// An item that its group lacks is looked for in the groups after it, and its
-// position there is run here. That is so with every item of every later group:
-// said is where the wrong path comes easily, because another group has an item of
-// that name, or the earlier group one like it.
+// The library looks for an item that its group lacks in the groups after it, and then runs
+// its position here. That is true of every item of every later group; it is reported only
+// where the mistake is easy: another group has an item of that name, or the earlier group
+// has a similar one.
 class LaterGroupsCheck
 {
   public:
-    LaterGroupsCheck(const PlanCheck &in, const std::vector<Group> &groups) : in_(in)
+    LaterGroupsCheck(const CheckContext &context, const std::vector<Group> &groups)
+        : context_(context)
     {
         for (const Group &group : groups) {
             if (group.found) {
@@ -73,8 +75,8 @@ class LaterGroupsCheck
         std::size_t more = 0;
         for (const Item *item : entry.items) {
             const Group *earlier = earlier_group(item->name);
-            const auto run =
-                earlier != nullptr ? in_.plan.resolve(earlier->name, item->name) : std::nullopt;
+            const auto run = earlier != nullptr ? context_.plan.resolve(earlier->name, item->name)
+                                                : std::nullopt;
             if (!run || run->number == item->number) {
                 continue;
             }
@@ -89,12 +91,12 @@ class LaterGroupsCheck
                                path_of(earlier->name, item->name), names_of({run}));
         }
         if (first != nullptr) {
-            in_.findings.warning(in_.places.of(first->number, "name"), "{}{}", text,
-                                 more > 0 ? fmt::format(", and to {} more here", more) : "");
+            context_.findings.warning(context_.places.of(first->number, "name"), "{}{}", text,
+                                      more > 0 ? fmt::format(", and to {} more here", more) : "");
         }
     }
 
-    // One before this group whose path with that name leads here.
+    // A group before this one whose path with that name leads here.
     [[nodiscard]] const Group *earlier_group(const std::string &name) const
     {
         const auto last = after_last_.find(name);
@@ -107,7 +109,7 @@ class LaterGroupsCheck
                                                                : nullptr;
     }
 
-    const PlanCheck in_;
+    const CheckContext context_;
     std::vector<Entry> groups_;
     std::size_t at_ = 0;
     std::unordered_map<std::string, std::size_t> uses_;
@@ -117,9 +119,9 @@ class LaterGroupsCheck
 
 } // namespace
 
-void check_later_groups(const PlanCheck &in, const std::vector<Group> &groups)
+void check_later_groups(const CheckContext &context, const std::vector<Group> &groups)
 {
-    LaterGroupsCheck(in, groups).check();
+    LaterGroupsCheck(context, groups).check();
 }
 
 } // namespace fptest

@@ -16,26 +16,26 @@ namespace fptest
 {
 
 // Elements named almost like groups or items.
-void check_tags(const PlanCheck &in);
+void check_tags(const CheckContext &context);
 
-// False where no path finds the group.
-bool check_group_name(const PlanCheck &in, const Group &group);
+// False if no path finds the group.
+bool check_group_name(const CheckContext &context, const Group &group);
 
-// first is the element that has the name in this group before it; null for none.
-void check_item_name(const PlanCheck &in, const Group &group, const Item &item,
+// first is an earlier element of this group with the same name; null if there is none.
+void check_item_name(const CheckContext &context, const Group &group, const Item &item,
                      const std::size_t *first);
 
 // What the library and the shell make of an item's name and args.
-void check_program(const PlanCheck &in, const Item &item,
+void check_program(const CheckContext &context, const Item &item,
                    const std::unordered_set<std::string> &item_names, ShellChecker &shell);
 
 // An item in another element of its group.
-void check_nested(const PlanCheck &in, const Group &group, const Item &item);
+void check_nested(const CheckContext &context, const Group &group, const Item &item);
 
-// What else is in a group, by which the library counts on to its items.
-void check_positions(const PlanCheck &in, const Group &group);
+// Other nodes in a group, which shift the positions of its items.
+void check_positions(const CheckContext &context, const Group &group);
 
-// Says where a path of a group leads into a later one that is easily meant.
-void check_later_groups(const PlanCheck &in, const std::vector<Group> &groups);
+// Paths of a group that lead into a later one, if the mistake is easy.
+void check_later_groups(const CheckContext &context, const std::vector<Group> &groups);
 
 } // namespace fptest

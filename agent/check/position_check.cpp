@@ -1,7 +1,7 @@
 // SPDX-FileCopyrightText: 2026 The Quillmark authors
 // SPDX-License-Identifier: Apache-2.0
 
-#include "check/checks.h"
+#include "check/document_checks.h"
 #include "check/plan_checks.h"
 #include "util/text.h"
 
@@ -18,22 +18,23 @@ namespace
 constexpr std::size_t kShownEffects = 3;
 constexpr std::size_t kShownKinds = 5;
 
-bool is_other_of(const PlanCheck &in, const Group &group, const Plan::Element &element)
+bool is_other_of(const CheckContext &context, const Group &group, const Plan::Element &element)
 {
-    return element.tag != "Cmd" && mxmlGetParent(in.plan.elements()[element.number]) == group.node;
+    return element.tag != "Cmd" &&
+           mxmlGetParent(context.plan.elements()[element.number]) == group.node;
 }
 
-// Those that a group command takes for items; false where there are none.
-bool report_run_others(const PlanCheck &in, const Group &group, const Resolution &run)
+// Reports elements that a group command takes for items; false if there are none.
+bool report_run_others(const CheckContext &context, const Group &group, const Resolution &run)
 {
     bool found = false;
     for (const auto &element : run) {
-        if (element && is_other_of(in, group, *element)) {
-            in.findings.error(in.places.of(element->number),
-                              "{} in group {} has a name, by which {} would run it like an item; "
-                              "put it outside of the group",
-                              kind_of(in.plan.elements()[element->number]), quoted_name(group.name),
-                              path_of(group.name));
+        if (element && is_other_of(context, group, *element)) {
+            context.findings.error(context.places.of(element->number),
+                                   "{} in group {} has a name, by which {} would run it like an "
+                                   "item; put it outside of the group",
+                                   kind_of(context.plan.elements()[element->number]),
+                                   quoted_name(group.name), path_of(group.name));
             found = true;
         }
     }
@@ -66,19 +67,19 @@ std::string kinds_of(const std::vector<mxml_node_t *> &others)
     return join_and(kinds);
 }
 
-std::size_t place_of_others(const PlanCheck &in, const Group &group)
+std::size_t place_of_others(const CheckContext &context, const Group &group)
 {
-    std::size_t place = in.places.of_text(group.number);
+    std::size_t place = context.places.of_text(group.number);
     for (mxml_node_t *other : group.others) {
         if (mxmlGetType(other) == MXML_ELEMENT) {
-            place = std::min(place, in.places.of(in.plan.number(other)));
+            place = std::min(place, context.places.of(context.plan.number(other)));
         }
     }
-    return place != kNone ? place : in.places.of(group.number);
+    return place != kNone ? place : context.places.of(group.number);
 }
 
-// All in their order, and at most elements of the group beside them.
-bool runs_its_items(const PlanCheck &in, const Group &group, const Resolution &run)
+// All of them in order, and nothing else but other elements of the group.
+bool runs_its_items(const CheckContext &context, const Group &group, const Resolution &run)
 {
     std::vector<std::size_t> meant;
     for (const Item &item : group.items) {
@@ -88,22 +89,23 @@ bool runs_its_items(const PlanCheck &in, const Group &group, const Resolution &r
     }
     std::vector<std::size_t> found;
     for (const auto &element : run) {
-        if (element && !is_other_of(in, group, *element)) {
+        if (element && !is_other_of(context, group, *element)) {
             found.push_back(element->number);
         }
     }
     return found == meant;
 }
 
-// What paths run that is not what they name.
-std::vector<std::string> shifts_of(const PlanCheck &in, const Group &group, const Resolution &run)
+// Which paths run something else than they name.
+std::vector<std::string> shifts_of(const CheckContext &context, const Group &group,
+                                   const Resolution &run)
 {
     std::vector<std::string> effects;
-    if (!runs_its_items(in, group, run)) {
+    if (!runs_its_items(context, group, run)) {
         effects.push_back(fmt::format("{} would run {}", path_of(group.name), names_of(run)));
     }
     for (const Item *item : addressable_items(group)) {
-        const auto found = in.plan.resolve(group.name, item->name);
+        const auto found = context.plan.resolve(group.name, item->name);
         if (!found || found->number != item->number) {
             effects.push_back(
                 fmt::format("{} would run {}", path_of(group.name, item->name), names_of({found})));
@@ -114,48 +116,48 @@ std::vector<std::string> shifts_of(const PlanCheck &in, const Group &group, cons
 
 } // namespace
 
-void check_nested(const PlanCheck &in, const Group &group, const Item &item)
+void check_nested(const CheckContext &context, const Group &group, const Item &item)
 {
     std::string effect = "no node path leads to it";
     if (group.found && is_addressable(item.name)) {
-        const auto run = in.plan.resolve(group.name, item.name);
+        const auto run = context.plan.resolve(group.name, item.name);
         const std::string path = path_of(group.name, item.name);
         effect = run && run->number == item.number
                      ? fmt::format("{} finds it by chance", path)
                      : fmt::format("{} would run {}", path, names_of({run}));
     }
-    in.findings.error(in.places.of(item.number),
-                      "{} is not directly in its group, but in {}: {}; put it directly into a "
-                      "group",
-                      words_for(item), kind_of(mxmlGetParent(item.node)), effect);
+    context.findings.error(
+        context.places.of(item.number),
+        "{} is not directly in its group, but in {}: {}; put it directly into a group",
+        words_for(item), kind_of(mxmlGetParent(item.node)), effect);
 }
 
-void check_positions(const PlanCheck &in, const Group &group)
+void check_positions(const CheckContext &context, const Group &group)
 {
     if (group.items.empty() && group.nested.empty() && group.others.empty()) {
-        in.findings.warning(in.places.of(group.number),
-                            "group {} is empty: {} would run nothing, and an item of it is "
-                            "looked for in the groups after it; put items into it",
-                            quoted_name(group.name), path_of(group.name));
+        context.findings.warning(context.places.of(group.number),
+                                 "group {} is empty: {} would run nothing, and an item of it is "
+                                 "looked for in the groups after it; put items into it",
+                                 quoted_name(group.name), path_of(group.name));
     }
     if (group.others.empty()) {
         return;
     }
-    const Resolution run = in.plan.resolve(group.name);
-    const bool said = report_run_others(in, group, run) || !group.nested.empty();
-    const std::vector<std::string> effects = shifts_of(in, group, run);
+    const Resolution run = context.plan.resolve(group.name);
+    const bool said = report_run_others(context, group, run) || !group.nested.empty();
+    const std::vector<std::string> effects = shifts_of(context, group, run);
     const std::string kinds = kinds_of(group.others);
-    const std::size_t place = place_of_others(in, group);
+    const std::size_t place = place_of_others(context, group);
     if (!effects.empty()) {
-        in.findings.error(place,
-                          "{} in group {}, which shifts the positions: {}; keep all but items "
-                          "out of the group",
-                          kinds, quoted_name(group.name), some_of(effects));
+        context.findings.error(
+            place,
+            "{} in group {}, which shifts the positions: {}; keep all but items out of the group",
+            kinds, quoted_name(group.name), some_of(effects));
     } else if (!said) {
-        in.findings.warning(place,
-                            "{} in group {}: {} would look for more items than there are, and go "
-                            "on; keep all but items out of the group",
-                            kinds, quoted_name(group.name), path_of(group.name));
+        context.findings.warning(place,
+                                 "{} in group {}: {} would look for more items than there are, and "
+                                 "go on; keep all but items out of the group",
+                                 kinds, quoted_name(group.name), path_of(group.name));
     }
 }
 

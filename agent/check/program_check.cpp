@@ -1,6 +1,7 @@
 // SPDX-FileCopyrightText: 2026 The Quillmark authors
 // SPDX-License-Identifier: Apache-2.0
 
+#include "check/document_checks.h"
 #include "check/plan_checks.h"
 #include "util/text.h"
 
@@ -21,7 +22,7 @@ struct VendorName {
     int vendor = 0;
 };
 
-// An item's name that has a vendor's suffix in it.
+// An item's name with a vendor's suffix in it.
 std::optional<VendorName> vendor_name(std::string_view name)
 {
     for (const int vendor : {2, 1}) {
@@ -34,39 +35,38 @@ std::optional<VendorName> vendor_name(std::string_view name)
     return std::nullopt;
 }
 
-void check_vendors(const PlanCheck &in, const Item &item,
+void check_vendors(const CheckContext &context, const Item &item,
                    const std::unordered_set<std::string> &item_names)
 {
     const std::string &name = item.name;
-    const std::size_t place = in.places.of(item.number, "name");
+    const std::size_t place = context.places.of(item.number, "name");
     const auto vendor = vendor_name(name);
     if (name == std::string(kGatherer) + "_qsee" || (vendor && vendor->name == kGatherer)) {
-        in.findings.warning(place,
-                            "item {} is not the gatherer: that is '{}', to which the library "
-                            "adds the vendor's suffix; leave it out",
-                            quoted_name(name), kGatherer);
+        context.findings.warning(place,
+                                 "item {} is not the gatherer: that is '{}', to which the library "
+                                 "adds the vendor's suffix; leave it out",
+                                 quoted_name(name), kGatherer);
     } else if (vendor && item_names.contains(vendor->name)) {
-        in.findings.warning(place,
-                            "item {0} would be run as {1} under vendor {2}, and item {3} as {0}; "
-                            "rename one",
-                            quoted_name(name), quoted_name(name + vendor->suffix), vendor->vendor,
-                            quoted_name(vendor->name));
+        context.findings.warning(
+            place, "item {0} would be run as {1} under vendor {2}, and item {3} as {0}; rename one",
+            quoted_name(name), quoted_name(name + vendor->suffix), vendor->vendor,
+            quoted_name(vendor->name));
     } else if (vendor) {
-        in.findings.warning(place,
-                            "item {} would be run as {} under vendor {}: the library adds the "
-                            "suffix; leave it out",
-                            quoted_name(name), quoted_name(name + vendor->suffix), vendor->vendor);
+        context.findings.warning(
+            place,
+            "item {} would be run as {} under vendor {}: the library adds the suffix; leave it out",
+            quoted_name(name), quoted_name(name + vendor->suffix), vendor->vendor);
     }
 }
 
-void check_command_line(const PlanCheck &in, const Item &item)
+void check_command_line(const CheckContext &context, const Item &item)
 {
     if (!item.args) {
         const std::string line = command_line(item.name, std::nullopt, "");
-        in.findings.error(in.places.of(item.number),
-                          "item {} has no args: its command line would be {}, which the shell "
-                          "refuses; add args=\"\"",
-                          quoted_name(item.name), quoted_name(line));
+        context.findings.error(context.places.of(item.number),
+                               "item {} has no args: its command line would be {}, which the shell "
+                               "refuses; add args=\"\"",
+                               quoted_name(item.name), quoted_name(line));
         return;
     }
     std::vector<std::string> excesses;
@@ -78,15 +78,16 @@ void check_command_line(const PlanCheck &in, const Item &item)
         }
     }
     if (!excesses.empty()) {
-        in.findings.error(in.places.of(item.number, "args"),
-                          "the command line of item {} is cut to {} bytes, by {}; shorten its {}",
-                          quoted_name(item.name), kCommandLimit, join_and(excesses),
-                          item.args->empty() ? "name" : "args");
+        context.findings.error(
+            context.places.of(item.number, "args"),
+            "the command line of item {} is cut to {} bytes, by {}; shorten its {}",
+            quoted_name(item.name), kCommandLimit, join_and(excesses),
+            item.args->empty() ? "name" : "args");
     }
 }
 } // namespace
 
-void check_program(const PlanCheck &in, const Item &item,
+void check_program(const CheckContext &context, const Item &item,
                    const std::unordered_set<std::string> &item_names, ShellChecker &shell)
 {
     const std::string &name = item.name;
@@ -94,15 +95,15 @@ void check_program(const PlanCheck &in, const Item &item,
         return;
     }
     if (name.size() > kStopLimit && name.size() <= kNameLimit) {
-        in.findings.warning(in.places.of(item.number, "name"),
-                            "item {} may not be found to be stopped: ps is asked for the first "
-                            "{} of the {} bytes of its name, and finds another or none; shorten "
-                            "it",
-                            quoted_name(name), kStopLimit, name.size());
+        context.findings.warning(
+            context.places.of(item.number, "name"),
+            "item {} may not be found to be stopped: ps is asked for the first {} of the {} bytes "
+            "of its name, and finds another or none; shorten it",
+            quoted_name(name), kStopLimit, name.size());
     }
     shell.check(item);
-    check_vendors(in, item, item_names);
-    check_command_line(in, item);
+    check_vendors(context, item, item_names);
+    check_command_line(context, item);
 }
 
 } // namespace fptest

@@ -3,6 +3,7 @@
 
 #include "check/shell_check.h"
 
+#include "check/document_checks.h"
 #include "plan/plan.h"
 
 #include <algorithm>
@@ -17,7 +18,7 @@ namespace
 using Fault = ShellReading::Fault;
 using Effect = ShellReading::Effect;
 
-// The characters of a program's name that the shell does not take as they are.
+// The characters of a program's name that mean something to the shell.
 std::string shell_characters(std::string_view name)
 {
     constexpr std::string_view kTaken = " \"'\\$`;&|<>()*?[{";
@@ -30,7 +31,7 @@ std::string shell_characters(std::string_view name)
     return join_and(found);
 }
 
-// Whether the shell may read more in it than words.
+// Whether it may hold more than words.
 bool may_hold_syntax(std::string_view line)
 {
     return line.size() <= kCommandLimit && // else it is cut, and what is left of it changes
@@ -51,7 +52,7 @@ std::string reason(const Fault &fault)
     return {};
 }
 
-// What the shell runs for the text between backticks, where a '\' may be before these.
+// What the shell runs for the text between backticks, in which a '\' escapes these.
 std::string without_escapes(const std::string &text, std::string_view escaped)
 {
     std::string plain;
@@ -65,7 +66,7 @@ std::string without_escapes(const std::string &text, std::string_view escaped)
 
 } // namespace
 
-ShellChecker::ShellChecker(const PlanCheck &in) : in_(in)
+ShellChecker::ShellChecker(const CheckContext &context) : context_(context)
 {
 }
 
@@ -92,19 +93,19 @@ void ShellChecker::check(const Item &item)
             }
         }
     }
-    // before a line feed that is reported it is the same mistake
+    // with a line feed after it that is reported, it is the same mistake
     const bool ends_line = std::ranges::any_of(verdict.reading.effects, [&](const Effect &effect) {
         return effect.mark == "\n" && line[effect.at - 1] == '\r';
     });
     if (const std::size_t at = args.find('\r'); at != args.npos && !ends_line) {
-        in_.findings.warning(args_place(item, at),
-                             "the shell takes the carriage return here for a character like any "
-                             "other, and would hand it to item {}; leave it out",
-                             quoted_name(item.name));
+        context_.findings.warning(args_place(item, at),
+                                  "the shell takes the carriage return here for a character like "
+                                  "any other, and would hand it to item {}; leave it out",
+                                  quoted_name(item.name));
     }
 }
 
-// The shell's word counts where there is one.
+// If there is a shell, its word counts.
 ShellChecker::Verdict ShellChecker::judge(const Item &item, const std::string &line)
 {
     const auto [place, is_new] = verdicts_.try_emplace(line);
@@ -117,19 +118,18 @@ ShellChecker::Verdict ShellChecker::judge(const Item &item, const std::string &l
                                       : answer == DeviceShell::Answer::refused;
         if (answer == DeviceShell::Answer::unknown && shell_.is_out_of_time() && !is_limit_told_) {
             is_limit_told_ = true;
-            in_.findings.warning(
-                in_.places.of(item.number, "name"),
-                "the device's shell has been asked for as long as fptest waits for "
-                "it: from item {} on, what it would refuse may be missed; check the "
-                "rest as a plan of its own",
+            context_.findings.warning(
+                context_.places.of(item.number, "name"),
+                "the device's shell has been asked for as long as fptest waits for it: from item "
+                "{} on, what it would refuse may be missed; check the rest as a plan of its own",
                 quoted_name(item.name));
         }
     }
     return verdict;
 }
 
-// With -n the shell does not look between backticks. What is between those in others
-// costs only what these print.
+// With -n the shell does not look between backticks. A fault in nested ones only costs
+// what the outer ones print.
 bool ShellChecker::is_substitution_refused(const Effect &substitution, std::string &why)
 {
     const std::string &text = substitution.text;
@@ -140,32 +140,31 @@ bool ShellChecker::is_substitution_refused(const Effect &substitution, std::stri
                           is_substitution_refused(effect, why);
                });
     }
-    // a '\' before a '"' is an escape where quotes are round it
+    // within double quotes a '\' escapes a '"' as well
     return shell_.ask(without_escapes(text, "$`\\"), why) == DeviceShell::Answer::refused &&
            shell_.ask(without_escapes(text, "$`\\\""), why) == DeviceShell::Answer::refused;
 }
 
 std::size_t ShellChecker::args_place(const Item &item, std::size_t at) const
 {
-    return in_.places.inside(item.number, "args", at);
+    return context_.places.inside(item.number, "args", at);
 }
 
 void ShellChecker::report_name(const Item &item, const std::string &characters,
                                bool is_line_refused)
 {
-    in_.findings.add(is_line_refused ? Finding::Severity::error : Finding::Severity::warning,
-                     in_.places.of(item.number, "name"),
-                     "item {} has {} in its name, which the shell reads as its own: it would {}; "
-                     "rename it",
-                     quoted_name(item.name), characters,
-                     is_line_refused ? "refuse the command line"
-                                     : "not run a program of that name");
+    context_.findings.add(
+        is_line_refused ? Finding::Severity::error : Finding::Severity::warning,
+        context_.places.of(item.number, "name"),
+        "item {} has {} in its name, which the shell reads as its own: it would {}; rename it",
+        quoted_name(item.name), characters,
+        is_line_refused ? "refuse the command line" : "not run a program of that name");
 }
 
 void ShellChecker::report_refusal(const Item &item, const Verdict &verdict, std::size_t args_begin)
 {
     const auto &fault = verdict.reading.fault;
-    in_.findings.error(
+    context_.findings.error(
         args_place(item, fault ? fault->at - args_begin : 0),
         "the shell would refuse the command line of item {}: {}", quoted_name(item.name),
         fault ? reason(*fault) : fmt::format("{}; fix its args", one_line(verdict.why)));
@@ -183,95 +182,88 @@ void ShellChecker::report_effect(const Item &item, const Effect &effect, std::si
         break;
     case Effect::Kind::expansion:
         if (shell_.ask_to_expand(effect.text, why) == DeviceShell::Answer::refused) {
-            in_.findings.error(place,
-                               "the shell would refuse the command line of item {}: {}; put a '\\' "
-                               "before the '$' here if it is meant for the item",
-                               name, one_line(why));
+            context_.findings.error(place,
+                                    "the shell would refuse the command line of item {}: {}; put a "
+                                    "'\\' before the '$' here if it is meant for the item",
+                                    name, one_line(why));
         }
         break;
     case Effect::Kind::substitution:
         if (is_substitution_refused(effect, why)) {
-            in_.findings.error(
-                place,
-                "the shell would refuse the command line of item {}: in {} here, {}; put a "
-                "'\\' before {} if it is meant for the item",
-                name, effect.mark == "`" ? "the backticks" : text, one_line(why), mark);
+            context_.findings.error(place,
+                                    "the shell would refuse the command line of item {}: in {} "
+                                    "here, {}; put a '\\' before {} if it is meant for the item",
+                                    name, effect.mark == "`" ? "the backticks" : text,
+                                    one_line(why), mark);
             break;
         }
-        in_.findings.warning(
+        context_.findings.warning(
             place,
-            "the shell would run {} as a command of its own before item {}, and put "
-            "what that prints here; put a '\\' before it if it is meant for the item",
+            "the shell would run {} as a command of its own before item {}, and put what that "
+            "prints here; put a '\\' before it if it is meant for the item",
             text, name);
         break;
     case Effect::Kind::redirection:
-        in_.findings.warning(
-            place,
-            "the shell would redirect item {} by {}, and not hand it that; put the "
-            "{} in quotes if it is meant for the item",
-            name, text, mark);
+        context_.findings.warning(place,
+                                  "the shell would redirect item {} by {}, and not hand it that; "
+                                  "put the {} in quotes if it is meant for the item",
+                                  name, text, mark);
         break;
     case Effect::Kind::comment:
-        in_.findings.warning(
-            place,
-            "the shell would take {} for a comment, and not hand it to item {}; put "
-            "the {} in quotes if it is meant for the item",
-            text, name, mark);
+        context_.findings.warning(place,
+                                  "the shell would take {} for a comment, and not hand it to item "
+                                  "{}; put the {} in quotes if it is meant for the item",
+                                  text, name, mark);
         break;
     case Effect::Kind::continuation:
-        in_.findings.warning(
-            place,
-            "the shell would take away the {} and the line feed here, and join what "
-            "is before and after them; leave them out",
-            mark);
+        context_.findings.warning(place,
+                                  "the shell would take away the {} and the line feed here, and "
+                                  "join what is before and after them; leave them out",
+                                  mark);
         break;
     case Effect::Kind::function:
-        in_.findings.error(
-            place,
-            "the shell would make a function of item {} here, and run nothing; put the "
-            "{} in quotes if it is meant for the item",
-            name, mark);
+        context_.findings.error(place,
+                                "the shell would make a function of item {} here, and run nothing; "
+                                "put the {} in quotes if it is meant for the item",
+                                name, mark);
         break;
     }
 }
 
-// What ends the item's own command.
+// Reports what ends the item's own command.
 void ShellChecker::report_command(const Item &item, const Effect &effect, std::size_t place)
 {
     const std::string name = quoted_name(item.name);
     const std::string text = quoted_name(effect.text);
     const std::string mark = quoted_name(effect.mark);
     if (effect.mark == "\n") {
-        in_.findings.error(
-            place,
-            "the shell would end the command of item {} at the line feed here, and run "
-            "{} as a command of its own; write a blank in its place",
-            name, text);
+        context_.findings.error(place,
+                                "the shell would end the command of item {} at the line feed here, "
+                                "and run {} as a command of its own; write a blank in its place",
+                                name, text);
     } else if (effect.mark == "&" || effect.mark == "|&") {
-        in_.findings.warning(place,
-                             "the shell would run item {} in the background, {}; put the {} in "
-                             "quotes if it is meant for the item",
-                             name,
-                             effect.text.empty()
-                                 ? "so that it ends at once for the library"
-                                 : fmt::format("and run {} as a command of its own", text),
-                             mark);
+        context_.findings.warning(place,
+                                  "the shell would run item {} in the background, {}; put the {} "
+                                  "in quotes if it is meant for the item",
+                                  name,
+                                  effect.text.empty()
+                                      ? "so that it ends at once for the library"
+                                      : fmt::format("and run {} as a command of its own", text),
+                                  mark);
     } else if (effect.text.empty()) {
-        in_.findings.warning(
-            place,
-            "the shell would end the command of item {0} here, and not hand it the "
-            "{1}; put the {1} in quotes if it is meant for the item",
-            name, mark);
+        context_.findings.warning(place,
+                                  "the shell would end the command of item {0} here, and not hand "
+                                  "it the {1}; put the {1} in quotes if it is meant for the item",
+                                  name, mark);
     } else {
         const std::string when = effect.mark == "&&" ? fmt::format(" where item {} succeeds", name)
                                  : effect.mark == "||" ? fmt::format(" where item {} fails", name)
                                  : effect.mark == "|" ? fmt::format(" on what item {} prints", name)
                                                       : fmt::format(", after item {}", name);
-        in_.findings.warning(
-            place,
-            "the shell would run {} as a command of its own{}; put the {} in quotes "
-            "if it is meant for the item",
-            text, when, mark);
+        context_.findings.warning(place,
+                                  "the shell would run {} as a command of its own{}; put the {} in "
+                                  "quotes if it is meant for the item",
+                                  text, when, mark);
     }
 }
 

@@ -60,10 +60,10 @@ class LineScanner
         std::string mark;
         std::string end;
         bool drops_tabs = false;
-        bool is_quoted = false; // its end is, so that nothing is expanded in it
+        bool is_quoted = false; // then nothing is expanded in it
     };
 
-    // How far the command being read has come.
+    // The progress through the current command.
     struct State {
         std::size_t words = 0;
         bool is_empty = true;  // it has no redirection either
@@ -92,7 +92,7 @@ class LineScanner
         at_ += found ? what.size() : 0;
         return found;
     }
-    // The first of these that is here.
+    // The first of these marks that is here; empty if none is.
     std::string_view pass_any(std::initializer_list<std::string_view> marks)
     {
         const auto *const found =
@@ -104,7 +104,7 @@ class LineScanner
         while (pass(" ") || pass("\t") || pass_continuation()) {
         }
     }
-    // In the middle of an operator it makes another one, which is not read here.
+    // Inside an operator it makes another operator, which is not read here.
     bool pass_continuation()
     {
         const std::size_t begin = at_;
@@ -139,7 +139,7 @@ class LineScanner
         }
     }
 
-    // What is after it is the text, up to the end of the line.
+    // Its text is what follows, up to the end of the line.
     void begin_effect(std::size_t at, std::string_view mark)
     {
         if (is_first()) {
@@ -159,7 +159,7 @@ class LineScanner
 
     // --- commands ---
 
-    // Up to a ')', where it is the end of something.
+    // Up to a ')' that ends something.
     void read_commands()
     {
         State state;
@@ -228,7 +228,7 @@ class LineScanner
         }
     }
 
-    // Where the next command begins; the line's size where there is none.
+    // Where the next command begins; the line's size if there is none.
     [[nodiscard]] std::size_t next_command() const
     {
         std::size_t at = at_;
@@ -353,7 +353,7 @@ class LineScanner
                 if (document.drops_tabs) {
                     text.remove_prefix(std::min(text.find_first_not_of('\t'), text.size()));
                 }
-                // what it is within may end right after it
+                // an enclosing substitution may end right after it
                 const bool is_last = depth_ > 0 && text.starts_with(document.end + ")");
                 found = is_last || text == document.end;
                 if (is_last) {
@@ -407,7 +407,7 @@ class LineScanner
         if (word.ends_with('=') && looking_at("(")) {
             read_pattern(); // the values of an array
         }
-        // after these a command begins
+        // a command follows these
         if (!is_any(word, {"if", "then", "elif", "else", "while", "until", "do", "{", "!"})) {
             ++state.words;
         }
@@ -427,7 +427,7 @@ class LineScanner
         }
     }
 
-    // One character, or what is quoted or put in its place.
+    // One character, a quotation or an expansion.
     void read_character(bool in_quotes)
     {
         if (looking_at("\\\n")) {
@@ -455,7 +455,7 @@ class LineScanner
         }
     }
 
-    // In the second kind a quote may be escaped.
+    // In $'...' a quote may be escaped.
     void read_single_quotes(std::string_view mark)
     {
         const std::size_t begin = at_;
@@ -466,7 +466,7 @@ class LineScanner
         expect_end("'", begin, mark);
     }
 
-    // Passes over the end of what began there, or misses it.
+    // Passes over the end of what began there, or reports that it is missing.
     void expect_end(std::string_view end, std::size_t begin, std::string_view mark)
     {
         if (!pass(end)) {
@@ -525,7 +525,7 @@ class LineScanner
         expect_end(")", begin, "(");
     }
 
-    // False where it begins no arithmetic, or has another end: it is commands then.
+    // False if it is no arithmetic, or ends otherwise: then it holds commands.
     bool pass_arithmetic(std::string_view mark)
     {
         const std::size_t begin = at_;

@@ -1,8 +1,8 @@
 // SPDX-FileCopyrightText: 2026 The Quillmark authors
 // SPDX-License-Identifier: Apache-2.0
 
-// Reads "/system/bin/NAME ARGS" as the device's shell would, to find what else than the
-// item that would run.
+// Reads "/system/bin/NAME ARGS" as the device's shell would, to find what would run besides
+// the item.
 #pragma once
 
 #include <cstddef>
@@ -24,7 +24,7 @@ struct ShellReading {
     };
     // What the shell does besides starting the line's first command.
     struct Effect {
-        // "${...}" and "$((...))" are expansions, at which it may give up.
+        // "${...}" and "$((...))" are expansions, at which the shell may give up.
         enum class Kind {
             command,
             substitution,
@@ -41,12 +41,12 @@ struct ShellReading {
     };
 
     std::optional<Fault> fault; // the first
-    // In their order, up to what ends the first command, or the first line feed that does.
+    // In order, up to what ends the first command, or the first line feed that does.
     std::vector<Effect> effects;
 };
 
-// Reads a line as the shell of the device does, but for reserved words: a fault
-// that is only one of grammar it misses.
+// Reads a line as the device's shell does, except for reserved words: it misses faults that
+// are only grammatical.
 ShellReading read_shell_line(std::string_view line);
 
 } // namespace fptest

@@ -38,7 +38,7 @@ class SourceMap
         return tags_.empty() ? 0 : tags_[element].begin;
     }
 
-    // Of the value, or of the element where it has no such attribute.
+    // Of the value, or of the element if it has no such attribute.
     [[nodiscard]] std::size_t of(std::size_t element, std::string_view name) const
     {
         const Attribute *place = find(element, name);
@@ -61,7 +61,7 @@ class SourceMap
         return found != texts_.end() ? found->second : std::string::npos;
     }
 
-    // Whether it has that attribute, but no value for it, which has been said.
+    // Whether it has that attribute, but no value for it, which is reported elsewhere.
     [[nodiscard]] bool is_valueless(std::size_t element, std::string_view name) const
     {
         const Attribute *place = find(element, name);

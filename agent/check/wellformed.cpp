@@ -15,8 +15,8 @@ namespace fptest
 namespace
 {
 
-// Entities in entities can go deeper than a stack, and the library knows none: the
-// declaration of one ends the parse.
+// Nested entities can overflow the stack, and the library knows none: a declaration of one
+// ends the parse.
 void XMLCALL stop_at_entity(void *parser, const XML_Char *, int, const XML_Char *, int,
                             const XML_Char *, const XML_Char *, const XML_Char *, const XML_Char *)
 {

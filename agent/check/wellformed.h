@@ -11,7 +11,7 @@
 namespace fptest
 {
 
-// Where a text ceases to be XML, and why.
+// Where a text stops being XML, and why.
 struct Flaw {
     std::size_t offset = 0;
     XML_Error error = XML_ERROR_NONE;

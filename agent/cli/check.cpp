@@ -29,13 +29,13 @@ struct CheckOptions {
     Storing storing = Storing::by_command;
 };
 
-// What it holds is known of a plan that loads.
-std::string size_of(const CheckedPlan &read)
+// Groups and items are counted only if the plan loads.
+std::string size_of(const CheckedPlan &checked)
 {
-    std::string size = read.storing == Storing::as_file
-                           ? plural(read.text.size(), "byte")
-                           : fmt::format("{} of {} bytes", read.text.size(), kPlanLimit);
-    if (const auto &plan = read.whole().plan) {
+    std::string size = checked.storing == Storing::as_file
+                           ? plural(checked.text.size(), "byte")
+                           : fmt::format("{} of {} bytes", checked.text.size(), kPlanLimit);
+    if (const auto &plan = checked.whole().plan) {
         std::size_t items = 0;
         const auto groups = plan->groups();
         for (const Plan::Group &group : groups) {
@@ -47,16 +47,16 @@ std::string size_of(const CheckedPlan &read)
     return size;
 }
 
-// False where the plan has errors.
+// False if the plan has errors.
 bool check_file(const std::string &file, const std::string &text, Storing storing)
 {
-    const CheckedPlan read = check(one_line(name_of_plan(file)), text, storing);
-    print(stdout, read);
-    const auto errors = static_cast<std::size_t>(
-        std::ranges::count(read.findings, Finding::Severity::error, &Finding::severity));
-    const std::size_t warnings = read.findings.size() - errors;
-    print_to(stdout, "{}: {}, {} ({})\n", read.name, plural(errors, "error"),
-             plural(warnings, "warning"), size_of(read));
+    const CheckedPlan plan = check(one_line(name_of_plan(file)), text, storing);
+    print(stdout, plan);
+    const auto errors =
+        static_cast<std::size_t>(std::ranges::count_if(plan.findings, &Finding::is_error));
+    const std::size_t warnings = plan.findings.size() - errors;
+    print_to(stdout, "{}: {}, {} ({})\n", plan.name, plural(errors, "error"),
+             plural(warnings, "warning"), size_of(plan));
     return errors == 0;
 }
 

@@ -28,8 +28,8 @@ dev_t disk_of(const fs::path &directory)
     return stat(directory.c_str(), &status) == 0 ? status.st_dev : 0;
 }
 
-// device/run says what it keeps of its own two directories.
-bool goes_with_device(const fs::path &directory, const std::string &device)
+// device/run says which of its own two directories it keeps.
+bool is_lost_with_device(const fs::path &directory, const std::string &device)
 {
     std::error_code none;
     const std::string place = fs::weakly_canonical(directory, none).string() + "/";
@@ -41,7 +41,7 @@ bool goes_with_device(const fs::path &directory, const std::string &device)
 
 } // namespace
 
-void look_after_reports(const std::vector<std::pair<std::string, std::string>> &files)
+void warn_of_lost_outputs(const std::vector<std::pair<std::string, std::string>> &files)
 {
     const char *device = std::getenv("QUILLMARK_DEVICE");
     if (device == nullptr) {
@@ -63,14 +63,14 @@ void look_after_reports(const std::vector<std::pair<std::string, std::string>> &
                           "device/run --out DIR gives a working directory that can be written",
                           name);
         }
-        if (goes_with_device(directory, device)) {
+        if (is_lost_with_device(directory, device)) {
             lost.push_back(name);
         }
     }
     if (!lost.empty()) {
-        say("{} {} with the virtual device when it ends; device/run --out DIR gives a working "
+        say("{} {} lost when the virtual device ends; device/run --out DIR gives a working "
             "directory that stays",
-            join_and(lost), lost.size() == 1 ? "goes" : "go");
+            join_and(lost), lost.size() == 1 ? "is" : "are");
     }
 }
 

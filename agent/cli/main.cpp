@@ -59,7 +59,7 @@ class CommandLine
         require_known_command(argc, argv);
         std::vector<std::string> words(argv + std::min(argc, 1), argv + argc);
         if (const CLI::App *command = words.empty() ? nullptr : find(words.front())) {
-            words = fptest::readable(*command, std::move(words));
+            words = fptest::split_empty_values(*command, std::move(words));
         }
         std::ranges::reverse(words); // as the parser wants them
         try {
@@ -78,7 +78,7 @@ class CommandLine
         return found == commands.end() ? nullptr : *found;
     }
 
-    // CLI11 would only say that there is none.
+    // CLI11 would only say that there is no command.
     void require_known_command(int argc, char **argv) const
     {
         const std::string word = argc > 1 ? argv[1] : "";
@@ -114,10 +114,9 @@ Exit complain(Exit status, const std::string &text)
 int main(int argc, char **argv)
 {
     fptest::fill_standard_descriptors();
-    // a reader that has left is met as an error where it is written to
-    std::signal(SIGPIPE, SIG_IGN);
-    std::signal(SIGXFSZ, SIG_IGN); // as is a limit of a file's size
-    std::signal(SIGCHLD, SIG_DFL); // or nothing can be waited for, if the caller ignores it
+    std::signal(SIGPIPE, SIG_IGN); // report a closed pipe as a write error instead of dying
+    std::signal(SIGXFSZ, SIG_IGN); // the same for a file at its size limit
+    std::signal(SIGCHLD, SIG_DFL); // the caller may ignore it, and then no child can be waited for
     Exit status = Exit::success;
     try {
         status = CommandLine().run(argc, argv);
@@ -127,9 +126,9 @@ int main(int argc, char **argv)
     } catch (const std::exception &error) {
         status = complain(Exit::environment, error.what());
     }
-    // items that did not pass are told by run's own views; errors in a plan are told here
-    const bool is_untold = std::fflush(stdout) != 0 || std::ferror(stdout) != 0;
-    if (is_untold && (status == Exit::success || status == Exit::items_failed)) {
+    // failed items and errors in a plan are results, not failures of fptest
+    const bool is_unwritten = std::fflush(stdout) != 0 || std::ferror(stdout) != 0;
+    if (is_unwritten && (status == Exit::success || status == Exit::items_failed)) {
         status = complain(Exit::environment, "standard output cannot be written");
     }
     const std::string loss = fptest::log_loss();

@@ -19,7 +19,7 @@ namespace fptest
 namespace
 {
 
-// What is wrong with a value, which a shell's variable may have left empty.
+// What is wrong with a value; an unset variable in a shell may have left it empty.
 std::string refused(const std::string &value, const std::string &why)
 {
     return value.empty() ? "its value is empty" : fmt::format("{} {}", in_quotes(value), why);
@@ -32,7 +32,7 @@ template <typename Number> CLI::Validator number_in(Number least, Number most)
                 const char *end = text.data() + text.size();
                 const auto [stop, error] = std::from_chars(text.data(), end, number);
                 const bool is_number = error == std::errc{} && stop == end;
-                // said so that what is not a number at all is in no range
+                // written so that NaN is rejected
                 if (is_number && number >= least && number <= most) {
                     text = fmt::format("{}", number); // CLI11 reads 010 as octal
                     return std::string();
@@ -54,16 +54,6 @@ CLI::App &add_subcommand(CLI::App &app, const char *name, const char *purpose, c
     command->failure_message(usage_line);
     command->callback([&chosen, action = std::move(action)] { chosen = action; });
     return *command;
-}
-
-void add_log(CLI::App &command, std::string &log)
-{
-    command
-        .add_option("--log", log,
-                    "append the library's log to FILE; without, it\n"
-                    "goes where VR_LOG_FILE says, or nowhere")
-        ->type_name("FILE")
-        ->check(not_empty());
 }
 
 CLI::Validator range(double least, double most)

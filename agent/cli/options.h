@@ -1,7 +1,7 @@
 // SPDX-FileCopyrightText: 2026 The Quillmark authors
 // SPDX-License-Identifier: Apache-2.0
 
-// What the subcommands' options have in common.
+// What the subcommands' options share.
 #pragma once
 
 #include "cli/subcommands.h"
@@ -12,30 +12,28 @@
 namespace fptest
 {
 
-// Adds a subcommand. Where the command line names it, the action is the chosen one.
+// Adds a subcommand. If the command line names it, its action is chosen.
 CLI::App &add_subcommand(CLI::App &app, const char *name, const char *purpose, const char *examples,
                          Action &chosen, Action action);
 
-void add_log(CLI::App &command, std::string &log);
-
 // --- what a value may be ------------------------------------------------------
 
-// A number in that range, of seconds or of rounds. CLI11's own takes an empty text for 0.
+// A number in that range. CLI11's own validator takes an empty text for 0.
 CLI::Validator range(double least, double most);
 CLI::Validator range(int least, int most);
 
-// Seconds, or so many minutes, hours or days; put down in seconds.
+// A time in seconds, minutes, hours or days, converted to seconds.
 CLI::Validator time_span();
 
-// One of those words; "'x' " and otherwise is what is said of another.
+// One of those words; of another the error says "'x' " and otherwise.
 CLI::Validator one_of(std::vector<std::string> words, std::string otherwise);
 
-// The codes that the library has a text for, spelled as it does.
+// The codes that the library has a text for, in its spelling.
 CLI::Validator result_code();
 
 CLI::Validator not_empty();
 
-// A plan that device/run has taken the working directory away from.
+// A plan, also one relative to the directory that device/run was called in.
 CLI::Validator desk_file();
 
 } // namespace fptest

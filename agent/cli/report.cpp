@@ -1,8 +1,8 @@
 // SPDX-FileCopyrightText: 2026 The Quillmark authors
 // SPDX-License-Identifier: Apache-2.0
 
+#include "cli/log_option.h"
 #include "cli/options.h"
-#include "cli/outputs.h"
 #include "module/log_file.h"
 #include "module/preflight.h"
 #include "module/stored_plan.h"
@@ -42,7 +42,7 @@ struct ReportOptions {
     std::string log;
 };
 
-// What the report adds to the file, at the most: each byte as an entity.
+// The most that a report adds to the file: attributes, and each byte as an entity.
 constexpr std::size_t kLongestEntity = 6;
 constexpr std::size_t kAttributes = 64;
 
@@ -65,35 +65,28 @@ Plan load_stored(std::string &text)
                   names.empty() ? "; it has none at all" : known_names(name, names, "it has"));
 }
 
-// The item's number in the plan. Only its own group is looked at: the library
-// would go on into the groups after it, and annotate another item.
+// The item's number in the plan. Only its own group is searched: the library would go
+// on into later groups, and annotate another item.
 std::size_t find_item(const Plan &plan, const ReportOptions &options)
 {
     const auto groups = plan.groups();
     const auto group = std::ranges::find(groups, options.group, &Plan::Group::name);
     if (group == groups.end()) {
-        std::vector<std::string> names;
-        for (const Plan::Group &one : groups) {
-            names.push_back(one.name);
-        }
-        unknown("the stored plan", "group", options.group, names);
+        unknown("the stored plan", "group", options.group, group_names(plan));
     }
-    std::vector<std::string> names;
-    for (const Plan::Element &item : group->items) {
-        if (item.name == options.item) {
-            return item.number;
-        }
-        names.push_back(item.name.value_or(""));
+    const auto item = std::ranges::find(group->items, options.item, &Plan::Element::name);
+    if (item == group->items.end()) {
+        unknown(fmt::format("group {} of the stored plan", in_quotes(options.group)), "item",
+                options.item, item_names(plan, options.group));
     }
-    unknown(fmt::format("group {} of the stored plan", in_quotes(options.group)), "item",
-            options.item, names);
+    return item->number;
 }
 
 Exit report(const ReportOptions &options)
 {
-    require_log_of_its_own(options.log, Beside::nothing);
+    require_log_of_its_own(options.log, StdoutUse::nothing);
     choose_log(options.log);
-    mend_stored_plan(); // or a report that has spoiled it would cost this one
+    mend_stored_plan(); // an earlier report may have spoiled it
     const Descriptor lock = lock_stored_plan();
     std::string text =
         require_stored_plan(", so nothing can be reported: store one with fptest run --plan FILE");
@@ -108,7 +101,7 @@ Exit report(const ReportOptions &options)
         description, [](char c) { return std::strchr("&<>\"", c) != nullptr; });
     require_room(text.size() + kAttributes + description.size() +
                  static_cast<std::size_t>(entities) * kLongestEntity);
-    // a stop that came into the middle of it would cut the plan
+    // a stop in the middle of it would cut the plan
     sigset_t stops;
     sigset_t before;
     sigemptyset(&stops);

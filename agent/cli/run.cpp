@@ -3,6 +3,7 @@
 
 #include "check/finding_printer.h"
 #include "cli/desk_paths.h"
+#include "cli/log_option.h"
 #include "cli/options.h"
 #include "cli/outputs.h"
 #include "cli/run_options.h"
@@ -45,39 +46,37 @@ constexpr char kRunExamples[] =
 
 // --- the plan -----------------------------------------------------------------
 
-// A plan that a command cannot hold is put into its place as a file.
+// A plan that is too long for a command is placed as a file.
 Storing storing_of(const RunOptions &options, const std::string &text)
 {
     if (options.plan.empty()) {
         return Storing::as_file;
     }
-    return options.as_sent             ? Storing::by_command_only
-           : text.size() <= kPlanLimit ? Storing::by_command
-                                       : Storing::as_file;
+    return options.as_sent || text.size() <= kPlanLimit ? Storing::by_command : Storing::as_file;
 }
 
-// One that the library loads.
+// A plan that the library loads.
 CheckedPlan open_plan(const RunOptions &options)
 {
     const std::string text = options.plan.empty()
                                  ? require_stored_plan(": give one with --plan FILE")
                                  : require_file(options.plan);
-    CheckedPlan read = check(name_of_plan(options.plan), text, storing_of(options, text));
-    const bool has_error = has_errors(read.findings);
+    CheckedPlan checked = check(name_of_plan(options.plan), text, storing_of(options, text));
+    const bool has_error = has_errors(checked.findings);
     if (has_error && !options.force) {
-        print(stderr, read);
+        print(stderr, checked);
         throw Failure(Cause::input, "nothing was run, because the plan has errors; fix them, or "
                                     "run it as it is with --force");
     }
-    if (!read.findings.empty() && !options.quiet) {
+    if (!checked.findings.empty() && !options.quiet) {
         say("the plan has {}: see fptest check {}{}", has_error ? "errors" : "warnings",
-            read.storing == Storing::as_file ? "--for file " : "", one_line(read.name));
+            checked.storing == Storing::as_file ? "--for file " : "", one_line(checked.name));
     }
-    if (!read.loaded.plan) {
+    if (!checked.loaded.plan) {
         throw Failure(Cause::input, "{}: the library cannot load this plan: {}",
-                      one_line(read.name), one_line(read.loaded.why));
+                      one_line(checked.name), one_line(checked.loaded.why));
     }
-    return read;
+    return checked;
 }
 
 // --- before the run -----------------------------------------------------------
@@ -131,19 +130,19 @@ void list_items(const std::vector<Path> &paths, const Plan &plan, const std::str
     _exit(static_cast<int>(Exit::interrupted));
 }
 
-void require_nothing_to_report_of_a_list(const RunOptions &options)
+void refuse_list_with_results(const RunOptions &options)
 {
-    const std::string report = options.tap              ? "--tap"
-                               : !options.json.empty()  ? "--json"
-                               : !options.junit.empty() ? "--junit"
-                                                        : "";
-    if (options.list && !report.empty()) {
+    const std::string results = options.tap              ? "--tap"
+                                : !options.json.empty()  ? "--json"
+                                : !options.junit.empty() ? "--junit"
+                                                         : "";
+    if (options.list && !results.empty()) {
         throw Failure(Cause::input,
-                      "--list runs nothing that {} could tell of: leave one of them out", report);
+                      "--list runs nothing, so {} would be empty: leave one of them out", results);
     }
 }
 
-// Kept locked, so that what is looked at now is still so when it is run.
+// The lock keeps the device as it is found now.
 Descriptor ready_device()
 {
     require_device();
@@ -179,30 +178,30 @@ Run run_of(const RunOptions &options, const std::string &plan, int vendor)
 
 Exit run(RunOptions options)
 {
-    require_nothing_to_report_of_a_list(options);
-    settle_outputs(options);
+    refuse_list_with_results(options);
+    resolve_output_conflicts(options);
     if (options.as_sent && options.plan.empty()) {
         throw Failure(Cause::input, "--as-sent is of no use without --plan FILE, which is sent");
     }
     if (options.list) {
         require_standard_output("--list");
     } else {
-        look_after_reports(
+        warn_of_lost_outputs(
             {{"--json", options.json}, {"--junit", options.junit}, {"--log", options.log}});
     }
     const Descriptor lock = options.list ? Descriptor(-1) : ready_device();
-    const CheckedPlan read = open_plan(options);
-    const Plan &plan = *read.loaded.plan;
+    const CheckedPlan checked = open_plan(options);
+    const Plan &plan = *checked.loaded.plan;
     std::vector<Path> paths;
     for (const std::string &text : options.paths) {
-        paths.push_back(parse_path(text, plan, read.name, options.force));
+        paths.push_back(parse_path(text, plan, checked.name, options.force));
     }
     if (paths.empty() && !options.list) {
         throw Failure(Cause::input,
                       "no PATH given: say what to run, as root/group or root/group/item{}",
                       known_groups(plan));
     }
-    require_writable_reports(options);
+    require_writable_results(options);
     choose_log(options.log);
     Signals signals;
     std::optional<LibraryProcess> library(std::in_place);
@@ -218,26 +217,26 @@ Exit run(RunOptions options)
     if (!options.quiet) {
         report_other_gatherer(round, plan, vendor_suffix(vendor).value_or(""));
     }
-    const bool is_sent = read.storing != Storing::as_file;
+    const bool is_sent = checked.storing != Storing::as_file;
     const bool is_placed = !is_sent && !options.plan.empty();
     if (is_sent || is_placed) {
-        require_room(is_sent ? read.stored.size() : read.text.size());
+        require_room(is_sent ? checked.stored.size() : checked.text.size());
     }
     if (is_placed && !options.quiet) {
         say("{}: its {} bytes are more than the {} that a command stores, so it is placed as the "
             "file {}",
-            one_line(read.name), read.text.size(), kPlanLimit, kStoredPlan);
+            one_line(checked.name), checked.text.size(), kPlanLimit, kStoredPlan);
     }
     const auto store_plan = [&] {
         if (is_sent) {
-            send_and_wait(*library, "XMLFile::" + read.text);
-            require_stored(library->read_back(), read.stored);
+            send_and_wait(*library, "XMLFile::" + checked.text);
+            require_stored(library->read_back(), checked.stored);
         } else if (is_placed) {
-            store_as_file(read.text);
-            library.emplace(); // the one before keeps the plan that was there when it was asked
+            store_as_file(checked.text);
+            library.emplace(); // the old one still holds the plan from before
         }
     };
-    Run run = run_of(options, read.name, vendor);
+    Run run = run_of(options, checked.name, vendor);
     const auto owned = make_reporters(options);
     std::vector<Reporter *> reporters;
     for (const auto &reporter : owned) {

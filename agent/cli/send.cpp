@@ -1,8 +1,8 @@
 // SPDX-FileCopyrightText: 2026 The Quillmark authors
 // SPDX-License-Identifier: Apache-2.0
 
+#include "cli/log_option.h"
 #include "cli/options.h"
-#include "cli/outputs.h"
 #include "module/library_process.h"
 #include "module/log_file.h"
 #include "module/preflight.h"
@@ -43,7 +43,7 @@ struct SendOptions {
 
 using namespace std::chrono_literals;
 
-// Commands separated by zero bytes; one after the last may be there or not.
+// Commands separated by zero bytes, with or without one after the last.
 std::vector<std::string> read_commands()
 {
     std::vector<std::string> commands;
@@ -69,7 +69,7 @@ std::string_view head_of(std::string_view command)
     return command.substr(0, command.find(':'));
 }
 
-// What a command stores as the plan; nothing where it stores none.
+// The plan that a command stores; nullopt if it stores none.
 std::optional<std::string> plan_of(std::string_view command)
 {
     const std::string_view head = head_of(command);
@@ -100,10 +100,10 @@ std::vector<std::string> items_of(const std::string &command)
 class Sender
 {
   public:
-    // The reply, or nothing where the command was interrupted.
+    // The reply; nullopt if the command was interrupted.
     std::optional<std::string> send(const std::string &command)
     {
-        // the library waits for nobody who is just writing the plan that it loads
+        // nobody may be writing the plan while the library loads it
         Descriptor plan =
             head_of(command).starts_with("XMLNodePath") ? lock_stored_plan() : Descriptor(-1);
         const auto items = items_of(command);
@@ -111,7 +111,7 @@ class Sender
         for (;;) {
             const auto event = library_.wait(100ms, {signals_.descriptor()});
             if (event) {
-                plan = Descriptor(-1); // it is loaded before the first item is told
+                plan = Descriptor(-1); // the library loads it before it names the first item
                 library_.output().pass(stderr, event->output);
             }
             if (event && event->kind == LibraryProcess::Event::Kind::item) {
@@ -126,7 +126,7 @@ class Sender
             }
             interrupted_ = interrupted_ || signals_.take() != 0;
             if (interrupted_) {
-                return std::nullopt; // with the library's process its item is stopped
+                return std::nullopt; // the item ends with the library's process
             }
         }
     }
@@ -143,12 +143,12 @@ Exit send(const SendOptions &options)
     if (options.commands.empty() != options.from_input) {
         throw Failure(Cause::input, "give COMMANDs as arguments, or with -0 on standard input");
     }
-    require_log_of_its_own(options.log, Beside::results);
+    require_log_of_its_own(options.log, StdoutUse::results);
     require_device();
     choose_log(options.log);
     const std::vector<std::string> commands =
         options.from_input ? read_commands() : options.commands;
-    // as a run of its own, unless it touches nothing of one
+    // lock the device as a run does, if a command stores a plan or runs items
     Descriptor lock(-1);
     if (std::ranges::any_of(commands, [](const std::string &command) {
             return plan_of(command) || head_of(command).starts_with("XMLNodePath");

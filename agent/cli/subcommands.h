@@ -1,8 +1,8 @@
 // SPDX-FileCopyrightText: 2026 The Quillmark authors
 // SPDX-License-Identifier: Apache-2.0
 
-// What fptest does, a file for each subcommand: each function adds one, with its
-// options, help and examples.
+// The subcommands, one per file: each function adds one, with its options, help and
+// examples.
 #pragma once
 
 #include "util/failure.h"
@@ -16,16 +16,16 @@ namespace fptest
 
 enum class Exit {
     success = 0,
-    items_failed = 1,  // or, of a checked plan, errors
+    items_failed = 1,  // or a checked plan has errors
     usage = 2,         // or an error in the plan
-    environment = 3,   // the device is not ready for it
+    environment = 3,   // the device is not ready
     interrupted = 130, // by a signal
 };
 
-// Says how the program is to end, or throws a Failure.
+// Returns the exit status, or throws a Failure.
 using Action = std::function<Exit()>;
 
-// Where the command line names it, chosen is what it does.
+// If the command line names the subcommand, it becomes the chosen action.
 void add_run(CLI::App &app, Action &chosen);
 void add_check(CLI::App &app, Action &chosen);
 void add_show(CLI::App &app, Action &chosen);

@@ -16,8 +16,7 @@ namespace fptest
 namespace
 {
 
-// The parser's error names an option in front of what it says of it, a flag without
-// its dashes.
+// The parser's error begins with the option's name, for a flag without its dashes.
 const CLI::Option *option_of(const CLI::App &command, const std::string &text)
 {
     for (const CLI::Option *option : command.get_options()) {
@@ -30,6 +29,11 @@ const CLI::Option *option_of(const CLI::App &command, const std::string &text)
     return nullptr;
 }
 
+std::string no_value(const CLI::Option &option)
+{
+    return option.get_name() + " takes no value";
+}
+
 std::string mismatch(const CLI::App &command, const std::string &text)
 {
     const CLI::Option *option = option_of(command, text);
@@ -38,19 +42,18 @@ std::string mismatch(const CLI::App &command, const std::string &text)
     }
     const std::string name = option->get_name();
     if (option->get_expected_max() == 0) {
-        return fmt::format("{} takes no value", name);
+        return no_value(*option);
     }
     return option->count() > 1
                ? fmt::format("{} is given {} times: give it once", name, option->count())
-               : fmt::format("{0} lacks its value: give it as {0} {1}", name,
-                             option->get_type_name());
+               : fmt::format("{0} needs a value: {0} {1}", name, option->get_type_name());
 }
 
 std::string without_option(const CLI::App &command, const std::string &word)
 {
     const std::string name = word.substr(0, word.find('='));
     std::vector<std::string> names;
-    std::vector<std::string> longer; // of which it is the beginning
+    std::vector<std::string> longer; // names that begin with it
     for (const CLI::Option *option : command.get_options()) {
         if (option->get_name().starts_with('-')) {
             names.push_back(option->get_name());
@@ -86,7 +89,7 @@ std::string with_help(const std::string &text, const std::string &command)
 
 } // namespace
 
-std::vector<std::string> readable(const CLI::App &command, std::vector<std::string> words)
+std::vector<std::string> split_empty_values(const CLI::App &command, std::vector<std::string> words)
 {
     for (std::size_t at = 0; at < words.size() && words[at] != "--"; ++at) {
         const std::string &word = words[at];
@@ -98,9 +101,7 @@ std::vector<std::string> readable(const CLI::App &command, std::vector<std::stri
             continue;
         }
         if (option->get_expected_max() == 0) {
-            throw Failure(Cause::input, "{}",
-                          with_help(fmt::format("{} takes no value", option->get_name()),
-                                    command.get_name()));
+            throw Failure(Cause::input, "{}", with_help(no_value(*option), command.get_name()));
         }
         words[at].pop_back();
         words.insert(words.begin() + static_cast<std::ptrdiff_t>(++at), "");
@@ -126,7 +127,7 @@ std::string usage_line(const CLI::App *app, const CLI::Error &error)
         text = surplus(*app, command, text);
         break;
     case CLI::ExitCodes::RequiredError:
-        // what is missing may be there, misspelt
+        // the missing word may be there, misspelt
         text = commands.empty() ? "no command is given" : surplus(*app, command, text);
         break;
     default:

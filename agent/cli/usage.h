@@ -1,7 +1,7 @@
 // SPDX-FileCopyrightText: 2026 The Quillmark authors
 // SPDX-License-Identifier: Apache-2.0
 
-// What is wrong with a command line, said as every other error.
+// What is wrong with a command line, worded like every other error.
 #pragma once
 
 #include <CLI/CLI.hpp>
@@ -16,11 +16,12 @@ namespace fptest
 // line feed.
 std::string usage_line(const CLI::App *app, const CLI::Error &error);
 
-// A command's words as the parser is to read them: of "--name=" it would take the next
-// word for the value, which is empty.
-std::vector<std::string> readable(const CLI::App &command, std::vector<std::string> words);
+// Splits "--name=" into "--name" and an empty value: the parser would take the next word
+// for the value.
+std::vector<std::string> split_empty_values(const CLI::App &command,
+                                            std::vector<std::string> words);
 
-// That the program has no such option, without "fptest: " and a line feed.
+// Says that the program has no such option, without "fptest: " and a line feed.
 std::string unknown_option(const std::string &word, const CLI::App &app);
 
 } // namespace fptest

@@ -387,6 +387,39 @@ std::optional<Plan::Element> Plan::resolve_item(const std::string &group,
                : std::nullopt;
 }
 
+mxml_node_t *Plan::root() const
+{
+    const auto found = std::ranges::find_if(elements_, [](mxml_node_t *node) {
+        const std::string_view tag = mxmlGetElement(node);
+        return !tag.starts_with('?') && !tag.starts_with('!');
+    });
+    return found != elements_.end() ? *found : nullptr;
+}
+
+std::vector<std::string> group_names(const Plan &plan)
+{
+    std::vector<std::string> names;
+    for (const Plan::Group &group : plan.groups()) {
+        if (std::ranges::find(names, group.name) == names.end()) {
+            names.push_back(group.name);
+        }
+    }
+    return names;
+}
+
+std::vector<std::string> item_names(const Plan &plan, const std::string &group)
+{
+    std::vector<std::string> names;
+    const auto groups = plan.groups();
+    const auto found = std::ranges::find(groups, group, &Plan::Group::name);
+    if (found != groups.end()) {
+        for (const Plan::Element &item : found->items) {
+            names.push_back(item.name.value_or(""));
+        }
+    }
+    return names;
+}
+
 std::vector<Tag> element_tags(const Plan &plan, std::vector<Tag> tags)
 {
     std::erase_if(tags, [](const Tag &tag) { return !makes_element(tag); });

@@ -75,6 +75,9 @@ class Plan
         return tree_.get();
     }
 
+    // The first element that is no comment or the like; null if there is none.
+    mxml_node_t *root() const;
+
   private:
     using Tree = std::unique_ptr<mxml_node_t, void (*)(mxml_node_t *)>;
     using Numbers = std::vector<std::size_t>;
@@ -97,6 +100,10 @@ class Plan
     Numbers items_;
     std::unordered_map<std::string, Numbers> items_named_;
 };
+
+// The names of the groups, each once, and of the items of a group.
+std::vector<std::string> group_names(const Plan &plan);
+std::vector<std::string> item_names(const Plan &plan, const std::string &group);
 
 std::optional<std::string> attribute(mxml_node_t *node, const char *name);
 

@@ -24,7 +24,7 @@ namespace
 
 using Json = nlohmann::ordered_json;
 
-constexpr int kFormat = 2; // one more whenever a reader would have to be changed
+constexpr int kFormat = 2; // increased whenever readers would have to change
 
 Json text_or_null(const std::optional<std::string> &text)
 {
@@ -36,15 +36,10 @@ Json words_or_null(const std::string &words)
     return words.empty() ? Json() : Json(sanitize_utf8(words));
 }
 
-// In milliseconds: the digits after them are noise.
+// Rounded to milliseconds: finer digits are noise.
 Json seconds_or_null(const std::optional<double> &seconds)
 {
     return seconds ? Json(std::round(*seconds * 1000) / 1000) : Json();
-}
-
-Json event(const char *name)
-{
-    return {{"event", name}};
 }
 
 void add_report(Json &json, const ItemReport &report)
@@ -112,8 +107,7 @@ class JsonReporter : public Reporter
                     {{"group", sanitize_utf8(item.group)}, {"item", sanitize_utf8(item.name)}});
             }
         }
-        Json json = event("run");
-        json["format"] = kFormat;
+        Json json = {{"event", "run"}, {"format", kFormat}};
         json["program"] = "fptest";
         json["version"] = FPTEST_VERSION;
         json["plan"] = sanitize_utf8(run.plan);
@@ -185,8 +179,7 @@ class JsonReporter : public Reporter
     {
         end_the_rest(run);
         const Counts counts = count(run);
-        Json json = event("finish");
-        json["finished"] = run.finished;
+        Json json = {{"event", "finish"}, {"finished", run.finished}};
         json["reason"] = words_or_null(why_not_all(run));
         json["rounds"] = run.round;
         json["passed"] = counts.passed;
@@ -225,8 +218,7 @@ class JsonReporter : public Reporter
                 {"round", run.round}};
     }
 
-    // So that every item of a round that was begun has its end in the file of a run
-    // that was not killed.
+    // Unless the run is killed, every item of a round that began has its "end".
     void end_the_rest(const Run &run)
     {
         for (std::size_t suite = 0; suite < first_of_.size(); ++suite) {
@@ -245,7 +237,7 @@ class JsonReporter : public Reporter
 
     std::string path_;
     std::optional<Writer> writer_;
-    std::vector<std::size_t> first_of_; // each suite, of a round's items
+    std::vector<std::size_t> first_of_; // of each suite, its first among the round's items
     std::vector<bool> ended_;           // each item of the round
 };
 

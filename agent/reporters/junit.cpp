@@ -30,8 +30,8 @@ namespace fptest
 namespace
 {
 
-// Whether a file can be put in that one's place. A pipe or a device cannot be
-// replaced, and what has a name only as a descriptor is somebody else's.
+// Whether another file can replace it. A pipe or a device cannot be replaced, and a
+// file named by a descriptor belongs to somebody else.
 bool is_replaceable(const std::string &path)
 {
     for (const char *descriptor : {"/dev/std", "/dev/fd/", "/proc/"}) {
@@ -44,17 +44,17 @@ bool is_replaceable(const std::string &path)
     return stat(path.c_str(), &status) != 0 || S_ISREG(status.st_mode);
 }
 
-// What is written before it takes the place of the target.
+// The file that is written first, and then replaces the target.
 std::string aside_of(const std::string &target)
 {
     return fmt::format("{}.{}.tmp", target, getpid());
 }
 
-// A file without a name, gone with this process.
+// A file without a name, which ends with this process.
 Descriptor unnamed_file(const std::string &directory)
 {
     Descriptor file(open(directory.c_str(), O_TMPFILE | O_RDWR | O_CLOEXEC, 0600));
-    if (!file.is_open()) { // not every file system has such files
+    if (!file.is_open()) { // not every file system supports O_TMPFILE
         std::string name = directory + "/fptest-XXXXXX";
         file = Descriptor(mkostemp(name.data(), O_CLOEXEC));
         if (file.is_open()) {
@@ -64,11 +64,11 @@ Descriptor unnamed_file(const std::string &directory)
     return file;
 }
 
-// The rounds that are over, as they are in the document.
+// The finished rounds, as the document has them.
 class Spool
 {
   public:
-    // In one of the directories. False where there is no room.
+    // In the first directory that has room; false if none has.
     bool open(const std::vector<std::string> &directories)
     {
         return std::ranges::any_of(directories, [this](const std::string &directory) {
@@ -88,7 +88,7 @@ class Spool
         return size_;
     }
 
-    // The piece there, as far as it is there; empty at the end.
+    // The piece from there on; empty at the end.
     std::string piece(off_t at, off_t end) const
     {
         std::string text(static_cast<std::size_t>(std::min<off_t>(kPiece, end - at)), '\0');
@@ -193,7 +193,7 @@ class JunitReporter : public Reporter
                 return true;
             });
         } else {
-            // there may be no room for it where it waits for its reader
+            // the whole document may be more than the writer lets wait
             rest_ = spool_.size();
             if (!write(run, [this](std::string_view text) { return spool_.add(text); })) {
                 fail();
@@ -243,7 +243,7 @@ class JunitReporter : public Reporter
         tick(run);
     }
 
-    // The more there is to write, the less often: a long run is not to be held up.
+    // The more there is to write, the less often, so as not to hold up a long run.
     void replace(const Run &run)
     {
         if (!failure_.empty()) {
@@ -283,7 +283,7 @@ class JunitReporter : public Reporter
         return false;
     }
 
-    // The whole document, in pieces. False where the sink says so.
+    // The whole document, in pieces. False if the sink fails.
     bool write(const Run &run, const Sink &sink) const
     {
         const off_t end = spool_.size(); // the sink may be the spool itself
@@ -308,11 +308,11 @@ class JunitReporter : public Reporter
 
     std::string path_;
     std::string target_;
-    std::optional<Writer> direct_; // in place of the target
+    std::optional<Writer> direct_; // in place of a target
     Spool spool_;
-    std::optional<off_t> rest_; // from where on the spool has the document
-    std::vector<Late> late_;    // of the round
-    Tests before_;              // of the rounds before it
+    std::optional<off_t> rest_;    // where the rest of the document begins in the spool
+    std::vector<LateReport> late_; // of the round
+    TestCounts before_;            // of the rounds before it
     bool changed_ = false;
     Clock::time_point next_;
     std::string failure_;
@@ -325,7 +325,7 @@ std::string junit_obstacle(const std::string &path)
     if (path == "-") {
         return "";
     }
-    if (const int error = Writer::obstacle(path); error != 0) { // also one that is read-only
+    if (const int error = Writer::obstacle(path); error != 0) { // such as a read-only file
         return failure_of(path, error);
     }
     const int error = is_replaceable(path) ? Writer::obstacle(aside_of(end_of_links(path))) : 0;

@@ -28,14 +28,14 @@ std::string xml_escaped(std::string_view text)
         {">", "&gt;"},
         {"\"", "&quot;"},
         {"\r", "&#13;"},
-        // Unicode has them, XML has not
+        // valid Unicode, but not in XML
         {"\xEF\xBF\xBE", "\uFFFD"},
         {"\xEF\xBF\xBF", "\uFFFD"},
     };
     return replaced(sanitize_utf8(text), kEscapes);
 }
 
-// A reader makes blanks of the tabs and line feeds in attributes.
+// Readers turn tabs and line feeds in attributes into blanks.
 std::string attribute(const char *name, std::string_view value)
 {
     static constexpr Replacement kEscapes[] = {{"\t", "&#9;"}, {"\n", "&#10;"}};
@@ -53,7 +53,7 @@ std::string time_attribute(double seconds)
     return fmt::format(" time=\"{}.{:03}\"", milliseconds / 1000, milliseconds % 1000);
 }
 
-// In whole seconds and without a zone, as the format has it.
+// In whole seconds and without a zone, as the format wants.
 std::string timestamp_attribute(std::chrono::system_clock::time_point time)
 {
     return attribute("timestamp", timestamp(time).substr(0, 19));
@@ -75,7 +75,7 @@ std::string properties(const std::string &indent, const std::string &inside)
 
 // --- its pieces --------------------------------------------------------------
 
-void add(Tests &tests, const Run &run, const Suite &suite)
+void add(TestCounts &tests, const Run &run, const Suite &suite)
 {
     for (const ItemRun &item : suite.items) {
         ++tests.all;
@@ -97,14 +97,13 @@ void add(Tests &tests, const Run &run, const Suite &suite)
     }
 }
 
-std::string attributes(const Tests &tests)
+std::string attributes(const TestCounts &tests)
 {
     return attribute("tests", tests.all) + attribute("failures", tests.failures) +
            attribute("errors", tests.errors) + attribute("skipped", tests.skipped);
 }
 
-// What is known of an item that has not passed, for readers that show no
-// properties.
+// What is known of an item that has not passed, for readers that show no properties.
 std::string details(const ItemRun &item)
 {
     const ItemReport &report = item.report;
@@ -130,7 +129,7 @@ std::string details(const ItemRun &item)
     return text;
 }
 
-// There is no outcome of an item, or of a round.
+// For an item or a round without an outcome.
 std::string not_run(const Run &run, bool was_running)
 {
     const std::string &why = why_not_all(run);
@@ -199,10 +198,10 @@ std::string summary_properties(const Run &run, const std::string &indent)
     return text;
 }
 
-std::string test_suite(const Run &run, std::size_t number, const std::vector<Late> &late)
+std::string test_suite(const Run &run, std::size_t number, const std::vector<LateReport> &late)
 {
     const Suite &suite = run.suites[number];
-    Tests tests;
+    TestCounts tests;
     add(tests, run, suite);
     double seconds = 0;
     auto start = run.start;
@@ -215,7 +214,7 @@ std::string test_suite(const Run &run, std::size_t number, const std::vector<Lat
                          property(indent, "vendor", std::to_string(run.vendor)) +
                          property(indent, "pass_code", std::to_string(run.pass_code)) +
                          kStateGoesHere;
-    for (const Late &one : late) {
+    for (const LateReport &one : late) {
         if (one.suite == number) {
             inside += property(indent, "late_report", one.text);
         }
@@ -235,7 +234,7 @@ std::string test_suite(const Run &run, std::size_t number, const std::vector<Lat
 
 } // namespace
 
-Tests &Tests::operator+=(const Tests &more)
+TestCounts &TestCounts::operator+=(const TestCounts &more)
 {
     all += more.all;
     failures += more.failures;
@@ -244,9 +243,9 @@ Tests &Tests::operator+=(const Tests &more)
     return *this;
 }
 
-Tests tests_of_round(const Run &run)
+TestCounts tests_of_round(const Run &run)
 {
-    Tests tests;
+    TestCounts tests;
     for (const Suite &suite : run.suites) {
         add(tests, run, suite);
     }
@@ -256,8 +255,8 @@ Tests tests_of_round(const Run &run)
 namespace
 {
 
-// Whether there is an error for what is still to come: rounds that have not begun, or
-// the end of the run, unless something else says that it was cut off.
+// Whether the document needs an error for what is still to come: rounds that have not
+// begun, or the end of the run if nothing else shows that it was cut off.
 bool has_rest(const Run &run)
 {
     return rounds_to_come(run) > 0 || (!run.finished && tests_of_round(run).errors == 0);
@@ -274,9 +273,9 @@ std::string name_of_rest(const Run &run)
 
 } // namespace
 
-std::string junit_head(const Run &run, const Tests &before)
+std::string junit_head(const Run &run, const TestCounts &before)
 {
-    Tests tests = before;
+    TestCounts tests = before;
     tests += tests_of_round(run);
     if (has_rest(run)) {
         ++tests.all;
@@ -287,7 +286,7 @@ std::string junit_head(const Run &run, const Tests &before)
         attributes(tests), time_attribute(run.seconds), timestamp_attribute(run.start));
 }
 
-std::string junit_round(const Run &run, const std::vector<Late> &late)
+std::string junit_round(const Run &run, const std::vector<LateReport> &late)
 {
     std::string text;
     for (std::size_t number = 0; number < run.suites.size(); ++number) {
@@ -313,7 +312,7 @@ std::string junit_tail(const Run &run)
     if (!has_rest(run)) {
         return "</testsuites>\n";
     }
-    Tests tests;
+    TestCounts tests;
     tests.all = 1;
     tests.errors = 1;
     return fmt::format("  <testsuite name=\"{0}\"{1}{2}{3}>\n    <testcase classname=\"rounds\" "

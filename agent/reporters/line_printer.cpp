@@ -88,8 +88,8 @@ std::string LinePrinter::failure() const
     return writer_.failure();
 }
 
-// What takes the drawn lines away and leaves the cursor where they began. A
-// terminal that was made narrower has wrapped them.
+// Erases the drawn lines and leaves the cursor where they began. A terminal that was
+// made narrower has wrapped them.
 std::string LinePrinter::erase()
 {
     if (drawn_.empty()) {

@@ -1,8 +1,8 @@
 // SPDX-FileCopyrightText: 2026 The Quillmark authors
 // SPDX-License-Identifier: Apache-2.0
 
-// Lines on a terminal: some stay, and below them some are drawn again and again. What
-// is in them is a view's.
+// Lines on a terminal: some stay, and others below them are redrawn. What they say is
+// up to a view.
 #pragma once
 
 #include "reporters/writer.h"
@@ -17,7 +17,7 @@ namespace fptest
 
 enum class Colour { none, red, green, yellow, cyan };
 
-// A line as it grows, with its width in columns and not in bytes.
+// A line as it grows, measured in columns, not bytes.
 class Line
 {
   public:
@@ -30,7 +30,7 @@ class Line
         return room_ - width_;
     }
 
-    // What there is no room for is cut.
+    // Cuts what does not fit.
     void add(const std::string &text, Colour colour = Colour::none);
 
     const std::string &text() const
@@ -57,18 +57,18 @@ class LinePrinter
     // As wide as the terminal is now.
     Line new_line() const;
 
-    // Puts a line above those that are redrawn, when they are.
+    // Puts a line above the redrawn ones, at the next redraw.
     void keep(const Line &line);
 
-    // False while the terminal does not take what it was given: frames are left out then.
+    // False while the terminal is behind: skip frames then.
     bool wants_frame() const;
 
-    // Puts these lines in the place of those that were drawn.
+    // Replaces the lines that were drawn.
     void redraw(const std::vector<Line> &lines);
 
-    // Leaves those that are drawn as they are, and begins a line after them.
+    // Leaves the drawn lines as they are, and starts a new line below them.
     void leave();
-    // They are gone, or somebody else's.
+    // The drawn lines are gone, or somebody else has written over them.
     void forget();
 
     bool is_flushed() const;
@@ -80,8 +80,8 @@ class LinePrinter
     std::FILE *terminal_;
     Writer writer_;
     bool coloured_;
-    std::vector<std::size_t> drawn_; // the widths of the lines that are redrawn
-    std::string kept_;               // lines that are above the next frame
+    std::vector<std::size_t> drawn_; // widths of the redrawn lines
+    std::string kept_;               // lines to go above the next frame
 };
 
 } // namespace fptest

@@ -24,7 +24,7 @@ namespace
 using Clock = std::chrono::steady_clock;
 using namespace std::chrono_literals;
 
-constexpr std::size_t kNarrowest = 40; // in which an item's result can still be seen
+constexpr std::size_t kNarrowest = 40; // columns in which an item's result still shows
 
 Colour colour_of(Outcome outcome)
 {
@@ -95,8 +95,8 @@ class LiveView : public Reporter
         if (!has_room) {
             keep_text("      " + said);
         }
-        if (!item.left_running.empty()) {
-            keep_text("      left running: " + one_line(left_running(item)), Colour::yellow);
+        if (const std::string left = left_running_line(item); !left.empty()) {
+            keep_text("      " + left, Colour::yellow);
         }
         if (item.outcome != Outcome::passed) {
             for (const std::string &text : last_lines(item.output)) {
@@ -123,7 +123,7 @@ class LiveView : public Reporter
         printer_.leave();
     }
 
-    // What is there now is the shell's.
+    // The shell has written since.
     void resumed(const Run &run) override
     {
         printer_.forget();
@@ -133,11 +133,10 @@ class LiveView : public Reporter
     void finish(const Run &run) override
     {
         running_.clear();
-        if (!run.finished) {
-            keep_text("not finished: " + one_line(run.why_unfinished), Colour::yellow);
-        }
-        if (!run.why_ended.empty()) {
-            keep_text("ended: " + one_line(run.why_ended), Colour::yellow);
+        for (const std::string &line : {not_finished(run), ended_early(run)}) {
+            if (!line.empty()) {
+                keep_text(line, Colour::yellow);
+            }
         }
         for (const std::string &line : summary_table(run)) {
             keep_text(line);
@@ -198,12 +197,11 @@ class LiveView : public Reporter
     Line total_line(const Run &run) const
     {
         const Counts counts = count(run);
+        const auto [passed, failed] = tally(counts);
         Line line = printer_.new_line();
-        line.add(fmt::format("{} passed", counts.passed),
-                 counts.passed > 0 ? Colour::green : Colour::none);
+        line.add(passed, counts.passed > 0 ? Colour::green : Colour::none);
         line.add(", ");
-        line.add(fmt::format("{} failed", counts.failed),
-                 counts.failed > 0 ? Colour::red : Colour::none);
+        line.add(failed, counts.failed > 0 ? Colour::red : Colour::none);
         line.add(rest_of_total(run));
         if (!running_.empty() && !run.why_unfinished.empty()) {
             line.add("; Ctrl-C again leaves at once");
@@ -218,7 +216,7 @@ class LiveView : public Reporter
         printer_.keep(line);
     }
 
-    // While the terminal does not take what it was given, frames are left out.
+    // Skips frames while the terminal is behind.
     void draw(const Run &run)
     {
         if (printer_.wants_frame()) {
@@ -240,7 +238,7 @@ class LiveView : public Reporter
         drawn_at_ = Clock::now();
     }
 
-    // What an item said last, as far as it says things in lines.
+    // The last line that the item printed.
     static std::string last_line(const std::string &output)
     {
         const auto lines =
@@ -259,17 +257,17 @@ class LiveView : public Reporter
 
 } // namespace
 
-std::unique_ptr<Reporter> live_view(std::FILE *terminal, bool colour)
+std::unique_ptr<Reporter> make_live_view(std::FILE *terminal, bool colour)
 {
     return std::make_unique<LiveView>(terminal, colour);
 }
 
-std::unique_ptr<Reporter> suitable_view(std::FILE *stream, bool quiet)
+std::unique_ptr<Reporter> make_suitable_view(std::FILE *stream, bool quiet)
 {
     if (quiet || !is_smart_terminal(stream) || terminal_width(stream) < kNarrowest) {
-        return plain_view(stream, quiet);
+        return make_plain_view(stream, quiet);
     }
-    return live_view(stream, wants_colour());
+    return make_live_view(stream, wants_colour());
 }
 
 } // namespace fptest

@@ -56,10 +56,10 @@ class PlainView : public Reporter
         }
         said_ = Clock::now();
         const ItemRun &item = item_at(run, place_);
-        print(
-            fmt::format("{}: {}{}, {}", name_of(run, item), item.stopping ? "stopping" : "running",
-                        item.report.progress ? ", progress " + one_line(*item.report.progress) : "",
-                        duration(item.running)));
+        print(fmt::format(
+            "{}: {}{}, {}", one_line(title(run, item)), item.stopping ? "stopping" : "running",
+            item.report.progress ? ", progress " + one_line(*item.report.progress) : "",
+            duration(item.running)));
         print_output(new_output(item.output));
         output_said_ = item.output;
     }
@@ -72,7 +72,7 @@ class PlainView : public Reporter
         if (quiet_ && passed && item.left_running.empty()) {
             return;
         }
-        std::string text = fmt::format("{}: {}{}", name_of(run, item), word(item.outcome),
+        std::string text = fmt::format("{}: {}{}", one_line(title(run, item)), word(item.outcome),
                                        reported_result(item.report));
         if (const std::string how = how_it_ended(item); !how.empty()) {
             text += ", " + how;
@@ -82,8 +82,8 @@ class PlainView : public Reporter
         }
         const std::string said = remark(item);
         print(text + (said.empty() ? "" : ": " + said));
-        if (!item.left_running.empty()) {
-            print("    left running: " + one_line(left_running(item)));
+        if (const std::string left = left_running_line(item); !left.empty()) {
+            print("    " + left);
         }
         if (!passed) {
             print_output(item.output);
@@ -97,15 +97,11 @@ class PlainView : public Reporter
 
     void finish(const Run &run) override
     {
-        if (!run.finished) {
-            print("not finished: " + one_line(run.why_unfinished));
-        }
+        print(not_finished(run));
         if (quiet_) {
             return;
         }
-        if (!run.why_ended.empty()) {
-            print("ended: " + one_line(run.why_ended));
-        }
+        print(ended_early(run));
         for (const std::string &line : summary_table(run)) {
             print(line);
         }
@@ -123,13 +119,8 @@ class PlainView : public Reporter
     }
 
   private:
-    static std::string name_of(const Run &run, const ItemRun &item)
-    {
-        return fmt::format("{}/{}{}", one_line(item.group), one_line(item.name), of_round(run));
-    }
-
-    // What has come to it since it was shown. Of one that is longer than what is kept
-    // that is not known, and its last lines are shown again.
+    // What is new since it was last shown. Once the start of the output has been
+    // dropped nobody knows, and the last lines are shown again.
     std::string_view new_output(const std::string &output) const
     {
         const bool is_more = output.starts_with(output_said_);
@@ -145,7 +136,9 @@ class PlainView : public Reporter
 
     void print(const std::string &text)
     {
-        writer_.write(text + "\n");
+        if (!text.empty()) {
+            writer_.write(text + "\n");
+        }
     }
 
     Writer writer_;
@@ -158,7 +151,7 @@ class PlainView : public Reporter
 
 } // namespace
 
-std::unique_ptr<Reporter> plain_view(std::FILE *stream, bool quiet)
+std::unique_ptr<Reporter> make_plain_view(std::FILE *stream, bool quiet)
 {
     return std::make_unique<PlainView>(stream, quiet);
 }

@@ -30,9 +30,8 @@ std::string tap_escaped(std::string_view text)
     return replaced(one_line(text), kEscapes);
 }
 
-// A text between double quotes, as both YAML and JSON read it. YAML has no room
-// for some characters that a clean text may hold: they break a line there, or
-// are none at all.
+// A text between double quotes, as both YAML and JSON read it. YAML does not allow
+// some characters that a clean text may hold, or breaks the line at them.
 std::string yaml_quoted(std::string_view text)
 {
     static constexpr Replacement kEscapes[] = {
@@ -47,7 +46,7 @@ std::string yaml_quoted(std::string_view text)
         {"\xEF\xBF\xBE", "\\uFFFE"},
         {"\xEF\xBF\xBF", "\\uFFFF"},
     };
-    // Perl's reader of YAML takes a longer one for broken
+    // Perl's YAML reader rejects longer ones
     constexpr std::size_t kLongest = 60000;
     constexpr std::size_t kKept = 10000;
     const std::string whole = '"' + replaced(sanitize_utf8(text), kEscapes) + '"';
@@ -139,8 +138,8 @@ class TapReporter : public Reporter
     void begin(const Run &run) override
     {
         begin_round(run);
-        // Perl's Test::Harness, which runs many a bench, refuses 14 up to its 3.44. What
-        // is written is the same: to 13 a subtest is lines that it does not know.
+        // Perl's Test::Harness, common on benches, refuses version 14 up to its 3.44. The
+        // rest is the same: to version 13 a subtest is lines that it ignores.
         const bool harness = std::getenv("HARNESS_ACTIVE") != nullptr;
         write(harness ? "TAP version 13\n" : "TAP version 14\n");
         if (has_fixed_rounds(run)) {
@@ -179,6 +178,7 @@ class TapReporter : public Reporter
     void finish(const Run &run) override
     {
         const Counts counts = count(run);
+        const auto [passed, failed] = tally(counts);
         std::string text = next_lines(run, true);
         if (run.finished && !has_fixed_rounds(run)) {
             text += plan_line(points_);
@@ -186,8 +186,8 @@ class TapReporter : public Reporter
         for (const std::string &line : summary_table(run)) {
             text += comment(line);
         }
-        text += fmt::format("# {} passed, {} failed, {} not run in {}\n", counts.passed,
-                            counts.failed, counts.not_run, duration(run.seconds));
+        text += comment(fmt::format("{}, {}, {} not run in {}", passed, failed, counts.not_run,
+                                    duration(run.seconds)));
         if (!run.finished) {
             text += fmt::format("Bail out!  {}\n", run.why_unfinished.empty()
                                                        ? "the run did not finish"
@@ -222,8 +222,8 @@ class TapReporter : public Reporter
         suite_ = 0;
     }
 
-    // The lines that are due. Points come in the order of the plan, or a harness
-    // complains: one that has ended early waits for those before it.
+    // The lines that are due. Points keep the order of the plan, or a harness complains:
+    // an item that ends early waits for those before it.
     std::string next_lines(const Run &run, bool all)
     {
         std::string text;
@@ -236,7 +236,7 @@ class TapReporter : public Reporter
             for (; item_ < suite.items.size() && (all || ended_[suite_][item_]); ++item_) {
                 text += item_point(run, suite.items[item_], item_ + 1);
             }
-            // the round's last point waits for the end of all that items have left running
+            // the round's last point waits until all that items left running has ended
             if (item_ < suite.items.size() || (!all && suite_ + 1 == run.suites.size())) {
                 break;
             }

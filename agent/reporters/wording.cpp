@@ -20,7 +20,7 @@ constexpr std::size_t kOutputLines = 10;
 constexpr std::size_t kOutputColumns = 200;
 constexpr std::size_t kTableColumns = 80;
 
-// "2 h", in the largest unit that it is a whole number of.
+// "2 h", in the largest unit that gives a whole number.
 std::string time_limit(double seconds)
 {
     static constexpr std::pair<long long, const char *> kUnits[] = {
@@ -65,8 +65,13 @@ std::string heading(const Run &run)
 
 std::string total(const Run &run)
 {
-    const Counts counts = count(run);
-    return fmt::format("{} passed, {} failed{}", counts.passed, counts.failed, rest_of_total(run));
+    const auto [passed, failed] = tally(count(run));
+    return passed + ", " + failed + rest_of_total(run);
+}
+
+std::pair<std::string, std::string> tally(const Counts &counts)
+{
+    return {fmt::format("{} passed", counts.passed), fmt::format("{} failed", counts.failed)};
 }
 
 std::string rest_of_total(const Run &run)
@@ -78,6 +83,16 @@ std::string rest_of_total(const Run &run)
                              : has_fixed_rounds(run) ? fmt::format(", {} to go", counts.not_run)
                                                      : fmt::format(", round {}", run.round);
     return fmt::format("{}, {}", rest, duration(run.seconds));
+}
+
+std::string not_finished(const Run &run)
+{
+    return run.finished ? "" : "not finished: " + one_line(run.why_unfinished);
+}
+
+std::string ended_early(const Run &run)
+{
+    return run.why_ended.empty() ? "" : "ended: " + one_line(run.why_ended);
 }
 
 std::string how_it_ended(const ItemRun &item)
@@ -99,6 +114,11 @@ std::string left_running(const ItemRun &item)
     return text;
 }
 
+std::string left_running_line(const ItemRun &item)
+{
+    return item.left_running.empty() ? "" : "left running: " + one_line(left_running(item));
+}
+
 std::string result_of(const ItemReport &report)
 {
     return report.result_without_value ? "?" : one_line(report.result.value_or("-"));
@@ -115,7 +135,7 @@ std::string remark(const ItemRun &item)
                            item.outcome == Outcome::timed_out || item.outcome == Outcome::stopped;
     std::string text = one_line(item.report.description.value_or(""));
     if (text.empty() && item.signal != 0 && !explained) {
-        return {}; // how it ended is said already
+        return {}; // how_it_ended() says it
     }
     if (explained || item.overruled || text.empty()) {
         text = one_line(item.reason) + (text.empty() || item.reason.empty() ? "" : ": ") + text;
@@ -130,9 +150,8 @@ std::string late_report(const Run &run, Place place, const ItemReport &report)
                                      ? fmt::format(", progress {}", one_line(*report.progress))
                                      : "";
     const std::string said = one_line(report.description.value_or(""));
-    return fmt::format("{}/{}{}: late report{}{}{}; it changes nothing", one_line(item.group),
-                       one_line(item.name), of_round(run), reported_result(report), progress,
-                       said.empty() ? "" : ": " + said);
+    return fmt::format("{}: late report{}{}{}; it changes nothing", one_line(title(run, item)),
+                       reported_result(report), progress, said.empty() ? "" : ": " + said);
 }
 
 std::vector<std::string> last_lines(std::string_view output)

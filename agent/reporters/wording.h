@@ -1,14 +1,15 @@
 // SPDX-FileCopyrightText: 2026 The Quillmark authors
 // SPDX-License-Identifier: Apache-2.0
 
-// What views and reports say of a run, in the same words. The texts are clean and
-// of one line, unless it is said otherwise.
+// The words that all reporters use for a run. Each text is one clean line, unless
+// stated otherwise.
 #pragma once
 
 #include "run/results.h"
 
 #include <string>
 #include <string_view>
+#include <utility>
 #include <vector>
 
 namespace fptest
@@ -19,33 +20,40 @@ std::string heading(const Run &run);
 
 // "3 passed, 1 failed, 2 to go, 12.0 s"
 std::string total(const Run &run);
-// What of it comes after the failed ones: ", 2 to go, 12.0 s".
+// Its parts: "3 passed" and "1 failed"; ", 2 to go, 12.0 s".
+std::pair<std::string, std::string> tally(const Counts &counts);
 std::string rest_of_total(const Run &run);
 
-// "exit status 5", "died by SIGSEGV"; empty where there is nothing to be said: it
-// ended with 0, or by the signal that stopped it.
+// "not finished: interrupted", "ended: G/X did not pass"; empty if that is not so.
+std::string not_finished(const Run &run);
+std::string ended_early(const Run &run);
+
+// "exit status 5", "died by SIGSEGV"; empty if it ended with 0, or by the signal that
+// stopped it.
 std::string how_it_ended(const ItemRun &item);
 
-// "sh (pid 812), logcat (pid 815)", as the names are; empty where nothing is left.
+// "sh (pid 812), logcat (pid 815)", with the names as they are; empty if nothing is left.
 std::string left_running(const ItemRun &item);
+// "left running: sh (pid 812)"; empty if nothing is left.
+std::string left_running_line(const ItemRun &item);
 
 // "?" for a result without a value, "-" for none.
 std::string result_of(const ItemReport &report);
 
-// ", result 0"; empty where none was reported.
+// ", result 0"; empty if none was reported.
 std::string reported_result(const ItemReport &report);
 
-// What an item has said of itself, or what there is to say of it.
+// The item's description, the reason for its outcome, or both.
 std::string remark(const ItemRun &item);
 
 // "G/X: late report, result 0: TEXT; it changes nothing"
 std::string late_report(const Run &run, Place place, const ItemReport &report);
 
-// The last lines that an item printed, none of them longer than is sensible.
+// The last lines that an item printed, long ones cut.
 std::vector<std::string> last_lines(std::string_view output);
 
-// Each item over its rounds, in lines of at most 80 columns, the first one the
-// heads. Empty where there has been one round alone.
+// Each item over its rounds, in lines of at most 80 columns, under a line of
+// headings. Empty after a single round.
 std::vector<std::string> summary_table(const Run &run);
 
 } // namespace fptest

@@ -22,7 +22,7 @@ namespace fptest
 namespace
 {
 
-// How long a reader may take before it is one that is not waited for.
+// A reader that takes longer is no longer waited for.
 constexpr std::chrono::milliseconds kPrompt(100);
 
 bool is_regular(int descriptor)
@@ -32,7 +32,7 @@ bool is_regular(int descriptor)
     return fstat(descriptor, &status) == 0 && S_ISREG(status.st_mode);
 }
 
-// Whether opening it may take until somebody reads it.
+// Whether opening it may wait for a reader.
 bool may_block(const std::string &path)
 {
     struct stat status {
@@ -43,11 +43,11 @@ bool may_block(const std::string &path)
 } // namespace
 
 struct Writer::State {
-    // set before the thread is started, and its own then
+    // set before the thread starts; afterwards only the thread uses them
     std::string name;
     int flags = 0;
     int mode = 0;
-    Descriptor file{-1}; // where it is not the caller's
+    Descriptor file{-1}; // if it is not the caller's
     int descriptor = -1;
 
     std::mutex mutex;
@@ -137,15 +137,15 @@ int Writer::obstacle(const std::string &path)
     if (!file.is_open()) {
         return errno;
     }
-    if (!is_there) { // a link that leads to it stays
+    if (!is_there) { // keep a link that leads to it
         std::error_code none;
         std::filesystem::remove(std::filesystem::canonical(path, none), none);
     }
     return 0;
 }
 
-// Signals are for the thread that waits for them. This one is not waited for, as it
-// may be stuck for good.
+// Blocks signals in the thread, as another one waits for them. The thread is detached,
+// because it may be stuck for good.
 void Writer::start()
 {
     has_thread_ = true;
@@ -156,7 +156,7 @@ void Writer::start()
     std::thread([state = state_] { state->run(); }).detach();
     pthread_sigmask(SIG_SETMASK, &before, nullptr);
     std::unique_lock lock(state_->mutex);
-    is_patient_ = state_->changed.wait_for(lock, kPrompt, [this] { return state_->opened; });
+    waits_for_reader_ = state_->changed.wait_for(lock, kPrompt, [this] { return state_->opened; });
 }
 
 void Writer::write(const std::string &text)
@@ -178,8 +178,8 @@ void Writer::write(const std::string &text)
     }
     state.queue += text;
     state.changed.notify_all();
-    if (is_patient_) {
-        is_patient_ = state.changed.wait_for(lock, kPrompt, [&state] {
+    if (waits_for_reader_) {
+        waits_for_reader_ = state.changed.wait_for(lock, kPrompt, [&state] {
             return !state.failure.empty() || (state.queue.empty() && state.in_work == 0);
         });
     }
@@ -204,7 +204,7 @@ void Writer::write_now(const std::string &text)
     }
     state_->failure = failure_of(state_->name, error);
     if (is_known) {
-        // where even that fails the last line is left broken, and the failure is told
+        // if even that fails the last line stays broken; the failure is reported anyway
         [[maybe_unused]] const int result =
             ftruncate(state_->descriptor, status.st_size - static_cast<off_t>(written));
     }

@@ -16,30 +16,6 @@ namespace fptest
 namespace
 {
 
-std::vector<std::string> group_names(const Plan &plan)
-{
-    std::vector<std::string> names;
-    for (const Plan::Group &group : plan.groups()) {
-        if (std::ranges::find(names, group.name) == names.end()) {
-            names.push_back(group.name);
-        }
-    }
-    return names;
-}
-
-std::vector<std::string> item_names(const Plan &plan, const std::string &name)
-{
-    std::vector<std::string> names;
-    const auto groups = plan.groups();
-    const auto group = std::ranges::find(groups, name, &Plan::Group::name);
-    if (group != groups.end()) {
-        for (const Plan::Element &item : group->items) {
-            names.push_back(item.name.value_or(""));
-        }
-    }
-    return names;
-}
-
 // "; did you mean 'x'? The groups are a, b and c", for a name that is not there.
 std::string instead(const std::string &name, const std::vector<std::string> &names,
                     const std::string &what)
@@ -206,13 +182,8 @@ std::string known_groups(const Plan &plan)
 std::vector<Path> all_paths(const Plan &plan)
 {
     std::string root = "plan";
-    for (mxml_node_t *node : plan.elements()) {
-        const std::string tag = mxmlGetElement(node);
-        if (!tag.starts_with("?") && !tag.starts_with("!")) {
-            const char *name = mxmlElementGetAttr(node, "name");
-            root = name != nullptr ? name : tag;
-            break;
-        }
+    if (mxml_node_t *const node = plan.root(); node != nullptr) {
+        root = attribute(node, "name").value_or(mxmlGetElement(node));
     }
     std::vector<Path> paths;
     for (const std::string &group : group_names(plan)) {

@@ -133,4 +133,9 @@ std::string title(const Run &run, const Suite &suite)
     return suite.group + of_round(run);
 }
 
+std::string title(const Run &run, const ItemRun &item)
+{
+    return item.group + "/" + item.name + of_round(run);
+}
+
 } // namespace fptest

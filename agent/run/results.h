@@ -136,6 +136,8 @@ std::string of_round(const Run &run);
 
 // "Bringup", or "Bringup (round 2)"
 std::string title(const Run &run, const Suite &suite);
+// "Bringup/SpiCheck", or "Bringup/SpiCheck (round 2)"
+std::string title(const Run &run, const ItemRun &item);
 
 // Is called in this order: begin; for each item started, any number of progressed, ended;
 // round_over between two rounds; finish, even if items did not run. The run is up to date at

@@ -81,8 +81,7 @@ class Rounds
             return false;
         }
         const ItemRun &item = item_at(run_, {job.suite, (*failed)->item});
-        run_.why_ended = fmt::format("{}{} did not pass (--until-fail)",
-                                     one_line(item.group + "/" + item.name), of_round(run_));
+        run_.why_ended = one_line(title(run_, item)) + " did not pass (--until-fail)";
         return true;
     }
 
@@ -212,7 +211,7 @@ bool run_rounds(const std::vector<Reporter *> &reporters, const Runner::Options 
     }
     finish(run, reporters);
     if (!flush(reporters, signals, runner.signal() != 0)) {
-        say_at_end("a report is not whole: it was not read to its end");
+        say_at_end("a result file is incomplete: its reader stopped reading");
         return false;
     }
     const std::string failure = failures(reporters);

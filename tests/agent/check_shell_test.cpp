@@ -46,7 +46,7 @@ bool runs(const std::string &args)
 }
 
 // Only where there is a shell to be asked.
-TEST(CheckedGrammar, IsTheShellsToJudge)
+TEST(CheckedGrammar, ShellDecidesWhatIsASyntaxError)
 {
     std::string why;
     ASSERT_EQ(DeviceShell().ask("/system/bin/X a; if", why), DeviceShell::Answer::refused);

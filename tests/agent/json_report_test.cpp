@@ -328,7 +328,7 @@ TEST_F(Reports, BadPathIsToldBeforeAnythingRuns)
 {
     write_file(path("file"), "x");
     const std::string bad = path("file") + "/report";
-    for (const auto &make : {json_report, junit_report}) {
+    for (const auto &make : {make_json_reporter, make_junit_reporter}) {
         const auto report = make(bad);
         Playback playback(*report, mixed_run());
         playback.begin();

@@ -113,7 +113,8 @@ TEST_F(LongPlan, IsCutAtTheCommandsLimitWithAsSent)
     EXPECT_EQ(ended.out, "");
     EXPECT_THAT(ended.err, HasSubstr(" more than the 2048 that a command stores: the plan would be "
                                      "cut here, and the library would "));
-    EXPECT_THAT(ended.err, HasSubstr("; shorten it, or leave --as-sent out\n"));
+    EXPECT_THAT(ended.err, HasSubstr("; shorten it, or have fptest run --plan place it as a "
+                                     "file, without --as-sent\n"));
     EXPECT_FALSE(fs::exists(kPlanFile));
 
     // cut where it still loads

@@ -272,8 +272,8 @@ TEST_F(Output, ListHasNoReports)
         device::Lines arguments = {"run", "--list", "--plan", plan("<P/>")};
         arguments.insert(arguments.end(), report.begin(), report.end());
         expect_refusal(2,
-                       "fptest: --list runs nothing that " + report.front() +
-                           " could tell of: leave one of them out",
+                       "fptest: --list runs nothing, so " + report.front() +
+                           " would be empty: leave one of them out",
                        arguments);
     }
     EXPECT_FALSE(is_there("out"));

@@ -259,7 +259,7 @@ TEST(LoadedPlan, PrintsNothingAndLeavesTheLibraryAsItWas)
               "mxml: XML does not start with '<' (saw 'x').\n");
 }
 
-TEST(LoadedPlan, MayHaveDescriptorZero)
+TEST(LoadedPlan, LoadsFromDescriptorZero)
 {
     const support::FreedDescriptor freed(STDIN_FILENO);
     EXPECT_TRUE(Plan::load_as_library("<P/>"));
@@ -425,7 +425,7 @@ TEST(PlanWithReports, TellsAValueThatIsEmptyFromOneThatIsMissing)
 
 // --- places of elements ---------------------------------------------------------------------
 
-TEST(ElementTags, BelongToTheElementsOneByOne)
+TEST(ElementTags, MatchTheElementsOneToOne)
 {
     const std::string text = "<?xml version=\"1.0\"?><!DOCTYPE P><P><!-- c -->text<![CDATA[d]]>"
                              "<?e f?><Cmd /></P>";

@@ -156,7 +156,7 @@ class Reports : public ::testing::Test
     std::string plain_of(const RunOfItems &run, const How &how = play_all, bool quiet = false) const
     {
         const Stream stream = open_stream("plain");
-        return left_by(*plain_view(stream.get(), quiet), "plain", run, how);
+        return left_by(*make_plain_view(stream.get(), quiet), "plain", run, how);
     }
 
     static void play_all(Playback &playback)

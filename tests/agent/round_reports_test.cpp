@@ -422,7 +422,7 @@ TEST_F(RoundReports, AreQuietButForWhatIsWrong)
 TEST_F(RoundReports, LeaveTheShellsLinesAloneAfterAPause)
 {
     const Stream stream = open_stream("live");
-    const auto view = live_view(stream.get(), false);
+    const auto view = make_live_view(stream.get(), false);
     Playback playback(*view, two_items(1));
     playback.begin();
     playback.start({0, 0});

@@ -123,8 +123,8 @@ TEST_F(Rounds, AreListedOnce)
     EXPECT_LT(ended.seconds, 5);
 }
 
-// A million rounds begin, are held and are given up as one is.
-TEST_F(Rounds, TakeNothingWhileTheyHaveNotBegun)
+// A million planned rounds take no more memory and output than one.
+TEST_F(Rounds, CostNothingBeforeTheyBegin)
 {
     FptestProcess fptest({"run", "--repeat", "1000000", "--json", work("json"), "--junit",
                           work("junit"), "--tap", "--plan", plan(kOnePasses), "P/G"});

@@ -244,7 +244,7 @@ TEST_F(RunGatherer, HasNoResultFromWhatItsCopyOfThePlanSaysOfAnEarlierRun)
     EXPECT_THAT(outcomes(), ElementsAre("SensorProbe: failed", "Item: passed"));
 }
 
-TEST_F(RunGatherer, ReportsInVainBeforeItIsTold)
+TEST_F(RunGatherer, ReportBeforeTriggerIsLate)
 {
     for (const std::string way : {"--quiet", "--as-group"}) {
         SCOPED_TRACE(way);

@@ -49,7 +49,7 @@ class Refusal : public Run
 
 // --- paths -----------------------------------------------------------------------------
 
-TEST_F(Refusal, OfAnUnknownNameNamesTheNearestAndThoseThereAre)
+TEST_F(Refusal, UnknownNameSuggestsTheNearestAndListsAll)
 {
     write_file(kPlanFile, kTwoGroups);
     const std::string path = plan(kTwoGroups);

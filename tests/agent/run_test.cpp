@@ -436,7 +436,7 @@ TEST_F(Run, LosesNoReportThatComesAfterOneThatSpoilsThePlan)
     EXPECT_EQ(description(0), "dead");
 }
 
-TEST_F(Run, TellsAReportThatGoesIntoAnItemBeforeItsOwn)
+TEST_F(Run, ShowsAReportForAnEarlierItemAsLate)
 {
     const Ended ended = run_group({{"Item", "report G 100 0 fine"},
                                    {"Script", "'fptest report G Item --progress 100 --result 1 "

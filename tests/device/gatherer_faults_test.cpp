@@ -102,7 +102,7 @@ TEST_F(FailingGatherer, ThatResetsItsConnectionIsLoggedAndTheNextIsTriggered)
     }
 }
 
-TEST_F(FailingGatherer, ThatLeavesWithoutReadingIsNotNoticed)
+TEST_F(FailingGatherer, LeavesUnnoticedBeforeItReads)
 {
     OtherHost host([] {
         EXPECT_EQ(trigger(), kTriggered);

@@ -35,7 +35,7 @@ def test_the_sandbox_truly_refuses_namespaces():
 # ---- refusals ----------------------------------------------------------------
 
 REFUSED = "namespaces are refused here; "
-ADVICE = ("; or, on a machine that may be thrown away, make it the device: as root, "
+ADVICE = ("; or, on a machine that may be thrown away, use it as the device: as root, "
           "device/run --in-place, QUILLMARK_IN_PLACE=1 scripts/demo, QUILLMARK_IN_PLACE=1 "
           "scripts/test")
 USER = {"user": 1000}

@@ -86,12 +86,12 @@ def test_reports_are_not_written_to_the_host_and_the_line_says_what_to_do(option
         "device: device/run --out DIR gives a working directory that can be written\n")
 
 
-def test_reports_in_tmp_are_said_to_go_with_the_device(in_tmp):
+def test_results_in_tmp_are_said_to_be_lost_with_the_device(in_tmp):
     junit, json = f"{in_tmp}.xml", f"{in_tmp}.json"
 
     assert on_device(*RUN_A_PLAN, "--junit", junit, "--json", json).err == (
-        f"fptest: --json {json} and --junit {junit} go with the virtual device when it "
-        "ends; device/run --out DIR gives a working directory that stays\n")
+        f"fptest: --json {json} and --junit {junit} are lost when the virtual "
+        "device ends; device/run --out DIR gives a working directory that stays\n")
 
 
 def test_nothing_but_the_shell_is_in_bin():

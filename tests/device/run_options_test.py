@@ -73,18 +73,18 @@ def test_with_out_a_command_is_looked_for_there_and_then_in_the_callers_director
     assert with_out("results", caller, "./mine").out == "another\n"
 
 
-# ---- where reports go without it ---------------------------------------------------------
+# ---- where results go without it ---------------------------------------------------------
 
-def test_reports_on_the_devices_own_disks_are_said_to_go_with_it():
+def test_results_on_the_devices_own_disks_are_said_to_be_lost_with_it():
     status, _, err = on_device(*RUN_A_PLAN, "--junit", "/data/vorlane/r.xml")
 
     assert status == 0
     assert err.splitlines()[-1] == (
-        "fptest: --junit /data/vorlane/r.xml goes with the virtual device when it ends; "
+        "fptest: --junit /data/vorlane/r.xml is lost when the virtual device ends; "
         "device/run --out DIR gives a working directory that stays")
 
 
-def test_nothing_is_said_of_reports_that_stay(tmp_path):
+def test_nothing_is_said_of_results_that_stay(tmp_path):
     status, _, err = on_device(*RUN_A_PLAN, "--junit", "/data/vorlane/r.xml", "--log",
                                "/dev/null", options=("--data", tmp_path / "data"))
 
