@@ -263,11 +263,6 @@ bool ask_to_end(const std::vector<Leftover> &processes)
     return found;
 }
 
-bool ChildProcesses::has_gatherer() const
-{
-    return !of_gatherer().empty();
-}
-
 char state_of(pid_t process)
 {
     const auto found = read_process(fmt::format("/proc/{}", process));

@@ -49,10 +49,7 @@ class ChildProcesses
     // Signals items and the gatherer, even an earlier run's.
     void signal_all(int signal) const;
 
-    // Whether the gatherer runs, or is being started, even an earlier run's.
-    bool has_gatherer() const;
-
-    // The gatherer, even an earlier run's, and its descendants.
+    // The gatherer, also if it is just starting or an earlier run's, and its descendants.
     std::vector<Leftover> of_gatherer() const;
 
   private:

@@ -258,7 +258,8 @@ void Runner::poll_gatherer(RunningItem &active)
         return;
     }
     active.gatherer_looked_for = now();
-    active.gatherer_missed = library_.processes().has_gatherer() ? 0 : active.gatherer_missed + 1;
+    active.gatherer_missed =
+        library_.processes().of_gatherer().empty() ? active.gatherer_missed + 1 : 0;
     if (active.gatherer_missed < 2 || now() - active.start < kBeforeMissed) {
         return;
     }

@@ -43,8 +43,6 @@ std::string described(const std::vector<Leftover> &processes)
 
 } // namespace
 
-// --- signals ------------------------------------------------------------------
-
 void Runner::read_signals()
 {
     for (int signal = signals_.take(); signal != 0; signal = signals_.take()) {
@@ -90,8 +88,6 @@ void Runner::suspend()
         listener->resumed(run_);
     }
 }
-
-// --- items --------------------------------------------------------------------
 
 void Runner::stop_what_is_due()
 {
@@ -229,8 +225,6 @@ void Runner::cannot_stop(RunningItem &active)
     result.reason += ", and goes on running";
 }
 
-// --- what they leave running ---------------------------------------------------
-
 // Without those that earlier items left running.
 std::vector<Leftover> Runner::item_processes() const
 {
@@ -306,7 +300,7 @@ void Runner::make_way_for(const Job &job)
             (!running.empty() && std::ranges::none_of(running, is_taken_for_gatherer))) {
             end_gatherer();
         }
-        gatherer_runs_ = library_.processes().has_gatherer();
+        gatherer_runs_ = !library_.processes().of_gatherer().empty();
         require_trigger_port(); // an item may have taken it
     }
     reader_.poll();
