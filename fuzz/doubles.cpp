@@ -35,11 +35,6 @@ namespace
 constexpr int kSocket = 700; // no descriptor of ours comes near
 constexpr pid_t kChild = 100;
 
-struct Listing {
-    std::string text;
-    std::size_t at = 0;
-};
-
 struct State {
     bool plan_there = false;
     bool as_child = false;
@@ -223,11 +218,6 @@ ssize_t qm_write(int descriptor, const void *data, size_t size)
     return descriptor >= kSocket ? static_cast<ssize_t>(size) : ::write(descriptor, data, size);
 }
 
-off_t qm_lseek(int descriptor, off_t offset, int whence)
-{
-    return ::lseek(descriptor, offset, whence);
-}
-
 int qm_close(int descriptor)
 {
     if (descriptor >= kSocket) {
@@ -272,18 +262,8 @@ int Accept(int /*descriptor*/, sockaddr *address, socklen_t *length)
 FILE *qm_popen(const char *command, const char *mode)
 {
     state().started.push_back(std::string("popen ") + command);
-    const auto read = [](void *cookie, char *buffer, size_t size) {
-        auto *listing = static_cast<Listing *>(cookie);
-        const size_t count = listing->text.copy(buffer, size, listing->at);
-        listing->at += count;
-        return static_cast<ssize_t>(count);
-    };
-    const auto close = [](void *cookie) {
-        delete static_cast<Listing *>(cookie);
-        return 0;
-    };
-    auto *cookie = new Listing{state().listing};
-    FILE *stream = fopencookie(cookie, mode, {read, nullptr, nullptr, close});
+    std::string &listing = state().listing;
+    FILE *stream = fmemopen(listing.data(), listing.size(), mode);
     state().streams.insert(stream);
     return stream;
 }
@@ -342,16 +322,6 @@ pid_t qm_waitpid(pid_t /*pid*/, int * /*status*/, int /*options*/)
     return 0;
 }
 
-int qm_sigemptyset(sigset_t *set)
-{
-    return sigemptyset(set);
-}
-
-int qm_sigaddset(sigset_t *set, int signal)
-{
-    return sigaddset(set, signal);
-}
-
 int qm_sigprocmask(int /*how*/, const sigset_t * /*set*/, sigset_t *old)
 {
     return old != nullptr ? sigemptyset(old) : 0;
@@ -360,21 +330,6 @@ int qm_sigprocmask(int /*how*/, const sigset_t * /*set*/, sigset_t *old)
 sighandler_t qm_signal(int /*signal*/, sighandler_t /*handler*/)
 {
     return SIG_DFL;
-}
-
-pid_t qm_getpid()
-{
-    return 1;
-}
-
-pid_t qm_gettid()
-{
-    return 1;
-}
-
-char *qm_strdup(const char *text)
-{
-    return ::strdup(text);
 }
 
 // Formats, so that every argument is read.

@@ -128,13 +128,13 @@ int main(int argc, char **argv)
         status = complain(Exit::environment, error.what());
     }
     // items that did not pass are told by run's own views; errors in a plan are told here
-    const bool is_told = status != Exit::success && status != Exit::items_failed;
-    const bool is_unwritten = std::fflush(stdout) != 0 || std::ferror(stdout) != 0;
+    const bool is_untold = std::fflush(stdout) != 0 || std::ferror(stdout) != 0;
+    if (is_untold && (status == Exit::success || status == Exit::items_failed)) {
+        status = complain(Exit::environment, "standard output cannot be written");
+    }
     const std::string loss = fptest::log_loss();
     if (!loss.empty()) {
-        status = complain(is_told ? status : Exit::environment, loss);
-    } else if (is_unwritten && !is_told) {
-        status = complain(Exit::environment, "standard output cannot be written");
+        status = complain(status == Exit::success ? Exit::environment : status, loss);
     }
     return static_cast<int>(status);
 }

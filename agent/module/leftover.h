@@ -13,7 +13,8 @@ namespace fptest
 struct Leftover {
     std::string name; // of its program, without the path
     pid_t process = 0;
-    pid_t group = 0; // of processes
+    pid_t group = 0;             // of processes
+    unsigned long long born = 0; // on the kernel's clock: its number may be another's later
 };
 
 } // namespace fptest

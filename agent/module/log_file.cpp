@@ -72,7 +72,7 @@ void choose_log(const std::string &option)
                       std::strerror(errno));
     }
     opened = std::move(log);
-    opened_label = label(file);
+    opened_label = option.empty() ? "" : label(file);
     setenv(kLogVariable, path.c_str(), 1);
 }
 
@@ -80,13 +80,14 @@ std::string log_loss()
 {
     struct stat status {
     };
-    // is there room for one more byte?
-    if (!opened.is_open() || fstat(opened.get(), &status) != 0 || !S_ISREG(status.st_mode) ||
-        fallocate(opened.get(), FALLOC_FL_KEEP_SIZE, status.st_size, 1) == 0 || errno != ENOSPC) {
+    // asks for room for one byte more, which stays unwritten
+    if (opened_label.empty() || fstat(opened.get(), &status) != 0 || !S_ISREG(status.st_mode) ||
+        fallocate(opened.get(), FALLOC_FL_KEEP_SIZE, status.st_size, 1) == 0 ||
+        (errno != ENOSPC && errno != EDQUOT)) {
         return {};
     }
     return fmt::format("{} is incomplete: {}; make room, or name another file", opened_label,
-                       std::strerror(ENOSPC));
+                       std::strerror(errno));
 }
 
 } // namespace fptest

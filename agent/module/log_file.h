@@ -21,7 +21,8 @@ NamedFile log_file(const std::string &option);
 // Sends the library's log there; to be called before the library is.
 void choose_log(const std::string &option);
 
-// Why the log is incomplete, which the library does not report; empty if it is complete.
+// Why the log of --log is incomplete, which the library does not report; empty if it is not.
+// An item that reports has its run's log, and cannot help it.
 std::string log_loss();
 
 } // namespace fptest

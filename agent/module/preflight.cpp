@@ -118,7 +118,9 @@ void require_programs(const std::vector<std::string> &items, int vendor, bool fo
         if (is_gatherer(item, vendor)) {
             has_gatherer = true;
         } else {
-            programs.push_back(program);
+            for (const int any : {0, 1, 2}) { // the vendor may have been another one
+                programs.push_back(program_of(item, *vendor_suffix(any)));
+            }
         }
         if (is_plain_name(item) && access(program.c_str(), X_OK) != 0 &&
             std::ranges::find(missing, program) == missing.end()) {
@@ -145,11 +147,13 @@ void require_programs(const std::vector<std::string> &items, int vendor, bool fo
 std::string other_gatherer(const std::vector<std::string> &args, const std::string &suffix)
 {
     const std::string program = program_of(kGatherer, suffix);
-    const auto running = process_of_any({program});
-    if (!running) {
+    const auto running = process_of_any(
+        {program_of(kGatherer, *vendor_suffix(0)), program_of(kGatherer, *vendor_suffix(1))});
+    std::string started =
+        running ? read_file(fmt::format("/proc/{}/cmdline", running->second)).value_or("") : "";
+    if (!running || !started.starts_with(running->first)) { // the library finds no script
         return {};
     }
-    std::string started = read_file(fmt::format("/proc/{}/cmdline", running->second)).value_or("");
     started.erase(started.find_last_not_of('\0') + 1);
     std::ranges::replace(started, '\0', ' ');
     const bool is_other = std::ranges::any_of(args, [&](const std::string &one) {

@@ -7,6 +7,8 @@
 #include "util/files.h"
 
 #include <algorithm>
+#include <array>
+#include <cctype>
 #include <charconv>
 #include <csignal>
 #include <cstdlib>
@@ -16,6 +18,7 @@
 #include <map>
 #include <optional>
 #include <system_error>
+#include <unistd.h>
 
 namespace fptest
 {
@@ -25,14 +28,17 @@ namespace
 struct Process {
     pid_t parent = 0;
     pid_t group = 0;
+    unsigned long long born = 0;
     char state = '?';
     std::string program; // argv[0], or the kernel's name for it
     std::string name;    // without the path
-    std::string script;  // the shell's first argument that is no option
+    std::string script;  // that an interpreter runs: its first argument that is no option
     bool gathers = false;
 };
 
 using Processes = std::map<pid_t, Process>;
+
+constexpr std::size_t kKernelsName = 15; // characters; of a script it is the script's
 
 std::string last_part(const std::string &path)
 {
@@ -51,17 +57,24 @@ std::optional<Process> read_process(const std::filesystem::path &directory)
     process.state = stat[close + 2];
     char *end = nullptr;
     process.parent = static_cast<pid_t>(std::strtol(stat.c_str() + close + 3, &end, 10));
-    process.group = static_cast<pid_t>(std::strtol(end, nullptr, 10));
+    process.group = static_cast<pid_t>(std::strtol(end, &end, 10));
+    for (int field = 5; field < 22; ++field) {
+        process.born = std::strtoull(end, &end, 10);
+    }
     const std::string arguments = read_file(directory / "cmdline").value_or("");
     const std::string command = arguments.c_str();
     process.program = command.empty() ? stat.substr(open + 1, close - open - 1) : command;
     process.name = last_part(process.program);
-    if (process.name.ends_with("sh")) {
-        std::size_t at = command.size() + 1;
-        while (at < arguments.size() && arguments[at] == '-') { // its options
-            at += std::strlen(&arguments[at]) + 1;
-        }
-        process.script = at < arguments.size() ? &arguments[at] : "";
+    std::size_t at = command.size() + 1;
+    while (at < arguments.size() && arguments[at] == '-') { // options
+        at += std::strlen(&arguments[at]) + 1;
+    }
+    const std::string script = at < arguments.size() ? &arguments[at] : "";
+    constexpr std::array kShells{"sh", "mksh", "ksh", "ash", "dash", "bash"};
+    const std::string kernels_name = stat.substr(open + 1, close - open - 1);
+    if (std::ranges::find(kShells, process.name) != kShells.end() ||
+        (!script.empty() && last_part(script).substr(0, kKernelsName) == kernels_name)) {
+        process.script = script;
     }
     return process;
 }
@@ -112,9 +125,9 @@ bool is_below(const Processes &processes, pid_t pid, pid_t ancestor)
                     [ancestor](const auto &entry) { return entry.second.parent == ancestor; });
 }
 
-// All processes except the ancestor and its own ancestors: fptest's caller may be named like
-// a gatherer. The other vendor's gatherer counts only if an earlier run left it.
-Processes read_processes(pid_t ancestor, int vendor)
+// All processes except the ancestor and its own ancestors: fptest's caller may have any
+// name.
+Processes read_others(pid_t ancestor)
 {
     Processes processes = read_processes();
     for (auto found = processes.find(ancestor); found != processes.end();) {
@@ -122,11 +135,29 @@ Processes read_processes(pid_t ancestor, int vendor)
         processes.erase(found);
         found = processes.find(parent);
     }
+    return processes;
+}
+
+// A program that has run another one, or has changed its arguments, is the gatherer
+// still: "/system/bin/SensorProbe.real", "/system/bin/SensorProbe: idle".
+bool continues(const std::string &program, const std::string &gatherer)
+{
+    return program.starts_with(gatherer) && program.size() > gatherer.size() &&
+           std::isalnum(static_cast<unsigned char>(program[gatherer.size()])) == 0 &&
+           program[gatherer.size()] != '_';
+}
+
+// Marks the gatherers. An earlier run may have left one of another vendor; among the
+// processes of this run an item may have a name that begins as the gatherer's.
+Processes read_family(pid_t ancestor, int vendor)
+{
+    Processes processes = read_others(ancestor);
     for (const int one : {0, 1}) {
         const std::string program = program_of(kGatherer, *vendor_suffix(one));
         for (auto &[pid, process] : processes) {
-            if ((process.program == program || process.script == program) &&
-                (one == vendor || !is_below(processes, pid, ancestor))) {
+            const bool is_exact = process.program == program || process.script == program;
+            if ((is_exact && one == vendor) || ((is_exact || continues(process.program, program)) &&
+                                                !is_below(processes, pid, ancestor))) {
                 process.gathers = true;
             }
         }
@@ -155,29 +186,19 @@ std::vector<Leftover> leftovers(const Processes &processes, pid_t left_out,
     std::vector<Leftover> all;
     for (const auto &[pid, process] : processes) {
         if (lives(process) && pid != left_out && predicate(pid, process)) {
-            all.push_back({process.name, pid, process.group});
+            all.push_back({process.name, pid, process.group, process.born});
         }
     }
     return all;
 }
 
-template <typename Predicate>
-std::optional<std::pair<std::string, pid_t>> find_program(const Predicate &predicate)
+// As ps lists it and grep finds it.
+bool is_found_as_gatherer(const Process &process)
 {
-    for (const auto &[pid, process] : read_processes()) {
-        if (lives(process) && predicate(process.program)) {
-            return std::pair(process.program, pid);
-        }
-    }
-    return std::nullopt;
+    return lives(process) && process.program.starts_with(program_of(kGatherer, ""));
 }
 
 } // namespace
-
-bool is_taken_for_gatherer(const Leftover &process)
-{
-    return process.name.starts_with(kGatherer);
-}
 
 bool runs_below(pid_t ancestor, const std::vector<std::string> &items)
 {
@@ -208,21 +229,35 @@ std::optional<pid_t> met_by_stop(const std::string &item)
 std::optional<std::pair<std::string, pid_t>>
 process_of_any(const std::vector<std::string> &programs)
 {
-    return find_program([&](const std::string &program) {
-        return std::ranges::find(programs, program) != programs.end();
-    });
+    for (const auto &[pid, process] : read_others(getpid())) {
+        for (const std::string &program : {process.program, process.script}) {
+            if (lives(process) && std::ranges::find(programs, program) != programs.end()) {
+                return std::pair(program, pid);
+            }
+        }
+    }
+    return std::nullopt;
 }
 
-std::optional<std::pair<std::string, pid_t>> taken_for_gatherer()
+bool is_found_as_gatherer(pid_t process)
 {
-    return find_program([gatherer = program_of(kGatherer, "")](const std::string &program) {
-        return program.starts_with(gatherer);
-    });
+    const auto found = read_process(fmt::format("/proc/{}", process));
+    return found && is_found_as_gatherer(*found);
+}
+
+std::optional<std::pair<std::string, pid_t>> found_as_gatherer()
+{
+    for (const auto &[pid, process] : read_processes()) {
+        if (is_found_as_gatherer(process)) {
+            return std::pair(process.program, pid);
+        }
+    }
+    return std::nullopt;
 }
 
 std::vector<Leftover> ChildProcesses::of_items(const std::vector<Leftover> &left_out) const
 {
-    const Processes processes = read_processes(ancestor_, vendor_);
+    const Processes processes = read_family(ancestor_, vendor_);
     return leftovers(processes, library_, [&](pid_t pid, const Process &process) {
         return process.group != library_ && is_below(processes, pid, ancestor_) &&
                !comes_of_gatherer(processes, pid) && !comes_of_any(processes, pid, left_out);
@@ -231,7 +266,7 @@ std::vector<Leftover> ChildProcesses::of_items(const std::vector<Leftover> &left
 
 std::vector<Leftover> ChildProcesses::of_gatherer() const
 {
-    const Processes processes = read_processes(ancestor_, vendor_);
+    const Processes processes = read_family(ancestor_, vendor_);
     return leftovers(processes, library_, [&](pid_t pid, const Process &process) {
         return comes_of_gatherer(processes, pid) ||
                (process.group == library_ && is_below(processes, pid, ancestor_));
@@ -240,7 +275,7 @@ std::vector<Leftover> ChildProcesses::of_gatherer() const
 
 void ChildProcesses::signal_all(int signal) const
 {
-    const Processes processes = read_processes(ancestor_, vendor_);
+    const Processes processes = read_family(ancestor_, vendor_);
     const auto all = leftovers(processes, library_, [&](pid_t pid, const Process & /* process */) {
         return is_below(processes, pid, ancestor_) || comes_of_gatherer(processes, pid);
     });
@@ -261,6 +296,12 @@ bool ask_to_end(const std::vector<Leftover> &processes)
     const bool found = signal_each(processes, SIGTERM);
     signal_each(processes, SIGCONT);
     return found;
+}
+
+bool lives(const Leftover &process)
+{
+    const auto found = read_process(fmt::format("/proc/{}", process.process));
+    return found && lives(*found) && found->born == process.born;
 }
 
 char state_of(pid_t process)

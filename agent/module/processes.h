@@ -16,10 +16,10 @@
 namespace fptest
 {
 
-// Whether the library takes this process for a running gatherer.
-bool is_taken_for_gatherer(const Leftover &process);
-// Any such process, started by its whole path.
-std::optional<std::pair<std::string, pid_t>> taken_for_gatherer();
+// Whether the library takes this process for a running gatherer; and the first that it takes
+// for one, with its whole path.
+bool is_found_as_gatherer(pid_t process);
+std::optional<std::pair<std::string, pid_t>> found_as_gatherer();
 
 // Whether a stop would find a process by one of these names, of which it gives ps the first
 // characters.
@@ -63,6 +63,9 @@ bool signal_each(const std::vector<Leftover> &processes, int signal);
 
 // As signal_each() with SIGTERM, which reaches suspended ones as well.
 bool ask_to_end(const std::vector<Leftover> &processes);
+
+// Whether it has not ended.
+bool lives(const Leftover &process);
 
 // "D", "S", ...: the state of a process as ps shows it; '?' if it is gone.
 char state_of(pid_t process);

@@ -10,6 +10,7 @@
 #include <array>
 #include <filesystem>
 #include <iterator>
+#include <string_view>
 #include <sys/inotify.h>
 #include <unistd.h>
 #include <utility>
@@ -20,6 +21,8 @@ namespace
 {
 
 constexpr std::size_t kSeen = 100; // reports kept for an item
+constexpr std::string_view kPlanName =
+    std::string_view(kStoredPlan).substr(std::string_view(kStoredPlan).rfind('/') + 1);
 
 // mend_stored_plan() leaves an empty result for one without a value.
 ItemReport report_of(const Plan &plan, std::size_t number)
@@ -75,16 +78,18 @@ ReportReader::ReportReader(Run &run, const std::vector<Listener *> &listeners, R
 
 void ReportReader::poll()
 {
-    std::array<char, 4096> events{};
-    while (::read(saves_.get(), events.data(), events.size()) > 0) {
-    }
+    is_saved_ = take_saves() || is_saved_;
     const auto status = stored_plan_status();
     if ((running_.items.empty() && judged_.empty()) || !status ||
-        (status->st_mtim.tv_sec == plan_status_.st_mtim.tv_sec &&
+        std::chrono::steady_clock::now() < next_look_ ||
+        (!is_saved_ && status->st_mtim.tv_sec == plan_status_.st_mtim.tv_sec &&
          status->st_mtim.tv_nsec == plan_status_.st_mtim.tv_nsec &&
          status->st_size == plan_status_.st_size && status->st_ino == plan_status_.st_ino)) {
         return;
     }
+    // a large plan that is saved all the time takes no more than half of a core
+    const auto begin = std::chrono::steady_clock::now();
+    is_saved_ = false;
     const std::string text = read_stored_plan().value_or("");
     if (const auto plan = Plan::parse_annotated(text)) {
         plan_status_ = *status;
@@ -95,6 +100,24 @@ void ReportReader::poll()
             mend_stored_plan(); // or nobody else could report
         }
     }
+    const auto end = std::chrono::steady_clock::now();
+    next_look_ = end + (end - begin);
+}
+
+// Whether the plan has been saved since. Two saves in one tick of the clock of files may
+// leave the same time and size.
+bool ReportReader::take_saves()
+{
+    alignas(inotify_event) std::array<char, 4096> told{};
+    bool found = false;
+    for (ssize_t got = 0; (got = ::read(saves_.get(), told.data(), told.size())) > 0;) {
+        for (std::size_t at = 0; at < static_cast<std::size_t>(got);) {
+            const auto *event = reinterpret_cast<const inotify_event *>(&told[at]);
+            found = found || kPlanName == event->name;
+            at += sizeof *event + event->len;
+        }
+    }
+    return found;
 }
 
 void ReportReader::read(const std::optional<Plan> &plan)
@@ -188,12 +211,12 @@ void ReportReader::report_late(const Place &place, bool gathers, int round,
     }
 }
 
-void ReportReader::note_gathered(const std::string &text)
+void ReportReader::note_gathered(const std::string &text, int vendor)
 {
     const auto plan = Plan::parse_annotated(text);
     for (std::size_t number = 0; plan && number < plan->elements().size(); ++number) {
         const char *name = mxmlElementGetAttr(plan->elements()[number], "name");
-        if (name != nullptr && is_gatherer(name, run_.vendor)) {
+        if (name != nullptr && is_gatherer(name, vendor)) {
             note_gathered(report_of(*plan, number));
         }
     }

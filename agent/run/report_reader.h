@@ -27,7 +27,7 @@ class ReportReader
     ReportReader(Run &run, const std::vector<Listener *> &listeners, RunningJob &running);
 
     // What a plan that is about to be replaced says of gatherers, which may have a copy.
-    void note_gathered(const std::string &text);
+    void note_gathered(const std::string &text, int vendor);
 
     // Readable once somebody has saved the plan, so that two changes are not taken for one;
     // -1 if the system does not report them.
@@ -65,6 +65,7 @@ class ReportReader
         std::vector<ItemReport> seen; // an old copy of the plan may bring one of them back
     };
 
+    bool take_saves();
     void read_report(RunningItem &active, const Plan &plan);
     void read_late_report(Judged &judged, const Plan &plan);
     bool is_stale(RunningItem &active, const Plan &plan, const ItemReport &report);
@@ -80,6 +81,8 @@ class ReportReader
     int gathered_in_ = 0;              // the round of the last gathering
     bool marks_are_gone_ = false;      // from items' elements
     unsigned poll_count_ = 1;
+    bool is_saved_ = false; // and not read since
+    std::chrono::steady_clock::time_point next_look_;
     struct stat plan_status_ {
     };
     std::chrono::nanoseconds changed_{}; // of the plan that poll() read, by the file's clock

@@ -258,15 +258,14 @@ void Runner::poll_gatherer(RunningItem &active)
         return;
     }
     active.gatherer_looked_for = now();
-    active.gatherer_missed =
-        library_.processes().of_gatherer().empty() ? active.gatherer_missed + 1 : 0;
+    active.gatherer_missed = note_gatherer() ? 0 : active.gatherer_missed + 1;
     if (active.gatherer_missed < 2 || now() - active.start < kBeforeMissed) {
         return;
     }
     active.gatherer_end = active.moved_on ? "the gatherer ended before it had reported"
                                           : "the gatherer ended before it connected";
     if (!active.moved_on) {
-        if (const auto other = taken_for_gatherer()) {
+        if (const auto other = found_as_gatherer()) {
             active.gatherer_end += fmt::format(", or the library took {} (pid {}) for it",
                                                one_line(other->first), other->second);
         }
@@ -411,7 +410,7 @@ void Runner::finish(RunningItem &active, TimePoint end)
     }
     if (active.gathers && !has_finished(result.report)) {
         gatherer_may_report_late_ = true;
-        signal_each(library_.processes().of_gatherer(), SIGTERM);
+        signal_each(gatherer_processes(), SIGTERM);
     }
     reader_.watch_for_late_reports(active);
     mend_stored_plan();

@@ -37,7 +37,7 @@ class Runner
     // The stored plan before the run, of which a gatherer may have kept a copy.
     void note_earlier_plan(const std::string &text)
     {
-        reader_.note_gathered(text);
+        reader_.note_gathered(text, vendor_);
     }
 
     // Runs a job and fills in its items. False if the run is over; the run says why.
@@ -71,7 +71,7 @@ class Runner
     using SteadyClock = std::chrono::steady_clock;
     using TimePoint = RunningItem::TimePoint;
 
-    static constexpr std::chrono::milliseconds kTurn{25}; // between two polls of the plan
+    static constexpr std::chrono::milliseconds kTurn{25}; // at most, between two polls
     static constexpr std::size_t kNoElement = static_cast<std::size_t>(-1);
 
     TimePoint now() const;
@@ -99,7 +99,9 @@ class Runner
     void end_stop(const LibraryProcess::Event &event);
     void cannot_stop(RunningItem &active);
     std::vector<Leftover> item_processes() const;
-    std::vector<Leftover> processes_of(const RunningItem &active) const;
+    std::vector<Leftover> processes_of(const RunningItem &active);
+    bool note_gatherer();
+    std::vector<Leftover> gatherer_processes();
     std::vector<Leftover> note_left_running(std::size_t element);
     void end_left_running();
     void end_gatherer();
@@ -116,6 +118,7 @@ class Runner
     RunningJob running_;
     ReportReader reader_;
     std::vector<Leftover> left_;             // by items of this round
+    std::vector<Leftover> gatherers_;        // also helpers that outlive the gatherer
     std::vector<std::size_t> left_elements_; // the items' elements
     SteadyClock::duration suspended_{};
     TimePoint last_suspension_;

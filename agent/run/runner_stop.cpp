@@ -182,7 +182,7 @@ void Runner::stop_gatherer(RunningItem &active)
         active.was_stopped = true;
         release_command();
     }
-    const std::vector<Leftover> left = library_.processes().of_gatherer();
+    const std::vector<Leftover> left = gatherer_processes();
     if (!is_last && !active.was_stopped && ask_to_end(left)) {
         active.was_stopped = true;
     }
@@ -231,9 +231,28 @@ std::vector<Leftover> Runner::item_processes() const
     return library_.processes().of_items(left_);
 }
 
-std::vector<Leftover> Runner::processes_of(const RunningItem &active) const
+// Whether the gatherer runs. What comes of it is known from then on.
+bool Runner::note_gatherer()
 {
-    return active.gathers ? library_.processes().of_gatherer() : item_processes();
+    std::erase_if(gatherers_, [](const Leftover &one) { return !lives(one); });
+    const std::vector<Leftover> found = library_.processes().of_gatherer();
+    for (const Leftover &one : found) {
+        if (std::ranges::find(gatherers_, one.process, &Leftover::process) == gatherers_.end()) {
+            gatherers_.push_back(one);
+        }
+    }
+    return !found.empty();
+}
+
+std::vector<Leftover> Runner::gatherer_processes()
+{
+    note_gatherer();
+    return gatherers_;
+}
+
+std::vector<Leftover> Runner::processes_of(const RunningItem &active)
+{
+    return active.gathers ? gatherer_processes() : item_processes();
 }
 
 std::vector<Leftover> Runner::note_left_running(std::size_t element)
@@ -290,17 +309,18 @@ void Runner::make_way_for(const Job &job)
         return target && is_gatherer(run_.suites[job.suite].items[target->item].name, vendor_);
     };
     if (std::ranges::any_of(job.targets, is_gatherers)) {
-        if (std::ranges::any_of(library_.processes().of_items(), is_taken_for_gatherer)) {
-            end_left_running(); // the library would start no gatherer beside it
-        }
-        reader_.note_gathered(read_stored_plan().value_or(""));
-        // the library does not see one that is a script, and would start another beside it
-        const std::vector<Leftover> running = library_.processes().of_gatherer();
-        if (gatherer_may_report_late_ ||
-            (!running.empty() && std::ranges::none_of(running, is_taken_for_gatherer))) {
+        end_all([this] { // or the library would start no gatherer beside them
+            auto left = library_.processes().of_items();
+            std::erase_if(left, [](const auto &one) { return !is_found_as_gatherer(one.process); });
+            return left;
+        });
+        reader_.note_gathered(read_stored_plan().value_or(""), vendor_);
+        // the library does not find one that is a script, and would start another beside it
+        const std::vector<Leftover> running = gatherer_processes();
+        if (gatherer_may_report_late_ || (!running.empty() && !found_as_gatherer())) {
             end_gatherer();
         }
-        gatherer_runs_ = !library_.processes().of_gatherer().empty();
+        gatherer_runs_ = note_gatherer();
         require_trigger_port(); // an item may have taken it
     }
     reader_.poll();
@@ -329,7 +349,7 @@ void Runner::end_left_running()
 
 void Runner::end_gatherer()
 {
-    end_all([this] { return library_.processes().of_gatherer(); });
+    end_all([this] { return gatherer_processes(); });
     gatherer_may_report_late_ = false;
 }
 

@@ -251,6 +251,12 @@ TEST_F(Report, SaysThatTheDiskIsFull)
                       std::string(2000, 'd')})
                   .status,
               0);
+    // that the run's log has no room is not the item's concern
+    EXPECT_EQ(run_program({"/system/bin/sh", "-c",
+                           "VR_LOG_FILE=/data/vorlane/log exec fptest report Bringup SpiCheck "
+                           "--progress 1 --result 0"})
+                  .status,
+              0);
 }
 
 TEST_F(Report, WritesTheLibrarysLogWhereItIsTold)

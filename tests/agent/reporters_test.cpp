@@ -85,8 +85,7 @@ TEST_F(Reports, AreReadableAndUnfinishedWhereTheRunWasCutOff)
     for (int round = 0; round < 100 && !HasFailure(); ++round) {
         const RunOfItems run = random_run(random);
         const std::size_t stop = random() % 6;
-        const auto play_a_part = [&](Listener &report) {
-            Playback playback(report, run);
+        const auto play_a_part = [&](Playback &playback) {
             playback.begin();
             for (std::size_t suite = 0; suite < run.suites.size() && suite < stop; ++suite) {
                 for (std::size_t at = 0; at < run.suites[suite].items.size() && at < stop; ++at) {
@@ -97,19 +96,27 @@ TEST_F(Reports, AreReadableAndUnfinishedWhereTheRunWasCutOff)
                 }
             }
         };
-        play_a_part(*json_report(path("json")));
-        EXPECT_TRUE(events(events_of(read_file(path("json"))), "finish").empty());
-        play_a_part(*junit_report(path("xml")));
-        for (const Element &group : parse_xml(read_file(path("xml"))).all("testsuite")) {
+        EXPECT_TRUE(events_of(json_of(run, play_a_part), "finish").empty());
+        for (const Element &group : parse_xml(junit_of(run, play_a_part)).all("testsuite")) {
             if (group.attributes.at("name") != "end of the run") {
                 EXPECT_EQ(group.properties().at("finished"), "false");
             }
         }
-        play_tap(play_a_part);
-        const Tap tap = parse_tap(read_file(path("tap")));
+        const Tap tap = parse_tap(tap_of(run, play_a_part));
         EXPECT_EQ(tap.planned, run.suites.size());
         EXPECT_TRUE(tap.comments.empty());
     }
+}
+
+TEST_F(Reports, TellOfAResultWithoutAValueByAnEmptyText)
+{
+    ItemRun one = item("a", Outcome::failed);
+    one.report.result_without_value = true;
+    const RunOfItems run = run_of({suite("G", {one})});
+    EXPECT_EQ(events_of(json_of(run), "end").at(0).at("result"), "");
+    EXPECT_EQ(parse_tap(tap_of(run)).points.at(0).inside.at(0).diagnosis.at("result"), "");
+    EXPECT_EQ(parse_xml(junit_of(run)).children.at(0).all("testcase").at(0).properties(),
+              (Attributes{{"result", ""}}));
 }
 
 TEST(Counts, TakeEveryOtherOutcomeForFailed)

@@ -6,6 +6,7 @@
 
 #include "playback.h"
 #include "reporters/reporters.h"
+#include "reporters/views.h"
 #include "support/process.h"
 #include "support/reports.h"
 #include "support/temporary_directory.h"
@@ -14,12 +15,10 @@
 #include <gmock/gmock.h>
 #include <nlohmann/json.hpp>
 
-#include <algorithm>
 #include <csignal>
 #include <cstdio>
 #include <cstdlib>
 #include <functional>
-#include <iterator>
 #include <map>
 #include <memory>
 #include <string>
@@ -115,14 +114,6 @@ inline RunOfItems run_with(const std::string &text)
 
 // --- reading -----------------------------------------------------------------
 
-inline std::vector<Json> events(const std::vector<Json> &lines, const std::string &name)
-{
-    std::vector<Json> found;
-    std::copy_if(lines.begin(), lines.end(), std::back_inserter(found),
-                 [&](const Json &line) { return line.at("event") == name; });
-    return found;
-}
-
 inline ino_t inode(const std::string &path)
 {
     struct stat status {
@@ -147,41 +138,55 @@ class Reports : public ::testing::Test
         return directory_.path(name);
     }
 
-    std::string json_of(const RunOfItems &run) const
+    // What each writes of a run that happens so.
+    using How = std::function<void(Playback &)>;
+    std::string json_of(const RunOfItems &run, const How &how = play_all) const
     {
-        play(*json_report(path("json")), run);
-        return read_file(path("json"));
+        return left_by(*json_report(path("json")), "json", run, how);
     }
-    std::vector<Json> json_lines_of(const RunOfItems &run) const
+    std::string junit_of(const RunOfItems &run, const How &how = play_all) const
     {
-        return events_of(json_of(run));
+        return left_by(*junit_report(path("xml")), "xml", run, how);
     }
-    std::string junit_of(const RunOfItems &run) const
+    std::string tap_of(const RunOfItems &run, const How &how = play_all) const
     {
-        play(*junit_report(path("xml")), run);
-        return read_file(path("xml"));
+        const Stream stream = open_stream("tap");
+        return left_by(*tap_report(stream.get()), "tap", run, how);
     }
-    std::string tap_of(const RunOfItems &run) const
+    std::string plain_of(const RunOfItems &run, const How &how = play_all, bool quiet = false) const
     {
-        play_tap([&](Listener &tap) { play(tap, run); });
-        return read_file(path("tap"));
+        const Stream stream = open_stream("plain");
+        return left_by(*plain_view(stream.get(), quiet), "plain", run, how);
     }
 
-    void play_tap(const std::function<void(Listener &)> &what) const
+    static void play_all(Playback &playback)
     {
-        const Stream stream(std::fopen(path("tap").c_str(), "w"), &std::fclose);
-        ASSERT_NE(stream, nullptr);
-        what(*tap_report(stream.get()));
+        playback.play();
     }
 
     using Stream = std::unique_ptr<std::FILE, decltype(&std::fclose)>;
+    Stream open_stream(const std::string &name) const
+    {
+        return {std::fopen(path(name).c_str(), "w"), &std::fclose};
+    }
 
     TemporaryDirectory directory_;
+
+  private:
+    std::string left_by(Listener &report, const std::string &name, const RunOfItems &run,
+                        const How &how) const
+    {
+        Playback playback(report, run);
+        how(playback);
+        EXPECT_EQ(report.failure(), "");
+        return read_file(path(name));
+    }
 };
 
 using JsonReport = Reports;
 using JunitReport = Reports;
 using TapReport = Reports;
+using RoundReports = Reports;
 
 // Its exit status, or minus the signal.
 inline int in_a_child(const std::function<void()> &what)

@@ -2,30 +2,12 @@
 // SPDX-License-Identifier: Apache-2.0
 
 // What reports say of rounds, of breaks, and of how items ended.
-#include "playback.h"
-#include "reporters/reporters.h"
-#include "reporters/views.h"
 #include "reporters/wording.h"
-#include "support/reports.h"
-#include "support/temporary_directory.h"
+#include "reporters_test.h"
 
-#include <gmock/gmock.h>
-#include <nlohmann/json.hpp>
-
-#include <array>
-#include <csignal>
-#include <fcntl.h>
-#include <functional>
-#include <memory>
-#include <sys/stat.h>
 #include <thread>
-#include <unistd.h>
 
-using namespace playback;
-using namespace support;
-using namespace std::chrono_literals;
-using namespace testing;
-using Json = nlohmann::json;
+using namespace reporters_test;
 
 namespace
 {
@@ -47,65 +29,23 @@ RunOfItems interrupted(RunOfItems run)
     return run;
 }
 
-class RoundReports : public Test
+// Two rounds and the first item of a third.
+void play_into_third(Playback &playback)
 {
-  protected:
-    void SetUp() override
-    {
-        unsetenv("HARNESS_ACTIVE");
-        std::signal(SIGPIPE, SIG_IGN);
-    }
+    playback.begin();
+    playback.play_round();
+    playback.begin_next_round();
+    playback.play_round();
+    playback.begin_next_round();
+    playback.run_item({0, 0});
+}
 
-    // Two rounds and the first item of a third.
-    static void play_into_third(Playback &playback)
-    {
-        playback.begin();
-        playback.play_round();
-        playback.begin_next_round();
-        playback.play_round();
-        playback.begin_next_round();
-        playback.run_item({0, 0});
-    }
-
-    std::string path(const std::string &name) const
-    {
-        return directory_.path(name);
-    }
-
-    using Stream = std::unique_ptr<std::FILE, decltype(&std::fclose)>;
-
-    // What is written to a stream.
-    std::string written(const std::function<void(std::FILE *)> &what) const
-    {
-        const Stream stream(std::fopen(path("stream").c_str(), "w"), &std::fclose);
-        what(stream.get());
-        return read_file(path("stream"));
-    }
-
-    std::string tap(const RunOfItems &run, const std::function<void(Playback &)> &what) const
-    {
-        return written([&](std::FILE *stream) {
-            const auto report = tap_report(stream);
-            Playback playback(*report, run);
-            what(playback);
-        });
-    }
-
-    std::string plain(const RunOfItems &run, const std::function<void(Playback &)> &what) const
-    {
-        return written([&](std::FILE *stream) {
-            const auto view = plain_view(stream, false);
-            Playback playback(*view, run);
-            what(playback);
-        });
-    }
-
-    TemporaryDirectory directory_;
-};
-
-void play_one(Playback &playback)
+// Of a million rounds.
+void play_until_interrupted(Playback &playback)
 {
-    playback.play();
+    play_into_third(playback);
+    playback.end_as(interrupted(two_items(1'000'000)));
+    playback.finish();
 }
 
 void play_two(Playback &playback)
@@ -117,28 +57,20 @@ void play_two(Playback &playback)
 
 TEST_F(RoundReports, NumberTheEventsOfAllRoundsInJson)
 {
-    const auto report = json_report(path("json"));
-    Playback playback(*report, two_items(3));
-    play_into_third(playback);
+    const std::string text = json_of(two_items(3), play_into_third);
     std::vector<std::string> ends;
-    for (const Json &end : events_of(read_file(path("json")), "end")) {
+    for (const Json &end : events_of(text, "end")) {
         ends.push_back(std::to_string(end.at("index").get<int>()) + " " +
                        end.at("item").get<std::string>() + " " +
                        std::to_string(end.at("round").get<int>()));
     }
     EXPECT_THAT(ends, ElementsAre("0 a 1", "1 b 1", "2 a 2", "3 b 2", "4 a 3"));
-    EXPECT_EQ(events_of(read_file(path("json")), "run").at(0).at("items").size(), 2U);
+    EXPECT_EQ(events_of(text, "run").at(0).at("items").size(), 2U);
 }
 
 TEST_F(RoundReports, EndTheRestOfABrokenRoundAndCountTheOthersInJson)
 {
-    const RunOfItems run = two_items(1'000'000);
-    const auto report = json_report(path("json"));
-    Playback playback(*report, run);
-    play_into_third(playback);
-    playback.end_as(interrupted(run));
-    playback.finish();
-    const std::string text = read_file(path("json"));
+    const std::string text = json_of(two_items(1'000'000), play_until_interrupted);
     EXPECT_EQ(events_of(text, "end").size(), 6U);
     const Json last = events_of(text, "end").back();
     EXPECT_EQ(last.at("index"), 5);
@@ -155,9 +87,7 @@ TEST_F(RoundReports, SayInJsonWhatEndsTheRun)
     run.time_limit = 7200;
     run.until_fail = true;
     run.why_ended = "H/b did not pass (--until-fail)";
-    const auto report = json_report(path("json"));
-    Playback(*report, run).play();
-    const std::string text = read_file(path("json"));
+    const std::string text = json_of(run);
     const Json begin = events_of(text, "run").at(0);
     EXPECT_EQ(begin.at("rounds"), Json());
     EXPECT_EQ(begin.at("time_limit"), 7200.0);
@@ -169,7 +99,7 @@ TEST_F(RoundReports, SayInJsonWhatEndsTheRun)
 
 TEST_F(RoundReports, PlanAllRoundsInFrontWhereTapKnowsTheirNumber)
 {
-    const std::string text = tap(two_items(2), play_two);
+    const std::string text = tap_of(two_items(2), play_two);
     const Tap read = parse_tap(text);
     EXPECT_THAT(text, StartsWith("TAP version 14\n1..4\n"));
     std::vector<std::string> names;
@@ -187,7 +117,7 @@ TEST_F(RoundReports, PlanTheRoundsAtTheEndWhereTapDoesNotKnowTheirNumber)
 {
     RunOfItems run = two_items(std::nullopt);
     run.time_limit = 3600;
-    const std::string text = tap(run, play_two);
+    const std::string text = tap_of(run, play_two);
     EXPECT_THAT(text, StartsWith("TAP version 14\n# Subtest: G (round 1)\n"));
     EXPECT_THAT(text, HasSubstr("not ok 4 - H (round 2)\n1..4\n# ITEM"));
     EXPECT_EQ(parse_tap(text).planned, 4U);
@@ -198,22 +128,17 @@ TEST_F(RoundReports, PlanTheRoundsAtTheEndWhereTapDoesNotKnowTheirNumber)
 
 TEST_F(RoundReports, SkipTheRestOfABrokenRoundInTap)
 {
-    const RunOfItems run = two_items(1'000'000);
-    const std::string text = tap(run, [&run](Playback &playback) {
-        play_into_third(playback);
-        playback.end_as(interrupted(run));
-        playback.finish();
-    });
-    EXPECT_THAT(text, EndsWith("ok 5 - G (round 3)\n"
-                               "# Subtest: H (round 3)\n"
-                               "    1..1\n"
-                               "    ok 1 - b # SKIP not run: interrupted by SIGTERM\n"
-                               "ok 6 - H (round 3) # SKIP not run: interrupted by SIGTERM\n"
-                               "# ITEM  PASSED    LEAST   MEDIAN  LONGEST\n"
-                               "# G/a   3 of 3  0.301 s  0.301 s  0.301 s\n"
-                               "# H/b   0 of 2  0.301 s  0.301 s  0.301 s\n"
-                               "# 3 passed, 2 failed, 1999995 not run in 2.5 s\n"
-                               "Bail out!  interrupted by SIGTERM\n"));
+    EXPECT_THAT(tap_of(two_items(1'000'000), play_until_interrupted),
+                EndsWith("ok 5 - G (round 3)\n"
+                         "# Subtest: H (round 3)\n"
+                         "    1..1\n"
+                         "    ok 1 - b # SKIP not run: interrupted by SIGTERM\n"
+                         "ok 6 - H (round 3) # SKIP not run: interrupted by SIGTERM\n"
+                         "# ITEM  PASSED    LEAST   MEDIAN  LONGEST\n"
+                         "# G/a   3 of 3  0.301 s  0.301 s  0.301 s\n"
+                         "# H/b   0 of 2  0.301 s  0.301 s  0.301 s\n"
+                         "# 3 passed, 2 failed, 1999995 not run in 2.5 s\n"
+                         "Bail out!  interrupted by SIGTERM\n"));
 }
 
 // --- JUnit ----------------------------------------------------------------------
@@ -233,12 +158,11 @@ std::vector<std::string> verdicts(const Element &top)
 
 TEST_F(RoundReports, NameTheTestCasesOfEachRoundInJunit)
 {
-    const auto report = junit_report(path("xml"));
-    Playback playback(*report, two_items(4));
-    play_into_third(playback);
-    playback.play_round();
-    playback.finish();
-    const Element top = parse_xml(read_file(path("xml")));
+    const Element top = parse_xml(junit_of(two_items(4), [](Playback &playback) {
+        play_into_third(playback);
+        playback.play_round();
+        playback.finish();
+    }));
     EXPECT_THAT(verdicts(top), ElementsAre("G/a (round 1): passed", "H/b (round 1): failure",
                                            "G/a (round 2): passed", "H/b (round 2): failure",
                                            "G/a (round 3): passed", "H/b (round 3): failure"));
@@ -255,13 +179,7 @@ TEST_F(RoundReports, NameTheTestCasesOfEachRoundInJunit)
 
 TEST_F(RoundReports, TellTheRoundsThatHaveNotBegunAsOneErrorInJunit)
 {
-    const RunOfItems run = two_items(1'000'000);
-    const auto report = junit_report(path("xml"));
-    Playback playback(*report, run);
-    play_into_third(playback);
-    playback.end_as(interrupted(run));
-    playback.finish();
-    const Element top = parse_xml(read_file(path("xml")));
+    const Element top = parse_xml(junit_of(two_items(1'000'000), play_until_interrupted));
     EXPECT_THAT(verdicts(top), ElementsAre("G/a (round 1): passed", "H/b (round 1): failure",
                                            "G/a (round 2): passed", "H/b (round 2): failure",
                                            "G/a (round 3): passed", "H/b (round 3): not run",
@@ -280,10 +198,7 @@ TEST_F(RoundReports, TellTheRoundsThatHaveNotBegunAsOneErrorInJunit)
 
 TEST_F(RoundReports, AreRedInJunitFromTheFirstMomentOn)
 {
-    const auto report = junit_report(path("xml"));
-    Playback playback(*report, two_items(2));
-    playback.begin();
-    const Element top = parse_xml(read_file(path("xml")));
+    const Element top = parse_xml(junit_of(two_items(2), std::mem_fn(&Playback::begin)));
     EXPECT_THAT(verdicts(top), ElementsAre("G/a (round 1): not run", "H/b (round 1): not run",
                                            "rounds/round 2: not run"));
     EXPECT_EQ(top.attributes.at("errors"), "3");
@@ -295,9 +210,7 @@ TEST_F(RoundReports, AreRedInJunitWhereAnOpenRunIsCutOffBetweenItsRounds)
     run.time_limit = 3600;
     run.finished = false;
     run.why_unfinished = "interrupted by SIGTERM";
-    const auto report = junit_report(path("xml"));
-    Playback(*report, run).play();
-    const Element top = parse_xml(read_file(path("xml")));
+    const Element top = parse_xml(junit_of(run));
     EXPECT_EQ(verdicts(top).back(), "rounds/round 2: not run");
     EXPECT_EQ(top.attributes.at("tests"), "3");
     EXPECT_EQ(top.attributes.at("errors"), "1");
@@ -310,9 +223,7 @@ TEST_F(RoundReports, SkipWhatIsLeftAfterTheItemThatWasWaitedForInJunit)
     run.suites[1].items[0] = item("b", Outcome::not_run);
     run.suites[1].items[0].group = "H";
     run.why_ended = "G/a did not pass (--until-fail)";
-    const auto report = junit_report(path("xml"));
-    Playback(*report, run).play();
-    const Element top = parse_xml(read_file(path("xml")));
+    const Element top = parse_xml(junit_of(run));
     EXPECT_THAT(verdicts(top), ElementsAre("G/a (round 1): passed", "H/b (round 1): skipped"));
     EXPECT_EQ(top.attributes.at("errors"), "0");
     EXPECT_EQ(
@@ -356,9 +267,7 @@ RunOfItems crashed_run()
 
 TEST_F(RoundReports, TellInJsonHowAnItemEnded)
 {
-    const auto report = json_report(path("json"));
-    Playback(*report, crashed_run()).play();
-    const auto ends = events_of(read_file(path("json")), "end");
+    const auto ends = events_of(json_of(crashed_run()), "end");
     EXPECT_EQ(ends.at(0).at("exit_status"), Json());
     EXPECT_EQ(ends.at(0).at("signal"), "SIGSEGV");
     EXPECT_EQ(ends.at(0).at("left_running"),
@@ -370,9 +279,7 @@ TEST_F(RoundReports, TellInJsonHowAnItemEnded)
 
 TEST_F(RoundReports, TellInJunitHowAnItemEnded)
 {
-    const auto report = junit_report(path("xml"));
-    Playback(*report, crashed_run()).play();
-    const Element group = parse_xml(read_file(path("xml"))).children.at(0);
+    const Element group = parse_xml(junit_of(crashed_run())).children.at(0);
     const Element crash = group.all("testcase").at(0);
     EXPECT_EQ(crash.properties().at("signal"), "SIGSEGV");
     EXPECT_EQ(crash.properties().at("left_running"), "sh (pid 812), logcat (pid 815)");
@@ -386,7 +293,7 @@ TEST_F(RoundReports, TellInJunitHowAnItemEnded)
 
 TEST_F(RoundReports, TellInTapHowAnItemEnded)
 {
-    const Tap read = parse_tap(tap(crashed_run(), play_one));
+    const Tap read = parse_tap(tap_of(crashed_run()));
     EXPECT_EQ(
         read.points.at(0).inside.at(0).diagnosis,
         (std::map<std::string, std::string>{{"outcome", "failed"},
@@ -403,7 +310,7 @@ TEST_F(RoundReports, TellInTapHowAnItemEnded)
 
 TEST_F(RoundReports, ShowHowAnItemEnded)
 {
-    EXPECT_EQ(plain(crashed_run(), play_one),
+    EXPECT_EQ(plain_of(crashed_run()),
               "plans/demo.xml: 2 items, vendor 1\n"
               "G/a: failed, result 0, died by SIGSEGV, 0.3 s: chip answers\n"
               "    left running: sh (pid 812), logcat (pid 815)\n"
@@ -439,20 +346,14 @@ constexpr char kLate[] = "G/a: late report, result 0: of round 1␊really; it ch
 
 TEST_F(RoundReports, TellALateReportOnALineOfItsOwn)
 {
-    EXPECT_THAT(plain(two_items(1), play_with_a_late_report),
+    EXPECT_THAT(plain_of(two_items(1), play_with_a_late_report),
                 HasSubstr(std::string("\n") + kLate + "\nH/b: failed"));
-    EXPECT_EQ(parse_tap(tap(two_items(1), play_with_a_late_report)).comments.at(0), kLate);
+    EXPECT_EQ(parse_tap(tap_of(two_items(1), play_with_a_late_report)).comments.at(0), kLate);
 
-    const auto junit = junit_report(path("xml"));
-    Playback in_junit(*junit, two_items(1));
-    play_with_a_late_report(in_junit);
-    EXPECT_EQ(parse_xml(read_file(path("xml"))).children.at(0).properties().at("late_report"),
-              kLate);
+    const std::string junit = junit_of(two_items(1), play_with_a_late_report);
+    EXPECT_EQ(parse_xml(junit).children.at(0).properties().at("late_report"), kLate);
 
-    const auto json = json_report(path("json"));
-    Playback in_json(*json, two_items(1));
-    play_with_a_late_report(in_json);
-    Json late = events_of(read_file(path("json")), "late").at(0);
+    Json late = events_of(json_of(two_items(1), play_with_a_late_report), "late").at(0);
     late.erase("time");
     EXPECT_EQ(late, Json::parse(R"({"event": "late", "index": 0, "group": "G", "item": "a",
         "round": 1, "progress": "100", "result": "0", "description": "of round 1\nreally"})"));
@@ -493,7 +394,7 @@ TEST_F(RoundReports, EndAViewWithATableOfTheItems)
     const std::string long_name(100, 'n');
     RunOfItems run = run_of({suite("G", {passed(long_name), failed("b")})});
     run.rounds = 2;
-    const std::string text = plain(run, play_two);
+    const std::string text = plain_of(run, play_two);
     const std::string name = "G/" + std::string(40, 'n') + "...";
     EXPECT_THAT(text,
                 HasSubstr("\nITEM" + std::string(43, ' ') + "PASSED    LEAST   MEDIAN  LONGEST\n" +
@@ -506,37 +407,33 @@ TEST_F(RoundReports, AreQuietButForWhatIsWrong)
     ItemRun left = passed("b");
     left.left_running = {{"sh", 812}};
     const RunOfItems run = run_of({suite("G", {passed("a"), left, failed("c")})});
-    EXPECT_EQ(written([&run](std::FILE *stream) {
-                  const auto view = plain_view(stream, true);
-                  Playback(*view, run).play(2);
-              }),
-              "G/b: passed, result 0, 0.3 s: chip answers\n"
-              "    left running: sh (pid 812)\n"
-              "G/c: failed, result 1, 0.3 s: 3 dead pixels\n"
-              "    | row 7\n"
-              "    | row 9\n"
-              "G/b: passed, result 0, 0.3 s: chip answers\n"
-              "    left running: sh (pid 812)\n"
-              "G/c: failed, result 1, 0.3 s: 3 dead pixels\n"
-              "    | row 7\n"
-              "    | row 9\n");
+    EXPECT_EQ(plain_of(run, play_two, true), "G/b: passed, result 0, 0.3 s: chip answers\n"
+                                             "    left running: sh (pid 812)\n"
+                                             "G/c: failed, result 1, 0.3 s: 3 dead pixels\n"
+                                             "    | row 7\n"
+                                             "    | row 9\n"
+                                             "G/b: passed, result 0, 0.3 s: chip answers\n"
+                                             "    left running: sh (pid 812)\n"
+                                             "G/c: failed, result 1, 0.3 s: 3 dead pixels\n"
+                                             "    | row 7\n"
+                                             "    | row 9\n");
 }
 
 TEST_F(RoundReports, LeaveTheShellsLinesAloneAfterAPause)
 {
-    const std::string text = written([](std::FILE *stream) {
-        const auto view = live_view(stream, false);
-        Playback playback(*view, two_items(1));
-        playback.begin();
-        playback.start({0, 0});
-        playback.pause();
-        std::fputs("[1]+  Stopped\n$ fg\n", stream);
-        std::fflush(stream);
-        playback.resume();
-    });
+    const Stream stream = open_stream("live");
+    const auto view = live_view(stream.get(), false);
+    Playback playback(*view, two_items(1));
+    playback.begin();
+    playback.start({0, 0});
+    playback.pause();
+    std::fputs("[1]+  Stopped\n$ fg\n", stream.get());
+    std::fflush(stream.get());
+    playback.resume();
     const std::string frame = "  a        [        ]       0.0 s  running    -  \n"
                               "0 passed, 0 failed, 2 to go, 0.0 s";
-    EXPECT_THAT(text, EndsWith("G\n" + frame + "\n[1]+  Stopped\n$ fg\n" + frame))
+    EXPECT_THAT(read_file(path("live")),
+                EndsWith("G\n" + frame + "\n[1]+  Stopped\n$ fg\n" + frame))
         << "what was drawn before the pause is not erased after it";
 }
 
@@ -544,7 +441,7 @@ TEST_F(RoundReports, CutALineOfOutputThatIsTooLong)
 {
     ItemRun loud = failed("a");
     loud.output = std::string(60'000, 'x') + "\nshort\n";
-    const std::string text = plain(run_of({suite("G", {loud})}), play_one);
+    const std::string text = plain_of(run_of({suite("G", {loud})}));
     EXPECT_THAT(text, HasSubstr("\n    | " + std::string(197, 'x') + "...\n    | short\n"));
     const std::string ten = "1\n2\n3\n4\n5\n6\n7\n8\n9\n10\n";
     EXPECT_THAT(last_lines(ten), SizeIs(10));

@@ -334,6 +334,32 @@ TEST_F(RunGatherer, IsStartedThoughAnItemLeftAProcessWhoseNameBeginsAsItsOwn)
     EXPECT_THAT(outcomes(), ElementsAre("Item: passed", "SensorProbe: passed"));
 }
 
+TEST_F(RunGatherer, MayRunAnotherProgramInItsOwnPlace)
+{
+    const std::string gatherer = "--help; exec -a " + std::string(kProbe) +
+                                 ".real /system/bin/Item gather report-here G SensorProbe 100 0 "
+                                 "one gather sleep 1 report-here G SensorProbe 100 0 two sleep 60";
+    for (const char *description : {"one", "two"}) {
+        run_group({{"SensorProbe", gatherer}}, {"--timeout", "5"});
+        EXPECT_THAT(outcomes(), ElementsAre("SensorProbe: passed"));
+        EXPECT_EQ(end_of(0).at("description"), description);
+    }
+}
+
+TEST_F(RunGatherer, OfAnEarlierRunIsEndedWithItsHelpers)
+{
+    const support::Process gatherer(
+        {.arguments = {"sh", "-c",
+                       "exec -a " + std::string(kProbe) +
+                           " sh -c '/system/bin/Item gather; /system/bin/Third ignore-stop sleep "
+                           "1.2 report-here G SensorProbe 100 0 helper & wait'"}});
+    ASSERT_TRUE(eventually([] { return !processes_named(kProbe).empty(); }));
+    run_group({{"SensorProbe", "--help; exec sleep 30"}},
+              {"--repeat", "2", "--timeout", "0.5", "--grace", "0.3"});
+    EXPECT_THAT(outcomes(), ElementsAre("SensorProbe: timed out", "SensorProbe: timed out"));
+    EXPECT_THAT(events("progress"), IsEmpty());
+}
+
 TEST_F(RunGatherer, IsNotTheScriptThatRunsFptest)
 {
     Lines words = with_group({{"SensorProbe", "--group G --seconds 0.1"}});

@@ -7,36 +7,25 @@
 
 #include <cerrno>
 #include <chrono>
+#include <iterator>
 #include <poll.h>
 #include <pty.h>
 #include <stdexcept>
 #include <sys/ioctl.h>
 #include <unistd.h>
+#include <utf8.h>
 #include <utmp.h>
+
+using namespace std::chrono;
 
 namespace
 {
 
-std::string utf8(const VTermScreenCell &cell)
+std::string text_of(const VTermScreenCell &cell)
 {
     std::string text;
     for (int at = 0; at < VTERM_MAX_CHARS_PER_CELL && cell.chars[at] != 0; ++at) {
-        const std::uint32_t c = cell.chars[at];
-        if (c < 0x80) {
-            text += static_cast<char>(c);
-        } else if (c < 0x800) {
-            text += static_cast<char>(0xc0 | (c >> 6));
-            text += static_cast<char>(0x80 | (c & 0x3f));
-        } else if (c < 0x10000) {
-            text += static_cast<char>(0xe0 | (c >> 12));
-            text += static_cast<char>(0x80 | ((c >> 6) & 0x3f));
-            text += static_cast<char>(0x80 | (c & 0x3f));
-        } else {
-            text += static_cast<char>(0xf0 | (c >> 18));
-            text += static_cast<char>(0x80 | ((c >> 12) & 0x3f));
-            text += static_cast<char>(0x80 | ((c >> 6) & 0x3f));
-            text += static_cast<char>(0x80 | (c & 0x3f));
-        }
+        utf8::append(cell.chars[at], std::back_inserter(text));
     }
     return text;
 }
@@ -50,16 +39,10 @@ std::string line_of(const std::function<VTermScreenCell(int)> &cell, int columns
         if (one.chars[0] == static_cast<std::uint32_t>(-1)) {
             continue;
         }
-        line += one.chars[0] == 0 ? " " : utf8(one);
+        line += one.chars[0] == 0 ? " " : text_of(one);
     }
     line.erase(line.find_last_not_of(' ') + 1);
     return line;
-}
-
-double now()
-{
-    using namespace std::chrono;
-    return duration<double>(steady_clock::now().time_since_epoch()).count();
 }
 
 } // namespace
@@ -69,16 +52,11 @@ TerminalSession::TerminalSession(const std::vector<std::string> &arguments, int 
     : columns_(columns), rows_(rows), vterm_(vterm_new(rows, columns)),
       screen_(vterm_obtain_screen(vterm_))
 {
-    static const VTermScreenCallbacks callbacks = {
-        .damage = nullptr,
-        .moverect = nullptr,
-        .movecursor = nullptr,
-        .settermprop = nullptr,
-        .bell = nullptr,
-        .resize = nullptr,
-        .sb_pushline = push_line,
-        .sb_popline = nullptr,
-    };
+    static const auto callbacks = [] {
+        VTermScreenCallbacks all{};
+        all.sb_pushline = push_line;
+        return all;
+    }();
     vterm_set_utf8(vterm_, 1);
     vterm_screen_set_callbacks(screen_, &callbacks, this);
     vterm_screen_reset(screen_, 1);
@@ -146,9 +124,9 @@ bool TerminalSession::read_some(int milliseconds)
 
 bool TerminalSession::wait_for(const std::function<bool()> &condition, double seconds)
 {
-    const double end = now() + seconds;
+    const auto end = steady_clock::now() + duration<double>(seconds);
     while (!condition()) {
-        if (now() > end || !read_some(20)) {
+        if (steady_clock::now() > end || !read_some(20)) {
             return condition();
         }
     }
@@ -162,10 +140,10 @@ bool TerminalSession::wait_for_text(const std::string &text, double seconds)
 
 int TerminalSession::wait_for_end(double seconds)
 {
-    const double end = now() + seconds;
-    while (now() < end && read_some(20)) {
-    }
-    if (!support::eventually([this] { return process_->has_ended(); }, end - now())) {
+    const auto end = steady_clock::now() + duration<double>(seconds);
+    wait_for([] { return false; }, seconds);
+    const duration<double> left = end - steady_clock::now();
+    if (!support::eventually([this] { return process_->has_ended(); }, left.count())) {
         throw std::runtime_error("the program has not ended:\n" + text());
     }
     return process_->wait().status;
@@ -207,16 +185,11 @@ std::string TerminalSession::text() const
     return text;
 }
 
-TerminalSession::Cell TerminalSession::cell(int row, int column) const
+int TerminalSession::colour(int row, int column) const
 {
     VTermScreenCell cell{};
     vterm_screen_get_cell(screen_, {row, column}, &cell);
-    Cell result;
-    result.text = utf8(cell);
-    if (VTERM_COLOR_IS_INDEXED(&cell.fg)) {
-        result.colour = cell.fg.indexed.idx;
-    }
-    return result;
+    return VTERM_COLOR_IS_INDEXED(&cell.fg) ? cell.fg.indexed.idx : -1;
 }
 
 int TerminalSession::push_line(int columns, const VTermScreenCell *cells, void *user)

@@ -11,7 +11,6 @@
 #include <optional>
 #include <string>
 #include <string_view>
-#include <sys/types.h>
 #include <vector>
 #include <vterm.h>
 
@@ -46,20 +45,8 @@ class TerminalSession
     {
         return written_;
     }
-    pid_t pid() const
-    {
-        return process_->pid();
-    }
-    int columns() const
-    {
-        return columns_;
-    }
-
-    struct Cell {
-        std::string text;
-        int colour = -1; // 0 to 15 of the palette; -1 for the terminal's own
-    };
-    Cell cell(int row, int column) const;
+    // 0 to 15 of the palette; -1 for the terminal's own.
+    int colour(int row, int column) const;
 
   private:
     bool read_some(int milliseconds);

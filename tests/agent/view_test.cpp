@@ -45,7 +45,7 @@ class LiveView : public FptestTest
     {
         const int row = row_of(session, line);
         const std::string whole = session.lines()[static_cast<std::size_t>(row)];
-        return session.cell(row, static_cast<int>(whole.find(text))).colour;
+        return session.colour(row, static_cast<int>(whole.find(text)));
     }
 };
 

@@ -228,7 +228,7 @@ Shown play(const Step &step, Lines &before_fault)
     platform::plan_output({step.output});
     std::string buffer = faults::replied({});
     const int value = step.call(buffer.data());
-    platform::drop_output();
+    platform::state().outputs.clear();
     const Lines events = joined({std::exchange(before_fault, {}), platform::events()});
     const State state = state_now();
 

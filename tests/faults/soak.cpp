@@ -71,7 +71,7 @@ void play(const faults::Step &step)
     platform::plan_output({step.output});
     std::string buffer = faults::replied({});
     check_equal(step.call(buffer.data()), 0, step.name);
-    platform::drop_output();
+    platform::state().outputs.clear();
     const bool replies = step.kind == Kind::Group || step.kind == Kind::Item;
     check(buffer == (step.kind == Kind::ReadBack ? faults::read_back(platform::plan_text())
                      : replies                   ? faults::replied("")
@@ -102,9 +102,9 @@ Counts left_open()
 void live()
 {
     platform::reset();
-    platform::stop_recording();
+    platform::state().recording = false;
     long started = 0;
-    platform::on_system([&](const std::string &) { ++started; });
+    platform::state().system_hook = [&](const std::string &) { ++started; };
     const long descriptors = descriptors_open();
     std::string plan;
     for (long cycle = 1; cycle <= kCycles; ++cycle) {

@@ -529,10 +529,10 @@ TEST_F(CommandEntry, RunOfAGroupRepliesWithZerosAfterTheItems)
     platform::write_plan(kOnePlan);
     std::string reply = untouched(100);
     int runs = 0;
-    platform::on_system([&](const std::string & /*command*/) {
+    platform::state().system_hook = [&](const std::string & /*command*/) {
         ++runs;
         EXPECT_EQ(reply, untouched(100));
-    });
+    };
     EXPECT_EQ(FPTEST_RunTestCmd("XMLNodePath::P/g", reply.data(), 100), 0);
 
     EXPECT_EQ(runs, 1);

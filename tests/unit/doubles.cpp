@@ -2,7 +2,7 @@
 // SPDX-License-Identifier: Apache-2.0
 
 // What the library calls instead of the platform: see platform.h.
-#include "platform_state.h"
+#include "platform.h"
 
 #include "mxml_whitespace.h"
 #include "sockwrap.h"

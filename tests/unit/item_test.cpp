@@ -30,7 +30,7 @@ class Item : public LibraryTest
     static Lines run_item(const std::string &vendor, const std::string &name)
     {
         platform::reset();
-        set_vendor(vendor);
+        state().vendor = vendor;
         load_plan(plan_of(cmd(name)));
         return run();
     }
@@ -63,7 +63,7 @@ class ItemRun : public Item, public WithParamInterface<Run>
     static void prepare()
     {
         platform::reset();
-        set_vendor(GetParam().vendor);
+        state().vendor = GetParam().vendor;
         const std::string name = "<Cmd name=\"" + GetParam().name + "\"";
         load_plan(
             plan_of(name + (GetParam().args ? " args=\"" + *GetParam().args + "\"/>" : "/>")));
@@ -304,7 +304,7 @@ TEST_F(Item, VendorIsTheDecimalNumberThatTheTextBeginsWith)
              {"99999999999999999999", -1, INT_MAX},
          }) {
         platform::reset();
-        set_vendor(text);
+        state().vendor = text;
         load_plan(plan_of(""));
 
         const int expected = sizeof(long) == 8 ? number : clamped;
@@ -316,9 +316,9 @@ TEST_F(Item, VendorIsTheDecimalNumberThatTheTextBeginsWith)
 TEST_F(Item, VendorIsReadAfreshForEveryItemAndZeroWhereThereIsNone)
 {
     load_plan(plan_of(cmd("a") + cmd("b")));
-    set_vendor("1");
+    state().vendor = "1";
     EXPECT_THAT(run(0), Contains("system(/system/bin/a_ca -t 5)"));
-    set_vendor("2");
+    state().vendor = "2";
     EXPECT_THAT(run(1), Contains("system(/system/bin/b_ca_qsee -t 5)"));
     platform::reset();
     EXPECT_EQ(run(1), ran("b"));
@@ -341,7 +341,7 @@ TEST_F(Item, AnyOtherVendorStartsNothingAfterThePresenceCheck)
 
 TEST_F(Item, LookupThatFailsStartsNothingAfterTheVendorIsRead)
 {
-    set_vendor("2");
+    state().vendor = "2";
     internals::SingleItemExecute(nullptr, "g", 0);
     EXPECT_EQ(events(), found_nothing(no_item(kNoPlan), "2"));
     EXPECT_EQ(internals::vendor, 2);
@@ -386,8 +386,9 @@ TEST_F(Item, NameIsRecordedBetweenItsLineAndThePresenceCheck)
     load_plan(plan_of(cmd("before") + cmd("x")));
     run(0);
     Lines seen;
-    platform::on_log([&seen](const std::string &) { seen.push_back(internals::command_name); });
-    platform::on_system([&seen](const std::string &) { seen.push_back(internals::command_name); });
+    state().log_hook = state().system_hook = [&seen](const std::string &) {
+        seen.push_back(internals::command_name);
+    };
     run(1);
     // enter, the lookup's three, the name; the query's two, the command, its run, leave
     EXPECT_THAT(seen, ElementsAre("before", "before", "before", "before", "before", "x", "x", "x",

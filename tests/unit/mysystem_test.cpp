@@ -48,7 +48,7 @@ TEST_F(Launcher, ParentLooksOnceWithoutWaitingAndRestoresSignals)
          }) {
         platform::reset();
         plan_steps("waitpid", {look});
-        platform::set_wait_status(status);
+        platform::state().wait_status = status;
         EXPECT_EQ(internals::mysystem("sleep 1000"), result);
         EXPECT_EQ(events(), launch(waited));
         EXPECT_THAT(platform::left_open(), IsEmpty());
@@ -91,7 +91,7 @@ TEST_F(Launcher, ChildRunsTheShellThoughItsMaskCannotBePutBack)
 TEST_F(Launcher, NextLaunchStartsAnew)
 {
     plan_steps("waitpid", {gives(100), gives(0)});
-    platform::set_wait_status(kExited127);
+    platform::state().wait_status = kExited127;
     EXPECT_EQ(internals::mysystem("first"), kExited127);
     EXPECT_EQ(internals::mysystem("second"), 0);
 

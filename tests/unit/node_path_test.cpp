@@ -106,7 +106,7 @@ TEST_F(NodePath, PathWithoutASlashStandsForItselfUntilItsLastComponentIsCopied)
     const std::string path(100, 'a');
     std::string last(65, 'x');
     Lines seen;
-    platform::on_log([&](const std::string & /*event*/) { seen.push_back(last); });
+    platform::state().log_hook = [&](const std::string & /*event*/) { seen.push_back(last); };
     internals::get_node_level(path.c_str(), last.data(), 64);
 
     const std::string cut = filled(path.substr(0, 63), 64) + "x";
@@ -257,11 +257,11 @@ TEST_F(NodePath, EveryRunOfAGroupIsGivenTheTreeOfItsMoment)
         nullptr, "<P><CmdGroup name='g'><Cmd name='x'/><Cmd name='y' args='9'/></CmdGroup></P>",
         nullptr);
     mxml_node_t *first = nullptr;
-    platform::on_system([&](const std::string &command) {
+    platform::state().system_hook = [&](const std::string &command) {
         if (command == "/system/bin/a 1") {
             first = std::exchange(g_TestCmdTree, other);
         }
-    });
+    };
     EXPECT_EQ(run("P/g"), begun_by("P/g", {"P", "g"}) + asked_length(load(), 3) + ran("a", "1") +
                               ran("y", "9", 1) + found_nothing());
     mxmlDelete(first);

@@ -292,7 +292,7 @@ TEST_F(Path, OfAnyPlanIsToldByThePlanAsTheLibraryLooksItUp)
 {
     std::mt19937 random(11);
     int different = 0;
-    platform::stop_recording();
+    platform::state().recording = false;
     for (int round = 0; round < 300; ++round) {
         const std::string text = random_plan(random);
         mxml_node_t *const tree = load_plan(text);

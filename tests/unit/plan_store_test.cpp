@@ -136,14 +136,14 @@ TEST_F(PlanStore, PlanThatIsNotWholeIsAsOneThatDoesNotParse)
     for (const int place : {MXML_ADD_BEFORE, MXML_ADD_AFTER}) { // first, last
         platform::reset();
         write_plan(kLaidOut);
-        platform::on_load([place](mxml_node_t *tree) {
+        platform::state().load_hook = [place](mxml_node_t *tree) {
             mxmlAdd(tree, place, MXML_ADD_TO_PARENT, mxmlNewCustom(nullptr, nullptr, nullptr));
-        });
+        };
         EXPECT_EQ(internals::load_configs_file(kPath), nullptr);
         EXPECT_EQ(events(), load());
         EXPECT_EQ(g_TestCmdTree, nullptr);
     }
-    platform::on_load(nullptr);
+    platform::state().load_hook = nullptr;
     EXPECT_NE(internals::load_configs_file(kPath), nullptr);
 }
 

@@ -1,7 +1,7 @@
 // SPDX-FileCopyrightText: 2026 The Quillmark authors
 // SPDX-License-Identifier: Apache-2.0
 
-#include "platform_state.h"
+#include "platform.h"
 
 #include "support/sequences.h"
 #include "support/temporary_directory.h"
@@ -31,9 +31,9 @@ const support::TemporaryDirectory &directory()
 
 } // namespace
 
-State &state()
+Answers &state()
 {
-    static State current;
+    static Answers current;
     return current;
 }
 
@@ -77,7 +77,7 @@ void reset()
     for (const auto &entry : fs::directory_iterator(directory().path())) {
         fs::remove_all(entry.path());
     }
-    state() = State();
+    state() = Answers();
     sigemptyset(&state().mask);
     sigaddset(&state().mask, SIGUSR1);
     state().handlers = {{SIGINT, host_int}, {SIGQUIT, host_quit}};
@@ -94,44 +94,9 @@ bool steps_left(const std::string &function)
     return !state().steps[function].empty();
 }
 
-void drop_output()
-{
-    state().outputs.clear();
-}
-
-void stop_recording()
-{
-    state().recording = false;
-}
-
 void plan_output(std::vector<std::string> outputs)
 {
     state().outputs.insert(state().outputs.end(), outputs.begin(), outputs.end());
-}
-
-void set_wait_status(int status)
-{
-    state().wait_status = status;
-}
-
-void set_vendor(const std::string &text)
-{
-    state().vendor = text;
-}
-
-void on_system(std::function<void(const std::string &)> hook)
-{
-    state().system_hook = std::move(hook);
-}
-
-void on_load(std::function<void(mxml_node_t *)> hook)
-{
-    state().load_hook = std::move(hook);
-}
-
-void on_log(std::function<void(const std::string &)> hook)
-{
-    state().log_hook = std::move(hook);
 }
 
 void free_descriptor_zero()
@@ -178,25 +143,20 @@ std::vector<std::string> left_open()
     return names;
 }
 
-std::string plan_path()
-{
-    return redirected(kPlan);
-}
-
 bool plan_exists()
 {
-    return fs::exists(plan_path());
+    return fs::exists(redirected(kPlan));
 }
 
 std::string plan_text()
 {
     EXPECT_TRUE(plan_exists());
-    return support::read_file(plan_path());
+    return support::read_file(redirected(kPlan));
 }
 
 void write_plan(const std::string &text)
 {
-    support::write_file(plan_path(), text);
+    support::write_file(redirected(kPlan), text);
 }
 
 } // namespace platform

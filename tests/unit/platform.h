@@ -7,9 +7,18 @@
 // started, signalled, listened on or slept for.
 #pragma once
 
+#include "support/this_process.h"
+
 #include <mxml.h>
 
+#include <csetjmp>
+#include <csignal>
+#include <cstdio>
+#include <deque>
 #include <functional>
+#include <map>
+#include <memory>
+#include <optional>
 #include <string>
 #include <vector>
 
@@ -30,6 +39,38 @@ Step gives(long value, int error = 0);
 // read and write: does the real thing, with at most that many bytes.
 Step limit(long bytes);
 
+constexpr int kFirstFake = 1'000'000; // descriptors that stand for sockets
+
+// What the doubles have recorded and are to answer.
+struct Answers {
+    std::vector<std::string> events;
+    bool recording = true; // not for long runs: no events, and no checks of log lines
+    std::map<std::string, std::deque<Step>> steps;
+    std::deque<std::string> outputs; // what the coming popen calls, in turn, will have printed
+    std::map<int, std::string> descriptors;
+    std::map<FILE *, std::string> streams;
+    std::map<std::string, int> made; // how many of each kind
+    int next_fake = kFirstFake;
+    std::optional<std::string> vendor; // the text that get_node_value finds
+    int wait_status = 0;               // that waitpid calls with a result above 0 store
+    std::unique_ptr<support::FreedDescriptor> freed;
+    std::function<void(const std::string &)> system_hook; // inside each system(), its command
+    std::function<void(const std::string &)> log_hook;    // inside each log call, its event
+    std::function<void(mxml_node_t *)> load_hook; // with each tree, before the library sees it
+    sigset_t mask{};
+    std::map<int, sighandler_t> handlers;
+    std::jmp_buf child{};
+};
+
+Answers &state();
+
+// Handlers as the host has set them.
+void host_int(int signal);
+void host_quit(int signal);
+
+// The file that stands for the one at this path.
+std::string redirected(const std::string &path);
+
 // Forgets everything and starts anew: no events, no steps, no open
 // descriptors, an empty directory for /data/vorlane.
 void reset();
@@ -42,23 +83,7 @@ void plan_steps(const std::string &function, std::vector<Step> steps);
 // Whether any of them are still to come.
 bool steps_left(const std::string &function);
 
-// What the coming popen calls, in turn, will have printed.
 void plan_output(std::vector<std::string> outputs);
-// Forgets those that no popen call has taken.
-void drop_output();
-
-// The status word that the next waitpid calls with a result above 0 store.
-void set_wait_status(int status);
-
-// The text that get_node_value finds; by default it finds none.
-void set_vendor(const std::string &text);
-
-// Called inside each system() call, with its command.
-void on_system(std::function<void(const std::string &)> hook);
-// Called with each tree that Mini-XML has loaded, before the library sees it.
-void on_load(std::function<void(mxml_node_t *)> hook);
-// Called inside each log call, with its event.
-void on_log(std::function<void(const std::string &)> hook);
 
 // Frees descriptor 0 until the next reset: the next real open gets it.
 void free_descriptor_zero();
@@ -82,11 +107,7 @@ std::vector<std::string> calls();
 // streams are stream#1 and so on.
 std::vector<std::string> left_open();
 
-// For long runs: no events, and no checks of log lines, from now on.
-void stop_recording();
-
-// The test plan file: where it is, whether it is there, what is in it.
-std::string plan_path();
+// The test plan file: whether it is there, what is in it.
 bool plan_exists();
 std::string plan_text();
 void write_plan(const std::string &text);

@@ -52,7 +52,9 @@ class ReadBackAssertion : public ReadBack
   protected:
     static void read_back_aloud(int capacity)
     {
-        platform::on_log([](const std::string &event) { std::fputs(event.c_str(), stderr); });
+        platform::state().log_hook = [](const std::string &event) {
+            std::fputs(event.c_str(), stderr);
+        };
         char buffer[16];
         FPTEST_ExtractResultMsg(buffer, capacity);
     }

@@ -82,13 +82,13 @@ TEST_F(Report, EachValueIsSetAfterItsOwnLineAndBeforeTheNext)
 {
     load_plan(plan(" progress=\"1\" result=\"1\" description=\"old\""));
     Lines seen;
-    platform::on_log([&seen](const std::string &event) {
+    platform::state().log_hook = [&seen](const std::string &event) {
         if (event.starts_with("updateSrcXmlFile| ")) {
             seen.push_back(std::string(attribute("first", "a", "progress")) + " " +
                            attribute("first", "a", "result") + " " +
                            attribute("first", "a", "description"));
         }
-    });
+    };
     report(2, -2, "new");
 
     EXPECT_THAT(seen, ElementsAre("1 1 old", "1 1 old", "1 1 old", "2 1 old", "2 -2 old",
@@ -99,11 +99,11 @@ TEST_F(Report, FileIsRewrittenBetweenTheSaveLineAndTheSuccessLine)
 {
     load_plan();
     Lines seen;
-    platform::on_log([&seen](const std::string &event) {
+    platform::state().log_hook = [&seen](const std::string &event) {
         if (event.starts_with("updateSrcXmlFile| ") || event.starts_with("save_XmlFile| ")) {
             seen.push_back(plan_text() == plan() ? "old" : "new");
         }
-    });
+    };
     report(2, 0, "");
 
     EXPECT_THAT(seen, ElementsAre("old", "old", "old", "old", "old", "old", "old", "new", "new"));

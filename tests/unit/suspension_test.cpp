@@ -91,10 +91,10 @@ TEST_F(Suspension, NameIsListedByItsFirstTwentyEightCharacters)
 
 TEST_F(Suspension, NameIsListedWithoutTheVendorsSuffix)
 {
-    platform::set_vendor("1");
+    platform::state().vendor = "1";
     EXPECT_EQ(listed_name("item"), "item");
     SetUp();
-    platform::set_vendor("2");
+    platform::state().vendor = "2";
     EXPECT_EQ(listed_name("SensorProbe"), "SensorProbe");
 }
 
@@ -221,8 +221,9 @@ TEST_F(Suspension, ItemThatIsRunningCanBeStoppedAndTheGroupGoesOn)
     plan_steps("popen", {gives(0), platform::pass(), gives(0), platform::pass()});
     platform::plan_output({std::string(kHeader) + kProcess, kHeader});
     std::vector<int> results;
-    platform::on_system(
-        [&results](const std::string &) { results.push_back(FPTEST_SuspendItemExecute()); });
+    platform::state().system_hook = [&results](const std::string &) {
+        results.push_back(FPTEST_SuspendItemExecute());
+    };
     EXPECT_EQ(FPTEST_RunTestCmd("XMLNodePath::P/g", nullptr, 0), 0);
 
     EXPECT_THAT(results, ElementsAre(0, -1));
