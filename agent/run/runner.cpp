@@ -56,9 +56,9 @@ int signal_of(int status)
 } // namespace
 
 Runner::Runner(LibraryProcess &library, Signals &signals, Run &run,
-               const std::vector<Listener *> &listeners, const Options &options)
-    : library_(library), signals_(signals), run_(run), listeners_(listeners), options_(options),
-      reader_(run, listeners, running_)
+               const std::vector<Listener *> &listeners, Options options)
+    : library_(library), signals_(signals), run_(run), listeners_(listeners),
+      options_(std::move(options)), reader_(run, listeners, running_)
 {
     signals_.take_suspensions();
     library_.hold_at_ends();

@@ -32,7 +32,7 @@ class Runner
 
     // All of them outlive the runner.
     Runner(LibraryProcess &library, Signals &signals, Run &run,
-           const std::vector<Listener *> &listeners, const Options &options);
+           const std::vector<Listener *> &listeners, Options options);
 
     // The stored plan before the run, of which a gatherer may have kept a copy.
     void note_earlier_plan(const std::string &text)

@@ -206,9 +206,7 @@ void Runner::end_stop(const LibraryProcess::Event &event)
     }
     RunningItem &active = running_.items.back();
     const std::vector<Leftover> processes = processes_of(active);
-    if (event.value == 0 && !active.meets_other) {
-        active.was_stopped = true;
-    } else if (ask_to_end(processes)) {
+    if ((event.value == 0 && !active.meets_other) || ask_to_end(processes)) {
         active.was_stopped = true;
     }
 }
