@@ -158,7 +158,7 @@ void require_stored(const std::string &found, const std::string &wanted)
 
 std::string clear_reports(const std::vector<std::size_t> &elements)
 {
-    const std::string mark = new_mark();
+    std::string mark = new_mark();
     const Descriptor lock = lock_stored_plan();
     std::string text;
     const auto cleared = made_of_stored_plan(

@@ -154,7 +154,7 @@ bool ReportReader::is_stale(RunningItem &active, const Plan &plan, const ItemRep
     if (!active.gathers || !has_result(report)) {
         return true;
     }
-    active.reporting.from_a_copy = active.reporting.from_a_copy || !was_gathered(report);
+    active.reporting.from_a_copy = active.reporting.from_a_copy || !is_among(gathered_, report);
     return !active.reporting.from_a_copy;
 }
 
@@ -181,7 +181,7 @@ void ReportReader::begin_gathering()
         item_at(run_, active.place).report = {};
         active.reporting.seen.clear();
         active.reporting.taken_back.reset();
-    } else if (has_result(report) && !was_gathered(report)) {
+    } else if (has_result(report) && !is_among(gathered_, report)) {
         report_late(active.place, true, gathered_in_ != 0 ? gathered_in_ : run_.round, report);
     }
     const bool has_mark = bears_mark(*plan, active.element, running_.job.mark);
@@ -256,11 +256,6 @@ void ReportReader::note_gathered(const ItemReport &report)
     }
 }
 
-bool ReportReader::was_gathered(const ItemReport &report) const
-{
-    return is_among(gathered_, report);
-}
-
 void ReportReader::read_report(RunningItem &active, const Plan &plan)
 {
     const std::size_t number = active.element;
@@ -313,7 +308,7 @@ void ReportReader::read_late_report(Judged &judged, const Plan &plan)
         return;
     }
     const ItemReport report = report_of(plan, number);
-    const bool keeps_copy = judged.gathers && !was_gathered(report);
+    const bool keeps_copy = judged.gathers && !is_among(gathered_, report);
     if (!bears_mark(plan, judged.element, judged.mark) && !keeps_copy) {
         return;
     }

@@ -71,7 +71,6 @@ class ReportReader
     bool is_stale(RunningItem &active, const Plan &plan, const ItemReport &report);
     void report_late(const Place &place, bool gathers, int round, const ItemReport &report);
     void note_gathered(const ItemReport &report);
-    bool was_gathered(const ItemReport &report) const;
 
     Run &run_;
     const std::vector<Reporter *> &reporters_;

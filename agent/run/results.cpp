@@ -4,6 +4,7 @@
 #include "run/results.h"
 
 #include <algorithm>
+#include <array>
 #include <csignal>
 #include <fmt/core.h>
 #include <iterator>
@@ -91,21 +92,9 @@ void summarize(Run &run)
 
 const char *word(Outcome outcome)
 {
-    switch (outcome) {
-    case Outcome::not_run:
-        return "not run";
-    case Outcome::passed:
-        return "passed";
-    case Outcome::failed:
-        return "failed";
-    case Outcome::no_result:
-        return "no result";
-    case Outcome::timed_out:
-        return "timed out";
-    case Outcome::stopped:
-        return "stopped";
-    }
-    return "";
+    static constexpr std::array kWords{"not run",   "passed",    "failed",
+                                       "no result", "timed out", "stopped"};
+    return kWords.at(static_cast<std::size_t>(outcome));
 }
 
 std::string name_of_signal(int signal)

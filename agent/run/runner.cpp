@@ -56,9 +56,9 @@ int signal_of(int status)
 } // namespace
 
 Runner::Runner(LibraryProcess &library, Signals &signals, Run &run,
-               const std::vector<Reporter *> &reporters, const Options &options)
-    : library_(library), signals_(signals), run_(run), reporters_(reporters), options_(options),
-      reader_(run, reporters, running_)
+               const std::vector<Reporter *> &reporters, Options options)
+    : library_(library), signals_(signals), run_(run), reporters_(reporters),
+      options_(std::move(options)), reader_(run, reporters, running_)
 {
     signals_.take_suspensions();
     library_.hold_at_ends();

@@ -32,7 +32,7 @@ class Runner
 
     // All of them outlive the runner.
     Runner(LibraryProcess &library, Signals &signals, Run &run,
-           const std::vector<Reporter *> &reporters, const Options &options);
+           const std::vector<Reporter *> &reporters, Options options);
 
     // The stored plan before the run, of which a gatherer may have kept a copy.
     void note_earlier_plan(const std::string &text)

@@ -43,8 +43,6 @@ std::string described(const std::vector<Leftover> &processes)
 
 } // namespace
 
-// --- signals ------------------------------------------------------------------
-
 void Runner::read_signals()
 {
     for (int signal = signals_.take(); signal != 0; signal = signals_.take()) {
@@ -90,8 +88,6 @@ void Runner::suspend()
         reporter->resumed(run_);
     }
 }
-
-// --- items --------------------------------------------------------------------
 
 void Runner::stop_what_is_due()
 {
@@ -210,9 +206,7 @@ void Runner::end_stop(const LibraryProcess::Event &event)
     }
     RunningItem &active = running_.items.back();
     const std::vector<Leftover> processes = processes_of(active);
-    if (event.value == 0 && !active.meets_other) {
-        active.was_stopped = true;
-    } else if (ask_to_end(processes)) {
+    if ((event.value == 0 && !active.meets_other) || ask_to_end(processes)) {
         active.was_stopped = true;
     }
 }
@@ -228,8 +222,6 @@ void Runner::cannot_stop(RunningItem &active)
     finish(active, now());
     result.reason += ", and goes on running";
 }
-
-// --- what they leave running ---------------------------------------------------
 
 // Without those that earlier items left running.
 std::vector<Leftover> Runner::item_processes() const
