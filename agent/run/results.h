@@ -156,9 +156,12 @@ class Reporter
 
     virtual void begin(const Run &run) = 0;
     virtual void started(const Run &run, Place place) = 0;
-    virtual void progressed(const Run &run, Place place) = 0;
     virtual void ended(const Run &run, Place place) = 0;
     virtual void finish(const Run &run) = 0;
+
+    virtual void progressed(const Run & /* run */, Place /* place */)
+    {
+    }
 
     // All of a round has ended, and another one follows: the run still holds what is
     // over.

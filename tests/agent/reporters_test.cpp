@@ -85,8 +85,8 @@ TEST_F(Reports, AreReadableAndUnfinishedWhereTheRunWasCutOff)
     for (int round = 0; round < 100 && !HasFailure(); ++round) {
         const RunOfItems run = random_run(random);
         const std::size_t stop = random() % 6;
-        const auto play_a_part = [&](Reporter &report) {
-            Playback playback(report, run);
+        const auto play_a_part = [&](Reporter &reporter) {
+            Playback playback(reporter, run);
             playback.begin();
             for (std::size_t suite = 0; suite < run.suites.size() && suite < stop; ++suite) {
                 for (std::size_t at = 0; at < run.suites[suite].items.size() && at < stop; ++at) {

@@ -4,7 +4,6 @@
 // What reports say of rounds, of breaks, and of how items ended.
 #include "playback.h"
 #include "reporters/reporters.h"
-#include "reporters/views.h"
 #include "reporters/wording.h"
 #include "support/reports.h"
 #include "support/temporary_directory.h"
@@ -85,8 +84,8 @@ class RoundReports : public Test
     std::string tap(const RunOfItems &run, const std::function<void(Playback &)> &what) const
     {
         return written([&](std::FILE *stream) {
-            const auto report = make_tap_reporter(stream);
-            Playback playback(*report, run);
+            const auto reporter = make_tap_reporter(stream);
+            Playback playback(*reporter, run);
             what(playback);
         });
     }
@@ -117,8 +116,8 @@ void play_two(Playback &playback)
 
 TEST_F(RoundReports, NumberTheEventsOfAllRoundsInJson)
 {
-    const auto report = make_json_reporter(path("json"));
-    Playback playback(*report, two_items(3));
+    const auto reporter = make_json_reporter(path("json"));
+    Playback playback(*reporter, two_items(3));
     play_into_third(playback);
     std::vector<std::string> ends;
     for (const Json &end : events_of(read_file(path("json")), "end")) {
@@ -133,8 +132,8 @@ TEST_F(RoundReports, NumberTheEventsOfAllRoundsInJson)
 TEST_F(RoundReports, EndTheRestOfABrokenRoundAndCountTheOthersInJson)
 {
     const RunOfItems run = two_items(1'000'000);
-    const auto report = make_json_reporter(path("json"));
-    Playback playback(*report, run);
+    const auto reporter = make_json_reporter(path("json"));
+    Playback playback(*reporter, run);
     play_into_third(playback);
     playback.end_as(interrupted(run));
     playback.finish();
@@ -155,8 +154,8 @@ TEST_F(RoundReports, SayInJsonWhatEndsTheRun)
     run.time_limit = 7200;
     run.until_fail = true;
     run.why_ended = "H/b did not pass (--until-fail)";
-    const auto report = make_json_reporter(path("json"));
-    Playback(*report, run).play();
+    const auto reporter = make_json_reporter(path("json"));
+    Playback(*reporter, run).play();
     const std::string text = read_file(path("json"));
     const Json begin = events_of(text, "run").at(0);
     EXPECT_EQ(begin.at("rounds"), Json());
@@ -233,8 +232,8 @@ std::vector<std::string> verdicts(const Element &top)
 
 TEST_F(RoundReports, NameTheTestCasesOfEachRoundInJunit)
 {
-    const auto report = make_junit_reporter(path("xml"));
-    Playback playback(*report, two_items(4));
+    const auto reporter = make_junit_reporter(path("xml"));
+    Playback playback(*reporter, two_items(4));
     play_into_third(playback);
     playback.play_round();
     playback.finish();
@@ -256,8 +255,8 @@ TEST_F(RoundReports, NameTheTestCasesOfEachRoundInJunit)
 TEST_F(RoundReports, TellTheRoundsThatHaveNotBegunAsOneErrorInJunit)
 {
     const RunOfItems run = two_items(1'000'000);
-    const auto report = make_junit_reporter(path("xml"));
-    Playback playback(*report, run);
+    const auto reporter = make_junit_reporter(path("xml"));
+    Playback playback(*reporter, run);
     play_into_third(playback);
     playback.end_as(interrupted(run));
     playback.finish();
@@ -280,8 +279,8 @@ TEST_F(RoundReports, TellTheRoundsThatHaveNotBegunAsOneErrorInJunit)
 
 TEST_F(RoundReports, AreRedInJunitFromTheFirstMomentOn)
 {
-    const auto report = make_junit_reporter(path("xml"));
-    Playback playback(*report, two_items(2));
+    const auto reporter = make_junit_reporter(path("xml"));
+    Playback playback(*reporter, two_items(2));
     playback.begin();
     const Element top = parse_xml(read_file(path("xml")));
     EXPECT_THAT(verdicts(top), ElementsAre("G/a (round 1): not run", "H/b (round 1): not run",
@@ -295,8 +294,8 @@ TEST_F(RoundReports, AreRedInJunitWhereAnOpenRunIsCutOffBetweenItsRounds)
     run.time_limit = 3600;
     run.finished = false;
     run.why_unfinished = "interrupted by SIGTERM";
-    const auto report = make_junit_reporter(path("xml"));
-    Playback(*report, run).play();
+    const auto reporter = make_junit_reporter(path("xml"));
+    Playback(*reporter, run).play();
     const Element top = parse_xml(read_file(path("xml")));
     EXPECT_EQ(verdicts(top).back(), "rounds/round 2: not run");
     EXPECT_EQ(top.attributes.at("tests"), "3");
@@ -310,8 +309,8 @@ TEST_F(RoundReports, SkipWhatIsLeftAfterTheItemThatWasWaitedForInJunit)
     run.suites[1].items[0] = item("b", Outcome::not_run);
     run.suites[1].items[0].group = "H";
     run.why_ended = "G/a did not pass (--until-fail)";
-    const auto report = make_junit_reporter(path("xml"));
-    Playback(*report, run).play();
+    const auto reporter = make_junit_reporter(path("xml"));
+    Playback(*reporter, run).play();
     const Element top = parse_xml(read_file(path("xml")));
     EXPECT_THAT(verdicts(top), ElementsAre("G/a (round 1): passed", "H/b (round 1): skipped"));
     EXPECT_EQ(top.attributes.at("errors"), "0");
@@ -328,10 +327,10 @@ TEST_F(RoundReports, GoThroughAPipeThatHoldsLessThanTheJunitDocument)
     std::string text;
     std::thread reader([&] { text = read_file(path("pipe")); });
     {
-        const auto report = make_junit_reporter(path("pipe"));
-        Playback playback(*report, run);
+        const auto reporter = make_junit_reporter(path("pipe"));
+        Playback playback(*reporter, run);
         playback.play(2);
-        EXPECT_EQ(report->failure(), "");
+        EXPECT_EQ(reporter->failure(), "");
     }
     reader.join();
     EXPECT_THAT(verdicts(parse_xml(text)),
@@ -356,8 +355,8 @@ RunOfItems crashed_run()
 
 TEST_F(RoundReports, TellInJsonHowAnItemEnded)
 {
-    const auto report = make_json_reporter(path("json"));
-    Playback(*report, crashed_run()).play();
+    const auto reporter = make_json_reporter(path("json"));
+    Playback(*reporter, crashed_run()).play();
     const auto ends = events_of(read_file(path("json")), "end");
     EXPECT_EQ(ends.at(0).at("exit_status"), Json());
     EXPECT_EQ(ends.at(0).at("signal"), "SIGSEGV");
@@ -370,8 +369,8 @@ TEST_F(RoundReports, TellInJsonHowAnItemEnded)
 
 TEST_F(RoundReports, TellInJunitHowAnItemEnded)
 {
-    const auto report = make_junit_reporter(path("xml"));
-    Playback(*report, crashed_run()).play();
+    const auto reporter = make_junit_reporter(path("xml"));
+    Playback(*reporter, crashed_run()).play();
     const Element group = parse_xml(read_file(path("xml"))).children.at(0);
     const Element crash = group.all("testcase").at(0);
     EXPECT_EQ(crash.properties().at("signal"), "SIGSEGV");

@@ -115,8 +115,8 @@ TEST_F(TapReporter, HasEveryPlannedPointOnceAlsoWhereTheRunWasInterrupted)
 
 TEST_F(TapReporter, WritesAPointWhenItsItemHasEnded)
 {
-    play_tap([&](Reporter &report) {
-        Playback playback(report, mixed_run());
+    play_tap([&](Reporter &reporter) {
+        Playback playback(reporter, mixed_run());
         const auto text = [&] { return read_file(path("tap")); };
         playback.begin();
         EXPECT_EQ(text(), "TAP version 14\n1..2\n");
@@ -136,9 +136,9 @@ TEST_F(TapReporter, WritesAPointWhenItsItemHasEnded)
 
 TEST_F(TapReporter, KeepsItsOrderWhereItemsEndInAnother)
 {
-    play_tap([&](Reporter &report) {
+    play_tap([&](Reporter &reporter) {
         Playback playback(
-            report, run_of({suite("G", {passed("a"), passed("b")}), suite("H", {passed("c")})}));
+            reporter, run_of({suite("G", {passed("a"), passed("b")}), suite("H", {passed("c")})}));
         playback.begin();
         playback.start({0, 0});
         playback.run_item({0, 1});
@@ -291,9 +291,9 @@ TEST_F(Prove, SeesThatARunWasInterrupted)
 
 TEST_F(Prove, SeesThatARunWasCutOff)
 {
-    play_tap([&](Reporter &report) {
+    play_tap([&](Reporter &reporter) {
         Playback playback(
-            report, run_of({suite("G", {passed("a")}), suite("H", {passed("b"), passed("c")})}));
+            reporter, run_of({suite("G", {passed("a")}), suite("H", {passed("b"), passed("c")})}));
         playback.begin();
         playback.run_item({0, 0});
         playback.run_item({1, 0});
@@ -338,13 +338,13 @@ TEST_F(TapReporter, SaysThatTheDiskIsFullAndStaysQuiet)
 {
     const Stream stream(std::fopen("/dev/full", "w"), &std::fclose);
     ASSERT_NE(stream, nullptr);
-    const auto report = make_tap_reporter(stream.get());
-    Playback playback(*report, mixed_run());
+    const auto reporter = make_tap_reporter(stream.get());
+    Playback playback(*reporter, mixed_run());
     playback.begin();
-    EXPECT_EQ(report->failure(), "the TAP output: No space left on device");
+    EXPECT_EQ(reporter->failure(), "the TAP output: No space left on device");
     playback.run_item({0, 0});
     playback.finish();
-    EXPECT_EQ(report->failure(), "the TAP output: No space left on device");
+    EXPECT_EQ(reporter->failure(), "the TAP output: No space left on device");
 }
 
 TEST_F(TapReporter, SaysThatNobodyReads)
@@ -352,29 +352,29 @@ TEST_F(TapReporter, SaysThatNobodyReads)
     std::array<int, 2> ends{};
     ASSERT_EQ(pipe2(ends.data(), O_CLOEXEC), 0);
     const Stream stream(fdopen(ends[1], "w"), &std::fclose);
-    const auto report = make_tap_reporter(stream.get());
-    Playback playback(*report, mixed_run());
+    const auto reporter = make_tap_reporter(stream.get());
+    Playback playback(*reporter, mixed_run());
     playback.begin();
-    EXPECT_EQ(report->failure(), "");
+    EXPECT_EQ(reporter->failure(), "");
     close(ends[0]);
     playback.run_item({0, 0});
-    EXPECT_EQ(report->failure(), "the TAP output: Broken pipe");
+    EXPECT_EQ(reporter->failure(), "the TAP output: Broken pipe");
 }
 
 TEST_F(TapReporter, WritesNoMoreOnceItHasFoundNoRoom)
 {
     EXPECT_EQ(in_a_child([&] {
                   const Stream stream(std::fopen(path("tap").c_str(), "w"), &std::fclose);
-                  const auto report = make_tap_reporter(stream.get());
-                  Playback playback(*report, mixed_run());
+                  const auto reporter = make_tap_reporter(stream.get());
+                  Playback playback(*reporter, mixed_run());
                   {
                       const Limit limit(RLIMIT_FSIZE, 60);
                       playback.begin();
                       playback.run_item({0, 0});
                   }
-                  EXPECT_EQ(report->failure(), "the TAP output: File too large");
+                  EXPECT_EQ(reporter->failure(), "the TAP output: File too large");
                   playback.finish();
-                  EXPECT_EQ(report->failure(), "the TAP output: File too large");
+                  EXPECT_EQ(reporter->failure(), "the TAP output: File too large");
               }),
               0);
     EXPECT_THAT(read_file(path("tap")), Not(HasSubstr("Bail out")));
