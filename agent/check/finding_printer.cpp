@@ -62,10 +62,9 @@ std::pair<std::string, std::string> source_line(std::string_view text, std::size
         begin = std::min(kByteOrderMark.size(), end);
     }
     if (begin == first && begin > 0) { // not in the middle of a character
-        begin += static_cast<std::size_t>(
-            std::find_if_not(text.begin() + static_cast<std::ptrdiff_t>(begin),
-                             text.begin() + static_cast<std::ptrdiff_t>(offset), continues) -
-            (text.begin() + static_cast<std::ptrdiff_t>(begin)));
+        while (begin < offset && continues(text[begin])) {
+            ++begin;
+        }
     }
     while (end < text.size() && end > offset && continues(text[end])) {
         --end;

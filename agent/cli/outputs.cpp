@@ -6,8 +6,8 @@
 #include "cli/log_option.h"
 #include "module/log_file.h"
 #include "reporters/reporters.h"
-#include "reporters/views.h"
 #include "util/failure.h"
+#include "util/files.h"
 #include "util/text.h"
 
 #include <sys/stat.h>

@@ -1,7 +1,7 @@
 // SPDX-FileCopyrightText: 2026 The Quillmark authors
 // SPDX-License-Identifier: Apache-2.0
 
-#include "reporters/views.h"
+#include "reporters/reporters.h"
 
 #include "reporters/line_printer.h"
 #include "reporters/wording.h"

@@ -1,7 +1,7 @@
 // SPDX-FileCopyrightText: 2026 The Quillmark authors
 // SPDX-License-Identifier: Apache-2.0
 
-#include "reporters/views.h"
+#include "reporters/reporters.h"
 
 #include "reporters/wording.h"
 #include "reporters/writer.h"
@@ -43,10 +43,6 @@ class PlainView : public Reporter
         said_ = Clock::now();
         output_said_.clear();
         runs_ = true;
-    }
-
-    void progressed(const Run & /* run */, Place /* place */) override
-    {
     }
 
     void tick(const Run &run) override

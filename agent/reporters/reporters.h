@@ -1,8 +1,8 @@
 // SPDX-FileCopyrightText: 2026 The Quillmark authors
 // SPDX-License-Identifier: Apache-2.0
 
-// Result files, written as results come: whatever ends this process, the file holds
-// what was known by then, and shows that the run did not finish.
+// All reporters. Result files are written as results come: whatever ends this process, the
+// file holds what was known by then, and shows that the run did not finish.
 #pragma once
 
 #include "run/results.h"
@@ -36,5 +36,17 @@ std::string junit_obstacle(const std::string &path);
 // number of rounds is known, otherwise last. A run that ended early bails out; one that
 // was cut off lacks points, or the plan.
 std::unique_ptr<Reporter> make_tap_reporter(std::FILE *stream);
+
+// For a terminal: finished items above; below, redrawn in the terminal's width, those
+// that run, each with a progress bar, and a running total.
+std::unique_ptr<Reporter> make_live_view(std::FILE *terminal, bool colour);
+
+// For anything else: a line for each item that has ended, and now and then one for an
+// item that takes long. Quiet leaves out items that passed and the total.
+std::unique_ptr<Reporter> make_plain_view(std::FILE *stream, bool quiet);
+
+// The view that suits the stream: live on a terminal that can move its cursor, in
+// colour unless NO_COLOR is set.
+std::unique_ptr<Reporter> make_suitable_view(std::FILE *stream, bool quiet);
 
 } // namespace fptest

@@ -153,10 +153,6 @@ class TapReporter : public Reporter
         write(next_lines(run, false));
     }
 
-    void progressed(const Run & /* run */, Place /* place */) override
-    {
-    }
-
     void ended(const Run &run, Place place) override
     {
         begun_ = std::max(begun_, place.suite + 1);

@@ -152,9 +152,12 @@ class Reporter
 
     virtual void begin(const Run &run) = 0;
     virtual void started(const Run &run, Place place) = 0;
-    virtual void progressed(const Run &run, Place place) = 0;
     virtual void ended(const Run &run, Place place) = 0;
     virtual void finish(const Run &run) = 0;
+
+    virtual void progressed(const Run & /* run */, Place /* place */)
+    {
+    }
 
     // Another round follows; the run still holds the one that is over.
     virtual void round_over(const Run & /* run */)

@@ -37,9 +37,9 @@ TEST_F(JsonReporter, BeginsWithWhatIsPlanned)
 
 TEST_F(JsonReporter, TellsEveryEventOfAnItem)
 {
-    const auto report = make_json_reporter(path("json"));
-    Playback playback(*report, run_of({suite("Bringup", {passed("SpiCheck")}),
-                                       suite("Pixels", {passed("x"), failed("DeadPixel")})}));
+    const auto reporter = make_json_reporter(path("json"));
+    Playback playback(*reporter, run_of({suite("Bringup", {passed("SpiCheck")}),
+                                         suite("Pixels", {passed("x"), failed("DeadPixel")})}));
     playback.begin();
     playback.start({1, 1});
     playback.progress({1, 1}, {"40", std::nullopt, false, "row 3"});
@@ -67,8 +67,8 @@ TEST_F(JsonReporter, TellsEveryEventOfAnItem)
 
 TEST_F(JsonReporter, ProgressIsTimedByTheClock)
 {
-    const auto report = make_json_reporter(path("json"));
-    Playback playback(*report, run_of({suite("G", {passed("a")})}));
+    const auto reporter = make_json_reporter(path("json"));
+    Playback playback(*reporter, run_of({suite("G", {passed("a")})}));
     playback.begin();
     playback.start({0, 0});
     const auto before = std::chrono::system_clock::now();
@@ -156,8 +156,8 @@ TEST_F(JsonReporter, ReadsBackWhateverIsReported)
 
 TEST_F(JsonReporter, WritesEveryLineAtOnce)
 {
-    const auto report = make_json_reporter(path("json"));
-    Playback playback(*report, mixed_run());
+    const auto reporter = make_json_reporter(path("json"));
+    Playback playback(*reporter, mixed_run());
     const auto lines = [&] { return events_of(read_file(path("json"))).size(); };
     playback.begin();
     EXPECT_EQ(lines(), 1U);
@@ -172,8 +172,8 @@ TEST_F(JsonReporter, WritesEveryLineAtOnce)
 TEST_F(JsonReporter, LeavesWholeLinesAndNoFinishWhenItsProcessIsKilled)
 {
     EXPECT_EQ(in_a_child([&] {
-                  const auto report = make_json_reporter(path("json"));
-                  Playback playback(*report, mixed_run());
+                  const auto reporter = make_json_reporter(path("json"));
+                  Playback playback(*reporter, mixed_run());
                   playback.begin();
                   playback.run_item({0, 0});
                   playback.start({0, 1});
@@ -195,8 +195,8 @@ TEST_F(JsonReporter, TakesThePlaceOfAnOlderFile)
 
 TEST_F(JsonReporter, IsNotInheritedByPrograms)
 {
-    const auto report = make_json_reporter(path("json"));
-    Playback(*report, mixed_run()).begin();
+    const auto reporter = make_json_reporter(path("json"));
+    Playback(*reporter, mixed_run()).begin();
     const std::string command = "for f in /proc/$$/fd/*; do readlink \"$f\"; done | grep -c '" +
                                 path("json") + "' >" + path("count");
     EXPECT_NE(std::system(command.c_str()), 0);
@@ -276,9 +276,9 @@ TEST_F(JsonReporter, SaysThatNobodyReadsItsOutput)
     close(ends[0]);
     EXPECT_EQ(with_output(ends[1],
                           [&] {
-                              const auto report = make_json_reporter("-");
-                              Playback(*report, mixed_run()).begin();
-                              EXPECT_EQ(report->failure(), "standard output: Broken pipe");
+                              const auto reporter = make_json_reporter("-");
+                              Playback(*reporter, mixed_run()).begin();
+                              EXPECT_EQ(reporter->failure(), "standard output: Broken pipe");
                           }),
               0);
     close(ends[1]);
@@ -286,19 +286,19 @@ TEST_F(JsonReporter, SaysThatNobodyReadsItsOutput)
 
 TEST_F(JsonReporter, SaysThatTheDiskIsFullAndStaysQuiet)
 {
-    const auto report = make_json_reporter("/dev/full");
-    Playback(*report, mixed_run()).play();
-    EXPECT_EQ(report->failure(), "/dev/full: No space left on device");
+    const auto reporter = make_json_reporter("/dev/full");
+    Playback(*reporter, mixed_run()).play();
+    EXPECT_EQ(reporter->failure(), "/dev/full: No space left on device");
 }
 
 TEST_F(JsonReporter, TakesBackALineThatFoundNoRoom)
 {
     EXPECT_EQ(in_a_child([&] {
                   const Limit limit(RLIMIT_FSIZE, 2000);
-                  const auto report = make_json_reporter(path("json"));
-                  Playback playback(*report, mixed_run());
+                  const auto reporter = make_json_reporter(path("json"));
+                  Playback playback(*reporter, mixed_run());
                   playback.play();
-                  EXPECT_EQ(report->failure(), path("json") + ": File too large");
+                  EXPECT_EQ(reporter->failure(), path("json") + ": File too large");
               }),
               0);
     const std::string text = read_file(path("json"));
@@ -314,11 +314,11 @@ TEST_F(JsonReporter, WritesNoMoreOnceALineHasFoundNoRoom)
     // the short line after the long one would fit
     EXPECT_EQ(in_a_child([&] {
                   const Limit limit(RLIMIT_FSIZE, 1500);
-                  const auto report = make_json_reporter(path("json"));
+                  const auto reporter = make_json_reporter(path("json"));
                   ItemRun loud = passed("a");
                   loud.output = std::string(2000, 'x');
-                  Playback(*report, run_of({suite("G", {loud, passed("b")})})).play();
-                  EXPECT_EQ(report->failure(), path("json") + ": File too large");
+                  Playback(*reporter, run_of({suite("G", {loud, passed("b")})})).play();
+                  EXPECT_EQ(reporter->failure(), path("json") + ": File too large");
               }),
               0);
     EXPECT_EQ(events_of(read_file(path("json"))).back().at("event"), "progress");
@@ -329,14 +329,14 @@ TEST_F(Reports, BadPathIsToldBeforeAnythingRuns)
     write_file(path("file"), "x");
     const std::string bad = path("file") + "/report";
     for (const auto &make : {make_json_reporter, make_junit_reporter}) {
-        const auto report = make(bad);
-        Playback playback(*report, mixed_run());
+        const auto reporter = make(bad);
+        Playback playback(*reporter, mixed_run());
         playback.begin();
-        EXPECT_EQ(report->failure(), bad + ": Not a directory");
+        EXPECT_EQ(reporter->failure(), bad + ": Not a directory");
         playback.run_item({0, 0});
         playback.tick();
         playback.finish();
-        EXPECT_EQ(report->failure(), bad + ": Not a directory");
+        EXPECT_EQ(reporter->failure(), bad + ": Not a directory");
         const auto other = make(directory_.path(""));
         Playback(*other, mixed_run()).begin();
         EXPECT_EQ(other->failure(), directory_.path("") + ": Is a directory");

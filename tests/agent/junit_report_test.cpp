@@ -122,9 +122,9 @@ TEST_F(JunitReporter, ReadsBackWhateverIsReported)
 
 TEST_F(JunitReporter, IsAWholeDocumentFromTheBeginningOn)
 {
-    const auto report = make_junit_reporter(path("xml"));
-    Playback(*report, mixed_run()).begin();
-    EXPECT_EQ(report->failure(), "");
+    const auto reporter = make_junit_reporter(path("xml"));
+    Playback(*reporter, mixed_run()).begin();
+    EXPECT_EQ(reporter->failure(), "");
     const Element top = parse_xml(read_file(path("xml")));
     EXPECT_EQ(top.attributes.at("errors"), "6");
     EXPECT_EQ(top.attributes.at("skipped"), "0");
@@ -137,8 +137,8 @@ TEST_F(JunitReporter, IsAWholeDocumentFromTheBeginningOn)
 
 TEST_F(JunitReporter, IsReplacedOnceASecondWhileTheRunLasts)
 {
-    const auto report = make_junit_reporter(path("xml"));
-    Playback playback(*report, mixed_run());
+    const auto reporter = make_junit_reporter(path("xml"));
+    Playback playback(*reporter, mixed_run());
     playback.begin();
     const ino_t first = inode(path("xml"));
     playback.run_item({0, 0});
@@ -175,8 +175,8 @@ TEST_F(JunitReporter, IsReplacedOnceASecondWhileTheRunLasts)
 TEST_F(JunitReporter, LeavesAWholeDocumentWhenItsProcessIsKilled)
 {
     EXPECT_EQ(in_a_child([&] {
-                  const auto report = make_junit_reporter(path("xml"));
-                  Playback playback(*report, mixed_run());
+                  const auto reporter = make_junit_reporter(path("xml"));
+                  Playback playback(*reporter, mixed_run());
                   playback.begin();
                   std::this_thread::sleep_for(1100ms);
                   playback.run_item({0, 0});
@@ -241,8 +241,8 @@ TEST_F(JunitReporter, GoesIntoAPipeOnceAtTheEnd)
     ASSERT_EQ(mkfifo(path("pipe").c_str(), 0666), 0);
     const int reader = open(path("pipe").c_str(), O_RDONLY | O_NONBLOCK | O_CLOEXEC);
     ASSERT_GE(reader, 0);
-    const auto report = make_junit_reporter(path("pipe"));
-    Playback playback(*report, mixed_run());
+    const auto reporter = make_junit_reporter(path("pipe"));
+    Playback playback(*reporter, mixed_run());
     playback.begin();
     std::this_thread::sleep_for(1100ms);
     playback.run_item({0, 0});
@@ -256,7 +256,7 @@ TEST_F(JunitReporter, GoesIntoAPipeOnceAtTheEnd)
     EXPECT_EQ(parse_xml({buffer.data(), static_cast<std::size_t>(got)}).attributes.at("tests"),
               "6");
     close(reader);
-    EXPECT_EQ(report->failure(), "");
+    EXPECT_EQ(reporter->failure(), "");
     EXPECT_THAT(directory_.names(), ElementsAre("pipe"));
 }
 
@@ -274,15 +274,15 @@ TEST_F(JunitReporter, GoesIntoAnOpenDescriptorWithoutReplacingItsFile)
 
 TEST_F(JunitReporter, SaysWhyItCannotBeReplaced)
 {
-    const auto report = make_junit_reporter(path("xml"));
-    Playback playback(*report, mixed_run());
+    const auto reporter = make_junit_reporter(path("xml"));
+    Playback playback(*reporter, mixed_run());
     playback.begin();
     std::filesystem::create_directory(path("xml." + std::to_string(getpid()) + ".tmp"));
     playback.finish();
-    EXPECT_EQ(report->failure(), path("xml") + ": Is a directory");
+    EXPECT_EQ(reporter->failure(), path("xml") + ": Is a directory");
 }
 
-// No device of /dev is named here: a report that replaced what it should write
+// No device of /dev is named here: a reporter that replaced what it should write
 // into would take it from the machine.
 TEST_F(JunitReporter, SaysThatWhatItWritesIntoHasNoRoom)
 {
@@ -290,13 +290,13 @@ TEST_F(JunitReporter, SaysThatWhatItWritesIntoHasNoRoom)
                   const int file = open(path("out").c_str(), O_RDWR | O_CREAT | O_CLOEXEC, 0666);
                   const std::string name = "/dev/fd/" + std::to_string(file);
                   const Limit limit(RLIMIT_FSIZE, 1000);
-                  const auto report = make_junit_reporter(name);
-                  Playback playback(*report, mixed_run());
+                  const auto reporter = make_junit_reporter(name);
+                  Playback playback(*reporter, mixed_run());
                   playback.begin();
                   playback.run_item({0, 0});
-                  EXPECT_EQ(report->failure(), "");
+                  EXPECT_EQ(reporter->failure(), "");
                   playback.finish();
-                  EXPECT_EQ(report->failure(), name + ": File too large");
+                  EXPECT_EQ(reporter->failure(), name + ": File too large");
               }),
               0);
     EXPECT_EQ(read_file(path("out")).size(), 1000U);
@@ -308,9 +308,9 @@ TEST_F(JunitReporter, KeepsTheLastWholeDocumentWhereTheNextFindsNoRoom)
                   RunOfItems run = mixed_run();
                   run.suites[0].items[0].output = std::string(10000, 'x');
                   const Limit limit(RLIMIT_FSIZE, 5000);
-                  const auto report = make_junit_reporter(path("xml"));
-                  Playback(*report, run).play();
-                  EXPECT_EQ(report->failure(), path("xml") + ": File too large");
+                  const auto reporter = make_junit_reporter(path("xml"));
+                  Playback(*reporter, run).play();
+                  EXPECT_EQ(reporter->failure(), path("xml") + ": File too large");
               }),
               0);
     EXPECT_EQ(parse_xml(read_file(path("xml"))).attributes.at("errors"), "6");

@@ -6,7 +6,6 @@
 
 #include "playback.h"
 #include "reporters/reporters.h"
-#include "reporters/views.h"
 #include "support/process.h"
 #include "support/reports.h"
 #include "support/temporary_directory.h"

@@ -239,10 +239,10 @@ TEST_F(RoundReports, GoThroughAPipeThatHoldsLessThanTheJunitDocument)
     std::string text;
     std::thread reader([&] { text = read_file(path("pipe")); });
     {
-        const auto report = make_junit_reporter(path("pipe"));
-        Playback playback(*report, run);
+        const auto reporter = make_junit_reporter(path("pipe"));
+        Playback playback(*reporter, run);
         playback.play(2);
-        EXPECT_EQ(report->failure(), "");
+        EXPECT_EQ(reporter->failure(), "");
     }
     reader.join();
     EXPECT_THAT(verdicts(parse_xml(text)),

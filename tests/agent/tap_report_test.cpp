@@ -329,13 +329,13 @@ TEST_F(TapReporter, SaysThatTheDiskIsFullAndStaysQuiet)
 {
     const Stream stream(std::fopen("/dev/full", "w"), &std::fclose);
     ASSERT_NE(stream, nullptr);
-    const auto report = make_tap_reporter(stream.get());
-    Playback playback(*report, mixed_run());
+    const auto reporter = make_tap_reporter(stream.get());
+    Playback playback(*reporter, mixed_run());
     playback.begin();
-    EXPECT_EQ(report->failure(), "the TAP output: No space left on device");
+    EXPECT_EQ(reporter->failure(), "the TAP output: No space left on device");
     playback.run_item({0, 0});
     playback.finish();
-    EXPECT_EQ(report->failure(), "the TAP output: No space left on device");
+    EXPECT_EQ(reporter->failure(), "the TAP output: No space left on device");
 }
 
 TEST_F(TapReporter, SaysThatNobodyReads)
@@ -343,29 +343,29 @@ TEST_F(TapReporter, SaysThatNobodyReads)
     std::array<int, 2> ends{};
     ASSERT_EQ(pipe2(ends.data(), O_CLOEXEC), 0);
     const Stream stream(fdopen(ends[1], "w"), &std::fclose);
-    const auto report = make_tap_reporter(stream.get());
-    Playback playback(*report, mixed_run());
+    const auto reporter = make_tap_reporter(stream.get());
+    Playback playback(*reporter, mixed_run());
     playback.begin();
-    EXPECT_EQ(report->failure(), "");
+    EXPECT_EQ(reporter->failure(), "");
     close(ends[0]);
     playback.run_item({0, 0});
-    EXPECT_EQ(report->failure(), "the TAP output: Broken pipe");
+    EXPECT_EQ(reporter->failure(), "the TAP output: Broken pipe");
 }
 
 TEST_F(TapReporter, WritesNoMoreOnceItHasFoundNoRoom)
 {
     EXPECT_EQ(in_a_child([&] {
                   const Stream stream = open_stream("tap");
-                  const auto report = make_tap_reporter(stream.get());
-                  Playback playback(*report, mixed_run());
+                  const auto reporter = make_tap_reporter(stream.get());
+                  Playback playback(*reporter, mixed_run());
                   {
                       const Limit limit(RLIMIT_FSIZE, 60);
                       playback.begin();
                       playback.run_item({0, 0});
                   }
-                  EXPECT_EQ(report->failure(), "the TAP output: File too large");
+                  EXPECT_EQ(reporter->failure(), "the TAP output: File too large");
                   playback.finish();
-                  EXPECT_EQ(report->failure(), "the TAP output: File too large");
+                  EXPECT_EQ(reporter->failure(), "the TAP output: File too large");
               }),
               0);
     EXPECT_THAT(read_file(path("tap")), Not(HasSubstr("Bail out")));
