@@ -221,10 +221,11 @@ class FormChecker
             return "write &amp; for a '&'";
         }
         if (byte == '<') {
-            return "write &lt; for a '<'";
+            return "write &lt; for a '<', or end the value that begins before it";
         }
         if (byte >= 0x80) {
-            return "save it as UTF-8";
+            return first_not_utf8(text_) == kNone ? "write a plain character for this one"
+                                                  : "save it as UTF-8";
         }
         if (std::iscntrl(byte) != 0 && std::isspace(byte) == 0) {
             return "leave the control character out";

@@ -71,7 +71,9 @@ class LiveView : public Reporter
 
     void progressed(const Run &run, Place /* place */) override
     {
-        draw(run);
+        if (Clock::now() - drawn_at_ >= 25ms) {
+            draw(run);
+        }
     }
 
     void tick(const Run &run) override

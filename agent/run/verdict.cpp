@@ -129,10 +129,11 @@ class Judge
         }
         const bool is_interrupted = active_.stop == Outcome::stopped;
         if (active_.killed) {
-            return fmt::format("killed after {}, as it did not end when it was asked to",
+            return fmt::format("killed after {}, as it did not end when it was asked to{}",
                                is_interrupted ? "the run was interrupted by " +
                                                     name_for_people(context_.signal)
-                                              : duration(seconds));
+                                              : duration(seconds),
+                               if_written_over());
         }
         return is_interrupted
                    ? fmt::format("stopped by {}", name_for_people(context_.signal))

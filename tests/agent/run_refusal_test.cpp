@@ -360,8 +360,9 @@ TEST_F(Refusal, BesideAnItemOfAnEarlierRun)
 
 TEST_F(Refusal, OfASecondRunAtTheSameTime)
 {
-    FptestProcess first(with_group({{"Item", "await /tmp/scene/go report G 100 0 x"}}));
-    ASSERT_TRUE(support::eventually([] { return running_items() == Lines{"Item"}; }, 30));
+    FptestProcess first(
+        with_group({{"Item", "note /tmp/scene/begun await /tmp/scene/go report G 100 0 x"}}));
+    ASSERT_TRUE(wait_for_file("begun"));
     const std::string stored = read_file(kPlanFile);
     const Ended second = run_fptest({"run", "--plan", plan(kTwoGroups), "P/Bringup"});
     EXPECT_EQ(second.status, 3);
