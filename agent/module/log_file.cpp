@@ -37,8 +37,16 @@ std::string for_all_processes(const std::string &file)
 }
 
 // Kept open, or a FIFO's reader would see its end before the library writes.
-Descriptor opened{-1};
-std::string opened_label;
+struct OpenedLog {
+    Descriptor descriptor{-1};
+    std::string label; // of --log alone: an item's report cannot help its run's log
+};
+
+OpenedLog &opened()
+{
+    static OpenedLog log;
+    return log;
+}
 
 } // namespace
 
@@ -71,8 +79,7 @@ void choose_log(const std::string &option)
         throw Failure(Cause::device, "{} cannot be written: {}; name another file", label(file),
                       std::strerror(errno));
     }
-    opened = std::move(log);
-    opened_label = option.empty() ? "" : label(file);
+    opened() = {std::move(log), option.empty() ? "" : label(file)};
     setenv(kLogVariable, path.c_str(), 1);
 }
 
@@ -81,12 +88,13 @@ std::string log_loss()
     struct stat status {
     };
     // is there room for one more byte?
-    if (opened_label.empty() || fstat(opened.get(), &status) != 0 || !S_ISREG(status.st_mode) ||
-        fallocate(opened.get(), FALLOC_FL_KEEP_SIZE, status.st_size, 1) == 0 ||
+    const auto &[log, name] = opened();
+    if (name.empty() || fstat(log.get(), &status) != 0 || !S_ISREG(status.st_mode) ||
+        fallocate(log.get(), FALLOC_FL_KEEP_SIZE, status.st_size, 1) == 0 ||
         (errno != ENOSPC && errno != EDQUOT)) {
         return {};
     }
-    return fmt::format("{} is incomplete: {}; make room, or name another file", opened_label,
+    return fmt::format("{} is incomplete: {}; make room, or name another file", name,
                        std::strerror(errno));
 }
 
