@@ -358,6 +358,22 @@ TEST_F(Refusal, BesideAnItemOfAnEarlierRun)
     EXPECT_NE(access(kPlanFile, F_OK), 0);
 }
 
+TEST_F(Refusal, BesideAScriptOfAnEarlierRunOrAnotherVendorsItem)
+{
+    for (const Lines &words : {Lines{"/system/bin/Script", "kill -STOP $$"},
+                               Lines{"/system/bin/Item_ca", "sleep", "60"}}) {
+        const support::Process left({.arguments = words});
+        ASSERT_TRUE(support::eventually([] { return !running_items().empty(); }));
+        const Ended ended =
+            run_group({{"Script", script(script_report("0", "fine"))}, {"Item", kPasses}});
+        EXPECT_EQ(ended.status, 3);
+        EXPECT_EQ(ended.err, "fptest: " + words[0] +
+                                 " of an earlier run is still running, as process " +
+                                 std::to_string(left.pid()) +
+                                 ", and would report into this one: end it first\n");
+    }
+}
+
 TEST_F(Refusal, OfASecondRunAtTheSameTime)
 {
     FptestProcess first(
