@@ -127,13 +127,16 @@ int main(int argc, char **argv)
         status = complain(Exit::environment, error.what());
     }
     // failed items and errors in a plan are results, not failures of fptest
+    const auto has_worked = [&status] {
+        return status == Exit::success || status == Exit::items_failed;
+    };
     const bool is_unwritten = std::fflush(stdout) != 0 || std::ferror(stdout) != 0;
-    if (is_unwritten && (status == Exit::success || status == Exit::items_failed)) {
+    if (is_unwritten && has_worked()) {
         status = complain(Exit::environment, "standard output cannot be written");
     }
     const std::string loss = fptest::log_loss();
     if (!loss.empty()) {
-        status = complain(status == Exit::success ? Exit::environment : status, loss);
+        status = complain(has_worked() ? Exit::environment : status, loss);
     }
     return static_cast<int>(status);
 }

@@ -85,8 +85,8 @@ std::size_t find_item(const Plan &plan, const ReportOptions &options)
 Exit report(const ReportOptions &options)
 {
     require_log_of_its_own(options.log, StdoutUse::nothing);
-    choose_log(options.log);
-    mend_stored_plan(); // an earlier report may have spoiled it
+    choose_log(options.log, !options.log.empty()); // an item cannot help its run's log
+    mend_stored_plan();                            // an earlier report may have spoiled it
     const Descriptor lock = lock_stored_plan();
     std::string text =
         require_stored_plan(", so nothing can be reported: store one with fptest run --plan FILE");

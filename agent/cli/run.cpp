@@ -91,17 +91,18 @@ std::vector<std::string> names_of(const RoundPlan &round)
 }
 
 // The library starts no gatherer beside one that runs, whatever the plan says.
-void report_other_gatherer(const RoundPlan &round, const Plan &plan, const std::string &suffix)
+void report_other_gatherer(const RoundPlan &round, const Plan &plan, int vendor)
 {
     std::vector<std::string> args;
     for (const Job &job : round.jobs) {
         for (const auto &target : job.targets) {
-            if (target && round.suites[job.suite].items[target->item].name == kGatherer) {
+            if (target && is_gatherer(round.suites[job.suite].items[target->item].name, vendor)) {
                 args.push_back(attribute(plan.elements()[target->element], "args").value_or(""));
             }
         }
     }
-    if (const std::string other = other_gatherer(args, suffix); !other.empty()) {
+    const std::string other = other_gatherer(args, vendor_suffix(vendor).value_or(""));
+    if (!other.empty()) {
         say("a gatherer is running already, as {}: the library triggers that one, and starts none",
             in_quotes(other));
     }
@@ -215,7 +216,7 @@ Exit run(RunOptions options)
     const RoundPlan round = plan_round(paths, plan, options.as_group);
     require_programs(names_of(round), vendor, options.force);
     if (!options.quiet) {
-        report_other_gatherer(round, plan, vendor_suffix(vendor).value_or(""));
+        report_other_gatherer(round, plan, vendor);
     }
     const bool is_sent = checked.storing != Storing::as_file;
     const bool is_placed = !is_sent && !options.plan.empty();

@@ -39,7 +39,7 @@ std::string for_all_processes(const std::string &file)
 // Kept open, or a FIFO's reader would see its end before the library writes.
 struct OpenedLog {
     Descriptor descriptor{-1};
-    std::string label; // of --log alone: an item's report cannot help its run's log
+    std::string label; // empty if its loss is not reported
 };
 
 OpenedLog &opened()
@@ -64,7 +64,7 @@ NamedFile log_file(const std::string &option)
     return {kLogVariable, inherited};
 }
 
-void choose_log(const std::string &option)
+void choose_log(const std::string &option, bool reports_loss)
 {
     const NamedFile file = log_file(option);
     if (file.second.empty()) {
@@ -79,7 +79,7 @@ void choose_log(const std::string &option)
         throw Failure(Cause::device, "{} cannot be written: {}; name another file", label(file),
                       std::strerror(errno));
     }
-    opened() = {std::move(log), option.empty() ? "" : label(file)};
+    opened() = {std::move(log), reports_loss ? label(file) : ""};
     setenv(kLogVariable, path.c_str(), 1);
 }
 

@@ -18,10 +18,11 @@ std::string label(const NamedFile &file);
 // The file that --log names, or else VR_LOG_FILE; its name is empty for no log.
 NamedFile log_file(const std::string &option);
 
-// Sends the library's log there; to be called before the library is.
-void choose_log(const std::string &option);
+// Sends the library's log there; to be called before the library is. log_loss() reports
+// nothing if that is not wanted.
+void choose_log(const std::string &option, bool reports_loss = true);
 
-// Why --log's file is incomplete, which the library does not report; empty if it is complete.
+// Why the log's file is incomplete, which the library does not report; empty if it is complete.
 std::string log_loss();
 
 } // namespace fptest

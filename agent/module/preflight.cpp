@@ -118,8 +118,12 @@ void require_programs(const std::vector<std::string> &items, int vendor, bool fo
         if (is_gatherer(item, vendor)) {
             has_gatherer = true;
         } else {
-            for (const int any : {0, 1, 2}) { // the vendor may have been another one
-                programs.push_back(program_of(item, *vendor_suffix(any)));
+            programs.push_back(program);
+            for (const int other : {0, 1, 2}) { // the vendor may have been another one
+                const std::string then = program_of(item, *vendor_suffix(other));
+                if (then != program_of(kGatherer, "") && then != program_of(kGatherer, "_ca")) {
+                    programs.push_back(then);
+                }
             }
         }
         if (is_plain_name(item) && access(program.c_str(), X_OK) != 0 &&

@@ -301,7 +301,7 @@ bool ask_to_end(const std::vector<Leftover> &processes)
 bool lives(const Leftover &process)
 {
     const auto found = read_process(fmt::format("/proc/{}", process.process));
-    return found && lives(*found) && found->born == process.born;
+    return found && lives(*found) && found->born == process.born && found->group == process.group;
 }
 
 char state_of(pid_t process)

@@ -64,6 +64,7 @@ bool signal_each(const std::vector<Leftover> &processes, int signal);
 // As signal_each() with SIGTERM, which reaches suspended ones as well.
 bool ask_to_end(const std::vector<Leftover> &processes);
 
+// Whether it has not ended, nor moved to another process group, as a new item does.
 bool lives(const Leftover &process);
 
 // "D", "S", ...: the state of a process as ps shows it; '?' if it is gone.

@@ -100,6 +100,7 @@ struct RunningItem {
     bool meets_other = false;    // the library's stop hits another process
     bool was_stopped = false;    // a stop or signal has reached it
     bool killed = false;
+    bool goes_on = false; // though it was killed
     TimePoint stop_wanted_at;
     TimePoint stop_tried_at;
 

@@ -20,6 +20,7 @@ namespace fptest
 namespace
 {
 
+constexpr std::chrono::milliseconds kLongestPause(25);
 constexpr std::size_t kSeen = 100; // reports kept for an item
 constexpr std::string_view kPlanName =
     std::string_view(kStoredPlan).substr(std::string_view(kStoredPlan).rfind('/') + 1);
@@ -76,18 +77,17 @@ ReportReader::ReportReader(Run &run, const std::vector<Reporter *> &reporters, R
     inotify_add_watch(saves_.get(), folder.c_str(), IN_CLOSE_WRITE | IN_MOVED_TO);
 }
 
-void ReportReader::poll()
+void ReportReader::poll(When when)
 {
     is_saved_ = take_saves() || is_saved_;
     const auto status = stored_plan_status();
     if ((running_.items.empty() && judged_.empty()) || !status ||
-        std::chrono::steady_clock::now() < next_look_ ||
+        (when != When::at_once && std::chrono::steady_clock::now() < next_look_) ||
         (!is_saved_ && status->st_mtim.tv_sec == plan_status_.st_mtim.tv_sec &&
          status->st_mtim.tv_nsec == plan_status_.st_mtim.tv_nsec &&
          status->st_size == plan_status_.st_size && status->st_ino == plan_status_.st_ino)) {
         return;
     }
-    // a large plan that is saved all the time takes no more than half of a core
     const auto begin = std::chrono::steady_clock::now();
     is_saved_ = false;
     const std::string text = read_stored_plan().value_or("");
@@ -101,7 +101,7 @@ void ReportReader::poll()
         }
     }
     const auto end = std::chrono::steady_clock::now();
-    next_look_ = end + (end - begin);
+    next_look_ = end + std::min<std::chrono::nanoseconds>(end - begin, kLongestPause);
 }
 
 // Whether the plan has been saved since. Two saves in one tick of the clock of files may
@@ -113,7 +113,8 @@ bool ReportReader::take_saves()
     for (ssize_t got = 0; (got = ::read(saves_.get(), told.data(), told.size())) > 0;) {
         for (std::size_t at = 0; at < static_cast<std::size_t>(got);) {
             const auto *event = reinterpret_cast<const inotify_event *>(&told[at]);
-            found = found || kPlanName == event->name;
+            found = found || (event->mask & IN_Q_OVERFLOW) != 0 ||
+                    (event->len > 0 && kPlanName == event->name);
             at += sizeof *event + event->len;
         }
     }

@@ -36,8 +36,10 @@ class ReportReader
         return saves_.get();
     }
 
-    // Reads the plan if it has changed; skips one that is just being written.
-    void poll();
+    // Reads the plan if it has changed; skips one that is just being written. A plan that is
+    // saved all the time leaves time for other things, unless something is decided now.
+    enum class When { as_time_allows, at_once };
+    void poll(When when = When::as_time_allows);
 
     void read(const std::optional<Plan> &plan);
 

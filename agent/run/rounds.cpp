@@ -124,7 +124,7 @@ void say_at_end(const std::string &text)
     }
 }
 
-// Waits for the reports' readers, but not for long after an interrupt. False if a signal
+// Waits for the readers of results, but not for long after an interrupt. False if a signal
 // comes first, or the time is up.
 bool flush(const std::vector<Reporter *> &reporters, Signals &signals, bool is_interrupted)
 {

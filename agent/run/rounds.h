@@ -15,8 +15,8 @@
 namespace fptest
 {
 
-// Calls store() once every report has begun. False if the run was interrupted. Throws a
-// Failure if it broke off, the plan was not stored, or a report is incomplete.
+// Calls store() once every result file has begun. False if the run was interrupted. Throws a
+// Failure if it broke off, the plan was not stored, or a result file is incomplete.
 bool run_rounds(const std::vector<Reporter *> &reporters, const Runner::Options &options,
                 LibraryProcess &library, Signals &signals, Run &run, const RoundPlan &plan,
                 const std::function<void()> &store);

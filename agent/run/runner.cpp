@@ -390,6 +390,9 @@ void Runner::finish(RunningItem &active, TimePoint end)
     if (active.done) {
         return;
     }
+    if (active.gathers) {
+        reader_.poll(ReportReader::When::at_once);
+    }
     active.done = true;
     ItemRun &result = item_at(run_, active.place);
     result.seconds = std::max(0.0, Seconds(end - active.start).count());

@@ -214,13 +214,13 @@ void Runner::end_stop(const LibraryProcess::Event &event)
 void Runner::cannot_stop(RunningItem &active)
 {
     const std::vector<Leftover> left = item_processes();
-    ItemRun &result = item_at(run_, active.place);
+    const ItemRun &result = item_at(run_, active.place);
     break_off(fmt::format("{} cannot be killed: {} goes on running",
                           one_line(result.group + "/" + result.name), described(left)));
     active.was_stopped = true;
     active.killed = true;
+    active.goes_on = true;
     finish(active, now());
-    result.reason += ", and goes on running";
 }
 
 // Without those that earlier items left running.
@@ -321,7 +321,7 @@ void Runner::make_way_for(const Job &job)
         gatherer_runs_ = note_gatherer();
         require_trigger_port(); // an item may have taken it
     }
-    reader_.poll();
+    reader_.poll(ReportReader::When::at_once);
     reader_.forget(job);
 }
 
@@ -334,7 +334,7 @@ void Runner::end_round()
     if (gatherer_may_report_late_) {
         end_gatherer();
     }
-    reader_.poll();
+    reader_.poll(ReportReader::When::at_once);
     reader_.forget_round();
 }
 

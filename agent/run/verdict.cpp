@@ -18,7 +18,7 @@ namespace
 {
 
 constexpr char kOverwrittenAfter[] =
-    "; a process with an old copy of the plan has since overwritten it";
+    "; meanwhile a process with an old copy of the plan has overwritten its report";
 
 std::string reported(const ItemReport &report)
 {
@@ -129,11 +129,11 @@ class Judge
         }
         const bool is_interrupted = active_.stop == Outcome::stopped;
         if (active_.killed) {
-            return fmt::format("killed after {}, as it did not end when it was asked to{}",
+            return fmt::format("killed after {}, as it did not end when it was asked to{}{}",
                                is_interrupted ? "the run was interrupted by " +
                                                     name_for_people(context_.signal)
                                               : duration(seconds),
-                               if_written_over());
+                               active_.goes_on ? ", and goes on running" : "", if_written_over());
         }
         return is_interrupted
                    ? fmt::format("stopped by {}", name_for_people(context_.signal))

@@ -544,9 +544,14 @@ TEST_F(RunGatherer, IsAnyOtherItemWhereItIsTheSecondVendors)
 {
     set_vendor("2");
     const device::Socket taken = device::listen_on(device::kTriggerPort);
-    const Ended ended = run_group({{"SensorProbe", "--group G --seconds 0.1"}});
+    const Items items = {{"SensorProbe", "--group G --seconds 0.1"}};
+    const Ended ended = run_group(items);
     EXPECT_EQ(ended.status, 0) << ended.err;
     EXPECT_THAT(running_items(), IsEmpty());
+
+    const Gatherer of_another_vendor("sleep 60");
+    EXPECT_EQ(run_group(items).err, "");
+    EXPECT_THAT(outcomes(), ElementsAre("SensorProbe: passed"));
 }
 
 } // namespace
