@@ -121,7 +121,7 @@ void list_items(const std::vector<Path> &paths, const Plan &plan, const std::str
 }
 
 // The running item is stopped by the library's process, which sees that this one is gone;
-// the reports stay as far as they were written.
+// result files stay as far as they were written.
 [[noreturn]] void exit_at_once()
 {
     pollfd errors{STDERR_FILENO, POLLOUT, 0};

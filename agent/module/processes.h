@@ -32,7 +32,7 @@ std::optional<pid_t> met_by_stop(const std::string &item);
 std::optional<std::pair<std::string, pid_t>>
 process_of_any(const std::vector<std::string> &programs);
 
-// What a library's process has started, and what that has.
+// What a library's process has started, directly or not.
 class ChildProcesses
 {
   public:
