@@ -151,13 +151,11 @@ void require_programs(const std::vector<std::string> &items, int vendor, bool fo
 std::string other_gatherer(const std::vector<std::string> &args, const std::string &suffix)
 {
     const std::string program = program_of(kGatherer, suffix);
-    const auto running = process_of_any(
-        {program_of(kGatherer, *vendor_suffix(0)), program_of(kGatherer, *vendor_suffix(1))});
-    std::string started =
-        running ? read_file(fmt::format("/proc/{}/cmdline", running->second)).value_or("") : "";
-    if (!running || !started.starts_with(running->first)) { // the library finds no script
+    const auto running = found_as_gatherer();
+    if (!running) {
         return {};
     }
+    std::string started = read_file(fmt::format("/proc/{}/cmdline", running->second)).value_or("");
     started.erase(started.find_last_not_of('\0') + 1);
     std::ranges::replace(started, '\0', ' ');
     const bool is_other = std::ranges::any_of(args, [&](const std::string &one) {

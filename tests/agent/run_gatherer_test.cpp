@@ -339,11 +339,14 @@ TEST_F(RunGatherer, MayRunAnotherProgramInItsOwnPlace)
     const std::string gatherer = "--help; exec -a " + std::string(kProbe) +
                                  ".real /system/bin/Item gather report-here G SensorProbe 100 0 "
                                  "one gather sleep 1 report-here G SensorProbe 100 0 two sleep 60";
+    std::string told;
     for (const char *description : {"one", "two"}) {
-        run_group({{"SensorProbe", gatherer}}, {"--timeout", "5"});
+        told = run_group({{"SensorProbe", gatherer}}, {"--timeout", "5"}).err;
         EXPECT_THAT(outcomes(), ElementsAre("SensorProbe: passed"));
         EXPECT_EQ(end_of(0).at("description"), description);
     }
+    EXPECT_THAT(told, HasSubstr("fptest: a gatherer is running already, as "
+                                "'/system/bin/SensorProbe.real gather "));
 }
 
 TEST_F(RunGatherer, OfAnEarlierRunIsEndedWithItsHelpers)
