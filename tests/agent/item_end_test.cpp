@@ -18,7 +18,7 @@ bool is_suspended(pid_t process)
     return device::status_field(process, "State").starts_with('T');
 }
 
-class ItemEnd : public Run
+class ItemEnd : public RunCommand
 {
   protected:
     static std::string reason(std::size_t item)

@@ -11,7 +11,7 @@
 namespace
 {
 
-using OldCopy = Run;
+using OldCopy = RunCommand;
 
 TEST_F(OldCopy, BringsBackNoResultOfAnEarlierRun)
 {

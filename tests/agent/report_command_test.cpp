@@ -19,7 +19,7 @@ namespace
 const std::string kPlan =
     plan_of({{"Bringup", {{"SpiCheck", "a"}, {"DeadPixel", ""}}}, {"Endurance", {{"BurnIn", ""}}}});
 
-class Report : public FptestTest
+class ReportCommand : public FptestTest
 {
   protected:
     void SetUp() override
@@ -56,7 +56,7 @@ class Report : public FptestTest
     }
 };
 
-TEST_F(Report, WritesProgressResultAndDescription)
+TEST_F(ReportCommand, WritesProgressResultAndDescription)
 {
     const Ended ended = report({"Bringup", "SpiCheck", "--progress", "50", "--result", "-2",
                                 "--description", "half of it"});
@@ -71,7 +71,7 @@ TEST_F(Report, WritesProgressResultAndDescription)
 }
 
 // Mini-XML writes a byte order mark and does not read it again.
-TEST_F(Report, TakesADescriptionWithAByteOrderMark)
+TEST_F(ReportCommand, TakesADescriptionWithAByteOrderMark)
 {
     for (const auto &[description, shown] :
          std::vector<std::pair<std::string, std::string>>{{"a\uFEFF"
@@ -87,7 +87,7 @@ TEST_F(Report, TakesADescriptionWithAByteOrderMark)
     }
 }
 
-TEST_F(Report, TakesItsOptionsInAnyPlace)
+TEST_F(ReportCommand, TakesItsOptionsInAnyPlace)
 {
     EXPECT_EQ(report({"--result=1", "Endurance", "--progress=100", "BurnIn"}).status, 0);
     EXPECT_EQ(row("BurnIn"), "Endurance BurnIn 100 1");
@@ -98,7 +98,7 @@ TEST_F(Report, TakesItsOptionsInAnyPlace)
     EXPECT_EQ(row("BurnIn"), "Endurance BurnIn 0 0 -x");
 }
 
-TEST_F(Report, ReplacesTheReportBefore)
+TEST_F(ReportCommand, ReplacesTheReportBefore)
 {
     EXPECT_EQ(report({"Bringup", "SpiCheck", "--progress", "10", "--result", "-2", "--description",
                       "first"})
@@ -110,7 +110,7 @@ TEST_F(Report, ReplacesTheReportBefore)
     EXPECT_EQ(row("SpiCheck"), "Bringup SpiCheck 100 0");
 }
 
-TEST_F(Report, TakesAnyNumberThatThePlanCanHold)
+TEST_F(ReportCommand, TakesAnyNumberThatThePlanCanHold)
 {
     const std::pair<std::string, std::string> numbers[] = {
         {"-99999999", "-99999999"},
@@ -133,7 +133,7 @@ struct Text {
     bool is_replaced = false;
 };
 
-class ReportDescription : public Report, public WithParamInterface<Text>
+class ReportDescription : public ReportCommand, public WithParamInterface<Text>
 {
 };
 
@@ -162,7 +162,7 @@ INSTANTIATE_TEST_SUITE_P(
            Text{"TenThousandCharacters", std::string(10000, 'd'), std::string(10000, 'd')}),
     [](const auto &text) { return text.param.name; });
 
-TEST_F(Report, NamesTheNearestGroupAndAllThereAre)
+TEST_F(ReportCommand, NamesTheNearestGroupAndAllThereAre)
 {
     expect_refusal(2,
                    "fptest: the stored plan has no group 'Brngup'; did you mean 'Bringup'? It has "
@@ -172,7 +172,7 @@ TEST_F(Report, NamesTheNearestGroupAndAllThereAre)
                    {"x", "SpiCheck", "--progress", "1", "--result", "0"});
 }
 
-TEST_F(Report, NamesTheNearestItemAndAllOfTheGroup)
+TEST_F(ReportCommand, NamesTheNearestItemAndAllOfTheGroup)
 {
     expect_refusal(2,
                    "fptest: group 'Bringup' of the stored plan has no item 'SpiChek'; did you mean "
@@ -185,7 +185,7 @@ TEST_F(Report, NamesTheNearestItemAndAllOfTheGroup)
                    {"Bringup", "BurnIn", "--progress", "1", "--result", "0"});
 }
 
-TEST_F(Report, WantsAPlan)
+TEST_F(ReportCommand, WantsAPlan)
 {
     fs::remove(kPlanFile);
     const Ended ended = report({"Bringup", "SpiCheck", "--progress", "1", "--result", "0"});
@@ -195,7 +195,7 @@ TEST_F(Report, WantsAPlan)
     EXPECT_FALSE(fs::exists(kPlanFile));
 }
 
-TEST_F(Report, WantsAPlanThatLoads)
+TEST_F(ReportCommand, WantsAPlanThatLoads)
 {
     const std::string broken = "<P><CmdGroup name=\"G\"><Cmd name=\"I\" result=";
     write_file(kPlanFile, broken);
@@ -206,7 +206,7 @@ TEST_F(Report, WantsAPlanThatLoads)
     EXPECT_EQ(read_file(kPlanFile), broken);
 }
 
-TEST_F(Report, WaitsForAPlanThatIsJustBeingSaved)
+TEST_F(ReportCommand, WaitsForAPlanThatIsJustBeingSaved)
 {
     write_file(kPlanFile, "");
     const std::jthread saves([] {
@@ -218,7 +218,7 @@ TEST_F(Report, WaitsForAPlanThatIsJustBeingSaved)
     EXPECT_THAT(read_file(kPlanFile), HasSubstr("progress=\"1\""));
 }
 
-TEST_F(Report, SaysThatThePlanIsNotWritable)
+TEST_F(ReportCommand, SaysThatThePlanIsNotWritable)
 {
     fs::permissions(kPlanFile, fs::perms::owner_read);
     const Start start{
@@ -231,7 +231,7 @@ TEST_F(Report, SaysThatThePlanIsNotWritable)
     EXPECT_EQ(read_file(kPlanFile), kPlan);
 }
 
-TEST_F(Report, SaysThatTheDiskIsFull)
+TEST_F(ReportCommand, SaysThatTheDiskIsFull)
 {
     if (is_in_place()) {
         GTEST_SKIP() << "in place, the disk is the container's own and is not to be filled";
@@ -259,7 +259,7 @@ TEST_F(Report, SaysThatTheDiskIsFull)
               0);
 }
 
-TEST_F(Report, WritesTheLibrarysLogWhereItIsTold)
+TEST_F(ReportCommand, WritesTheLibrarysLogWhereItIsTold)
 {
     EXPECT_EQ(
         report({"Bringup", "SpiCheck", "--progress", "1", "--result", "0", "--log", work("log")})
@@ -269,7 +269,7 @@ TEST_F(Report, WritesTheLibrarysLogWhereItIsTold)
     EXPECT_EQ(read_file(device::kLogFile), "");
 }
 
-TEST_F(Report, LosesNothingOfManyAtTheSameTime)
+TEST_F(ReportCommand, LosesNothingOfManyAtTheSameTime)
 {
     std::string plan = "<P><CmdGroup name=\"G\">";
     std::string commands;
@@ -289,7 +289,7 @@ TEST_F(Report, LosesNothingOfManyAtTheSameTime)
     }
 }
 
-TEST_F(Report, LosesNothingBesideASampleItem)
+TEST_F(ReportCommand, LosesNothingBesideASampleItem)
 {
     write_file(kPlanFile, group_of({{"BurnIn", "--group G --seconds 1"}, {"mine", ""}}));
     FptestProcess item({"send", "XMLNodePath::P/G/BurnIn"});
@@ -304,7 +304,7 @@ TEST_F(Report, LosesNothingBesideASampleItem)
     EXPECT_EQ(row("BurnIn"), "G BurnIn 100 0 stable for 1 s");
 }
 
-TEST_F(Report, NeedsNoDeviceButThePlan)
+TEST_F(ReportCommand, NeedsNoDeviceButThePlan)
 {
     // it does not wait for a run that it is part of
     write_file(kPlanFile, group_of({{"Script", "'fptest report G Script --progress 100 --result 0 "

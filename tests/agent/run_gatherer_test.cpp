@@ -32,7 +32,7 @@ struct Gatherer : support::Process {
     }
 };
 
-class RunGatherer : public Run
+class RunGatherer : public RunCommand
 {
   protected:
     static bool library_waits_for_gatherer()
@@ -505,7 +505,7 @@ TEST_F(RunGatherer, HasWhatItLeavesRunningNamed)
 
 // --- vendors -------------------------------------------------------------------------
 
-TEST_F(Run, RunsTheVendorsPrograms)
+TEST_F(RunCommand, RunsTheVendorsPrograms)
 {
     const std::string path = plan(group_of({{"Item", notes("a")}, {"Other", "report G 100 0 b"}}));
     const std::map<std::string, std::string> suffixes = {{"1", "_ca"}, {"2", "_ca_qsee"}};
@@ -526,7 +526,7 @@ TEST_F(Run, RunsTheVendorsPrograms)
     }
 }
 
-TEST_F(Run, StopsTheVendorsPrograms)
+TEST_F(RunCommand, StopsTheVendorsPrograms)
 {
     set_vendor("2");
     EXPECT_EQ(run_group({{"Item", kSleeps}, {"Other", kPasses}}, {"--timeout", "1"}).status, 1);

@@ -19,7 +19,7 @@ const std::string kTwoGroups =
     plan_of({{"Bringup", {{"Item", "note /tmp/scene/order"}, {"Other", ""}}},
              {"Endurance", {{"Third", ""}}}});
 
-class Refusal : public Run
+class Refusal : public RunCommand
 {
   protected:
     // Runs it and expects that exit status, that line, and that nothing was started.
@@ -282,7 +282,7 @@ TEST_F(Refusal, WhereProgramsAreMissing)
            {"--plan", path, "P/G"});
 }
 
-TEST_F(Run, RunsTheRestWhereProgramsAreMissingByForce)
+TEST_F(RunCommand, RunsTheRestWhereProgramsAreMissingByForce)
 {
     EXPECT_EQ(run_group({{"Nobody", ""}, {"Item", kPasses}}, {"--force"}).status, 1);
     EXPECT_THAT(outcomes(), ElementsAre("Nobody: no result", "Item: passed"));
@@ -391,7 +391,7 @@ TEST_F(Refusal, OfASecondRunAtTheSameTime)
     EXPECT_EQ(run_fptest({"run", "P/G"}).status, 0);
 }
 
-class FullDisk : public Refusal
+class RunOnFullDisk : public Refusal
 {
   protected:
     void SetUp() override
@@ -403,7 +403,7 @@ class FullDisk : public Refusal
     }
 };
 
-TEST_F(FullDisk, StoresNoPlan)
+TEST_F(RunOnFullDisk, StoresNoPlan)
 {
     fill_disk();
     expect(3,
@@ -413,7 +413,7 @@ TEST_F(FullDisk, StoresNoPlan)
     EXPECT_FALSE(fs::exists(kPlanFile));
 }
 
-TEST_F(FullDisk, LeavesTheStoredPlanAsItWas)
+TEST_F(RunOnFullDisk, LeavesTheStoredPlanAsItWas)
 {
     std::string reported = group_of({{"Item", notes("new")}});
     reported.insert(reported.find("/>"), " progress=\"100\" result=\"0\" description=\"old\"");
@@ -426,7 +426,7 @@ TEST_F(FullDisk, LeavesTheStoredPlanAsItWas)
     EXPECT_EQ(read_file(kPlanFile), reported);
 }
 
-TEST_F(FullDisk, SaysThatTheLogLacksItsEnd)
+TEST_F(RunOnFullDisk, SaysThatTheLogLacksItsEnd)
 {
     fill_disk();
     const std::string log = "/data/vorlane/log";
@@ -437,7 +437,7 @@ TEST_F(FullDisk, SaysThatTheLogLacksItsEnd)
                              "another file\n");
 }
 
-TEST_F(FullDisk, StoresAPlanInTheRoomOfTheOldOne)
+TEST_F(RunOnFullDisk, StoresAPlanInTheRoomOfTheOldOne)
 {
     write_file(kPlanFile, kTwoGroups);
     fill_disk();

@@ -20,7 +20,7 @@ namespace
 
 // --- the reports ---------------------------------------------------------------------
 
-TEST_F(Run, TellsTheSameCountsInEveryReport)
+TEST_F(RunCommand, TellsTheSameCountsInEveryReport)
 {
     // one of each kind of end
     const std::string text = plan_of(
@@ -46,7 +46,7 @@ TEST_F(Run, TellsTheSameCountsInEveryReport)
     }
 }
 
-TEST_F(Run, WritesJsonToStandardOutputInPlaceOfTheView)
+TEST_F(RunCommand, WritesJsonToStandardOutputInPlaceOfTheView)
 {
     const Ended ended =
         run_fptest({"run", "--json", "-", "--plan", plan(group_of(kThreeThatNote)), "P/G"});
@@ -54,7 +54,7 @@ TEST_F(Run, WritesJsonToStandardOutputInPlaceOfTheView)
     EXPECT_EQ(tally_of_json(ended.out), (Tally{3, 0, 0}));
 }
 
-TEST_F(Run, IsATestForProve)
+TEST_F(RunCommand, IsATestForProve)
 {
     support::write_file(kPlanFile, plan_of({{"G", {{"Item", kPasses}}},
                                             {"Bad", {{"Other", "report Bad 100 1 x"}}}}));
@@ -71,7 +71,7 @@ TEST_F(Run, IsATestForProve)
     EXPECT_THAT(ended.out, HasSubstr("Result: FAIL"));
 }
 
-TEST_F(Run, TellsAHostileDescriptionTheSameInEveryReport)
+TEST_F(RunCommand, TellsAHostileDescriptionTheSameInEveryReport)
 {
     const std::string plain =
         "]]> <a b='c'>&amp;\"</a> # SKIP \\ x # TODO\none\nok 1 - faked\n1..7\n"
@@ -101,7 +101,7 @@ TEST_F(Run, TellsAHostileDescriptionTheSameInEveryReport)
 
 // --- what items print ------------------------------------------------------------------
 
-TEST_F(Run, KeepsWhatItemsPrintForTheReports)
+TEST_F(RunCommand, KeepsWhatItemsPrintForTheReports)
 {
     const Ended ended =
         run_group({{"Item", "say out complain err report G 100 0 fine"}, {"Other", kPasses}},
@@ -119,7 +119,7 @@ TEST_F(Run, KeepsWhatItemsPrintForTheReports)
     EXPECT_THAT(tests.at(1).all("system-out"), IsEmpty());
 }
 
-TEST_F(Run, KeepsApartWhatItemsPrintThoughItComesLate)
+TEST_F(RunCommand, KeepsApartWhatItemsPrintThoughItComesLate)
 {
     FptestProcess fptest(with_group(
         {{"Item", "say one note /tmp/scene/begun await /tmp/scene/go report G 100 0 x complain 1"},
@@ -142,7 +142,7 @@ TEST_F(Run, KeepsApartWhatItemsPrintThoughItComesLate)
 }
 
 // As "> /dev/stderr" does: the file is no pipe.
-TEST_F(Run, KeepsWhatIsPrintedAfterAnItemHasTruncatedItsOutput)
+TEST_F(RunCommand, KeepsWhatIsPrintedAfterAnItemHasTruncatedItsOutput)
 {
     run_group(
         {{"Item", "flood 30000"},
@@ -154,7 +154,7 @@ TEST_F(Run, KeepsWhatIsPrintedAfterAnItemHasTruncatedItsOutput)
     EXPECT_THAT(output(3), StartsWith("line 1\nline 2\n"));
 }
 
-TEST_F(Run, KeepsTheEndOfALongOutput)
+TEST_F(RunCommand, KeepsTheEndOfALongOutput)
 {
     const Ended ended = run_group(
         {{"Item", "flood 1000000 say 'the last line' report G 100 1 x"}, {"Other", "say short"}});
@@ -174,7 +174,7 @@ long long memory_behind(const std::string &descriptor)
     return status.st_blocks * 512LL;
 }
 
-TEST_F(Run, HoldsNoMoreOfAnOutputThanItTells)
+TEST_F(RunCommand, HoldsNoMoreOfAnOutputThanItTells)
 {
     FptestProcess fptest(with_group(
         {{"Item", "flood 60000000 say end note /tmp/scene/printed await /tmp/scene/go"}}));
@@ -188,7 +188,7 @@ TEST_F(Run, HoldsNoMoreOfAnOutputThanItTells)
     EXPECT_THAT(output(0), EndsWith("end\n"));
 }
 
-TEST_F(Run, StartsItemsAsAnyProgramIsStarted)
+TEST_F(RunCommand, StartsItemsAsAnyProgramIsStarted)
 {
     FptestProcess fptest(
         with_group({{"Item", "note /tmp/scene/begun await /tmp/scene/go report G 100 0 x"}},
@@ -220,7 +220,7 @@ TEST_F(Run, StartsItemsAsAnyProgramIsStarted)
 
 // --- reports that cannot be written ----------------------------------------------------
 
-TEST_F(Run, RunsNothingWhereItsTapCannotBeWritten)
+TEST_F(RunCommand, RunsNothingWhereItsTapCannotBeWritten)
 {
     const Start start{
         .arguments = {"run", "--tap", "--plan", plan(group_of({{"Item", kPasses}})), "P/G"},
@@ -230,7 +230,7 @@ TEST_F(Run, RunsNothingWhereItsTapCannotBeWritten)
     EXPECT_EQ(ended.err, "fptest: the TAP output: No space left on device; nothing was run\n");
 }
 
-TEST_F(Run, GoesOnWithoutAReportThatCannotBeWrittenAnyMore)
+TEST_F(RunCommand, GoesOnWithoutAReportThatCannotBeWrittenAnyMore)
 {
     const std::string fifo = work("json");
     ASSERT_EQ(mkfifo(fifo.c_str(), 0600), 0);
@@ -248,7 +248,7 @@ TEST_F(Run, GoesOnWithoutAReportThatCannotBeWrittenAnyMore)
     EXPECT_THAT(ended.out, HasSubstr("\n2 passed, 0 failed, "));
 }
 
-TEST_F(Run, NamesEveryReportThatFailsThoughTheRunIsInterrupted)
+TEST_F(RunCommand, NamesEveryReportThatFailsThoughTheRunIsInterrupted)
 {
     for (const int signal : {0, SIGINT}) {
         std::vector<Descriptor> readers;
@@ -285,7 +285,7 @@ Ended run_with_limit(int blocks, const std::string &options)
     return support::run(start);
 }
 
-TEST_F(Run, CountsNoOutputOfEarlierItemsAgainstTheLimitOfFiles)
+TEST_F(RunCommand, CountsNoOutputOfEarlierItemsAgainstTheLimitOfFiles)
 {
     plan(device::plan_of({{"G",
                            {{"Script", "'head -c 12000 /dev/zero; fptest report G Script "
@@ -293,7 +293,7 @@ TEST_F(Run, CountsNoOutputOfEarlierItemsAgainstTheLimitOfFiles)
     EXPECT_EQ(run_with_limit(60, "--repeat 4").status, 0);
 }
 
-TEST_F(Run, GoesOnWhereAReportIsTooLongForTheLimitOfFiles)
+TEST_F(RunCommand, GoesOnWhereAReportIsTooLongForTheLimitOfFiles)
 {
     plan(kOnePasses);
     const Ended ended = run_with_limit(2, "--repeat 20 --json /tmp/scene/json");

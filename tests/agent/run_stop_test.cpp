@@ -24,7 +24,7 @@ const device::PlanItem kScriptThatSleeps = {
 
 // --- items that take too long --------------------------------------------------------
 
-TEST_F(Run, StopsAnItemThatTakesTooLongThroughTheLibrary)
+TEST_F(RunCommand, StopsAnItemThatTakesTooLongThroughTheLibrary)
 {
     const Ended ended = run_group({{"Item", kSleeps}, {"Other", kPasses}}, {"--timeout", "1"});
     EXPECT_EQ(ended.status, 1);
@@ -40,7 +40,7 @@ TEST_F(Run, StopsAnItemThatTakesTooLongThroughTheLibrary)
     EXPECT_THAT(running_items(), IsEmpty());
 }
 
-TEST_F(Run, AsksTheItemToStopWhereAnotherProcessHasItsName)
+TEST_F(RunCommand, AsksTheItemToStopWhereAnotherProcessHasItsName)
 {
     run_group({{"Other", "report G 100 0 fine; /system/bin/Item ignore-stop sleep 60 &amp;"},
                {"Item", kSleeps}},
@@ -49,7 +49,7 @@ TEST_F(Run, AsksTheItemToStopWhereAnotherProcessHasItsName)
     EXPECT_EQ(read_file(work("signal")), "SIGTERM\n");
 }
 
-TEST_F(Run, StopsItemsOfAGroupsCommandOneByOne)
+TEST_F(RunCommand, StopsItemsOfAGroupsCommandOneByOne)
 {
     const Ended ended =
         run_group({{"Item", kSleeps}, {"Other", kPasses}, {"Third", kSleeps}, {"Fourth", kPasses}},
@@ -61,7 +61,7 @@ TEST_F(Run, StopsItemsOfAGroupsCommandOneByOne)
     EXPECT_EQ(read_file(work("signal")), "SIGTERM\nSIGTERM\n");
 }
 
-TEST_F(Run, LeavesAnItemAloneThatIsWithinItsTime)
+TEST_F(RunCommand, LeavesAnItemAloneThatIsWithinItsTime)
 {
     // a limit for each item and not for all of them
     for (const std::string way : {"--quiet", "--as-group"}) {
@@ -76,7 +76,7 @@ TEST_F(Run, LeavesAnItemAloneThatIsWithinItsTime)
 
 // --- items that are scripts ----------------------------------------------------------
 
-TEST_F(Run, TakesTheReportsOfAShellScript)
+TEST_F(RunCommand, TakesTheReportsOfAShellScript)
 {
     FptestProcess fptest(
         with_group({{"Script", script("fptest report G Script --progress 50 --result -2; "
@@ -91,7 +91,7 @@ TEST_F(Run, TakesTheReportsOfAShellScript)
               "G/Script: passed, result 0, T s: by a script");
 }
 
-TEST_F(Run, StopsAScriptAtItsLimitThatIsNotFoundByItsName)
+TEST_F(RunCommand, StopsAScriptAtItsLimitThatIsNotFoundByItsName)
 {
     const Ended ended = run_group({kScriptThatSleeps, {"Other", kPasses}}, {"--timeout", "0.5"});
     EXPECT_EQ(ended.status, 1);
@@ -106,7 +106,7 @@ TEST_F(Run, StopsAScriptAtItsLimitThatIsNotFoundByItsName)
 
 // --- interrupted ---------------------------------------------------------------------
 
-class Interrupted : public Run, public WithParamInterface<int>
+class Interrupted : public RunCommand, public WithParamInterface<int>
 {
 };
 
@@ -159,7 +159,7 @@ INSTANTIATE_TEST_SUITE_P(, Interrupted, Values(SIGINT, SIGTERM, SIGHUP), [](cons
     return std::string("BySIG") + sigabbrev_np(signal.param);
 });
 
-TEST_F(Run, SaysInTheViewThatItWasInterrupted)
+TEST_F(RunCommand, SaysInTheViewThatItWasInterrupted)
 {
     FptestProcess fptest(with_group({{"Item", kSleeps}, {"Other", kPasses}}));
     ASSERT_TRUE(wait_for_events("progress", 1));
@@ -173,7 +173,7 @@ TEST_F(Run, SaysInTheViewThatItWasInterrupted)
                                             "SIGTERM\n0 passed, 1 failed, 1 not run, T s\n");
 }
 
-TEST_F(Run, RunsNothingWhereItIsInterruptedBefore)
+TEST_F(RunCommand, RunsNothingWhereItIsInterruptedBefore)
 {
     const Start start{.arguments = with_group(kThreeThatNote), .prepare = interrupted_before};
     EXPECT_EQ(run_fptest(start).status, 130);
@@ -182,7 +182,7 @@ TEST_F(Run, RunsNothingWhereItIsInterruptedBefore)
     EXPECT_THAT(reasons(), Each("interrupted by Ctrl-C"));
 }
 
-TEST_F(Run, StartsNoOtherItemOfAnInterruptedGroupsCommand)
+TEST_F(RunCommand, StartsNoOtherItemOfAnInterruptedGroupsCommand)
 {
     const std::string sleeps = "note /tmp/scene/order tell-signal /tmp/scene/signal sleep 60";
     FptestProcess fptest(with_group({{"Item", sleeps}, {"Other", sleeps}, {"Third", sleeps}},
@@ -200,7 +200,7 @@ TEST_F(Run, StartsNoOtherItemOfAnInterruptedGroupsCommand)
     EXPECT_EQ(reasons().at(2), "interrupted by Ctrl-C");
 }
 
-TEST_F(Run, StopsAScriptThatIsInterrupted)
+TEST_F(RunCommand, StopsAScriptThatIsInterrupted)
 {
     FptestProcess fptest(with_group({kScriptThatSleeps}));
     ASSERT_TRUE(wait_for_file("begun"));
@@ -211,7 +211,7 @@ TEST_F(Run, StopsAScriptThatIsInterrupted)
     EXPECT_THAT(running_items(), IsEmpty());
 }
 
-TEST_F(Run, LeavesAtOnceWhenInterruptedTwice)
+TEST_F(RunCommand, LeavesAtOnceWhenInterruptedTwice)
 {
     // a stop does not end it, and no second one is needed to leave
     const Items items = {{"Item", kPasses},
@@ -243,7 +243,7 @@ TEST_F(Run, LeavesAtOnceWhenInterruptedTwice)
     EXPECT_FALSE(is_there("after"));
 }
 
-TEST_F(Run, StopsWhatRunsAfterItHasLeftAtOnce)
+TEST_F(RunCommand, StopsWhatRunsAfterItHasLeftAtOnce)
 {
     // the first signal is not seen to its end: the second one comes with it
     FptestProcess fptest(with_group(
@@ -264,7 +264,7 @@ struct CutOffCase {
     std::string way;
 };
 
-class CutOff : public Run, public WithParamInterface<CutOffCase>
+class CutOff : public RunCommand, public WithParamInterface<CutOffCase>
 {
 };
 
@@ -299,7 +299,7 @@ INSTANTIATE_TEST_SUITE_P(
            CutOffCase{"Script", kScriptThatSleeps, "--quiet"}),
     [](const auto &one) { return "Of" + one.param.name; });
 
-TEST_F(Run, BeginsAfterOneThatWasKilledWhenItsItemsHaveEnded)
+TEST_F(RunCommand, BeginsAfterOneThatWasKilledWhenItsItemsHaveEnded)
 {
     FptestProcess fptest(with_group({kScriptThatSleeps, {"SensorProbe", "--group G --seconds 0"}}));
     ASSERT_TRUE(wait_for_file("begun"));
@@ -314,7 +314,7 @@ TEST_F(Run, BeginsAfterOneThatWasKilledWhenItsItemsHaveEnded)
     EXPECT_THAT(outcomes(), ElementsAre("SensorProbe: passed"));
 }
 
-TEST_F(Run, LosesTheItemInWhichTheLibrarysProcessEndedAndNoOther)
+TEST_F(RunCommand, LosesTheItemInWhichTheLibrarysProcessEndedAndNoOther)
 {
     FptestProcess fptest(with_group(
         {{"Item", kPasses}, {"Other", "note /tmp/scene/begun sleep 60"}, {"Third", kPasses}},
@@ -333,7 +333,7 @@ TEST_F(Run, LosesTheItemInWhichTheLibrarysProcessEndedAndNoOther)
     EXPECT_THAT(running_items(), IsEmpty());
 }
 
-TEST_F(Run, LosesTheRestOfAGroupsCommandInWhichTheLibrarysProcessEnded)
+TEST_F(RunCommand, LosesTheRestOfAGroupsCommandInWhichTheLibrarysProcessEnded)
 {
     FptestProcess fptest(with_group(
         {{"Item", "note /tmp/scene/begun sleep 60"}, {"Other", kPasses}}, {"--as-group"}));
@@ -345,7 +345,7 @@ TEST_F(Run, LosesTheRestOfAGroupsCommandInWhichTheLibrarysProcessEnded)
                                "signal 9; --log FILE keeps what it says");
 }
 
-TEST_F(Run, GoesOnWhereTheLibrarysProcessIsSuspendedBetweenTwoItems)
+TEST_F(RunCommand, GoesOnWhereTheLibrarysProcessIsSuspendedBetweenTwoItems)
 {
     const std::string path =
         plan(group_of({{"Item", "report G 100 0 fine; (sleep 0.02; kill -STOP $PPID) &amp;"},

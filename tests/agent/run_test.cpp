@@ -19,7 +19,7 @@ const std::string kHasErrors =
 
 // --- the plan ---------------------------------------------------------------------
 
-TEST_F(Run, StoresThePlanThatIsGivenAsItIsInPlaceOfAnOlderOne)
+TEST_F(RunCommand, StoresThePlanThatIsGivenAsItIsInPlaceOfAnOlderOne)
 {
     write_file(kPlanFile, group_of({{"Other", notes("old")}}) + std::string(3000, ' '));
     const std::string text = "<?xml version=\"1.0\"?>\n<P>\n\t<CmdGroup name='G'>\n"
@@ -29,7 +29,7 @@ TEST_F(Run, StoresThePlanThatIsGivenAsItIsInPlaceOfAnOlderOne)
     EXPECT_THAT(outcomes(), ElementsAre("Item: no result"));
 }
 
-TEST_F(Run, TakesThePlanFromStandardInput)
+TEST_F(RunCommand, TakesThePlanFromStandardInput)
 {
     const Ended ended = run_fptest({"run", "--plan", "-", "P/G"}, group_of(kThreeThatNote));
     EXPECT_EQ(ended.status, 0) << ended.err;
@@ -37,7 +37,7 @@ TEST_F(Run, TakesThePlanFromStandardInput)
     EXPECT_THAT(ended.out, StartsWith("<stdin>: 3 items, vendor 0\n"));
 }
 
-TEST_F(Run, UsesTheStoredPlanWhereNoneIsGiven)
+TEST_F(RunCommand, UsesTheStoredPlanWhereNoneIsGiven)
 {
     write_file(kPlanFile, group_of(kThreeThatNote));
     const Ended ended = run({"P/G"});
@@ -46,7 +46,7 @@ TEST_F(Run, UsesTheStoredPlanWhereNoneIsGiven)
     EXPECT_THAT(ended.out, StartsWith("/data/vorlane/src1.xml: 3 items, vendor 0\n"));
 }
 
-TEST_F(Run, SaysWhatItIsWarnedOfAndGoesOn)
+TEST_F(RunCommand, SaysWhatItIsWarnedOfAndGoesOn)
 {
     const std::string path = plan(plan_of({{"G", {{"Item", kPasses}}}, {"Empty", {}}}));
     const Ended ended = run({"--plan", path, "P/G"});
@@ -56,7 +56,7 @@ TEST_F(Run, SaysWhatItIsWarnedOfAndGoesOn)
     EXPECT_EQ(run_fptest({"run", "--quiet", "--plan", path, "P/G"}).err, "");
 }
 
-TEST_F(Run, RunsAStoredPlanAgainWhateverHasBeenReported)
+TEST_F(RunCommand, RunsAStoredPlanAgainWhateverHasBeenReported)
 {
     // none of it could be stored by a command
     file("long", ":" + std::string(10000, 'd'));
@@ -71,7 +71,7 @@ TEST_F(Run, RunsAStoredPlanAgainWhateverHasBeenReported)
     EXPECT_THAT(read_file(kPlanFile), HasSubstr(":" + std::string(10000, 'd')));
 }
 
-TEST_F(Run, RunsByForceWhatIsStoredOfAPlan)
+TEST_F(RunCommand, RunsByForceWhatIsStoredOfAPlan)
 {
     const std::string stored = group_of({{"Item", kPasses}}) + "\n";
     const Ended ended = run({"--force", "--plan", plan("::" + stored + ":and more"), "P/G"});
@@ -81,7 +81,7 @@ TEST_F(Run, RunsByForceWhatIsStoredOfAPlan)
 
 // --- what is sent to the library ----------------------------------------------------
 
-TEST_F(Run, RunsAGroupItemByItemAndLeavesNoProcess)
+TEST_F(RunCommand, RunsAGroupItemByItemAndLeavesNoProcess)
 {
     const Ended ended = run_group(kThreeThatNote);
     EXPECT_EQ(ended.status, 0) << ended.err;
@@ -200,7 +200,7 @@ const std::vector<PathCase> kPathCases = {
      {"Item: passed once", "Item: no result"}},
 };
 
-class RunPaths : public Run, public WithParamInterface<PathCase>
+class RunPaths : public RunCommand, public WithParamInterface<PathCase>
 {
 };
 
@@ -227,7 +227,7 @@ TEST_P(RunPaths, Runs)
 INSTANTIATE_TEST_SUITE_P(, RunPaths, ValuesIn(kPathCases),
                          [](const auto &one) { return one.param.name; });
 
-TEST_F(Run, RunsNothingWhereAPathLeadsToNothing)
+TEST_F(RunCommand, RunsNothingWhereAPathLeadsToNothing)
 {
     std::string text = kShifted;
     text.insert(text.find("</P>"), "<CmdGroup name=\"Empty\"/>");
@@ -246,7 +246,7 @@ TEST_F(Run, RunsNothingWhereAPathLeadsToNothing)
     EXPECT_FALSE(is_there("order"));
 }
 
-TEST_F(Run, WritesTheLibrarysLogWhereItIsToldOrNowhere)
+TEST_F(RunCommand, WritesTheLibrarysLogWhereItIsToldOrNowhere)
 {
     Start start;
     start.environment["VR_LOG_FILE"] = std::nullopt;
@@ -264,7 +264,7 @@ TEST_F(Run, WritesTheLibrarysLogWhereItIsToldOrNowhere)
     EXPECT_FALSE(is_there("other"));
 }
 
-TEST_F(Run, DoesWithoutStandardStreams)
+TEST_F(RunCommand, DoesWithoutStandardStreams)
 {
     const std::string command = "fptest run --json " + work("json") + " --plan " +
                                 plan(group_of({{"Item", "say x report G 100 0 y"}})) + " P/G";
@@ -278,7 +278,7 @@ TEST_F(Run, DoesWithoutStandardStreams)
 
 // --- while items run ------------------------------------------------------------------
 
-TEST_F(Run, KnowsEachItemsStartAndDuration)
+TEST_F(RunCommand, KnowsEachItemsStartAndDuration)
 {
     const auto time_of = [](const Json &event) { return event.at("start").get<std::string>(); };
     for (const std::string way : {"--quiet", "--as-group"}) {
@@ -306,7 +306,7 @@ TEST_F(Run, KnowsEachItemsStartAndDuration)
     }
 }
 
-TEST_F(Run, ShowsProgressAndAsksTheLibraryForNothingWhileACommandRuns)
+TEST_F(RunCommand, ShowsProgressAndAsksTheLibraryForNothingWhileACommandRuns)
 {
     FptestProcess fptest(
         with_group({{"Item", "report G 30 -2 begun sleep 0.1 report G 60 -2 b sleep 0.1 "
@@ -327,7 +327,7 @@ TEST_F(Run, ShowsProgressAndAsksTheLibraryForNothingWhileACommandRuns)
     EXPECT_EQ(fptest.wait().status, 0);
 }
 
-TEST_F(Run, SeesReportsThatFollowEachOtherAtOnce)
+TEST_F(RunCommand, SeesReportsThatFollowEachOtherAtOnce)
 {
     std::string reports;
     for (const std::string progress : {"10", "20", "30", "40", "50", "60", "70", "80", "100"}) {
@@ -339,7 +339,7 @@ TEST_F(Run, SeesReportsThatFollowEachOtherAtOnce)
 
 // --- whose result it is -------------------------------------------------------------
 
-TEST_F(Run, TakesNoResultOfAnEarlierRoundForOneOfThis)
+TEST_F(RunCommand, TakesNoResultOfAnEarlierRoundForOneOfThis)
 {
     const Ended ended = run_group(
         {{"Item", "once /tmp/scene/item report G 100 0 once"},
@@ -354,7 +354,7 @@ TEST_F(Run, TakesNoResultOfAnEarlierRoundForOneOfThis)
     EXPECT_THAT(ended.out, HasSubstr("2 rounds"));
 }
 
-TEST_F(Run, TakesNoResultOfAnEarlierRunForOneOfThis)
+TEST_F(RunCommand, TakesNoResultOfAnEarlierRunForOneOfThis)
 {
     for (const std::string way : {"--quiet", "--as-group"}) {
         SCOPED_TRACE(way);
@@ -371,7 +371,7 @@ TEST_F(Run, TakesNoResultOfAnEarlierRunForOneOfThis)
     }
 }
 
-TEST_F(Run, LeavesTheReportsOfItemsThatItDoesNotRun)
+TEST_F(RunCommand, LeavesTheReportsOfItemsThatItDoesNotRun)
 {
     EXPECT_EQ(run_group(kThreeThatNote).status, 0);
     EXPECT_EQ(run({"P/G/Other"}).status, 0);
@@ -380,7 +380,7 @@ TEST_F(Run, LeavesTheReportsOfItemsThatItDoesNotRun)
     EXPECT_THAT(table, HasSubstr("three"));
 }
 
-TEST_F(Run, TakesTheCodeThatIsSaidToMeanPassed)
+TEST_F(RunCommand, TakesTheCodeThatIsSaidToMeanPassed)
 {
     const std::string path = plan(group_of({{"Item", "report G 100 0 a"},
                                             {"Other", "report G 100 1 b"},
@@ -399,7 +399,7 @@ TEST_F(Run, TakesTheCodeThatIsSaidToMeanPassed)
     EXPECT_EQ(run({"--pass-code", "1", "P/G/Third"}).status, 1);
 }
 
-TEST_F(Run, PrintsNothingQuietlyButWhatDidNotPass)
+TEST_F(RunCommand, PrintsNothingQuietlyButWhatDidNotPass)
 {
     const std::string path = plan(group_of({{"Item", kPasses}, {"Other", "report G 100 1 b"}}));
     Ended ended = run_fptest({"run", "--quiet", "--plan", path, "P/G"});
@@ -411,7 +411,7 @@ TEST_F(Run, PrintsNothingQuietlyButWhatDidNotPass)
     EXPECT_EQ(ended.err, "");
 }
 
-TEST_F(Run, RepairsAPlanThatAReportMadeUnloadableForTheNextItem)
+TEST_F(RunCommand, RepairsAPlanThatAReportMadeUnloadableForTheNextItem)
 {
     const Ended ended = run_group({{"Item", "report G 100 0 one"},
                                    {"Other", "report G 50 7 odd"}, // an attribute without a value
@@ -426,7 +426,7 @@ TEST_F(Run, RepairsAPlanThatAReportMadeUnloadableForTheNextItem)
 
 // --- what would be run ---------------------------------------------------------------
 
-TEST_F(Run, LosesNoReportThatComesAfterOneThatSpoilsThePlan)
+TEST_F(RunCommand, LosesNoReportThatComesAfterOneThatSpoilsThePlan)
 {
     run_group(
         {{"Script", "'/system/bin/Item report-null G 100 0; fptest report G Script --progress "
@@ -436,7 +436,7 @@ TEST_F(Run, LosesNoReportThatComesAfterOneThatSpoilsThePlan)
     EXPECT_EQ(description(0), "dead");
 }
 
-TEST_F(Run, ShowsAReportForAnEarlierItemAsLate)
+TEST_F(RunCommand, ShowsAReportForAnEarlierItemAsLate)
 {
     const Ended ended = run_group({{"Item", "report G 100 0 fine"},
                                    {"Script", "'fptest report G Item --progress 100 --result 1 "
@@ -446,7 +446,7 @@ TEST_F(Run, ShowsAReportForAnEarlierItemAsLate)
                 HasSubstr("G/Item: late report, result 1: pasted; it changes nothing\n"));
 }
 
-TEST_F(Run, EndsWhereTheStoredPlanIsGone)
+TEST_F(RunCommand, EndsWhereTheStoredPlanIsGone)
 {
     const std::string text = group_of(
         {{"Item", "sleep 0; rm /data/vorlane/src1.xml"}, {"Other", "report G 100 0 fine"}});
@@ -458,7 +458,7 @@ TEST_F(Run, EndsWhereTheStoredPlanIsGone)
     EXPECT_THAT(outcomes(), ElementsAre("Item: no result", "Other: not run"));
 }
 
-TEST_F(Run, LeavesNoMarksOfItsOwnInThePlan)
+TEST_F(RunCommand, LeavesNoMarksOfItsOwnInThePlan)
 {
     ASSERT_EQ(run_fptest({"run", "--plan", plan(kOnePasses), "P/G"}).status, 0);
     ASSERT_EQ(run_fptest({"run", "--repeat", "3", "P/G"}).status, 0);
@@ -466,7 +466,7 @@ TEST_F(Run, LeavesNoMarksOfItsOwnInThePlan)
     EXPECT_THAT(read_file(kPlanFile), HasSubstr("description=\"fine\""));
 }
 
-TEST_F(Run, ListsWhatWouldBeRunAndLeavesEverythingAsItIs)
+TEST_F(RunCommand, ListsWhatWouldBeRunAndLeavesEverythingAsItIs)
 {
     const std::string stored = plan_of({{"Old", {{"Item", "note /tmp/scene/order"}}}});
     write_file(kPlanFile, stored);
@@ -496,7 +496,7 @@ struct ListCase {
 const std::string kHead = "<?xml version=\"1.0\"?>\n<!-- a plan -->\n";
 const std::string kGroup = "<CmdGroup name=\"G\"><Cmd name=\"Item\" args=\"\"/></CmdGroup>";
 
-TEST_F(Run, ListsWithoutAStoredPlanAndStoresNone)
+TEST_F(RunCommand, ListsWithoutAStoredPlanAndStoresNone)
 {
     const std::vector<ListCase> cases = {
         {"all under the plan's own name",

@@ -49,7 +49,7 @@ inline const std::string kShifted =
     "<Cmd name=\"Third\" args=\"note /tmp/scene/order report G 100 0 three\"/>"
     "</CmdGroup></P>";
 
-class Run : public FptestTest
+class RunCommand : public FptestTest
 {
   protected:
     using Json = nlohmann::json;

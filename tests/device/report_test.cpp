@@ -12,7 +12,7 @@
 namespace
 {
 
-using Report = DeviceTest;
+using ReportOnDevice = DeviceTest;
 
 // It has a copy of the plan of its own.
 void another_process_reports(const std::string &arguments)
@@ -20,7 +20,7 @@ void another_process_reports(const std::string &arguments)
     EXPECT_EQ(std::system(("/system/bin/Note --report " + arguments).c_str()), 0);
 }
 
-TEST_F(Report, ItemsOwnReportIsReadBackAndThePlanIsLaidOut)
+TEST_F(ReportOnDevice, ItemsOwnReportIsReadBackAndThePlanIsLaidOut)
 {
     store("<?xml version=\"1.0\"?><P><CmdGroup name=\"G\">"
           "<Cmd name=\"SpiCheck\" args=\"--group G\"/>"
@@ -38,7 +38,7 @@ TEST_F(Report, ItemsOwnReportIsReadBackAndThePlanIsLaidOut)
     EXPECT_THAT(plan, ::testing::EndsWith("\n</CmdGroup>\n</P>\n"));
 }
 
-TEST_F(Report, ReportedPlanIsSavedByteForByte)
+TEST_F(ReportOnDevice, ReportedPlanIsSavedByteForByte)
 {
     store("<?xml version=\"1.0\"?><P><CmdGroup name=\"G\"><Cmd name=\"a\" args=\"-t\"/>"
           "</CmdGroup></P>");
@@ -53,7 +53,7 @@ TEST_F(Report, ReportedPlanIsSavedByteForByte)
                                     "</P>\n");
 }
 
-TEST_F(Report, ProcessWithAStaleCopyWritesOverWhatOthersHaveSaved)
+TEST_F(ReportOnDevice, ProcessWithAStaleCopyWritesOverWhatOthersHaveSaved)
 {
     store(group_of({{"a", ""}, {"b", ""}}));
     FPTEST_SetTransation("G", "a", 1, 0, "here"); // loads this process's copy
@@ -65,7 +65,7 @@ TEST_F(Report, ProcessWithAStaleCopyWritesOverWhatOthersHaveSaved)
     EXPECT_THAT(read_back(), ::testing::Not(HasSubstr("elsewhere")));
 }
 
-TEST_F(Report, OtherResultCodeLeavesAPlanThatIsNotLoadedAgain)
+TEST_F(ReportOnDevice, OtherResultCodeLeavesAPlanThatIsNotLoadedAgain)
 {
     store(group_of({{"a", ""}}));
     FPTEST_SetTransation("G", "a", 100, 2, "");
@@ -77,14 +77,14 @@ TEST_F(Report, OtherResultCodeLeavesAPlanThatIsNotLoadedAgain)
     EXPECT_THAT(read_back(), HasSubstr(" result "));
 }
 
-TEST_F(Report, PlanFileIsCreatedForEveryoneToReadAndWriteLessTheUmask)
+TEST_F(ReportOnDevice, PlanFileIsCreatedForEveryoneToReadAndWriteLessTheUmask)
 {
     umask(0027);
     store("<P/>");
     EXPECT_EQ(std::filesystem::status(kPlanFile).permissions(), std::filesystem::perms{0640});
 }
 
-TEST_F(Report, ReadBackIntoANegativeRoomEndsTheProcess)
+TEST_F(ReportOnDevice, ReadBackIntoANegativeRoomEndsTheProcess)
 {
     write_file(kPlanFile, "x");
     char buffer[1] = {'-'};

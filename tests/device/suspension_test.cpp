@@ -17,7 +17,7 @@ namespace
 constexpr char kLong[] = "ItemWithANameOfTwentyEightChars";
 constexpr char kLonger[] = "ItemWithANameOfTwentyEightCharsToo";
 
-class Suspension : public DeviceTest
+class SuspensionOnDevice : public DeviceTest
 {
   protected:
     // Runs the path in a thread of its own while the body stops it.
@@ -29,7 +29,7 @@ class Suspension : public DeviceTest
     }
 };
 
-TEST_F(Suspension, StoppedItemIsFollowedByTheNextOfItsGroup)
+TEST_F(SuspensionOnDevice, StoppedItemIsFollowedByTheNextOfItsGroup)
 {
     store(group_of({{"Note", "--sleep 60"}, {"ab", "next"}}));
     stop_while_running("P/G", [] {
@@ -39,7 +39,7 @@ TEST_F(Suspension, StoppedItemIsFollowedByTheNextOfItsGroup)
     EXPECT_THAT(ran(), ElementsAre("/system/bin/Note|--sleep|60", "/system/bin/ab|next"));
 }
 
-TEST_F(Suspension, ItemIsFoundUnderItsVendorsName)
+TEST_F(SuspensionOnDevice, ItemIsFoundUnderItsVendorsName)
 {
     set_vendor("1");
     store(group_of({{"Note", "--sleep 60"}}));
@@ -50,7 +50,7 @@ TEST_F(Suspension, ItemIsFoundUnderItsVendorsName)
     EXPECT_THAT(processes_named("/system/bin/Note_ca"), IsEmpty());
 }
 
-TEST_F(Suspension, GathererIsStoppedAfterItsCommandHasReturned)
+TEST_F(SuspensionOnDevice, GathererIsStoppedAfterItsCommandHasReturned)
 {
     store(group_of({{"SensorProbe", "--group G"}}));
     run_path("P/G/SensorProbe");
@@ -63,7 +63,7 @@ TEST_F(Suspension, GathererIsStoppedAfterItsCommandHasReturned)
     EXPECT_TRUE(eventually([] { return processes_named("/system/bin/SensorProbe").empty(); }));
 }
 
-TEST_F(Suspension, NameIsCutTo28CharactersForTheListing)
+TEST_F(SuspensionOnDevice, NameIsCutTo28CharactersForTheListing)
 {
     // only the longer one runs: the cut name of the other finds it
     const std::string program = std::string("/system/bin/") + kLonger;
@@ -79,7 +79,7 @@ TEST_F(Suspension, NameIsCutTo28CharactersForTheListing)
     EXPECT_EQ(signal_that_ends(pid), SIGTERM);
 }
 
-TEST_F(Suspension, OnlyTheFirstListedOfTwoIsStopped)
+TEST_F(SuspensionOnDevice, OnlyTheFirstListedOfTwoIsStopped)
 {
     const pid_t first = start_item_program({"/system/bin/ab", "--sleep", "60"});
     const pid_t second = start_item_program({"/system/bin/ab", "--sleep", "60"});
@@ -91,7 +91,7 @@ TEST_F(Suspension, OnlyTheFirstListedOfTwoIsStopped)
     EXPECT_EQ(waitpid(second, nullptr, WNOHANG), 0);
 }
 
-TEST_F(Suspension, ItemThatHasEndedIsNotFound)
+TEST_F(SuspensionOnDevice, ItemThatHasEndedIsNotFound)
 {
     store(group_of({{"Note", ""}}));
     run_path("P/G");
@@ -102,7 +102,7 @@ TEST_F(Suspension, ItemThatHasEndedIsNotFound)
                                          "FPTEST_SuspendItemExecute| target process not exist!"));
 }
 
-TEST_F(Suspension, ListingThatIsMissingIsNotFoundEither)
+TEST_F(SuspensionOnDevice, ListingThatIsMissingIsNotFoundEither)
 {
     setenv("PATH", "/nowhere", 1);
     ::testing::internal::CaptureStderr();
@@ -125,7 +125,7 @@ void put_listing_in_front(const std::string &output)
     setenv("PATH", "/data/vorlane/bin:/system/bin", 1);
 }
 
-TEST_F(Suspension, BeforeAnyItemEveryProcessIsListedAndTheFirstIsStopped)
+TEST_F(SuspensionOnDevice, BeforeAnyItemEveryProcessIsListedAndTheFirstIsStopped)
 {
     const pid_t victim = start_item_program({"/system/bin/ab", "--sleep", "60"});
     put_listing_in_front("USER PID\nroot     " + std::to_string(victim) +
@@ -136,7 +136,7 @@ TEST_F(Suspension, BeforeAnyItemEveryProcessIsListedAndTheFirstIsStopped)
     EXPECT_EQ(signal_that_ends(victim), SIGTERM);
 }
 
-TEST_F(Suspension, LineOfASingleWordStillRunsAKillCommand)
+TEST_F(SuspensionOnDevice, LineOfASingleWordStillRunsAKillCommand)
 {
     for (const char *line : {"word\n", "      \n"}) {
         put_listing_in_front(std::string("USER PID\n") + line);
@@ -150,7 +150,7 @@ TEST_F(Suspension, LineOfASingleWordStillRunsAKillCommand)
     }
 }
 
-TEST_F(Suspension, StandardKillTakesTheNineForAProcess)
+TEST_F(SuspensionOnDevice, StandardKillTakesTheNineForAProcess)
 {
     // the same text that the library runs, with a process that is there in the
     // place of the nobody that process 9 is
