@@ -6,6 +6,7 @@
 #include "cli/usage.h"
 #include "module/log_file.h"
 #include "util/files.h"
+#include "util/spelling.h"
 #include "util/text.h"
 #include "util/write.h"
 

@@ -4,11 +4,11 @@
 #include "cli/log_option.h"
 #include "cli/options.h"
 #include "module/log_file.h"
-#include "module/preflight.h"
 #include "module/stored_plan.h"
 #include "plan/plan.h"
 #include "quillmark.h"
 #include "util/files.h"
+#include "util/spelling.h"
 #include "util/text.h"
 #include "util/write.h"
 

@@ -4,6 +4,7 @@
 #include "cli/usage.h"
 
 #include "util/failure.h"
+#include "util/spelling.h"
 #include "util/text.h"
 
 #include <algorithm>

@@ -22,7 +22,6 @@
 #include <sys/file.h>
 #include <sys/socket.h>
 #include <sys/stat.h>
-#include <sys/statvfs.h>
 #include <thread>
 #include <unistd.h>
 
@@ -30,8 +29,6 @@ namespace fptest
 {
 namespace
 {
-
-constexpr char kDataDirectory[] = "/data/vorlane";
 
 std::vector<std::string> words_of(const std::string &text)
 {
@@ -52,26 +49,6 @@ void require_device()
                       kDataDirectory, std::strerror(errno));
     }
     require_regular_plan();
-}
-
-void require_room(std::size_t bytes)
-{
-    struct statvfs disk {
-    };
-    struct stat old {
-    };
-    if (statvfs(kDataDirectory, &disk) != 0) {
-        return;
-    }
-    // the old file is overwritten
-    const std::size_t freed =
-        stat(kStoredPlan, &old) == 0 ? static_cast<std::size_t>(old.st_blocks) * 512 : 0;
-    if (static_cast<std::size_t>(disk.f_bavail) * disk.f_frsize + freed < bytes) {
-        throw Failure(
-            Cause::device,
-            "the disk of {} is full: make room for {} bytes; the stored plan is as it was",
-            kDataDirectory, bytes);
-    }
 }
 
 Descriptor lock_device()

@@ -7,7 +7,6 @@
 
 #include "common/descriptor.h"
 
-#include <cstddef>
 #include <string>
 #include <vector>
 
@@ -16,9 +15,6 @@ namespace fptest
 
 // That this is a device, and ready.
 void require_device();
-
-// That there is room for a stored plan of that size.
-void require_room(std::size_t bytes);
 
 // That nobody else runs a plan here while the descriptor is open.
 Descriptor lock_device();

@@ -3,7 +3,7 @@
 
 #include "module/stored_plan.h"
 
-#include "module/preflight.h"
+#include "plan/library_rules.h"
 #include "plan/plan_text.h"
 #include "util/failure.h"
 #include "util/files.h"
@@ -17,6 +17,7 @@
 #include <fmt/core.h>
 #include <sys/file.h>
 #include <sys/stat.h>
+#include <sys/statvfs.h>
 #include <thread>
 
 namespace fptest
@@ -80,6 +81,26 @@ void require_regular_plan()
     };
     if (stat(kStoredPlan, &plan) == 0 && !S_ISREG(plan.st_mode)) {
         throw Failure(Cause::device, "{} is not a regular file: remove it", kStoredPlan);
+    }
+}
+
+void require_room(std::size_t bytes)
+{
+    struct statvfs disk {
+    };
+    struct stat old {
+    };
+    if (statvfs(kDataDirectory, &disk) != 0) {
+        return;
+    }
+    // the old file is overwritten
+    const std::size_t freed =
+        stat(kStoredPlan, &old) == 0 ? static_cast<std::size_t>(old.st_blocks) * 512 : 0;
+    if (static_cast<std::size_t>(disk.f_bavail) * disk.f_frsize + freed < bytes) {
+        throw Failure(
+            Cause::device,
+            "the disk of {} is full: make room for {} bytes; the stored plan is as it was",
+            kDataDirectory, bytes);
     }
 }
 

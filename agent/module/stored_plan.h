@@ -18,7 +18,7 @@ namespace fptest
 {
 
 // What is said of a plan that nobody can report into any more.
-inline constexpr char kPlanLost[] = "is gone, or not whole any more";
+inline constexpr char kPlanLost[] = "is gone or damaged";
 
 // Its text; nullopt if it cannot be read, with the reason in errno.
 std::optional<std::string> read_stored_plan();
@@ -32,6 +32,9 @@ std::optional<struct stat> stored_plan_status();
 
 // Throws a Failure if something else is in its place: opening a FIFO could block for ever.
 void require_regular_plan();
+
+// Throws a Failure if the disk has no room for a stored plan of that size.
+void require_room(std::size_t bytes);
 
 // What make() returns for its text. As long as that is empty, the text is read again for
 // half a second: somebody may be writing it.

@@ -12,6 +12,7 @@
 namespace fptest
 {
 
+inline constexpr char kDataDirectory[] = "/data/vorlane";
 inline constexpr char kStoredPlan[] = "/data/vorlane/src1.xml";
 inline constexpr std::size_t kPlanLimit = 2048;    // bytes that a command stores of a plan
 inline constexpr std::size_t kPathLimit = 2047;    // bytes of a node path

@@ -5,6 +5,7 @@
 
 #include "reporters/wording.h"
 #include "util/text.h"
+#include "util/times.h"
 
 #include <chrono>
 #include <cmath>

@@ -7,6 +7,7 @@
 #include "reporters/wording.h"
 #include "util/terminal.h"
 #include "util/text.h"
+#include "util/times.h"
 
 #include <algorithm>
 #include <charconv>

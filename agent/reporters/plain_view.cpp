@@ -6,6 +6,7 @@
 #include "reporters/wording.h"
 #include "reporters/writer.h"
 #include "util/text.h"
+#include "util/times.h"
 
 #include <algorithm>
 #include <chrono>

@@ -4,6 +4,7 @@
 #include "reporters/wording.h"
 
 #include "util/text.h"
+#include "util/times.h"
 
 #include <algorithm>
 #include <csignal>

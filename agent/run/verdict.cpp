@@ -8,6 +8,7 @@
 #include "plan/plan.h"
 #include "run/signals.h"
 #include "util/text.h"
+#include "util/times.h"
 
 #include <fmt/core.h>
 #include <unistd.h>
@@ -175,7 +176,7 @@ class Judge
             return "no report could be written: the stored plan is gone";
         }
         if (!Plan::parse_annotated(text)) {
-            return "no report could be written: the stored plan is not whole any more";
+            return "no report could be written: the stored plan is damaged";
         }
         std::string why;
         if (!Plan::load_as_library(text, &why)) {

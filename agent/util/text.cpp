@@ -4,14 +4,11 @@
 #include "util/text.h"
 
 #include <algorithm>
-#include <cctype>
 #include <clocale>
-#include <cmath>
 #include <cwchar>
 #include <fmt/core.h>
 #include <numeric>
 #include <utf8.h>
-#include <utility>
 
 namespace fptest
 {
@@ -114,10 +111,7 @@ std::string_view start_of(std::string_view text, std::size_t width)
     return text.substr(0, end);
 }
 
-// --- spelling ----------------------------------------------------------------
-
-constexpr std::size_t kEdit = 100; // a character too many, too few or another one
-constexpr std::size_t kCase = 1;   // the same one, but not its case
+} // namespace
 
 std::u32string characters(std::string_view text)
 {
@@ -125,57 +119,6 @@ std::u32string characters(std::string_view text)
     for_each_character(text, [&](char32_t code, std::size_t /* size */) { result += code; });
     return result;
 }
-
-char32_t lower(char32_t code)
-{
-    return code >= U'A' && code <= U'Z' ? code - U'A' + U'a' : code;
-}
-
-std::size_t exchange(char32_t one, char32_t other)
-{
-    if (one == other) {
-        return 0;
-    }
-    return lower(one) == lower(other) ? kCase : kEdit;
-}
-
-// The cost of turning one word into the other; swapped neighbours are one edit.
-std::size_t distance(const std::u32string &one, const std::u32string &other)
-{
-    using Row = std::vector<std::size_t>;
-    Row before_last;
-    Row last;
-    Row row(other.size() + 1);
-    for (std::size_t x = 0; x <= other.size(); ++x) {
-        row[x] = x * kEdit;
-    }
-    for (std::size_t y = 1; y <= one.size(); ++y) {
-        before_last = std::exchange(last, row);
-        row[0] = y * kEdit;
-        for (std::size_t x = 1; x <= other.size(); ++x) {
-            row[x] = std::min({last[x] + kEdit, row[x - 1] + kEdit,
-                               last[x - 1] + exchange(one[y - 1], other[x - 1])});
-            if (y > 1 && x > 1 && lower(one[y - 1]) == lower(other[x - 2]) &&
-                lower(one[y - 2]) == lower(other[x - 1])) {
-                row[x] = std::min(row[x], before_last[x - 2] + kEdit);
-            }
-        }
-    }
-    return row.back();
-}
-
-std::size_t edits_allowed(std::size_t length)
-{
-    return length < 4 ? 1 : std::max<std::size_t>(2, length / 3);
-}
-
-// Whether a word of that length may be meant: part of it must be right.
-bool near(std::size_t edits, std::size_t length)
-{
-    return edits <= edits_allowed(length) && edits < length;
-}
-
-} // namespace
 
 std::string sanitize_utf8(std::string_view bytes)
 {
@@ -241,42 +184,6 @@ std::string ellipsize(std::string_view text, std::size_t width)
     return std::string(start_of(text, width - kDots)).append(kDots, '.');
 }
 
-std::string nearest(std::string_view word, const std::vector<std::string> &candidates)
-{
-    const std::u32string wanted = characters(word);
-    const std::string *best = nullptr;
-    std::size_t least = 0;
-    for (const std::string &candidate : candidates) {
-        const std::size_t cost = distance(wanted, characters(candidate));
-        if (near(cost / kEdit, wanted.size()) && (best == nullptr || cost < least)) {
-            best = &candidate;
-            least = cost;
-        }
-    }
-    return best != nullptr ? *best : "";
-}
-
-std::string did_you_mean(const std::string &near)
-{
-    return near.empty() ? "" : fmt::format("; did you mean {}?", in_quotes(near));
-}
-
-std::string known_names(const std::string &word, const std::vector<std::string> &names,
-                        const std::string &introduction)
-{
-    return with_advice(did_you_mean(nearest(word, names)),
-                       fmt::format("{} {}", introduction, one_line(join_and(names))));
-}
-
-std::string with_advice(const std::string &text, std::string advice)
-{
-    if (!text.ends_with('?')) {
-        return fmt::format("{}; {}", text, advice);
-    }
-    advice.front() = static_cast<char>(std::toupper(static_cast<unsigned char>(advice.front())));
-    return fmt::format("{} {}", text, advice);
-}
-
 std::string plural(std::size_t count, std::string_view thing)
 {
     return fmt::format("{} {}{}", count, thing, count == 1 ? "" : "s");
@@ -292,25 +199,6 @@ std::string join_and(const std::vector<std::string> &words)
         text += words[at];
     }
     return text;
-}
-
-std::string duration(double seconds)
-{
-    // more than centuries is an error
-    const double sane = seconds > 0 ? std::min(seconds, 1e10) : 0;
-    const long long tenths = std::llround(sane * 10);
-    if (tenths < 600) {
-        return fmt::format("{}.{} s", tenths / 10, tenths % 10);
-    }
-    const long long whole = std::llround(sane);
-    const long long minutes = whole / 60;
-    return minutes < 60 ? fmt::format("{}:{:02}", minutes, whole % 60)
-                        : fmt::format("{}:{:02}:{:02}", minutes / 60, minutes % 60, whole % 60);
-}
-
-std::string fine_duration(double seconds)
-{
-    return seconds < 9.9995 ? fmt::format("{:.3f} s", std::max(seconds, 0.0)) : duration(seconds);
 }
 
 std::vector<std::string> aligned(const std::vector<std::vector<std::string>> &rows,
@@ -339,18 +227,6 @@ std::vector<std::string> aligned(const std::vector<std::vector<std::string>> &ro
         lines.push_back(line);
     }
     return lines;
-}
-
-std::string timestamp(std::chrono::system_clock::time_point time)
-{
-    using namespace std::chrono;
-    const auto day = floor<days>(time);
-    const year_month_day date(day);
-    const hh_mm_ss clock(floor<milliseconds>(time - day));
-    return fmt::format("{:04}-{:02}-{:02}T{:02}:{:02}:{:02}.{:03}Z", static_cast<int>(date.year()),
-                       static_cast<unsigned>(date.month()), static_cast<unsigned>(date.day()),
-                       clock.hours().count(), clock.minutes().count(), clock.seconds().count(),
-                       clock.subseconds().count());
 }
 
 } // namespace fptest

@@ -5,7 +5,6 @@
 // bytes an item reports.
 #pragma once
 
-#include <chrono>
 #include <cstddef>
 #include <span>
 #include <string>
@@ -33,6 +32,9 @@ struct Replacement {
 
 std::string replaced(std::string_view text, std::span<const Replacement> list);
 
+// U+FFFD for each invalid byte.
+std::u32string characters(std::string_view text);
+
 // The offset of the first invalid byte, or npos.
 std::size_t first_not_utf8(std::string_view bytes);
 
@@ -45,38 +47,16 @@ std::string pad_or_ellipsize(std::string_view text, std::size_t width);
 // As pad_or_ellipsize(), but a shorter text is not padded.
 std::string ellipsize(std::string_view text, std::size_t width);
 
-// The candidate that is spelled most like the word; empty if none is near enough.
-std::string nearest(std::string_view word, const std::vector<std::string> &candidates);
-
-// "; did you mean 'near'?", or empty.
-std::string did_you_mean(const std::string &near);
-
-// "; did you mean 'x'? The groups are x, y and z", with "the groups are" as introduction.
-std::string known_names(const std::string &word, const std::vector<std::string> &names,
-                        const std::string &introduction);
-
-// "text; advice", or "text? Advice".
-std::string with_advice(const std::string &text, std::string advice);
-
 // "1 item", "2 items"
 std::string plural(std::size_t count, std::string_view thing);
 
 // "a", "a and b", "a, b and c"
 std::string join_and(const std::vector<std::string> &words);
 
-// "0.3 s", "12.0 s", "3:05", "1:02:05"
-std::string duration(double seconds);
-
-// As duration(), but with milliseconds under ten seconds: "0.012 s".
-std::string fine_duration(double seconds);
-
 // The rows as lines of aligned columns, numbers to the right. The first column is cut if a
 // line would be wider than that.
 std::vector<std::string> aligned(const std::vector<std::vector<std::string>> &rows,
                                  const std::vector<bool> &is_number,
                                  std::size_t width = std::string::npos);
-
-// In UTC: "2024-05-06T07:08:09.123Z".
-std::string timestamp(std::chrono::system_clock::time_point time);
 
 } // namespace fptest

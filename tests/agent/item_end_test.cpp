@@ -436,8 +436,7 @@ TEST_F(ItemEnd, ItemThatDestroysThePlanHasNoResultWhateverItReported)
         run_group({{"Script", script(script_report("0", "fine") + "; sleep 0.1; " + way +
                                      " /data/vorlane/src1.xml")}});
         EXPECT_THAT(outcomes(), ElementsAre("Script: no result"));
-        EXPECT_EQ(reason(0),
-                  "what it reported is lost: the stored plan is gone, or not whole any more");
+        EXPECT_EQ(reason(0), "what it reported is lost: the stored plan is gone or damaged");
     }
 }
 

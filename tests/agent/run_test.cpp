@@ -453,8 +453,8 @@ TEST_F(RunCommand, EndsWhereTheStoredPlanIsGone)
     const Ended ended = run_fptest({"run", "--json", work("json"), "--plan", plan(text), "P/G"});
     EXPECT_EQ(ended.status, 3);
     EXPECT_EQ(ended.err, "fptest: the plan has warnings: see fptest check /tmp/scene/plan.xml\n"
-                         "fptest: the stored plan /data/vorlane/src1.xml is gone, or not whole any "
-                         "more: store it again\n");
+                         "fptest: the stored plan /data/vorlane/src1.xml is gone or damaged: "
+                         "store it again\n");
     EXPECT_THAT(outcomes(), ElementsAre("Item: no result", "Other: not run"));
 }
 

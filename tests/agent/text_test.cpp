@@ -2,7 +2,9 @@
 // SPDX-License-Identifier: Apache-2.0
 
 // Text for people and for files.
+#include "util/spelling.h"
 #include "util/text.h"
+#include "util/times.h"
 
 #include <gmock/gmock.h>
 
