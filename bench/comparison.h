@@ -28,7 +28,7 @@ struct Comparison {
     // Before and after each turn, not timed.
     std::function<void()> start = [] {};
     std::function<void()> clear = [] {};
-    // What one call took, where that is not its share of the turn.
+    // What one call took, if that is not its share of the turn.
     std::function<double()> seconds_for_one = nullptr;
     // What a turn has left behind: the same, whoever's it was.
     std::function<std::string()> outcome = [] { return std::string(); };

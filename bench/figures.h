@@ -33,13 +33,13 @@ std::string decimal(double value, int places);
 // standard output goes nowhere from now on, and the figures go where that went.
 void set_library_output_aside();
 
-// Prints a line. A column's width is negative where its text is aligned left.
+// Prints a line. A column's width is negative if its text is aligned left.
 using Widths = std::array<int, 8>;
 inline constexpr Widths kCaseWidths{-27, 9, 9, 8, 8, 7, 8};
 void print(const std::vector<std::string> &columns, const Widths &widths = kCaseWidths);
 
-// What a limit makes of a figure: "ok", "MISSED", or "unclear" where the figure varies by
-// more than it is too high; nothing where there is no limit (0).
+// What a limit makes of a figure: "ok", "MISSED", or "unclear" if the figure varies by
+// more than it is too high; nothing if there is no limit (0).
 std::string verdict(double figure, double limit, double spread = 0);
 // Whether any verdict was that a limit is missed.
 bool is_a_limit_missed();

@@ -36,7 +36,7 @@ const Peer kPeers[] = {
      "printf \"syntax(2)\\ntest_suite('trivial')\\n\" >Kyuafile"},
 };
 
-// Seconds for so many trivial items; none where it does not run here.
+// Seconds for so many trivial items; none if it does not run here.
 std::optional<double> time_of(const Peer &peer, int items)
 {
     std::string directory = (fs::temp_directory_path() / "peers-XXXXXX").string();

@@ -96,7 +96,7 @@ make_directories()
 	printf '%s\n' "${missing[@]}" >>"$keep/made" && mkdir -- "${missing[@]}"
 }
 
-# Links alone, in memory where there is some: a disk takes its time for hundreds. One
+# Links alone, in memory if there is some: a disk takes its time for hundreds. One
 # process makes them all; with ln it would be one for each.
 make_system_bin()
 {

@@ -5,7 +5,7 @@
 //
 // One header line, then one line for each process whose name starts with NAME,
 // by process id. A process's name is the last part of its argv[0], or the
-// kernel's name for it where it has no arguments (a zombie, for one). The NAME
+// kernel's name for it if it has no arguments (a zombie, for one). The NAME
 // column shows argv[0] alone: a query piped into grep never finds its own grep.
 
 #include "common/descriptor.h"
@@ -40,7 +40,7 @@ struct Process {
     unsigned long long wait_channel = 0;
     unsigned long long program_counter = 0;
     std::string kernel_name;
-    std::string command; // argv[0]; empty where there is none
+    std::string command; // argv[0]; empty if there is none
 
     std::string_view shown_name() const
     {
@@ -53,7 +53,7 @@ struct Process {
     }
 };
 
-// Nothing where the process has gone, before its file was opened or after.
+// Nothing if the process has gone, before its file was opened or after.
 std::optional<std::string> read_file(const std::filesystem::path &path)
 {
     const Descriptor file(open(path.c_str(), O_RDONLY | O_CLOEXEC));

@@ -9,7 +9,7 @@
 //   supervise become 0 SIGNALS MKSH START VENDOR SCRIPTS COMMAND ARG...
 //                                                  runs START on the device, then becomes COMMAND
 //
-// CALLER is the process to which this one belongs, and 0 where it need not be there.
+// CALLER is the process to which this one belongs, and 0 if it need not be there.
 // SIGNALS are the numbers, comma-separated, of those that the caller does not ignore.
 // They are blocked in all that is in between, so that one that comes before COMMAND
 // is begun meets what was to become COMMAND.
@@ -124,7 +124,7 @@ std::string proc(pid_t pid, const std::string &file)
     return "/proc/" + std::to_string(pid) + "/" + file;
 }
 
-// 0 where there is none.
+// 0 if there is none.
 pid_t first_child(pid_t pid)
 {
     pid_t child = 0;
@@ -286,7 +286,7 @@ class Supervisor
         return poll(&end, 1, 0) > 0;
     }
 
-    // 0 where it has just ended.
+    // 0 if it has just ended.
     pid_t command() const
     {
         const pid_t init = is_box_ ? first_child(pid_) : 0;

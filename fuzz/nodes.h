@@ -33,7 +33,7 @@ struct Nodes {
     std::vector<Content> contents;
     explicit Nodes(mxml_node_t *tree);
 
-    // Places in the vectors; nothing is where there is none.
+    // Places in the vectors; nothing if there is none.
     using Place = std::optional<std::size_t>;
     [[nodiscard]] Place group(std::string_view name) const;
     [[nodiscard]] Place item(std::size_t group, std::string_view name) const;

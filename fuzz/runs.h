@@ -14,7 +14,7 @@ std::vector<std::string> components(std::string_view text, char separator);
 
 // What doubles::started() tells after a run of the path, up to its first colon, tab or
 // line feed, on that plan; the gatherer runs when the process query printed anything.
-// Nothing where the agent's Plan has no such path: of '/' alone, which asks for a group
+// Nothing if the agent's Plan has no such path: of '/' alone, which asks for a group
 // without a name that the plan has.
 std::optional<std::vector<std::string>> expected_starts(const std::string &plan,
                                                         std::string_view path,

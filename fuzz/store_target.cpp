@@ -62,7 +62,7 @@ void check_layout(const Nodes &plan)
     }
 }
 
-// An element's place among all, as Plan numbers it; nothing where it is not run.
+// An element's place among all, as Plan numbers it; nothing if it is not run.
 std::optional<std::size_t> number_of(const Nodes &plan, const mxml_node_t *node)
 {
     std::size_t number = 0;
@@ -169,7 +169,7 @@ bool is_loaded_as(const std::vector<Content> &contents)
 
 // Some trees Mini-XML itself does not give back, whatever their layout: it refuses
 // an attribute without a value, and it resolves references to characters that it
-// then writes as they stand, where they mean something else (white space in a
+// then writes as they are, though they mean something else (white space in a
 // word, markup in a name) or are refused (control characters, surrogates, a byte
 // order mark), as they are in a description that holds them. So a tree that comes
 // back changed is a finding only if Mini-XML gives it back without the library's

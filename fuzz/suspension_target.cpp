@@ -31,7 +31,7 @@ std::optional<std::string> next_line(std::string_view &listing)
     return std::string(line.substr(0, line.find('\0')));
 }
 
-// The kill command; nothing where no process is listed.
+// The kill command; nothing if no process is listed.
 std::optional<std::string> expected_kill(std::string_view listing)
 {
     next_line(listing);

@@ -45,7 +45,7 @@ bool runs(const std::string &args)
     return support::run({.arguments = {"/system/bin/sh", "-c", line}}).status == 0;
 }
 
-// Only where there is a shell to be asked.
+// Only if there is a shell to be asked.
 TEST(CheckedGrammar, ShellDecidesWhatIsASyntaxError)
 {
     std::string why;
@@ -194,7 +194,7 @@ TEST(CheckedArgs, OfAnyKindAreErrorsWhereTheShellRefusesThem)
     }
     EXPECT_GT(refused, 200U); // else little has been tried
     EXPECT_LT(refused, 580U);
-    EXPECT_GT(known, refused * 95 / 100); // where there is no shell to be asked
+    EXPECT_GT(known, refused * 95 / 100); // if there is no shell to be asked
 }
 
 } // namespace

@@ -60,7 +60,7 @@ std::string messages(const std::string &text, Storing storing)
 //
 // KIND is what the lines are: the whole 'plan', one that is 'sent' instead of stored,
 // 'groups' in a root, or 'items' in its group 'A'. \xHH, \n, \t and \\ are as in C++,
-// \{N*TEXT} is N times TEXT, and a line that ends with \ has no line feed. Where a line
+// \{N*TEXT} is N times TEXT, and a line that ends with \ has no line feed. If a line
 // is not printed as it is, "= " begins what is printed below it; the column is
 // after a caret that is elsewhere. '#' begins a comment.
 struct Case {

@@ -78,7 +78,7 @@ pid_t FptestProcess::library() const
 // Whatever is missing here makes the test fail by what the program then does.
 void as_plain_user()
 {
-    // fails where there are none to be dropped, as in a device of namespaces
+    // fails if there are none to be dropped, as in a device of namespaces
     prctl(PR_SET_SECUREBITS, SECBIT_NOROOT | SECBIT_NOROOT_LOCKED);
     __user_cap_header_struct header{_LINUX_CAPABILITY_VERSION_3, 0};
     std::array<__user_cap_data_struct, 2> none{};

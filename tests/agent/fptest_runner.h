@@ -82,7 +82,7 @@ class FptestTest : public DeviceTest
     static bool wait_for_file(const std::string &name);
     // Items that are running, under any of their names.
     static device::Lines running_items();
-    // A test failure where some go on.
+    // A test failure if some go on.
     static void expect_items_to_end();
 };
 

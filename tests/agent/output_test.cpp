@@ -52,7 +52,7 @@ class Output : public FptestTest
     }
 
     // Of the log that --log names, and of one that VR_LOG_FILE does. The text has "{}" for
-    // what names it, "{=}" where the file follows. Standard output is a file.
+    // what names it, "{=}" if the file follows. Standard output is a file.
     static void expect_log_refusal(int status, const device::Lines &arguments,
                                    const std::string &log, const std::string &text)
     {

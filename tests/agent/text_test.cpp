@@ -192,7 +192,7 @@ TEST(PadOrEllipsize, FillsTheWidth)
              {"SensorProbe", 8, "Senso..."},
              {"SensorProbe", 10, "SensorP..."},
              {"SensorProbe", 11, "SensorProbe"},
-             // dots alone where there is no room for more
+             // dots alone if there is no room for more
              {"abcdef", 4, "a..."},
              {"abcdef", 3, "..."},
              {"abcdef", 2, ".."},

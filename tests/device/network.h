@@ -24,7 +24,7 @@ Socket listen_on(unsigned short port);
 Socket connect_to(unsigned short port);
 
 // Every byte that arrives until the peer closes or is silent for a while;
-// "<closed>" is put after it where the peer has closed.
+// "<closed>" is put after it if the peer has closed.
 std::string receive(const Socket &client);
 
 // Local addresses and ports, as in "00000000:8888", of the sockets that listen at

@@ -1,7 +1,7 @@
 // SPDX-FileCopyrightText: 2026 The Quillmark authors
 // SPDX-License-Identifier: Apache-2.0
 
-// What a host does with its plan where the disk is full or read-only, a directory is in
+// What a host does with its plan if the disk is full or read-only, a directory is in
 // the plan's place, or files may not grow. After each fault the next command without one
 // works.
 #include "common/descriptor.h"
@@ -222,7 +222,7 @@ class FileSizeLimit : public DeviceTest, public ::testing::WithParamInterface<bo
         return lines_;
     }
 
-    // So many of the last lines are missing where the signal ends the host.
+    // So many of the last lines are missing if the signal ends the host.
     void expect_end(int status, const Lines &all, int missing) const
     {
         EXPECT_EQ(status, is_ignored() ? 0 : -SIGXFSZ) << "the library changes no disposition";

@@ -1,7 +1,7 @@
 // SPDX-FileCopyrightText: 2026 The Quillmark authors
 // SPDX-License-Identifier: Apache-2.0
 
-// What a host does with its commands where a shell is missing, descriptors run out, or
+// What a host does with its commands if a shell is missing, descriptors run out, or
 // signals are handled in its own way. After each fault the next command without one works.
 #include "faults.h"
 #include "network.h"

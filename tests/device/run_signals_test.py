@@ -76,7 +76,7 @@ def test_a_second_signal_is_handed_on_as_well(start):
 
 
 def test_a_command_that_goes_on_is_ended_with_it_ten_seconds_later(start):
-    # both at once, as they take their time; in place, where they cannot, they are the same
+    # both at once, as they take their time; in place, if they cannot, they are the same
     ways = [ALONE, GROUP] if way() == "namespace" else [ALONE]
     goes_on = "trap '' TERM; echo ready; while :; do sleep 0.1; done"
     devices = [start("sh", "-c", goes_on) for _ in ways]

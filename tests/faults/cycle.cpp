@@ -32,7 +32,7 @@ constexpr char kFirstPlan[] = R"(<?xml version="1.0" encoding="UTF-8"?>
 
 // Shorter than the first, and ends inside its root: over a file that could not
 // be removed it makes a document that Mini-XML refuses. The item is the first
-// plan's, so that it runs in the same way where this plan could not be stored.
+// plan's, so that it runs in the same way if this plan could not be stored.
 constexpr char kSecondPlan[] = R"(<?xml version="1.0"?>
 <!-- the same board after a repair of its supply -->
 <TestPlan>

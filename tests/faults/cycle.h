@@ -30,7 +30,7 @@ const std::vector<Step> &cycle();
 // A step that sends a command to the library.
 Step command(Step::Kind kind, const std::string &name, const std::string &text);
 
-// The whole buffer after a reply, or as it was where there is none.
+// The whole buffer after a reply, or as it was if there is none.
 std::string replied(const std::optional<std::string> &reply);
 // The whole buffer after a read-back of so much text.
 std::string read_back(const std::string &text);

@@ -29,7 +29,7 @@ Lines failed(Lines events, std::size_t at, std::size_t cut);
 // The copy of a node path fails.
 Lines without_path(Lines events);
 // The plan cannot be loaded wherever the step needs it: it cannot be opened, with
-// that errno, or is refused where there is none.
+// that errno, or is refused if there is none.
 Lines without_plan(Lines events, Step::Kind step, int error);
 // Expects that each function that has begun tells how it has ended, when Mini-XML
 // has lost part of the plan.

@@ -102,7 +102,7 @@ def test_a_plain_compiler_builds_the_agent_that_the_readme_shows(prefix):
 
 
 def test_pkg_config_tells_a_compiler_its_flags(prefix, tmp_path):
-    # by another name: pkg-config prints nothing where a path has an apostrophe
+    # by another name: pkg-config prints nothing if a path has an apostrophe
     link = tmp_path / "prefix"
     link.symlink_to(prefix)
 

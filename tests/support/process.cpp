@@ -95,7 +95,7 @@ void Process::become(const Start &start) const
         dup2(start.is_one_stream ? output_.get() : errors_.get(), STDERR_FILENO);
     }
     if (!start.output.empty()) {
-        // a terminal becomes that of the session only where it can be read
+        // a terminal becomes that of the session only if it can be read
         const int file = open(start.output.c_str(), O_RDWR | O_CREAT | O_TRUNC, 0644);
         dup2(file, STDOUT_FILENO);
         close(file);

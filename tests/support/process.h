@@ -53,7 +53,7 @@ class Process
     {
         return pid_;
     }
-    void signal(int number) const; // throws where it is gone
+    void signal(int number) const; // throws if it is gone
     void signal_group(int number) const;
 
     // What it has printed so far.
@@ -61,7 +61,7 @@ class Process
     std::string err() const;
 
     bool has_ended();
-    // Throws where it does not end in that time.
+    // Throws if it does not end in that time.
     Ended wait(double seconds = 60);
 
   private:

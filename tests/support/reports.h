@@ -51,7 +51,7 @@ struct Element {
 // Of a test case: "passed", "skipped", "failure", or what type of error it is.
 std::string verdict_of(const Element &test);
 
-// The top element; a test failure and an empty one where it is not well-formed.
+// The top element; a test failure and an empty one if it is not well-formed.
 Element parse_xml(const std::string &text);
 
 // --- JSON lines --------------------------------------------------------------
@@ -62,7 +62,7 @@ std::vector<nlohmann::json> events_of(const std::string &text, const std::string
 
 // "Item: passed" for each end, in their order.
 Lines outcomes(const std::string &text);
-// Of each end, in their order; empty where it has none.
+// Of each end, in their order; empty if it has none.
 Lines reasons(const std::string &text);
 
 // --- TAP ---------------------------------------------------------------------

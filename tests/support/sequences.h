@@ -255,7 +255,7 @@ inline Lines nameless(const std::string &name = "(null)", const std::string &arg
     return found(name, args) + "SingleItemExecute| current node is null !\n";
 }
 
-// The query for a gatherer: nothing where it cannot be started, else what it prints.
+// The query for a gatherer: nothing if it cannot be started, else what it prints.
 inline Lines queried(const std::optional<std::string> &output = "", int count = 1)
 {
     const std::string stream = "stream#" + std::to_string(count);

@@ -270,7 +270,7 @@ TEST_F(Item, VendorIsTheDecimalNumberThatTheTextBeginsWith)
     struct Case {
         std::string text;
         int number;
-        int clamped = number; // where a long has 32 bits, as it is read as one
+        int clamped = number; // if a long has 32 bits, as it is read as one
     };
     for (const auto &[text, number, clamped] : std::initializer_list<Case>{
              {"0", 0},

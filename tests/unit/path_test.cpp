@@ -277,7 +277,7 @@ std::string random_plan(std::mt19937 &random)
     return (random() % 2 == 0 ? "<?xml version=\"1.0\"?>\n" : "") + ("<P>" + content + "</P>");
 }
 
-// Its arguments, which no two elements share; "-" where nothing is run of it.
+// Its arguments, which no two elements share; "-" if it runs nothing.
 std::string number_of(mxml_node_t *node)
 {
     const char *name = mxmlElementGetAttr(node, "name");

@@ -34,7 +34,7 @@ struct Step {
 
 // The default.
 Step pass();
-// Returns the value (with errno set, where an error is given) and does nothing.
+// Returns the value (with errno set, if an error is given) and does nothing.
 Step gives(long value, int error = 0);
 // read and write: does the real thing, with at most that many bytes.
 Step limit(long bytes);

@@ -38,7 +38,7 @@ class ReadBack : public LibraryTest
         FPTEST_ExtractResultMsg(buffer.data(), capacity);
         return buffer;
     }
-    // The same, where only so many bytes came.
+    // The same, if only so many bytes came.
     static std::string received(int capacity, const std::string &text)
     {
         return text +
