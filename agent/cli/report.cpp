@@ -92,8 +92,8 @@ Exit report(const ReportOptions &options)
         require_stored_plan(", so nothing can be reported: store one with fptest run --plan FILE");
     const Plan plan = load_stored(text);
     const std::size_t number = find_item(plan, options);
-    // Mini-XML would not load such a plan again
-    const std::string description = sanitize_utf8(options.description);
+    // such a plan would not load again
+    const std::string description = sanitize_xml(options.description);
     if (description != options.description) {
         say("bytes of the description that no plan can hold are replaced");
     }

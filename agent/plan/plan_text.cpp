@@ -81,10 +81,13 @@ std::optional<std::string> without_reports(const std::string &text,
 
 std::optional<std::string> made_loadable(const std::string &text)
 {
-    if (Plan::load_as_library(text) || !Plan::parse_annotated(text)) {
+    // Mini-XML loads what sanitize_xml() replaces besides
+    const bool is_xml =
+        text.find("\xEF\xBF\xBE") == text.npos && text.find("\xEF\xBF\xBF") == text.npos;
+    if ((is_xml && Plan::load_as_library(text)) || !Plan::parse_annotated(text)) {
         return std::nullopt;
     }
-    const std::string cleaned = sanitize_utf8(text);
+    const std::string cleaned = sanitize_xml(text);
     return with_empty_values(cleaned, scan(cleaned));
 }
 

@@ -22,8 +22,9 @@ std::optional<std::string> without_reports(const std::string &text,
                                            const std::vector<std::size_t> &numbers,
                                            const std::string &mark);
 
-// A text that is whole but does not load, with an empty value for attributes that have none,
-// and with invalid characters made visible; nullopt for any other text.
+// A text that is whole but does not load, or has characters that are none in XML, with an empty
+// value for attributes that have none, and with invalid characters made visible; nullopt for any
+// other text.
 std::optional<std::string> made_loadable(const std::string &text);
 
 // The text without any marks; nullopt if it is not whole.

@@ -24,16 +24,9 @@ namespace
 std::string xml_escaped(std::string_view text)
 {
     static constexpr Replacement kEscapes[] = {
-        {"&", "&amp;"},
-        {"<", "&lt;"},
-        {">", "&gt;"},
-        {"\"", "&quot;"},
-        {"\r", "&#13;"},
-        // valid Unicode, but not in XML
-        {"\xEF\xBF\xBE", "\uFFFD"},
-        {"\xEF\xBF\xBF", "\uFFFD"},
+        {"&", "&amp;"}, {"<", "&lt;"}, {">", "&gt;"}, {"\"", "&quot;"}, {"\r", "&#13;"},
     };
-    return replaced(sanitize_utf8(text), kEscapes);
+    return replaced(sanitize_xml(text), kEscapes);
 }
 
 // Readers turn tabs and line feeds in attributes into blanks.

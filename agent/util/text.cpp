@@ -127,6 +127,13 @@ std::string sanitize_utf8(std::string_view bytes)
     });
 }
 
+std::string sanitize_xml(std::string_view bytes)
+{
+    return cleaned(sanitize_utf8(bytes), [](char32_t code) {
+        return code == 0xFFFE || code == 0xFFFF ? kReplacement : code;
+    });
+}
+
 std::string one_line(std::string_view bytes)
 {
     return cleaned(bytes, visible_on_line);

@@ -18,6 +18,10 @@ namespace fptest
 // (U+2400 and on, U+2421 for DEL), C1 controls and invalid UTF-8 by U+FFFD.
 std::string sanitize_utf8(std::string_view bytes);
 
+// As sanitize_utf8(), and without the two valid characters that XML does not have, U+FFFE
+// and U+FFFF.
+std::string sanitize_xml(std::string_view bytes);
+
 // As sanitize_utf8(), and on one line: replaces tabs and line ends by pictures as well, and
 // what changes the direction of text (overrides, embeddings, isolates) by U+FFFD.
 std::string one_line(std::string_view bytes);

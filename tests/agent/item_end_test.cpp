@@ -421,6 +421,15 @@ TEST_F(ItemEnd, DescriptionThatNoPlanCanHoldCostsNoOtherItem)
     EXPECT_THAT(read_file(kPlanFile), HasSubstr("a\u2401b"));
 }
 
+TEST_F(ItemEnd, DescriptionThatIsNoXmlDoesNotKeepTheStoredPlanFromRunning)
+{
+    run_group({{"Item", "report-here G Item 100 0 $(printf a\\\\357\\\\277\\\\277b)"}});
+    const Ended ended = run({"P/G"});
+    EXPECT_EQ(ended.status, 0) << ended.err;
+    EXPECT_THAT(outcomes(), ElementsAre("Item: passed"));
+    EXPECT_THAT(read_file(kPlanFile), HasSubstr("a\uFFFDb"));
+}
+
 TEST_F(ItemEnd, NullDescriptionCostsNoOtherItem)
 {
     const Ended ended = run_group({{"Item", "report-null G 100 0"}, {"Other", kPasses}});

@@ -157,6 +157,7 @@ INSTANTIATE_TEST_SUITE_P(
     Values(Text{"Markup", "&<>\"' &amp; ]]> <!--", "&<>\"' &amp; ]]> <!--"},
            Text{"Blanks", "one\ntwo\tthree", "one␊two␉three"},
            Text{"Colon", "at 12:30", "at 12:30"}, Text{"Utf8", "指紋 µ", "指紋 µ"},
+           Text{"NoXml", "a\xEF\xBF\xBF\xEF\xBF\xBE", "a\uFFFD\uFFFD", true},
            Text{"ControlBytes", "a\x01\x1b[0m\x7f", "a␁␛[0m␡", true},
            Text{"NoUtf8", "a\xff\xfez", "a��z", true},
            Text{"TenThousandCharacters", std::string(10000, 'd'), std::string(10000, 'd')}),

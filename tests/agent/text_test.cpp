@@ -71,6 +71,13 @@ TEST(VisibleText, ShowsEveryControlCharacterButTabsAndLineEndsByItsPicture)
     EXPECT_EQ(sanitize_utf8("\x1B[31m\0red"s), "\u241B[31m\u2400red");
 }
 
+TEST(VisibleText, LeavesCharactersThatXmlLacksOutForXmlAlone)
+{
+    const std::string text = "\t\xEF\xBF\xBD\xEF\xBF\xBE\xEF\xBF\xBF\x1B\xFF";
+    EXPECT_EQ(fptest::sanitize_xml(text), "\t\uFFFD\uFFFD\uFFFD\u241B\uFFFD");
+    EXPECT_EQ(sanitize_utf8("\xEF\xBF\xBE"), "\xEF\xBF\xBE");
+}
+
 TEST(VisibleText, ReplacesTheControlCharactersAboveAscii)
 {
     for (int code = 0x80; code < 0xA0; ++code) {
