@@ -407,7 +407,7 @@ void Runner::finish(RunningItem &active, TimePoint end)
     result.reason = verdict.reason;
     result.overruled = verdict.overruled;
     // the library may be at the command's next item already, which is not left running
-    if (active.gathers && running_.items.size() == 1 && !active.stop &&
+    if (active.gathers && running_.items.size() == 1 &&
         running_.next >= running_.job.targets.size()) {
         result.left_running = note_left_running(active.element);
     }

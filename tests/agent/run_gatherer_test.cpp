@@ -503,6 +503,22 @@ TEST_F(RunGatherer, HasWhatItLeavesRunningNamed)
     EXPECT_TRUE(ends.at(1).at("left_running").empty());
 }
 
+TEST_F(RunGatherer, HasADaemonOfItsOwnNamedAndEndedWhereItIsStopped)
+{
+    run_group({{"SensorProbe", "--help >/dev/null; (setsid /system/bin/Third sleep 1.3 report-here "
+                               "G SensorProbe 100 0 late &amp;) ; exec /system/bin/Item gather "
+                               "sleep 30"},
+               {"Item", "report G 100 0 fine"}},
+              {"--repeat", "2", "--timeout", "0.6"});
+    EXPECT_THAT(outcomes(), ElementsAre("SensorProbe: timed out", "Item: passed",
+                                        "SensorProbe: timed out", "Item: passed"));
+    const auto ends = events("end");
+    for (const std::size_t round : {0, 2}) {
+        EXPECT_EQ(ends.at(round).at("left_running").at(0).at("name"), "Third");
+        EXPECT_TRUE(ends.at(round + 1).at("left_running").empty());
+    }
+}
+
 // --- vendors -------------------------------------------------------------------------
 
 TEST_F(RunCommand, RunsTheVendorsPrograms)
