@@ -63,13 +63,15 @@ bool is_safe_to_expand(std::string_view expansion)
     const bool is_arithmetic = expansion.starts_with("$((");
     const std::size_t mark = is_arithmetic ? 3 : 2;
     const std::string_view inside = expansion.substr(mark, expansion.size() - 2 * mark + 1);
-    const std::string_view marks = is_arithmetic ? " =!<>+-*/%^~&|,:?.[]()" : " =!+-*/%^~,:@#.;[]";
+    const std::string_view marks =
+        is_arithmetic ? " =!<>+-*/%^~&|,:?.[]()" : " =!+-*/%^~,:@#.;[]&|<>()";
     const auto is_taken = [&](char byte) {
         const auto character = static_cast<unsigned char>(byte);
         return may_be_in_a_name(character) || std::isdigit(character) != 0 ||
                marks.find(byte) != marks.npos;
     };
-    return std::ranges::all_of(inside, is_taken) && (is_arithmetic || !inside.starts_with(' ')) &&
+    return std::ranges::all_of(inside, is_taken) &&
+           (is_arithmetic || inside.find_first_of(" |<&(") != 0) &&
            !(std::ranges::any_of(inside, may_be_in_a_name) &&
              inside.find_first_of("/%?") != inside.npos);
 }

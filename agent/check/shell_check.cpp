@@ -209,6 +209,13 @@ void ShellChecker::report_effect(const Item &item, const Effect &effect, std::si
                                   "put the {} in quotes if it is meant for the item",
                                   name, text, mark);
         break;
+    case Effect::Kind::no_descriptor:
+        context_.findings.error(place,
+                                "the shell would refuse the command line of item {}: {} names no "
+                                "descriptor; write '>FILE 2>&1' to redirect both outputs, or put "
+                                "the {} in quotes if it is meant for the item",
+                                name, text, mark);
+        break;
     case Effect::Kind::comment:
         context_.findings.warning(place,
                                   "the shell would take {} for a comment, and not hand it to item "

@@ -322,11 +322,15 @@ class LineScanner
             fail(Fault::Kind::nothing_after, place, mark);
             return;
         }
-        note(Effect::Kind::redirection, begin, mark, begin, at_);
+        const std::string_view word = line_.substr(target, at_ - target);
+        const bool is_refused = is_any(mark, {">&", "<&"}) && !is_any(word, {"-", "p"}) &&
+                                word.find_first_not_of("0123456789") != word.npos &&
+                                word.find_first_of("$`\\'\"") == word.npos;
+        note(is_refused ? Effect::Kind::no_descriptor : Effect::Kind::redirection, begin, mark,
+             begin, at_);
         if (is_any(mark, {"<<", "<<-"})) {
-            const std::string_view end = line_.substr(target, at_ - target);
             here_documents_.push_back({place, std::string(line_.substr(place, at_ - place)),
-                                       unquoted(end), mark == "<<-", unquoted(end) != end});
+                                       unquoted(word), mark == "<<-", unquoted(word) != word});
         }
     }
 

@@ -30,6 +30,7 @@ struct ShellReading {
             substitution,
             expansion,
             redirection,
+            no_descriptor, // a redirection to a word in place of one, as in ">&log"
             comment,
             function,
             continuation

@@ -54,11 +54,11 @@ void require_device()
 Descriptor lock_device()
 {
     Descriptor directory(open(kDataDirectory, O_RDONLY | O_DIRECTORY | O_CLOEXEC));
-    // an fptest that was just killed holds it for another moment
+    // after an fptest that was killed, its items are still being ended
     for (int tries = 0; directory.is_open() && flock(directory.get(), LOCK_EX | LOCK_NB) != 0 &&
                         errno == EWOULDBLOCK;
          ++tries) {
-        if (tries == 25) {
+        if (tries == 150) {
             throw Failure(Cause::device, "another fptest is running a plan on this device: "
                                          "wait for its end, or stop it");
         }

@@ -195,8 +195,10 @@ void Writer::write_now(const std::string &text)
     struct stat status {
     };
     const bool is_known = is_own_ && fstat(state_->descriptor, &status) == 0;
-    if (is_known && status.st_nlink == 0) {
-        state_->failure = fmt::format("{}: somebody has removed it", state_->name);
+    written_ += static_cast<off_t>(written);
+    if (is_known && (status.st_nlink == 0 || status.st_size < written_)) {
+        state_->failure = fmt::format("{}: somebody has {} it", state_->name,
+                                      status.st_nlink == 0 ? "removed" : "cut");
         return;
     }
     if (written == text.size()) {

@@ -8,6 +8,7 @@
 #include <cstddef>
 #include <memory>
 #include <string>
+#include <sys/types.h>
 
 namespace fptest
 {
@@ -50,6 +51,7 @@ class Writer
     std::shared_ptr<State> state_; // shared with the thread, which may outlive this
     bool has_thread_ = false;
     bool is_own_ = false;
+    off_t written_ = 0;
     bool waits_for_reader_ = true;
 };
 

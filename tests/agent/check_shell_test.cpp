@@ -116,8 +116,8 @@ TEST(CheckedGrammar, IsJudgedWithoutRunningAnything)
              {"$((1 + " + run + "))", "${a:-" + run + "}", "${a[" + run + "]}", "$((" + run + "))",
               "${ touch " + file + ";}", "${|touch " + file + ";}",
               "$((a[${x:-$}{${y} touch " + file + " &}]))", "$((1)); touch " + file + "; ((1))",
-              "${x:-'}\"; touch " + file + "; : \"'}",
-              "${x[1]:-'}\"; touch " + file + "; : \"'}"}) {
+              "${x:-'}\"; touch " + file + "; : \"'}", "${x[1]:-'}\"; touch " + file + "; : \"'}",
+              "${|touch " + file + "}", "${<" + file + "}", "${(touch " + file + ")}"}) {
             EXPECT_EQ(DeviceShell().ask_to_expand(expansion, why), DeviceShell::Answer::unknown);
             EXPECT_NE(access(file.c_str(), F_OK), 0) << expansion;
         }
@@ -179,6 +179,7 @@ TEST(CheckedArgs, OfAnyKindAreErrorsWhereTheShellRefusesThem)
         const bool is_error =
             std::ranges::any_of(reading.effects, [&](const ShellReading::Effect &effect) {
                 return effect.kind == ShellReading::Effect::Kind::function ||
+                       effect.kind == ShellReading::Effect::Kind::no_descriptor ||
                        (effect.kind == ShellReading::Effect::Kind::expansion &&
                         shell.ask_to_expand(effect.text, why) == DeviceShell::Answer::refused) ||
                        (effect.mark == "`" &&

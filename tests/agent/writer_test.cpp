@@ -191,4 +191,14 @@ TEST_F(WriterTest, TellsThatItsFileHasBeenRemoved)
     EXPECT_EQ(writer.failure(), path + ": somebody has removed it");
 }
 
+TEST_F(WriterTest, TellsThatItsFileHasBeenCut)
+{
+    const std::string path = directory_.path("file");
+    Writer writer(path, O_WRONLY | O_CREAT | O_APPEND, 0600);
+    writer.write("abc");
+    ASSERT_EQ(truncate(path.c_str(), 2), 0);
+    writer.write("d");
+    EXPECT_EQ(writer.failure(), path + ": somebody has cut it");
+}
+
 } // namespace
