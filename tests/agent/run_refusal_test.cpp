@@ -363,7 +363,9 @@ TEST_F(Refusal, BesideAScriptOfAnEarlierRunOrAnotherVendorsItem)
     for (const Lines &words : {Lines{"/system/bin/Script", "kill -STOP $$"},
                                Lines{"/system/bin/Item_ca", "sleep", "60"}}) {
         const support::Process left({.arguments = words});
-        ASSERT_TRUE(support::eventually([] { return !running_items().empty(); }));
+        const std::string command = "/proc/" + std::to_string(left.pid()) + "/cmdline";
+        ASSERT_TRUE(support::eventually(
+            [&] { return read_file(command).find(words[0]) != std::string::npos; }));
         const Ended ended =
             run_group({{"Script", script(script_report("0", "fine"))}, {"Item", kPasses}});
         EXPECT_EQ(ended.status, 3);
