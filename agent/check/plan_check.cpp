@@ -27,6 +27,31 @@ void check_items(const CheckContext &context, const Elements &elements, const Gr
     }
 }
 
+// A gatherer goes on running, with the args that it was started with.
+void check_gatherers(const CheckContext &context, const std::vector<Group> &groups)
+{
+    std::optional<std::string> first;
+    std::string its_group;
+    for (const Group &group : groups) {
+        for (const Item &item : group.items) {
+            if (item.name != kGatherer || !item.args) {
+                continue;
+            }
+            if (first.value_or(*item.args) != *item.args) {
+                context.findings.warning(
+                    context.places.of(item.number, "args"),
+                    "the gatherer of group {} goes on running, so that this one would not be "
+                    "started, and its args not used: give both the same, and let it report for "
+                    "each group",
+                    quoted_name(its_group));
+            } else if (!first) {
+                first = item.args;
+                its_group = group.name;
+            }
+        }
+    }
+}
+
 } // namespace
 
 void check_plan(const CheckedPlan &checked, const Plan &plan, Findings &findings)
@@ -59,6 +84,7 @@ void check_plan(const CheckedPlan &checked, const Plan &plan, Findings &findings
         }
     }
     check_later_groups(context, elements.groups);
+    check_gatherers(context, elements.groups);
 }
 
 } // namespace fptest

@@ -9,6 +9,8 @@
 #include <algorithm>
 #include <array>
 #include <filesystem>
+#include <fmt/core.h>
+#include <functional>
 #include <iterator>
 #include <string_view>
 #include <sys/inotify.h>
@@ -42,6 +44,18 @@ bool is_same(const ItemReport &one, const ItemReport &other)
     return one.progress == other.progress && one.result == other.result &&
            one.result_without_value == other.result_without_value &&
            one.description.value_or("") == other.description.value_or("");
+}
+
+// What the plan says of all elements but one.
+std::size_t digest_of_others(const Plan &plan, std::size_t number)
+{
+    std::string all;
+    for (std::size_t other = 0; other < plan.elements().size(); ++other) {
+        const ItemReport report = other == number ? ItemReport{} : report_of(plan, other);
+        all += fmt::format("{}\x1F{}\x1F{}\x1E", report.progress.value_or(""),
+                           report.result.value_or(""), report.description.value_or(""));
+    }
+    return std::hash<std::string>()(all);
 }
 
 bool is_among(const std::vector<ItemReport> &reports, const ItemReport &report)
@@ -155,7 +169,8 @@ bool ReportReader::is_stale(RunningItem &active, const Plan &plan, const ItemRep
     if (!active.gathers || !has_result(report)) {
         return true;
     }
-    active.reporting.from_a_copy = active.reporting.from_a_copy || !is_among(gathered_, report);
+    active.reporting.from_a_copy = active.reporting.from_a_copy || !is_among(gathered_, report) ||
+                                   is_saved_as_before(plan, active.element);
     return !active.reporting.from_a_copy;
 }
 
@@ -182,8 +197,10 @@ void ReportReader::begin_gathering()
         item_at(run_, active.place).report = {};
         active.reporting.seen.clear();
         active.reporting.taken_back.reset();
-    } else if (has_result(report) && !is_among(gathered_, report)) {
+    } else if (has_result(report) &&
+               (!is_among(gathered_, report) || is_saved_as_before(*plan, active.element))) {
         report_late(active.place, true, gathered_in_ != 0 ? gathered_in_ : run_.round, report);
+        note_copy(*plan, active.element);
     }
     const bool has_mark = bears_mark(*plan, active.element, running_.job.mark);
     if (has_result(report) || !has_mark) {
@@ -220,6 +237,23 @@ void ReportReader::note_gathered(const std::string &text, int vendor)
         if (name != nullptr && is_gatherer(name, vendor)) {
             note_gathered(report_of(*plan, number));
         }
+    }
+}
+
+// A gatherer that reports from its own copy of the plan saves the same text again if it has
+// the same to say; had it reported for another item, that item's report would be another.
+bool ReportReader::is_saved_as_before(const Plan &plan, std::size_t element) const
+{
+    return std::ranges::find(copies_, digest_of_others(plan, element)) != copies_.end();
+}
+
+void ReportReader::note_copy(const Plan &plan, std::size_t element)
+{
+    if (!is_saved_as_before(plan, element)) {
+        copies_.push_back(digest_of_others(plan, element));
+    }
+    if (copies_.size() > kSeen) {
+        copies_.erase(copies_.begin());
     }
 }
 
@@ -274,6 +308,9 @@ void ReportReader::read_report(RunningItem &active, const Plan &plan)
         (active.reporting.overwritten && !has_result(report))) { // as it was cleared
         return;
     }
+    if (active.gathers && has_result(report)) {
+        note_copy(plan, number);
+    }
     active.reporting.overwritten = false;
     active.reporting.undone = has_result(result.report) && !has_result(report);
     if (!is_among(active.reporting.seen, report) ||
@@ -309,7 +346,8 @@ void ReportReader::read_late_report(Judged &judged, const Plan &plan)
         return;
     }
     const ItemReport report = report_of(plan, number);
-    const bool keeps_copy = judged.gathers && !is_among(gathered_, report);
+    const bool keeps_copy = judged.gathers && (!is_among(gathered_, report) ||
+                                               is_saved_as_before(plan, judged.element));
     if (!bears_mark(plan, judged.element, judged.mark) && !keeps_copy) {
         return;
     }
@@ -317,6 +355,9 @@ void ReportReader::read_late_report(Judged &judged, const Plan &plan)
         return;
     }
     judged.seen.push_back(report);
+    if (judged.gathers) {
+        note_copy(plan, judged.element);
+    }
     report_late(judged.place, judged.gathers, judged.round, report);
 }
 

@@ -73,6 +73,8 @@ class ReportReader
     bool is_stale(RunningItem &active, const Plan &plan, const ItemReport &report);
     void report_late(const Place &place, bool gathers, int round, const ItemReport &report);
     void note_gathered(const ItemReport &report);
+    bool is_saved_as_before(const Plan &plan, std::size_t element) const;
+    void note_copy(const Plan &plan, std::size_t element);
 
     Run &run_;
     const std::vector<Reporter *> &reporters_;
@@ -80,6 +82,7 @@ class ReportReader
     Descriptor saves_;
     std::vector<Judged> judged_;       // of this round, and gatherers
     std::vector<ItemReport> gathered_; // what an old copy may say of gatherers
+    std::vector<std::size_t> copies_;  // digests of what else the plan said then
     int gathered_in_ = 0;              // the round of the last gathering
     bool marks_are_gone_ = false;      // from items' elements
     unsigned poll_count_ = 1;

@@ -178,6 +178,20 @@ TEST_F(RunGatherer, MayReportFromACopyOfThePlanThatItKeeps)
     }
 }
 
+TEST_F(RunGatherer, MaySayTheSameAgainFromItsCopy)
+{
+    for (const std::string way : {"--quiet", "--as-group"}) {
+        SCOPED_TRACE(way);
+        const std::string reports = "gather report-here G SensorProbe 100 0 done sleep 0.3 "
+                                    "report-here G SensorProbe 100 1 late ";
+        const Gatherer gatherer(reports + reports + reports + "sleep 60");
+        run_group({{"SensorProbe", ""}, {"Item", "sleep 0.5 report G 100 0 fine"}},
+                  {way, "--repeat", "3", "--timeout", "3"});
+        EXPECT_THAT(outcomes(), AllOf(SizeIs(6), Each(EndsWith(": passed"))));
+        EXPECT_THAT(events("late"), SizeIs(3));
+    }
+}
+
 TEST_F(RunGatherer, MayKeepItsCopyWhileThePlanIsStoredAnew)
 {
     const Gatherer gatherer("gather report-here G SensorProbe 100 0 one gather report-here G "
