@@ -35,4 +35,16 @@ Comparison lookup_by_name(int items);
 Comparison lookup_by_position(int items);
 Comparison search(int items);
 
+// --- outside of this process --------------------------------------------------
+
+// Whether the library is small enough on disk, and what an idle agent and commands
+// leave in memory.
+void print_sizes();
+void print_memory();
+
+// Other programs that run tests, for orientation: time for one trivial item, without
+// what starting them takes; and ours, with and without the query for a running
+// gatherer, which is query (0 to 1) of it.
+void print_peers(double ours, double query, int items);
+
 } // namespace bench

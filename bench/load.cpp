@@ -4,9 +4,9 @@
 #include "cases.h"
 #include "figures.h"
 #include "plan.h"
-#include "unit.h"
 
 #include "common/descriptor.h"
+#include "tests/unit/internals.h"
 
 #include <fcntl.h>
 #include <memory>
@@ -58,15 +58,15 @@ Comparison load(const std::string &name, double limit, int items, mxml_node_t *(
             .seconds = 0.2,
             .prepare =
                 [=] {
-                    unit::drop();
+                    internals::reset();
                     write_plan(fresh_plan(items));
                     loaded->file = Descriptor(open(kPlanPath, O_RDONLY | O_CLOEXEC));
                 },
-            .library = [=] { loaded->tree = unit::load_configs_file(kPlanPath); },
+            .library = [=] { loaded->tree = internals::load_configs_file(kPlanPath); },
             .baseline = [=] { loaded->tree = loaded->bare = bare_load(loaded->file.get()); },
             .clear =
                 [=] {
-                    unit::drop();
+                    internals::reset();
                     mxmlDelete(loaded->bare);
                     loaded->tree = loaded->bare = nullptr;
                     lseek(loaded->file.get(), 0, SEEK_SET);
@@ -83,9 +83,9 @@ Comparison lookup(int items, void (*look_up)(mxml_node_t *tree, int index, const
             .calls = items > 100 ? 8 : 64,
             .prepare =
                 [=] {
-                    unit::drop();
+                    internals::reset();
                     write_plan(fresh_plan(items));
-                    *tree = unit::load_configs_file(kPlanPath);
+                    *tree = internals::load_configs_file(kPlanPath);
                     if (*tree == nullptr) {
                         throw std::runtime_error(std::string(kPlanPath) +
                                                  ": the library has not loaded it");
@@ -114,14 +114,14 @@ Comparison first_load_to_parser(int items)
 Comparison lookup_by_name(int items)
 {
     return lookup(items, [](mxml_node_t * /* tree */, int /* index */, const char *name) {
-        unit::get_node_index(kGroup, name);
+        internals::get_node_index(kGroup, name, 3);
     });
 }
 
 Comparison lookup_by_position(int items)
 {
     return lookup(items, [](mxml_node_t *tree, int index, const char * /* name */) {
-        unit::get_node_byIndex(tree, kGroup, index);
+        internals::get_node_byIndex(tree, kGroup, index);
     });
 }
 

@@ -5,7 +5,6 @@
 #include "cases.h"
 #include "figures.h"
 #include "growth.h"
-#include "tables.h"
 
 #include <CLI/CLI.hpp>
 #include <benchmark/benchmark.h>

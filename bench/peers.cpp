@@ -1,8 +1,8 @@
 // SPDX-FileCopyrightText: 2026 The Quillmark authors
 // SPDX-License-Identifier: Apache-2.0
 
+#include "cases.h"
 #include "figures.h"
-#include "tables.h"
 
 #include <cstdlib>
 #include <filesystem>

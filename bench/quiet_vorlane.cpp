@@ -7,14 +7,14 @@
 #include "vr_log.h"
 
 static void (*g_Listener)(const char *format, va_list arguments);
-static void (*g_Client)(void);
+static void (*g_Client)();
 
 void quiet_on_log(void (*listener)(const char *format, va_list arguments))
 {
     g_Listener = listener;
 }
 
-void quiet_on_accept(void (*client)(void))
+void quiet_on_accept(void (*client)())
 {
     g_Client = client;
 }
@@ -30,7 +30,7 @@ int vr_log_printf(int /* priority */, const char * /* tag */, const char *format
     return 0;
 }
 
-/* The Linux wrapper, which is compiled under this name here. */
+// The Linux wrapper, which is compiled under this name here.
 extern "C" int linux_Accept(int descriptor, struct sockaddr *address, socklen_t *length);
 
 int Accept(int descriptor, struct sockaddr *address, socklen_t *length)

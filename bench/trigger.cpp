@@ -6,7 +6,7 @@
 #include "plan.h"
 #include "quiet_vorlane.h"
 #include "sockwrap.h"
-#include "unit.h"
+#include "tests/unit/internals.h"
 
 #include <array>
 #include <netinet/in.h>
@@ -91,7 +91,7 @@ Comparison trigger()
                 },
             .library =
                 [] {
-                    unit::Sock_Init1();
+                    internals::Sock_Init1();
                     receive();
                 },
             .baseline =

@@ -60,22 +60,11 @@ Nodes::Nodes(mxml_node_t *tree)
     }
 }
 
-Nodes::Place Nodes::group(std::string_view name) const
+Nodes::Place Nodes::find(std::string_view element, std::string_view name, std::size_t after) const
 {
-    for (std::size_t at = 1; at < nodes.size(); ++at) {
+    for (std::size_t at = after + 1; at < nodes.size(); ++at) {
         const std::string *own = contents[at].attribute("name");
-        if (contents[at].element == "CmdGroup" && own != nullptr && *own == name) {
-            return at;
-        }
-    }
-    return std::nullopt;
-}
-
-Nodes::Place Nodes::item(std::size_t group, std::string_view name) const
-{
-    for (std::size_t at = group + 1; at < nodes.size(); ++at) {
-        const std::string *own = contents[at].attribute("name");
-        if (contents[at].element == "Cmd" && own != nullptr && *own == name) {
+        if (contents[at].element == element && own != nullptr && *own == name) {
             return at;
         }
     }

@@ -35,6 +35,6 @@ struct Nodes {
 
     // Places in the vectors; nothing if there is none.
     using Place = std::optional<std::size_t>;
-    [[nodiscard]] Place group(std::string_view name) const;
-    [[nodiscard]] Place item(std::size_t group, std::string_view name) const;
+    [[nodiscard]] Place find(std::string_view element, std::string_view name,
+                             std::size_t after = 0) const;
 };

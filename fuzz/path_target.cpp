@@ -9,7 +9,6 @@
 #include "quillmark.h"
 #include "runs.h"
 
-#include <algorithm>
 #include <string>
 
 using doubles::require;

@@ -5,6 +5,7 @@
 
 #include "plan/plan.h"
 
+#include <algorithm>
 #include <cstdlib>
 
 namespace
@@ -42,17 +43,12 @@ void expect_item(const fptest::Plan::Element &item, int vendor, bool gatherer_ru
 std::vector<std::string> components(std::string_view text, char separator)
 {
     Lines found;
-    std::string current;
-    for (const char character : text) {
-        if (character != separator) {
-            current += character;
-        } else if (!current.empty()) {
-            found.push_back(std::move(current));
-            current.clear();
+    while (!text.empty()) {
+        const std::string_view part = text.substr(0, text.find(separator));
+        if (!part.empty()) {
+            found.emplace_back(part);
         }
-    }
-    if (!current.empty()) {
-        found.push_back(std::move(current));
+        text.remove_prefix(std::min(part.size() + 1, text.size()));
     }
     return found;
 }

@@ -95,7 +95,8 @@ void check_lookups(const Nodes &plan, const fptest::Plan &told, const std::strin
                    const std::vector<std::string> &items)
 {
     const int length = internals::get_node_length(group.c_str(), 2);
-    require((length >= 0) == plan.group(group).has_value(), "a group is found, or is not");
+    require((length >= 0) == plan.find("CmdGroup", group).has_value(),
+            "a group is found, or is not");
     if (!is_addressable(group)) {
         return;
     }
@@ -222,8 +223,8 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t *data, std::size_t size
 
     const Report report = report_from(plan, input);
     auto contents = plan.contents;
-    const auto group = plan.group(report.group);
-    const auto item = group ? plan.item(*group, report.item) : std::nullopt;
+    const auto group = plan.find("CmdGroup", report.group);
+    const auto item = group ? plan.find("Cmd", report.item, *group) : std::nullopt;
     report.make();
     if (item) {
         report.expect_in(contents[*item]);

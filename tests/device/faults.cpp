@@ -4,7 +4,6 @@
 #include "faults.h"
 
 #include <algorithm>
-#include <cstdlib>
 #include <iterator>
 #include <sched.h>
 #include <sys/mount.h>

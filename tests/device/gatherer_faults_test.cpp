@@ -9,7 +9,6 @@
 #include <cerrno>
 #include <chrono>
 #include <csignal>
-#include <string>
 #include <sys/resource.h>
 #include <sys/socket.h>
 #include <thread>

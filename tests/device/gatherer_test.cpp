@@ -7,7 +7,6 @@
 
 #include <chrono>
 #include <csignal>
-#include <string>
 #include <thread>
 #include <unistd.h>
 

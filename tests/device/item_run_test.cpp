@@ -6,8 +6,6 @@
 #include "faults.h"
 
 #include <chrono>
-#include <string>
-#include <vector>
 
 namespace
 {

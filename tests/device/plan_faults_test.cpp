@@ -9,15 +9,11 @@
 
 #include <array>
 #include <csignal>
-#include <cstddef>
 #include <cstdlib>
 #include <fcntl.h>
 #include <filesystem>
-#include <optional>
-#include <string>
 #include <sys/mount.h>
 #include <sys/resource.h>
-#include <sys/types.h>
 #include <unistd.h>
 
 using namespace device;

@@ -7,18 +7,14 @@
 #include "network.h"
 #include "support/temporary_directory.h"
 
-#include <algorithm>
 #include <cerrno>
 #include <chrono>
 #include <csignal>
-#include <cstddef>
 #include <fcntl.h>
 #include <filesystem>
 #include <set>
-#include <string>
 #include <sys/resource.h>
 #include <sys/socket.h>
-#include <sys/types.h>
 #include <sys/wait.h>
 #include <thread>
 #include <unistd.h>

@@ -6,7 +6,6 @@
 
 #include <algorithm>
 #include <cerrno>
-#include <cstddef>
 #include <cstring>
 
 namespace
@@ -81,15 +80,6 @@ class CommandEntry : public LibraryTest
     static constexpr char kOnePlan[] =
         "<P><CmdGroup name='g'><Cmd name='a' args='1'/></CmdGroup></P>";
     static constexpr char kOtherPlan[] = "<P><CmdGroup name='g'/></P>";
-
-    // Loads a plan into the cache, by way of a lookup.
-    static void cache_plan(const std::string &text)
-    {
-        platform::write_plan(text);
-        ASSERT_GE(internals::get_node_length("g", 2), 0);
-        ASSERT_NE(g_TestCmdTree, nullptr);
-        events();
-    }
 
     // Tells when the cached tree is deleted, and how the plan file looked then.
     struct Deletion {
@@ -299,8 +289,7 @@ TEST_F(CommandEntry, PingMayGoOnAfterItsHeadAndHaveMoreFields)
 
 TEST_F(CommandEntry, PingLeavesThePlanAlone)
 {
-    cache_plan(kOnePlan);
-    mxml_node_t *const tree = g_TestCmdTree;
+    mxml_node_t *const tree = load_plan(kOnePlan);
     reply_to("pingtest", 64);
     EXPECT_EQ(g_TestCmdTree, tree);
     EXPECT_EQ(platform::plan_text(), kOnePlan);
@@ -325,8 +314,7 @@ TEST_F(CommandEntry, OtherCommandsNeitherUseUpThePingNorNeedIt)
 
 TEST_F(CommandEntry, UnknownHeadDoesNothing)
 {
-    cache_plan(kOnePlan);
-    mxml_node_t *const tree = g_TestCmdTree;
+    mxml_node_t *const tree = load_plan(kOnePlan);
     for (const char *unknown :
          {"unknown", "pingtes", "pingTest", "Pingtest", " pingtest", "xpingtest", "XMLFil",
           "XMLfile", " XMLFile", "xXMLFile", "XMLNodePat", "XMLNodepath", " XMLNodePath",
@@ -414,7 +402,7 @@ TEST_F(CommandEntry, PlanIsCutAtItsFirstColon)
 
 TEST_F(CommandEntry, StoringWithoutANameFieldLeavesAnEmptyFileAndNoCache)
 {
-    cache_plan(kOnePlan);
+    load_plan(kOnePlan);
     dirty_stack();
     EXPECT_EQ(FPTEST_RunTestCmd("XMLFile", nullptr, 0), 0);
 
@@ -426,7 +414,7 @@ TEST_F(CommandEntry, StoringWithoutANameFieldLeavesAnEmptyFileAndNoCache)
 
 TEST_F(CommandEntry, StoringDeletesTheCachedTreeOnceBetweenOpenAndWrite)
 {
-    cache_plan(kOnePlan);
+    load_plan(kOnePlan);
     Deletion deletion;
     watch_cached_tree(deletion);
     run_quietly(std::string("XMLFile::") + kOtherPlan);
@@ -438,7 +426,7 @@ TEST_F(CommandEntry, StoringDeletesTheCachedTreeOnceBetweenOpenAndWrite)
 
 TEST_F(CommandEntry, LookupAfterAStoreSeesTheNewPlan)
 {
-    cache_plan(kOnePlan);
+    load_plan(kOnePlan);
     EXPECT_EQ(internals::get_node_length("g", 2), 1);
     run_quietly(std::string("XMLFile::") + kOtherPlan);
     EXPECT_EQ(internals::get_node_length("g", 2), 0);
@@ -446,7 +434,7 @@ TEST_F(CommandEntry, LookupAfterAStoreSeesTheNewPlan)
 
 TEST_F(CommandEntry, StoringTakesDescriptorZero)
 {
-    cache_plan(kOnePlan);
+    load_plan(kOnePlan);
     platform::free_descriptor_zero();
     EXPECT_EQ(FPTEST_RunTestCmd("XMLFile::<P/>", nullptr, 0), 0);
 
@@ -458,8 +446,7 @@ TEST_F(CommandEntry, StoringTakesDescriptorZero)
 
 TEST_F(CommandEntry, StoringThatCannotOpenLosesTheFileAndKeepsTheCache)
 {
-    cache_plan(kOnePlan);
-    mxml_node_t *const tree = g_TestCmdTree;
+    mxml_node_t *const tree = load_plan(kOnePlan);
     Deletion deletion;
     watch_cached_tree(deletion);
     plan_steps("open", {gives(-1, EACCES)});
@@ -483,7 +470,7 @@ TEST_F(CommandEntry, AnyOtherWrittenCountIsLoggedAndNotRetriedAfterTheCacheIsDro
                                             {gives(0), "0", ""},
                                             {gives(5), "5", ""}}) {
         SetUp();
-        cache_plan(kOnePlan);
+        load_plan(kOnePlan);
         plan_steps("write", {step});
         EXPECT_EQ(FPTEST_RunTestCmd("XMLFile::<P/>", nullptr, 0), 0);
 

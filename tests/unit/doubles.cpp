@@ -17,7 +17,6 @@
 #include <cstdlib>
 #include <cstring>
 #include <fcntl.h>
-#include <netinet/in.h>
 #include <sstream>
 #include <sys/mman.h>
 #include <sys/wait.h>

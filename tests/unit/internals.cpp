@@ -20,10 +20,11 @@ void reset()
     memset(sendBuf, 0, sizeof sendBuf);
 }
 
-const int &ping_mask = g_PingMask;
+int &ping_mask = g_PingMask;
 const int &vendor = ::vendor;
 char (&command_name)[65] = g_CmdName;
 
+int (&RunTestCmd)(const char *, char *, int) = FPTEST_RunTestCmd;
 void (&ExtractString)(char *, int) = ::ExtractString;
 void (&TestMsgInit)(fpTest_TestMsg_t *) = ::TestMsgInit;
 void (&ParseCmdLine)(const char *, fpTest_TestMsg_t *) = fptest_ParseCmdLine;

@@ -5,7 +5,6 @@
 // items they run: path_test.cpp.
 #include "unit_test.h"
 
-#include <algorithm>
 #include <cerrno>
 #include <utility>
 

@@ -162,6 +162,7 @@ TEST_F(PlanSave, PlansAreSavedInOneLayout)
              {"<P><CmdGroup name='g'><Cmd name='a'/></CmdGroup><CmdGroup name='h'/></P>",
               "<P>\n<CmdGroup name=\"g\">\n\t<Cmd name=\"a\" />\n</CmdGroup>\n"
               "<CmdGroup name=\"h\" />\n</P>\n"},
+             // comments have lines of their own
              {"<?xml version=\"1.0\"?><!-- top --><P><!-- a: b --><CmdGroup name='g'>"
               "<!--c--><Cmd name='a'/></CmdGroup><!-- end --></P>",
               "<?xml version=\"1.0\"?>\n<!-- top -->\n<P>\n\t<!-- a: b -->\n"
@@ -193,42 +194,6 @@ TEST_F(PlanSave, NestingBeyondNineLevelsIsSavedWithEightTabs)
     }
     EXPECT_EQ(save_of(nested(12)), expected);
     EXPECT_EQ(shape(load_plan(expected)), shape(load_plan(nested(12))));
-}
-
-TEST_F(PlanSave, CommentsAreSavedOnLinesOfTheirOwn)
-{
-    EXPECT_EQ(save_of("<?xml version=\"1.0\"?><!-- top --><P><!-- a: b --><CmdGroup name='g'>"
-                      "<!--c--><Cmd name='a'/></CmdGroup><!-- end --></P>"),
-              "<?xml version=\"1.0\"?>\n"
-              "<!-- top -->\n"
-              "<P>\n"
-              "\t<!-- a: b -->\n"
-              "\t<CmdGroup name=\"g\">\n"
-              "\t\t<!--c-->\n"
-              "\t\t<Cmd name=\"a\" />\n"
-              "</CmdGroup>\n"
-              "\t<!-- end -->\n"
-              "</P>\n");
-}
-
-TEST_F(PlanSave, AttributesAreSavedEscapedAndInOrder)
-{
-    EXPECT_EQ(
-        save_of("<P><Cmd args='a &lt;&gt;&amp;&quot;&apos; \xc3\xa9' name=\"it's\" x=''/></P>"),
-        "<P>\n"
-        "<Cmd args=\"a &lt;&gt;&amp;&quot;' \xc3\xa9\" name=\"it's\" x=\"\" />\n"
-        "</P>\n");
-}
-
-TEST_F(PlanSave, LongAttributeListIsWrappedAtTheLibrarysOwnMargin)
-{
-    EXPECT_EQ(save_of("<P><Cmd name='" + std::string(30, 'n') + "' args='" + std::string(40, 'a') +
-                      "' progress='10'/></P>"),
-              "<P>\n"
-              "<Cmd name=\"" +
-                  std::string(30, 'n') + "\"\nargs=\"" + std::string(40, 'a') +
-                  "\" progress=\"10\" />\n"
-                  "</P>\n");
 }
 
 TEST_F(PlanSave, ChangesInTheTreeAreSaved)

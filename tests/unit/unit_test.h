@@ -14,7 +14,6 @@
 
 #include <cstddef>
 #include <string>
-#include <unistd.h>
 
 using support::Lines;
 
