@@ -46,16 +46,28 @@ bool is_same(const ItemReport &one, const ItemReport &other)
            one.description.value_or("") == other.description.value_or("");
 }
 
-// What the plan says of all elements but one.
-std::size_t digest_of_others(const Plan &plan, std::size_t number)
+// What the plan says of each element.
+std::vector<ItemReport> reports_of(const Plan &plan)
+{
+    std::vector<ItemReport> all;
+    for (std::size_t number = 0; number < plan.elements().size(); ++number) {
+        all.push_back(report_of(plan, number));
+    }
+    return all;
+}
+
+// Of all elements but one; empty if they have no report.
+std::string others_in(const Plan &plan, std::size_t number)
 {
     std::string all;
     for (std::size_t other = 0; other < plan.elements().size(); ++other) {
-        const ItemReport report = other == number ? ItemReport{} : report_of(plan, other);
-        all += fmt::format("{}\x1F{}\x1F{}\x1E", report.progress.value_or(""),
-                           report.result.value_or(""), report.description.value_or(""));
+        const ItemReport report = report_of(plan, other);
+        if (other != number && !is_same(report, ItemReport{})) {
+            all += fmt::format("{}\x1F{}\x1F{}\x1F{}\x1E", other, report.progress.value_or(""),
+                               report.result.value_or(""), report.description.value_or(""));
+        }
     }
-    return std::hash<std::string>()(all);
+    return all;
 }
 
 bool is_among(const std::vector<ItemReport> &reports, const ItemReport &report)
@@ -238,19 +250,42 @@ void ReportReader::note_gathered(const std::string &text, int vendor)
             note_gathered(report_of(*plan, number));
         }
     }
+    if (plan && earlier_.empty()) {
+        earlier_ = reports_of(*plan);
+    }
 }
 
 // A gatherer that reports from its own copy of the plan saves the same text again if it has
-// the same to say; had it reported for another item, that item's report would be another.
+// the same to say; had it reported for another item, that item's report would be another. If
+// the copy is from before this run, so are the reports in it.
 bool ReportReader::is_saved_as_before(const Plan &plan, std::size_t element) const
 {
-    return std::ranges::find(copies_, digest_of_others(plan, element)) != copies_.end();
+    const std::string others = others_in(plan, element);
+    if (others.empty() ||
+        std::ranges::find(copies_, std::hash<std::string>()(others)) != copies_.end()) {
+        return true;
+    }
+    const std::vector<ItemReport> reports = reports_of(plan);
+    const bool is_of_this_round = std::ranges::any_of(judged_, [&](const Judged &judged) {
+        return !judged.gathers && !judged.mark.empty() &&
+               bears_mark(plan, judged.element, judged.mark);
+    });
+    if (is_of_this_round || reports.size() != earlier_.size()) {
+        return false;
+    }
+    for (std::size_t other = 0; other < reports.size(); ++other) {
+        if (other != element && !is_same(reports[other], ItemReport{}) &&
+            !is_same(reports[other], earlier_[other])) {
+            return false;
+        }
+    }
+    return true;
 }
 
 void ReportReader::note_copy(const Plan &plan, std::size_t element)
 {
     if (!is_saved_as_before(plan, element)) {
-        copies_.push_back(digest_of_others(plan, element));
+        copies_.push_back(std::hash<std::string>()(others_in(plan, element)));
     }
     if (copies_.size() > kSeen) {
         copies_.erase(copies_.begin());

@@ -82,7 +82,8 @@ class ReportReader
     Descriptor saves_;
     std::vector<Judged> judged_;       // of this round, and gatherers
     std::vector<ItemReport> gathered_; // what an old copy may say of gatherers
-    std::vector<std::size_t> copies_;  // digests of what else the plan said then
+    std::vector<ItemReport> earlier_;  // of each element, before the run
+    std::vector<std::size_t> copies_;  // hashes of what others had reported then
     int gathered_in_ = 0;              // the round of the last gathering
     bool marks_are_gone_ = false;      // from items' elements
     unsigned poll_count_ = 1;

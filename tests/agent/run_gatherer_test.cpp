@@ -190,6 +190,12 @@ TEST_F(RunGatherer, MaySayTheSameAgainFromItsCopy)
         EXPECT_THAT(outcomes(), AllOf(SizeIs(6), Each(EndsWith(": passed"))));
         EXPECT_THAT(events("late"), SizeIs(3));
     }
+    const std::string report = "gather report-here G SensorProbe 100 0 done ";
+    const Gatherer gatherer(report + report + report + "sleep 60");
+    for (int number = 0; number < 3; ++number) {
+        run_group({{"Item", kPasses}, {"SensorProbe", ""}, {"Other", kPasses}});
+        EXPECT_THAT(outcomes(), AllOf(SizeIs(3), Each(EndsWith(": passed")))) << number;
+    }
 }
 
 TEST_F(RunGatherer, MayKeepItsCopyWhileThePlanIsStoredAnew)
