@@ -85,7 +85,7 @@ class SizeChecker
                         "cut here, {}; shorten it, or have fptest run --plan place it as a file, "
                         "without --as-sent",
                         command_.size(), command_.size() - kPlanLimit, kPlanLimit,
-                        colon_ < kPlanLimit ? "were it not cut at a ':' before"
+                        colon_ < kPlanLimit ? "if it were not cut at a ':' before that"
                                             : "and the library would " + fate("it"));
     }
 

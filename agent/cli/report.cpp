@@ -119,10 +119,8 @@ Exit report(const ReportOptions &options)
     wanted.result = std::to_string(options.result);
     wanted.description = as_loaded(description);
     if (!written || !(written->report(number) == wanted)) {
-        throw Failure(
-            Cause::device,
-            "the report is not in {}: is it writable? --log FILE tells what the library met",
-            kStoredPlan);
+        throw Failure(Cause::device, "the report is not in {}: is it writable? --log FILE says why",
+                      kStoredPlan);
     }
     return Exit::success;
 }

@@ -275,7 +275,7 @@ void add_run(CLI::App &app, Action &chosen)
     command.add_option("--timeout", options->timeout, "stop an item that takes longer")
         ->type_name("SECONDS")
         ->transform(range(0.001, 1000000.0));
-    command.add_option("--grace", options->grace, "then kill it after so long")
+    command.add_option("--grace", options->grace, "kill it this long after a stop")
         ->type_name("SECONDS")
         ->capture_default_str()
         ->transform(range(0.0, 1000000.0));
@@ -287,8 +287,8 @@ void add_run(CLI::App &app, Action &chosen)
         ->transform(range(1, 1000000));
     command
         .add_option("--for", options->time_limit,
-                    "begin another round of everything for so\n"
-                    "long: 90, 90s, 10m, 2h, 1d")
+                    "begin further rounds until this time is\n"
+                    "over: 90, 90s, 10m, 2h, 1d")
         ->type_name("TIME")
         ->transform(time_span());
     command.add_flag("--until-fail", options->until_fail,

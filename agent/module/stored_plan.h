@@ -67,8 +67,9 @@ StoredPlan whole_stored_plan();
 // and keeps control characters and invalid UTF-8. Throws a Failure if it cannot be written.
 void mend_stored_plan();
 
-// The lock that everybody who reports takes on the stored plan, so that no report undoes
-// another. Goes on without it after 10 seconds, or if there is no plan.
+// The lock that fptest and the sample items take on the stored plan, so that no report of
+// theirs undoes another; the library itself takes none. Goes on without it after 10 seconds, or if
+// there is no plan.
 Descriptor lock_stored_plan();
 
 // Puts another text in the stored plan's place, whole or not at all; the caller holds the

@@ -294,9 +294,8 @@ std::string junit_state(const Run &run)
     const std::string indent(6, ' ');
     std::string text = property(indent, "finished", run.finished ? "true" : "false");
     if (!run.finished) {
-        text +=
-            property(indent, "reason",
-                     has_ended(run) ? run.why_unfinished : "the run went on when this was written");
+        text += property(indent, "reason",
+                         has_ended(run) ? run.why_unfinished : "the run was still going on");
     }
     return text;
 }

@@ -46,7 +46,7 @@ std::unique_ptr<Reporter> make_live_view(std::FILE *terminal, bool colour);
 std::unique_ptr<Reporter> make_plain_view(std::FILE *stream, bool quiet);
 
 // The view that suits the stream: live on a terminal that can move its cursor, in
-// colour unless NO_COLOR is set.
+// colour unless NO_COLOR is set and not empty.
 std::unique_ptr<Reporter> make_suitable_view(std::FILE *stream, bool quiet);
 
 } // namespace fptest

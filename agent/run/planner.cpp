@@ -53,7 +53,7 @@ Path parts_of(const std::string &text, const Plan &plan)
                       in_quotes(text));
     }
     if (text.size() > kPathLimit) {
-        throw Failure(Cause::input, "a path of {} bytes is cut at {}: name the root with less",
+        throw Failure(Cause::input, "a path of {} bytes is cut at {}: use a shorter root",
                       text.size(), kPathLimit);
     }
     if (parts.size() == 3) {

@@ -23,7 +23,7 @@ namespace
 {
 
 constexpr std::chrono::milliseconds kLongestPause(25);
-constexpr std::size_t kSeen = 100; // reports kept for an item
+constexpr std::size_t kSeen = 100; // reports kept for an item, and copies for gatherers
 constexpr std::string_view kPlanName =
     std::string_view(kStoredPlan).substr(std::string_view(kStoredPlan).rfind('/') + 1);
 

@@ -141,7 +141,7 @@ std::string title(const Run &run, const ItemRun &item);
 
 // Is called in this order: begin; for each item started, any number of progressed, ended;
 // round_over between two rounds; finish, even if items did not run. The run is up to date at
-// each call. No call may wait for the reader of what the reporter writes.
+// each call. No call may wait long for the reader of what the reporter writes.
 class Reporter
 {
   public:

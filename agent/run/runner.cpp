@@ -3,7 +3,7 @@
 
 #include "run/runner.h"
 
-#include "module/preflight.h"
+#include "module/processes.h"
 #include "module/stored_plan.h"
 #include "plan/plan.h"
 #include "run/verdict.h"
@@ -319,7 +319,7 @@ void Runner::start_next(const LibraryProcess::Event &event)
     }
     if (vendor_ != run_.vendor) {
         append_output(item_at(run_, active.place).output,
-                      fmt::format("fptest: the vendor is {} by now\n", vendor_));
+                      fmt::format("fptest: the vendor is {} now\n", vendor_));
     }
 }
 
@@ -419,7 +419,7 @@ void Runner::finish(RunningItem &active, TimePoint end)
     mend_stored_plan();
 }
 
-// In the order of their starts, which is that of their numbers.
+// In the order of their starts.
 void Runner::notify_ended()
 {
     while (!running_.items.empty() && running_.items.front().done) {

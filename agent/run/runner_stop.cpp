@@ -280,8 +280,7 @@ template <typename Find> void Runner::end_all(const Find &find)
     for (auto left = find_all(); !left.empty(); left = find_all()) {
         const auto waited = now() - begin;
         if (waited > options_.grace + kBeforeGivingUp) {
-            break_off(fmt::format("{} cannot be killed, and would report into the next round",
-                                  described(left)));
+            break_off(fmt::format("{} cannot be killed, and might still report", described(left)));
             return;
         }
         if (waited > options_.grace) {

@@ -153,14 +153,14 @@ class Judge
         }
         if (reporting_.overwritten) {
             return active_.gathers
-                       ? "a process with an old copy of the plan has written it over, perhaps the "
+                       ? "a process with an old copy of the plan has overwritten it, perhaps the "
                          "gatherer: let it report by a new process each time"
-                       : "a process with an old copy of the plan has written it over, and nothing "
+                       : "a process with an old copy of the plan has overwritten it, and nothing "
                          "was reported after that";
         }
         if (reporting_.in_another_plan) {
-            return "the stored plan is another one by now: a process that knows that one has "
-                   "saved it";
+            return "another plan has been stored meanwhile, or saved by a process that still "
+                   "had it";
         }
         if (reporting_.undone) {
             return "a process with an old copy of the plan has written over what it had reported";

@@ -16,7 +16,7 @@ bool is_smart_terminal(std::FILE *stream);
 // The current width in columns, or 80 if it is unknown.
 std::size_t terminal_width(std::FILE *stream);
 
-// Unless NO_COLOR is set to anything.
+// Unless NO_COLOR is set and not empty.
 bool wants_colour();
 
 } // namespace fptest

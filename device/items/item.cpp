@@ -17,6 +17,7 @@
 #include <fcntl.h>
 #include <string_view>
 #include <sys/file.h>
+#include <sys/stat.h>
 #include <sys/wait.h>
 #include <thread>
 
@@ -51,10 +52,20 @@ std::string one_line(const CLI::App *app, const CLI::Error &error)
 // lock on the file. Without a plan there is nothing to lock, and the report fails.
 Descriptor lock_plan()
 {
-    Descriptor plan(open(plan_path, O_RDONLY | O_CLOEXEC));
-    while (plan.is_open() && flock(plan.get(), LOCK_EX) != 0 && errno == EINTR) {
+    for (;;) {
+        Descriptor plan(open(plan_path, O_RDONLY | O_CLOEXEC));
+        while (plan.is_open() && flock(plan.get(), LOCK_EX) != 0 && errno == EINTR) {
+        }
+        struct stat locked {
+        };
+        struct stat stored {
+        };
+        // fptest may have put another file in its place meanwhile
+        if (!plan.is_open() || fstat(plan.get(), &locked) != 0 || stat(plan_path, &stored) != 0 ||
+            locked.st_ino == stored.st_ino) {
+            return plan;
+        }
     }
-    return plan;
 }
 
 } // namespace
@@ -70,7 +81,7 @@ Item::Item(int argc, char **argv, const std::string &purpose, Seconds default_le
     app.failure_message(one_line);
     app.add_option("--group", group_, "the item's group in the test plan")->required();
     app.add_option("--item", name_, "the item's name in the test plan")->capture_default_str();
-    app.add_option("--seconds", seconds, "how long it takes, all in all")->capture_default_str();
+    app.add_option("--seconds", seconds, "how long it takes in total")->capture_default_str();
     try {
         app.parse(argc, argv);
         if (!(seconds >= 0 && seconds <= 86400)) {

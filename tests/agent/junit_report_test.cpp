@@ -101,7 +101,7 @@ TEST_F(JunitReporter, ReadsBackWhateverIsReported)
         EXPECT_EQ(group.attributes.at("name"), text.read);
         EXPECT_EQ(group.properties().at("plan"), text.read);
         EXPECT_EQ(group.properties().at("reason"),
-                  text.read.empty() ? "the run went on when this was written" : text.read);
+                  text.read.empty() ? "the run was still going on" : text.read);
         const Element test = group.all("testcase").at(0);
         EXPECT_EQ(test.attributes.at("classname"), text.read);
         EXPECT_EQ(test.attributes.at("name"), text.read);
@@ -129,8 +129,7 @@ TEST_F(JunitReporter, IsAWholeDocumentFromTheBeginningOn)
     EXPECT_EQ(top.attributes.at("errors"), "6");
     EXPECT_EQ(top.attributes.at("skipped"), "0");
     EXPECT_EQ(top.children.at(0).properties().at("finished"), "false");
-    EXPECT_EQ(top.children.at(0).properties().at("reason"),
-              "the run went on when this was written");
+    EXPECT_EQ(top.children.at(0).properties().at("reason"), "the run was still going on");
     EXPECT_EQ(top.children.at(0).all("testcase").at(0).all("error").at(0).attributes,
               (Attributes{{"type", "not run"}, {"message", "not run yet when this was written"}}));
 }

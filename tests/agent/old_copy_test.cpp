@@ -1,8 +1,8 @@
 // SPDX-FileCopyrightText: 2026 The Quillmark authors
 // SPDX-License-Identifier: Apache-2.0
 
-// A process that reports writes back the whole plan as it was when it loaded it. Nothing
-// passes by what such an old copy holds, and what it has written over is told.
+// A process that reports writes back the whole plan as it was when it loaded it. No
+// item passes because of what such a copy holds, and what it has overwritten is told.
 #include "run_test.h"
 
 #include <unistd.h>
@@ -52,7 +52,7 @@ TEST_F(OldCopy, BringsBackNoResultOfAnEarlierRun)
     EXPECT_THAT(read_file(kPlanFile), Not(HasSubstr("description=\"fine\"")));
     EXPECT_EQ(ended.status, 1);
     EXPECT_THAT(outcomes(), ElementsAre("Item: no result"));
-    EXPECT_THAT(ended.out, HasSubstr("a process with an old copy of the plan has written it over"));
+    EXPECT_THAT(ended.out, HasSubstr("a process with an old copy of the plan has overwritten it"));
 }
 
 TEST_F(OldCopy, BringsBackNoResultWhereThePlanIsGivenAnew)
@@ -65,7 +65,7 @@ TEST_F(OldCopy, BringsBackNoResultWhereThePlanIsGivenAnew)
     EXPECT_EQ(ended.status, 1);
     EXPECT_THAT(outcomes(), ElementsAre("Script: no result"));
     EXPECT_THAT(reasons().at(0),
-                StartsWith("a process with an old copy of the plan has written it over"));
+                StartsWith("a process with an old copy of the plan has overwritten it"));
 }
 
 TEST_F(OldCopy, BringsBackNoReportThatPasses)
@@ -127,8 +127,8 @@ TEST_F(OldCopy, IsTheReasonWhereItIsOfAnotherPlan)
 {
     file("other", device::plan_of({{"Q", {{"Other", ""}}}}));
     run_group({{"Script", "'cat /tmp/scene/other >/data/vorlane/src1.xml; sleep 0.2'"}});
-    EXPECT_EQ(reasons().at(0), "the stored plan is another one by now: a process that knows "
-                               "that one has saved it");
+    EXPECT_EQ(reasons().at(0), "another plan has been stored meanwhile, or saved by a process that "
+                               "still had it");
 }
 
 } // namespace

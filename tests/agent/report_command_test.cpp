@@ -228,7 +228,7 @@ TEST_F(ReportCommand, SaysThatThePlanIsNotWritable)
     const Ended ended = run_fptest(start);
     EXPECT_EQ(ended.status, 3);
     EXPECT_EQ(ended.err, "fptest: the report is not in /data/vorlane/src1.xml: is it writable? "
-                         "--log FILE tells what the library met\n");
+                         "--log FILE says why\n");
     EXPECT_EQ(read_file(kPlanFile), kPlan);
 }
 

@@ -167,7 +167,7 @@ TEST_F(Refusal, OfAFifoOrADirectoryInPlaceOfTheStoredPlan)
 TEST_F(Refusal, OfAPathThatTheLibraryWouldCut)
 {
     const std::string path = std::string(2100, 'r') + "/G/Item";
-    expect_refusal(2, "fptest: a path of 2107 bytes is cut at 2047: name the root with less",
+    expect_refusal(2, "fptest: a path of 2107 bytes is cut at 2047: use a shorter root",
                    {"run", "--plan", plan(kOnePasses), path});
 }
 

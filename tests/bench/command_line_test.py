@@ -8,15 +8,15 @@ from support.outside import TREE, run
 
 @pytest.mark.parametrize("arguments, line", [
     ("--fast", "unknown argument '--fast'; see scripts/bench --help"),
-    ("--filter", "--filter wants an argument; see scripts/bench --help"),
-    ("--filter ", "--filter wants an argument; see scripts/bench --help"),
+    ("--filter", "--filter needs an argument; see scripts/bench --help"),
+    ("--filter ", "--filter needs an argument; see scripts/bench --help"),
     ("--filter (", "--filter '(' is not a regular expression"),
     ("--json /tmp", "--json /tmp: this is a directory; name a file in it"),
     ("--json /proc/figures", "--json /proc/figures: this cannot be written"),
     ("--json /nowhere/figures.json",
      "--json /nowhere/figures.json: there is no such directory"),
     ("--write --filter ping",
-     "--write keeps figures, and wants all of them: leave out the options that spare some"),
+     "--write keeps all figures: leave out the options that skip some"),
 ])
 def test_a_wrong_argument_gets_one_line(arguments, line):
     assert run(TREE / "scripts/bench", *arguments.split(" ")) == (2, "", f"scripts/bench: {line}\n")

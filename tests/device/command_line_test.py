@@ -39,7 +39,7 @@ def test_a_bad_command_line_gets_one_line_and_status_125(line, complaint):
 
 @pytest.mark.parametrize("option", ["--data", "--out", "--bin", "--build", "--vendor"])
 def test_every_option_wants_an_argument(option):
-    assert_refused([option], f"{option} wants an argument; see device/run --help")
+    assert_refused([option], f"{option} needs an argument; see device/run --help")
 
 
 @pytest.mark.parametrize("option", ["--data", "--out", "--bin", "--build"])
