@@ -40,9 +40,8 @@ void check_gatherers(const CheckContext &context, const std::vector<Group> &grou
             if (first.value_or(*item.args) != *item.args) {
                 context.findings.warning(
                     context.places.of(item.number, "args"),
-                    "the gatherer of group {} goes on running, so that this one would not be "
-                    "started, and its args not used: give both the same, and let it report for "
-                    "each group",
+                    "this gatherer is not started while the one of group {} runs, which has "
+                    "other args: run them apart, and end it in between",
                     quoted_name(its_group));
             } else if (!first) {
                 first = item.args;

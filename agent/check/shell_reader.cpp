@@ -323,7 +323,7 @@ class LineScanner
             return;
         }
         const std::string_view word = line_.substr(target, at_ - target);
-        const bool is_refused = is_any(mark, {">&", "<&"}) && !is_any(word, {"-", "p"}) &&
+        const bool is_refused = is_any(mark, {">&", "<&", "&>&"}) && !is_any(word, {"-", "p"}) &&
                                 word.find_first_not_of("0123456789") != word.npos &&
                                 word.find_first_of("$`\\'\"") == word.npos;
         note(is_refused ? Effect::Kind::no_descriptor : Effect::Kind::redirection, begin, mark,

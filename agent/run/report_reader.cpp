@@ -5,6 +5,7 @@
 
 #include "module/stored_plan.h"
 #include "plan/plan_text.h"
+#include "util/text.h"
 
 #include <algorithm>
 #include <array>
@@ -27,10 +28,13 @@ constexpr std::size_t kSeen = 100; // reports kept for an item, and copies for g
 constexpr std::string_view kPlanName =
     std::string_view(kStoredPlan).substr(std::string_view(kStoredPlan).rfind('/') + 1);
 
-// mend_stored_plan() leaves an empty result for one without a value.
+// As mend_stored_plan() leaves it, but with a result that has no value told from none.
 ItemReport report_of(const Plan &plan, std::size_t number)
 {
     ItemReport report = plan.report(number);
+    if (report.description) {
+        report.description = sanitize_xml(*report.description);
+    }
     if (report.result == "") {
         report.result.reset();
         report.result_without_value = true;
@@ -175,6 +179,9 @@ void ReportReader::read(const std::optional<Plan> &plan)
 bool ReportReader::is_stale(RunningItem &active, const Plan &plan, const ItemReport &report)
 {
     if (bears_mark(plan, active.element, running_.job.mark)) {
+        reports_for_others_ =
+            reports_for_others_ || (active.gathers && running_.items.size() == 1 &&
+                                    has_news_of_others(plan, active.element));
         return false;
     }
     marks_are_gone_ = true;
@@ -250,36 +257,55 @@ void ReportReader::note_gathered(const std::string &text, int vendor)
             note_gathered(report_of(*plan, number));
         }
     }
-    if (plan && earlier_.empty()) {
-        earlier_ = reports_of(*plan);
+    before_ = plan ? reports_of(*plan) : std::vector<ItemReport>();
+    if (earlier_.empty()) {
+        earlier_ = before_;
     }
 }
 
+// Whether somebody has reported for another element than the gatherer's, since its job began.
+bool ReportReader::has_news_of_others(const Plan &plan, std::size_t element) const
+{
+    const std::vector<ItemReport> reports = reports_of(plan);
+    for (std::size_t other = 0; other < reports.size(); ++other) {
+        const bool is_known =
+            is_same(reports[other], ItemReport{}) ||
+            (other < before_.size() && is_same(reports[other], before_[other])) ||
+            std::ranges::any_of(judged_, [&](const Judged &judged) {
+                return judged.element == other && is_among(judged.seen, reports[other]);
+            });
+        if (other != element && !is_known) {
+            return true;
+        }
+    }
+    return false;
+}
+
 // A gatherer that reports from its own copy of the plan saves the same text again if it has
-// the same to say; had it reported for another item, that item's report would be another. If
-// the copy is from before this run, so are the reports in it.
+// the same to say. If it reports for other items as well, or they run beside it, that may be
+// for one of them. What an item left running has a copy with that item's mark.
 bool ReportReader::is_saved_as_before(const Plan &plan, std::size_t element) const
 {
     const std::string others = others_in(plan, element);
-    if (others.empty() ||
-        std::ranges::find(copies_, std::hash<std::string>()(others)) != copies_.end()) {
-        return true;
-    }
-    const std::vector<ItemReport> reports = reports_of(plan);
     const bool is_of_this_round = std::ranges::any_of(judged_, [&](const Judged &judged) {
         return !judged.gathers && !judged.mark.empty() &&
                bears_mark(plan, judged.element, judged.mark);
     });
-    if (is_of_this_round || reports.size() != earlier_.size()) {
-        return false;
+    if (others.empty() || is_of_this_round || reports_for_others_ ||
+        running_.job.targets.size() > 1) {
+        return others.empty();
     }
-    for (std::size_t other = 0; other < reports.size(); ++other) {
-        if (other != element && !is_same(reports[other], ItemReport{}) &&
-            !is_same(reports[other], earlier_[other])) {
-            return false;
-        }
+    if (std::ranges::find(copies_, std::hash<std::string>()(others)) != copies_.end()) {
+        return true;
     }
-    return true;
+    // or a copy from before this run
+    const std::vector<ItemReport> reports = reports_of(plan);
+    bool is_earlier = reports.size() == earlier_.size();
+    for (std::size_t other = 0; is_earlier && other < reports.size(); ++other) {
+        is_earlier = other == element || is_same(reports[other], ItemReport{}) ||
+                     is_same(reports[other], earlier_[other]);
+    }
+    return is_earlier;
 }
 
 void ReportReader::note_copy(const Plan &plan, std::size_t element)

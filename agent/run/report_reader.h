@@ -73,6 +73,7 @@ class ReportReader
     bool is_stale(RunningItem &active, const Plan &plan, const ItemReport &report);
     void report_late(const Place &place, bool gathers, int round, const ItemReport &report);
     void note_gathered(const ItemReport &report);
+    bool has_news_of_others(const Plan &plan, std::size_t element) const;
     bool is_saved_as_before(const Plan &plan, std::size_t element) const;
     void note_copy(const Plan &plan, std::size_t element);
 
@@ -82,6 +83,8 @@ class ReportReader
     Descriptor saves_;
     std::vector<Judged> judged_;       // of this round, and gatherers
     std::vector<ItemReport> gathered_; // what an old copy may say of gatherers
+    bool reports_for_others_ = false;  // the gatherer does
+    std::vector<ItemReport> before_;   // of each element, when a gatherer's job began
     std::vector<ItemReport> earlier_;  // of each element, before the run
     std::vector<std::size_t> copies_;  // hashes of what others had reported then
     int gathered_in_ = 0;              // the round of the last gathering

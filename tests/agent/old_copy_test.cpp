@@ -123,6 +123,18 @@ TEST_F(OldCopy, IsTheReasonWhereAReportIsWrittenOver)
               "a process with an old copy of the plan has written over what it had reported");
 }
 
+TEST_F(OldCopy, OfAnItemsDaemonIsNoReportOfASilentGatherer)
+{
+    run_group({{"Item", "sleep 0.1 &amp; /system/bin/Third report-here G Item 100 0 c sleep 0.7 "
+                        "report-here G Item 100 0 late &amp; sleep 0.2"},
+               {"SensorProbe", "--help >/dev/null; exec -a /system/bin/SensorProbe "
+                               "/system/bin/Other gather sleep 1 report G "
+                               "100 0 ok gather sleep 60"}},
+              {"--repeat", "2", "--timeout", "2"});
+    EXPECT_THAT(outcomes(), ElementsAre("Item: passed", "SensorProbe: passed", "Item: passed",
+                                        "SensorProbe: timed out"));
+}
+
 TEST_F(OldCopy, IsTheReasonWhereItIsOfAnotherPlan)
 {
     file("other", device::plan_of({{"Q", {{"Other", ""}}}}));

@@ -537,4 +537,33 @@ TEST_F(RunCommand, ListsWithoutAStoredPlanAndStoresNone)
     }
 }
 
+TEST_F(RunCommand, RunsTheVendorsPrograms)
+{
+    const std::string path = plan(group_of({{"Item", notes("a")}, {"Other", "report G 100 0 b"}}));
+    const std::map<std::string, std::string> suffixes = {{"1", "_ca"}, {"2", "_ca_qsee"}};
+    for (const auto &[vendor, suffix] : suffixes) {
+        SCOPED_TRACE(vendor);
+        set_vendor(vendor);
+        support::write_file(device::kLogFile, "");
+        const Ended ended = run({"--plan", path, "P/G"});
+        EXPECT_EQ(ended.status, 0) << ended.err;
+        EXPECT_THAT(lines_of(ended.out).at(0), EndsWith(": 2 items, vendor " + vendor));
+        EXPECT_THAT(programs_run(),
+                    ElementsAre("/system/bin/Item" + suffix + " " + notes("a"),
+                                "/system/bin/Other" + suffix + " report G 100 0 b"));
+        EXPECT_THAT(outcomes(), ElementsAre("Item: passed", "Other: passed"));
+        EXPECT_EQ(events("run").at(0).at("vendor"), std::stoi(vendor));
+        EXPECT_THAT(run_fptest({"run", "--list", "P/G/Other"}).out,
+                    "P/G/Other  /system/bin/Other" + suffix + " report G 100 0 b\n");
+    }
+}
+
+TEST_F(RunCommand, StopsTheVendorsPrograms)
+{
+    set_vendor("2");
+    EXPECT_EQ(run_group({{"Item", kSleeps}, {"Other", kPasses}}, {"--timeout", "1"}).status, 1);
+    EXPECT_THAT(outcomes(), ElementsAre("Item: timed out", "Other: passed"));
+    EXPECT_EQ(read_file(work("signal")), "SIGTERM\n");
+}
+
 } // namespace
