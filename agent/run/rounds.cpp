@@ -202,6 +202,12 @@ bool run_rounds(const std::vector<Reporter *> &reporters, const Runner::Options 
     Runner runner(library, signals, run, reporters, options);
     runner.note_earlier_plan(earlier_plan);
     try {
+        std::vector<std::size_t> all; // also of those that will not be reached
+        for (const Job &job : plan.jobs) {
+            const auto elements = job.elements();
+            all.insert(all.end(), elements.begin(), elements.end());
+        }
+        clear_reports(all);
         run.finished = Rounds(runner, run, reporters, plan).run_all();
         if (!runner.broken()) {
             remove_marks();

@@ -354,6 +354,15 @@ TEST_F(RunCommand, TakesNoResultOfAnEarlierRoundForOneOfThis)
     EXPECT_THAT(ended.out, HasSubstr("2 rounds"));
 }
 
+TEST_F(RunCommand, LeavesNoResultOfAnEarlierRunInThePlan)
+{
+    run_group({{"Item", "once /tmp/scene/item report G 100 0 once"}, {"Other", kPasses}});
+    EXPECT_THAT(outcomes(), ElementsAre("Item: passed", "Other: passed"));
+    EXPECT_EQ(run({"--until-fail", "P/G"}).status, 1);
+    EXPECT_THAT(outcomes(), ElementsAre("Item: no result", "Other: not run"));
+    EXPECT_THAT(read_file(kPlanFile), Not(HasSubstr("result=")));
+}
+
 TEST_F(RunCommand, TakesNoResultOfAnEarlierRunForOneOfThis)
 {
     for (const std::string way : {"--quiet", "--as-group"}) {
