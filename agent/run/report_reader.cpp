@@ -10,8 +10,6 @@
 #include <algorithm>
 #include <array>
 #include <filesystem>
-#include <fmt/core.h>
-#include <functional>
 #include <iterator>
 #include <string_view>
 #include <sys/inotify.h>
@@ -24,7 +22,7 @@ namespace
 {
 
 constexpr std::chrono::milliseconds kLongestPause(25);
-constexpr std::size_t kSeen = 100; // reports kept for an item, and copies for gatherers
+constexpr std::size_t kSeen = 100; // reports kept for an item
 constexpr std::string_view kPlanName =
     std::string_view(kStoredPlan).substr(std::string_view(kStoredPlan).rfind('/') + 1);
 
@@ -50,28 +48,15 @@ bool is_same(const ItemReport &one, const ItemReport &other)
            one.description.value_or("") == other.description.value_or("");
 }
 
-// What the plan says of each element.
-std::vector<ItemReport> reports_of(const Plan &plan)
+// Then whoever has saved the plan has reported for this element.
+bool is_only_report(const Plan &plan, std::size_t number)
 {
-    std::vector<ItemReport> all;
-    for (std::size_t number = 0; number < plan.elements().size(); ++number) {
-        all.push_back(report_of(plan, number));
-    }
-    return all;
-}
-
-// Of all elements but one; empty if they have no report.
-std::string others_in(const Plan &plan, std::size_t number)
-{
-    std::string all;
     for (std::size_t other = 0; other < plan.elements().size(); ++other) {
-        const ItemReport report = report_of(plan, other);
-        if (other != number && !is_same(report, ItemReport{})) {
-            all += fmt::format("{}\x1F{}\x1F{}\x1F{}\x1E", other, report.progress.value_or(""),
-                               report.result.value_or(""), report.description.value_or(""));
+        if (other != number && !is_same(report_of(plan, other), ItemReport{})) {
+            return false;
         }
     }
-    return all;
+    return true;
 }
 
 bool is_among(const std::vector<ItemReport> &reports, const ItemReport &report)
@@ -219,7 +204,6 @@ void ReportReader::begin_gathering()
     } else if (has_result(report) &&
                (!is_among(gathered_, report) || is_saved_as_before(*plan, active.element))) {
         report_late(active.place, true, gathered_in_ != 0 ? gathered_in_ : run_.round, report);
-        note_copy(*plan, active.element);
     }
     const bool has_mark = bears_mark(*plan, active.element, running_.job.mark);
     if (has_result(report) || !has_mark) {
@@ -253,28 +237,27 @@ void ReportReader::note_gathered(const std::string &text, int vendor)
     const auto plan = Plan::parse_annotated(text);
     for (std::size_t number = 0; plan && number < plan->elements().size(); ++number) {
         const char *name = mxmlElementGetAttr(plan->elements()[number], "name");
+        const ItemReport report = report_of(*plan, number);
         if (name != nullptr && is_gatherer(name, vendor)) {
-            note_gathered(report_of(*plan, number));
+            note_gathered(report);
         }
-    }
-    before_ = plan ? reports_of(*plan) : std::vector<ItemReport>();
-    if (earlier_.empty()) {
-        earlier_ = before_;
+        known_.resize(std::max(known_.size(), number + 1));
+        if (!is_among(known_[number], report)) {
+            known_[number].push_back(report);
+        }
+        if (known_[number].size() > kSeen) {
+            known_[number].erase(known_[number].begin());
+        }
     }
 }
 
 // Whether somebody has reported for another element than the gatherer's, since its job began.
 bool ReportReader::has_news_of_others(const Plan &plan, std::size_t element) const
 {
-    const std::vector<ItemReport> reports = reports_of(plan);
-    for (std::size_t other = 0; other < reports.size(); ++other) {
-        const bool is_known =
-            is_same(reports[other], ItemReport{}) ||
-            (other < before_.size() && is_same(reports[other], before_[other])) ||
-            std::ranges::any_of(judged_, [&](const Judged &judged) {
-                return judged.element == other && is_among(judged.seen, reports[other]);
-            });
-        if (other != element && !is_known) {
+    for (std::size_t other = 0; other < plan.elements().size(); ++other) {
+        const ItemReport report = report_of(plan, other);
+        if (other != element && !is_same(report, ItemReport{}) &&
+            (other >= known_.size() || !is_among(known_[other], report))) {
             return true;
         }
     }
@@ -286,36 +269,13 @@ bool ReportReader::has_news_of_others(const Plan &plan, std::size_t element) con
 // for one of them. What an item left running has a copy with that item's mark.
 bool ReportReader::is_saved_as_before(const Plan &plan, std::size_t element) const
 {
-    const std::string others = others_in(plan, element);
     const bool is_of_this_round = std::ranges::any_of(judged_, [&](const Judged &judged) {
         return !judged.gathers && !judged.mark.empty() &&
                bears_mark(plan, judged.element, judged.mark);
     });
-    if (others.empty() || is_of_this_round || reports_for_others_ ||
-        running_.job.targets.size() > 1) {
-        return others.empty();
-    }
-    if (std::ranges::find(copies_, std::hash<std::string>()(others)) != copies_.end()) {
-        return true;
-    }
-    // or a copy from before this run
-    const std::vector<ItemReport> reports = reports_of(plan);
-    bool is_earlier = reports.size() == earlier_.size();
-    for (std::size_t other = 0; is_earlier && other < reports.size(); ++other) {
-        is_earlier = other == element || is_same(reports[other], ItemReport{}) ||
-                     is_same(reports[other], earlier_[other]);
-    }
-    return is_earlier;
-}
-
-void ReportReader::note_copy(const Plan &plan, std::size_t element)
-{
-    if (!is_saved_as_before(plan, element)) {
-        copies_.push_back(std::hash<std::string>()(others_in(plan, element)));
-    }
-    if (copies_.size() > kSeen) {
-        copies_.erase(copies_.begin());
-    }
+    return is_only_report(plan, element) ||
+           (!is_of_this_round && !reports_for_others_ && running_.job.targets.size() == 1 &&
+            !has_news_of_others(plan, element));
 }
 
 void ReportReader::watch_for_late_reports(RunningItem &active)
@@ -369,9 +329,6 @@ void ReportReader::read_report(RunningItem &active, const Plan &plan)
         (active.reporting.overwritten && !has_result(report))) { // as it was cleared
         return;
     }
-    if (active.gathers && has_result(report)) {
-        note_copy(plan, number);
-    }
     active.reporting.overwritten = false;
     active.reporting.undone = has_result(result.report) && !has_result(report);
     if (!is_among(active.reporting.seen, report) ||
@@ -416,9 +373,6 @@ void ReportReader::read_late_report(Judged &judged, const Plan &plan)
         return;
     }
     judged.seen.push_back(report);
-    if (judged.gathers) {
-        note_copy(plan, judged.element);
-    }
     report_late(judged.place, judged.gathers, judged.round, report);
 }
 

@@ -75,20 +75,17 @@ class ReportReader
     void note_gathered(const ItemReport &report);
     bool has_news_of_others(const Plan &plan, std::size_t element) const;
     bool is_saved_as_before(const Plan &plan, std::size_t element) const;
-    void note_copy(const Plan &plan, std::size_t element);
 
     Run &run_;
     const std::vector<Reporter *> &reporters_;
     RunningJob &running_;
     Descriptor saves_;
-    std::vector<Judged> judged_;       // of this round, and gatherers
-    std::vector<ItemReport> gathered_; // what an old copy may say of gatherers
-    bool reports_for_others_ = false;  // the gatherer does
-    std::vector<ItemReport> before_;   // of each element, when a gatherer's job began
-    std::vector<ItemReport> earlier_;  // of each element, before the run
-    std::vector<std::size_t> copies_;  // hashes of what others had reported then
-    int gathered_in_ = 0;              // the round of the last gathering
-    bool marks_are_gone_ = false;      // from items' elements
+    std::vector<Judged> judged_;                 // of this round, and gatherers
+    std::vector<ItemReport> gathered_;           // what an old copy may say of gatherers
+    bool reports_for_others_ = false;            // the gatherer does
+    std::vector<std::vector<ItemReport>> known_; // of each element, when a gatherer's job began
+    int gathered_in_ = 0;                        // the round of the last gathering
+    bool marks_are_gone_ = false;                // from items' elements
     unsigned poll_count_ = 1;
     bool is_saved_ = false; // and not read since
     std::chrono::steady_clock::time_point next_look_;
