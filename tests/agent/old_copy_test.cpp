@@ -126,7 +126,7 @@ TEST_F(OldCopy, IsTheReasonWhereAReportIsWrittenOver)
 TEST_F(OldCopy, OfAnItemsDaemonIsNoReportOfASilentGatherer)
 {
     run_group({{"Item", "sleep 0.1 &amp; /system/bin/Third report-here G Item 100 0 c sleep 0.7 "
-                        "report-here G Item 100 0 late &amp; sleep 0.2"},
+                        "report-here G Item 100 0 c &amp; sleep 0.2"},
                {"SensorProbe", "--help >/dev/null; exec -a /system/bin/SensorProbe "
                                "/system/bin/Other gather sleep 1 report G "
                                "100 0 ok gather sleep 60"}},
