@@ -34,7 +34,7 @@ class Writer
     static constexpr std::size_t kMostWaiting = std::size_t{16} << 20;
 
     // The error of opening that file for writing; 0 if there is none, or if it would wait
-    // for a reader. Leaves the file as it is, and none where there was none.
+    // for a reader. Leaves the file as it is, and creates none to stay.
     static int obstacle(const std::string &path);
 
     // Whether text is still waiting.

@@ -26,7 +26,8 @@ class ReportReader
     // All of them outlive it.
     ReportReader(Run &run, const std::vector<Reporter *> &reporters, RunningJob &running);
 
-    // What a plan that is about to be replaced says of gatherers, which may have a copy.
+    // What the plan says before a gatherer's job, or before it is replaced: a gatherer may
+    // have a copy.
     void note_gathered(const std::string &text, int vendor);
 
     // Readable once somebody has saved the plan, so that two changes are not taken for one;

@@ -1,7 +1,7 @@
 // SPDX-FileCopyrightText: 2026 The Quillmark authors
 // SPDX-License-Identifier: Apache-2.0
 
-// Errors that are shown to the user. Unless somebody can do without, they end the program.
+// Errors that are shown to the user. They end the program unless a caller handles them.
 #pragma once
 
 #include <fmt/core.h>
