@@ -9,7 +9,6 @@
 #include "util/times.h"
 
 #include <algorithm>
-#include <chrono>
 #include <fmt/core.h>
 #include <string>
 #include <string_view>
@@ -19,9 +18,7 @@ namespace fptest
 namespace
 {
 
-using Clock = std::chrono::steady_clock;
-
-constexpr std::chrono::seconds kBetweenProgressLines(10);
+constexpr double kBetweenProgressLines = 10; // seconds of the item's time
 
 class PlainView : public Reporter
 {
@@ -41,18 +38,18 @@ class PlainView : public Reporter
     void started(const Run & /* run */, Place place) override
     {
         place_ = place;
-        said_ = Clock::now();
+        said_at_ = 0;
         output_said_.clear();
         runs_ = true;
     }
 
     void tick(const Run &run) override
     {
-        if (!runs_ || quiet_ || Clock::now() - said_ < kBetweenProgressLines) {
+        if (!runs_ || quiet_ || item_at(run, place_).running < said_at_ + kBetweenProgressLines) {
             return;
         }
-        said_ = Clock::now();
         const ItemRun &item = item_at(run, place_);
+        said_at_ = item.running;
         print(fmt::format(
             "{}: {}{}, {}", one_line(title(run, item)), item.stopping ? "stopping" : "running",
             item.report.progress ? ", progress " + one_line(*item.report.progress) : "",
@@ -142,7 +139,7 @@ class PlainView : public Reporter
     bool quiet_;
     Place place_;
     bool runs_ = false;
-    Clock::time_point said_;
+    double said_at_ = 0;
     std::string output_said_;
 };
 

@@ -508,7 +508,7 @@ TEST_F(ItemEnd, GathererThatEndsWithoutAReportIsNotWaitedFor)
 TEST_F(ItemEnd, GathererThatDidNotReportInTimeReportsIntoNothingLater)
 {
     const Items items = {{"SensorProbe", "--group G --seconds 1"},
-                         {"Item", "sleep 2 report G 100 0 fine"}};
+                         {"Item", "sleep 1.2 report G 100 0 fine"}};
     for (const std::string way : {"--quiet", "--as-group"}) {
         SCOPED_TRACE(way);
         run_group(items,

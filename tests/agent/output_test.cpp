@@ -448,20 +448,4 @@ TEST_F(Output, ShowsWhatTheGathererSaysBeforeItReports)
     EXPECT_EQ(session.wait_for_end(), 1);
 }
 
-TEST_F(Output, SaysEveryTenSecondsWhatAnItemHasSaid)
-{
-    FptestProcess fptest(
-        {"run", "--plan",
-         plan(group_of({{"Item", "say one sleep 11 say two sleep 10 report G 100 0 fine"}})),
-         "P/G"});
-    const Ended ended = fptest.wait(60);
-    EXPECT_EQ(without_times(ended.out), "/tmp/scene/plan.xml: 1 item, vendor 0\n"
-                                        "G/Item: running, T s\n"
-                                        "    | one\n"
-                                        "G/Item: running, T s\n"
-                                        "    | two\n"
-                                        "G/Item: passed, result 0, T s: fine\n"
-                                        "1 passed, 0 failed, T s\n");
-}
-
 } // namespace

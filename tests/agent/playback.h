@@ -132,6 +132,13 @@ class Playback
     {
         reporter_.tick(now_);
     }
+    // After that many seconds of it, with what it has printed until then.
+    void tick(Place place, double seconds, const std::string &output)
+    {
+        now(place).running = seconds;
+        now(place).output = output;
+        tick();
+    }
     // Which ends as the one before.
     void begin_next_round()
     {

@@ -437,6 +437,29 @@ TEST_F(RoundReports, LeaveTheShellsLinesAloneAfterAPause)
         << "what was drawn before the pause is not erased after it";
 }
 
+TEST_F(RoundReports, SayEveryTenSecondsWhatAnItemHasSaid)
+{
+    const How play_long_items = [](Playback &playback) {
+        playback.begin();
+        playback.start({0, 0});
+        playback.tick({0, 0}, 9.9, "one\n");
+        playback.tick({0, 0}, 10.1, "one\n");
+        playback.tick({0, 0}, 20, "one\ntwo\n");
+        playback.tick({0, 0}, 20.2, "one\ntwo\n");
+        playback.end_item({0, 0});
+        playback.start({0, 1});
+        playback.tick({0, 1}, 10, "");
+    };
+    EXPECT_EQ(plain_of(run_of({suite("G", {passed("a"), passed("b")})}), play_long_items),
+              "plans/demo.xml: 2 items, vendor 1\n"
+              "G/a: running, 10.1 s\n"
+              "    | one\n"
+              "G/a: running, 20.2 s\n"
+              "    | two\n"
+              "G/a: passed, result 0, 0.3 s: chip answers\n"
+              "G/b: running, 10.0 s\n");
+}
+
 TEST_F(RoundReports, CutALineOfOutputThatIsTooLong)
 {
     ItemRun loud = failed("a");

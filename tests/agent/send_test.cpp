@@ -179,11 +179,14 @@ TEST_F(Send, IsRefusedDuringARun)
         group_of({{"Item", "note /tmp/scene/begun await /tmp/scene/go report G 100 0 fine"}});
     FptestProcess fptest({"run", "--plan", plan(text), "P/G"});
     ASSERT_TRUE(wait_for_file("begun"));
-    for (const std::string command : {"XMLFile::<P/>", "XMLNodePath::P/G"}) {
-        expect_refusal(3,
-                       "fptest: another fptest is running a plan on this device: wait for its "
-                       "end, or stop it",
-                       {"send", command});
+    FptestProcess sends_plan({"send", "XMLFile::<P/>"});
+    FptestProcess sends_path({"send", "XMLNodePath::P/G"});
+    for (FptestProcess *refused : {&sends_plan, &sends_path}) {
+        const Ended ended = refused->wait();
+        EXPECT_EQ(ended.status, 3);
+        EXPECT_EQ(ended.out, "");
+        EXPECT_EQ(ended.err, "fptest: another fptest is running a plan on this device: wait for "
+                             "its end, or stop it\n");
     }
     EXPECT_EQ(run_fptest({"send", "pingtest"}).out, "Ping Success!\n");
     file("go", "");
