@@ -124,12 +124,36 @@ std::string proc(pid_t pid, const std::string &file)
     return "/proc/" + std::to_string(pid) + "/" + file;
 }
 
+std::vector<pid_t> children(pid_t pid)
+{
+    std::ifstream file(proc(pid, "task/" + std::to_string(pid) + "/children"));
+    return {std::istream_iterator<pid_t>(file), {}};
+}
+
 // 0 if there is none.
 pid_t first_child(pid_t pid)
 {
-    pid_t child = 0;
-    std::ifstream(proc(pid, "task/" + std::to_string(pid) + "/children")) >> child;
-    return child;
+    const std::vector<pid_t> all = children(pid);
+    return all.empty() ? 0 : all.front();
+}
+
+bool is_shell(pid_t pid)
+{
+    std::string name;
+    std::getline(std::ifstream(proc(pid, "comm")), name);
+    return name == "sh" || name == "mksh";
+}
+
+// A shell acts on a signal when the program that it waits for has ended: so that gets the
+// signal too, after the shell, which then starts no other.
+void signal_all(pid_t pid, int number)
+{
+    kill(pid, number);
+    if (is_shell(pid)) {
+        for (const pid_t child : children(pid)) {
+            signal_all(child, number);
+        }
+    }
 }
 
 // What bwrap has left to this process when it died: its child, which ends with it only
@@ -331,7 +355,7 @@ class Supervisor
     void hand_on(int number)
     {
         if (const pid_t pid = command(); pid > 0) {
-            kill(pid, number);
+            signal_all(pid, number);
         }
         give_up_soon(number);
     }

@@ -10,8 +10,10 @@
 #include "module/library_process.h"
 #include "module/log_file.h"
 #include "module/preflight.h"
+#include "module/processes.h"
 #include "module/stored_plan.h"
 #include "plan/plan.h"
+#include "plan/plan_text.h"
 #include "run/planner.h"
 #include "run/rounds.h"
 #include "run/runner.h"
@@ -90,9 +92,23 @@ std::vector<std::string> names_of(const RoundPlan &round)
     return names;
 }
 
-// The library starts no gatherer beside one that runs, whatever the plan says.
-void report_other_gatherer(const RoundPlan &round, const Plan &plan, int vendor)
+// Whether a gatherer runs that may save another plan than this with its next report, or may
+// still work for a run that was killed.
+bool has_gatherer_of_another_plan(const std::string &text)
 {
+    const std::string earlier = read_stored_plan().value_or("");
+    return !earlier.empty() && found_as_gatherer() &&
+           (has_marks(earlier) || !is_same_plan(earlier, text));
+}
+
+// The library starts no gatherer beside one that runs, whatever the plan says.
+void report_other_gatherer(const RoundPlan &round, const Plan &plan, int vendor, bool is_ended)
+{
+    if (is_ended) {
+        say("the gatherer of an earlier run is ended first: it may have kept that run's plan, and "
+            "would write it back");
+        return;
+    }
     std::vector<std::string> args;
     for (const Job &job : round.jobs) {
         for (const auto &target : job.targets) {
@@ -215,11 +231,14 @@ Exit run(RunOptions options)
 
     const RoundPlan round = plan_round(paths, plan, options.as_group);
     require_programs(names_of(round), vendor, options.force);
-    if (!options.quiet) {
-        report_other_gatherer(round, plan, vendor);
-    }
     const bool is_sent = checked.storing != Storing::as_file;
     const bool is_placed = !is_sent && !options.plan.empty();
+    Runner::Options for_runner = runner_options(options);
+    for_runner.ends_gatherer =
+        has_gatherer_of_another_plan(is_sent ? checked.stored : checked.text);
+    if (!options.quiet) {
+        report_other_gatherer(round, plan, vendor, for_runner.ends_gatherer);
+    }
     if (is_sent || is_placed) {
         require_room(is_sent ? checked.stored.size() : checked.text.size());
     }
@@ -243,7 +262,7 @@ Exit run(RunOptions options)
     for (const auto &reporter : owned) {
         reporters.push_back(reporter.get());
     }
-    if (!run_rounds(reporters, runner_options(options), *library, signals, run, round,
+    if (!run_rounds(reporters, for_runner, *library, signals, run, round,
                     store_plan)) {
         return Exit::interrupted;
     }

@@ -7,6 +7,7 @@
 #include <cerrno>
 #include <csignal>
 #include <cstdlib>
+#include <mutex>
 #include <spawn.h>
 #include <string_view>
 #include <sys/wait.h>
@@ -23,6 +24,8 @@ namespace
 {
 
 std::function<void(int)> on_status;
+std::mutex starting;
+bool starts_none = false;
 
 // The shell that the C library's system() would run.
 const char *shell()
@@ -77,8 +80,12 @@ int run_by_shell(const char *command, const SpawnAttributes &attributes)
 {
     const std::array<const char *, 4> arguments{"sh", "-c", command, nullptr};
     pid_t child = -1;
-    const int error = posix_spawn(&child, shell(), nullptr, attributes.get(),
-                                  const_cast<char *const *>(arguments.data()), environ);
+    std::unique_lock lock(starting);
+    const int error = starts_none
+                          ? ECANCELED
+                          : posix_spawn(&child, shell(), nullptr, attributes.get(),
+                                        const_cast<char *const *>(arguments.data()), environ);
+    lock.unlock();
     if (error == EAGAIN || error == ENOMEM) {
         errno = error;
         return -1;
@@ -100,6 +107,12 @@ int run_by_shell(const char *command, const SpawnAttributes &attributes)
 void set_status_handler(std::function<void(int)> handler)
 {
     on_status = std::move(handler);
+}
+
+void start_no_more_items()
+{
+    const std::lock_guard lock(starting);
+    starts_none = true;
 }
 
 } // namespace fptest

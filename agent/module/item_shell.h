@@ -15,4 +15,7 @@ namespace fptest
 // does not hit the library.
 void set_status_handler(std::function<void(int)> handler);
 
+// From its return on system() fails, as if there were no shell.
+void start_no_more_items();
+
 } // namespace fptest

@@ -81,6 +81,7 @@ class Server
             }
         }
         // never released, so that the command reaches no further item
+        start_no_more_items();
         const std::lock_guard lock(mutex_);
         if (busy_) {
             stop(items_);
@@ -290,9 +291,11 @@ void reset_signals()
         std::signal(signal, SIG_IGN); // drops a pending one, which was meant for the agent
         std::signal(signal, SIG_DFL);
     }
-    // not ignored, because items would inherit that
-    std::signal(SIGPIPE, [](int) {});
-    std::signal(SIGXFSZ, [](int) {});
+    // not ignored, because items would inherit that; the first three come here too if
+    // somebody signals all processes of the run, and stopping its item is the agent's
+    for (const int signal : {SIGINT, SIGTERM, SIGHUP, SIGPIPE, SIGXFSZ}) {
+        std::signal(signal, [](int) {});
+    }
     sigset_t none;
     sigemptyset(&none);
     sigprocmask(SIG_SETMASK, &none, nullptr);

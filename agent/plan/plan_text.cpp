@@ -91,6 +91,24 @@ std::optional<std::string> made_loadable(const std::string &text)
     return with_empty_values(cleaned, scan(cleaned));
 }
 
+bool has_marks(const std::string &text)
+{
+    return without_marks(text).value_or(text) != text;
+}
+
+bool is_same_plan(const std::string &one, const std::string &other)
+{
+    const auto parsed = Plan::parse_annotated(one);
+    const auto parsed_other = Plan::parse_annotated(other);
+    const auto is_same_element = [](mxml_node_t *node, mxml_node_t *other_node) {
+        return std::string_view(mxmlGetElement(node)) == mxmlGetElement(other_node) &&
+               attribute(node, "name") == attribute(other_node, "name") &&
+               attribute(node, "args") == attribute(other_node, "args");
+    };
+    return parsed && parsed_other &&
+           std::ranges::equal(parsed->elements(), parsed_other->elements(), is_same_element);
+}
+
 std::optional<std::string> without_marks(const std::string &text)
 {
     const auto tags = whole_tags(text);

@@ -27,6 +27,12 @@ std::optional<std::string> without_reports(const std::string &text,
 // other text.
 std::optional<std::string> made_loadable(const std::string &text);
 
+// Whether an element bears a mark, as after a run that did not come to its end.
+bool has_marks(const std::string &text);
+
+// Whether both have the same elements with the same names and args, whatever was reported.
+bool is_same_plan(const std::string &one, const std::string &other);
+
 // The text without any marks; nullopt if it is not whole.
 std::optional<std::string> without_marks(const std::string &text);
 

@@ -58,6 +58,7 @@ struct RunningItem {
     // How far its report in the stored plan can be trusted.
     struct Reporting {
         bool expected = true;     // false until a gatherer that already ran is triggered
+        bool gathering = false;   // since a gatherer's trigger
         bool overwritten = false; // by an old copy of the plan, and nothing was reported since
         bool lost = false;        // the stored plan is gone
         bool undone = false;      // a result was there, and is gone

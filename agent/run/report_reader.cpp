@@ -192,6 +192,7 @@ void ReportReader::begin_gathering()
     }
     RunningItem &active = running_.items.back();
     active.reporting.expected = true;
+    active.reporting.gathering = true;
     const auto plan = whole_stored_plan().annotated;
     if (!plan || !is_item(*plan, active.element, item_at(run_, active.place).name)) {
         return;
@@ -326,6 +327,8 @@ void ReportReader::read_report(RunningItem &active, const Plan &plan)
         return;
     }
     if (is_same(report, result.report) ||
+        // it was done, and what follows is late
+        (active.reporting.gathering && has_finished(result.report) && !has_finished(report)) ||
         (active.reporting.overwritten && !has_result(report))) { // as it was cleared
         return;
     }

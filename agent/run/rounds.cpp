@@ -200,7 +200,7 @@ bool run_rounds(const std::vector<Reporter *> &reporters, const Runner::Options 
         run_nothing(failure.what(), run, reporters, signals);
     }
     Runner runner(library, signals, run, reporters, options);
-    runner.note_earlier_plan(earlier_plan);
+    runner.begin(earlier_plan);
     try {
         std::vector<std::size_t> all; // also of those that will not be reached
         for (const Job &job : plan.jobs) {

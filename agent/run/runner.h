@@ -27,6 +27,7 @@ class Runner
         std::optional<std::chrono::duration<double>> timeout; // then an item is stopped
         std::chrono::duration<double> grace{2};               // and after that it is killed
         bool fail_on_exit_status = false;
+        bool ends_gatherer = false; // one that runs already
         std::function<void()> on_second_interrupt; // does not return
     };
 
@@ -34,11 +35,9 @@ class Runner
     Runner(LibraryProcess &library, Signals &signals, Run &run,
            const std::vector<Reporter *> &reporters, Options options);
 
-    // The stored plan before the run, of which a gatherer may have kept a copy.
-    void note_earlier_plan(const std::string &text)
-    {
-        reader_.note_gathered(text, vendor_);
-    }
+    // What there was before the run: its stored plan, of which a gatherer may have kept a
+    // copy, and the gatherer, if it is to be ended.
+    void begin(const std::string &earlier_plan);
 
     // Runs a job and fills in its items. False if the run is over; the run says why.
     bool run(const Job &job);

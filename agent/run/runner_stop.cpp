@@ -296,6 +296,14 @@ template <typename Find> void Runner::end_all(const Find &find)
     }
 }
 
+void Runner::begin(const std::string &earlier_plan)
+{
+    reader_.note_gathered(earlier_plan, vendor_);
+    if (options_.ends_gatherer) {
+        end_gatherer();
+    }
+}
+
 void Runner::make_way_for(const Job &job)
 {
     if (std::ranges::any_of(left_elements_,

@@ -2,6 +2,7 @@
 // SPDX-License-Identifier: Apache-2.0
 
 // Runs of the gatherer, and of the vendors' programs.
+#include "gatherer.h"
 #include "network.h"
 #include "run_test.h"
 
@@ -16,21 +17,9 @@
 namespace
 {
 
-constexpr char kProbe[] = "/system/bin/SensorProbe";
-
 // Something goes on in the gatherer's place, and connects nowhere.
 const Items kGathererThatNeverComes = {{"SensorProbe", "--help; exec sleep 30"},
                                        {"Other", kPasses}};
-
-// One of the test's own that is running already, until it goes out of scope.
-struct Gatherer : support::Process {
-    explicit Gatherer(const std::string &words)
-        : Process({.arguments = {"sh", "-c",
-                                 "exec -a " + std::string(kProbe) + " /system/bin/Item " + words}})
-    {
-        EXPECT_TRUE(eventually([] { return !processes_named(kProbe).empty(); }));
-    }
-};
 
 class RunGatherer : public RunCommand
 {
@@ -63,11 +52,15 @@ TEST_F(RunGatherer, WaitsForItsReport)
     ASSERT_THAT(processes_named(kProbe), SizeIs(1));
     EXPECT_EQ(processes_named(kProbe)[0].pid, gatherer);
     EXPECT_EQ(ended.err, "");
+}
 
-    ended = run_group({{"SensorProbe", "--group G --seconds 2"}});
-    EXPECT_EQ(ended.err, "fptest: a gatherer is running already, as '/system/bin/SensorProbe "
-                         "--group G --seconds 1': the library triggers that one, and starts "
-                         "none\n");
+TEST_F(RunGatherer, IsDoneOnceItHasReportedProgress100WhateverItReportsNext)
+{
+    const std::string reports = "gather report G 100 0 done sleep 0.05 report G 0 -2 idle ";
+    const Gatherer gatherer(reports + reports + reports + "sleep 60");
+    run_group({{"SensorProbe", ""}, {"Item", "sleep 0.3 report G 100 0 fine"}},
+              {"--as-group", "--repeat", "3"});
+    EXPECT_THAT(outcomes(), AllOf(SizeIs(6), Each(EndsWith(": passed"))));
 }
 
 TEST_F(RunGatherer, InterruptedInAGroupsCommandIsFollowedByNoOtherItem)
@@ -187,6 +180,7 @@ TEST_F(RunGatherer, MaySayTheSameAgainFromItsCopy)
         EXPECT_THAT(outcomes(), AllOf(SizeIs(6), Each(EndsWith(": passed"))));
         EXPECT_THAT(events("late"), SizeIs(3));
     }
+    std::filesystem::remove(kPlanFile); // or the next one would be ended with it
     const std::string report = "gather report-here G SensorProbe 100 0 done ";
     const Gatherer gatherer(report + report + report + "sleep 60");
     for (int number = 0; number < 3; ++number) {
@@ -206,16 +200,6 @@ TEST_F(RunGatherer, HasNoResultWhereItOnlySaysTheSameOfAnotherItemAgain)
         EXPECT_EQ(outcomes().at(0), "SensorProbe: passed");
         EXPECT_EQ(outcomes().at(2), "SensorProbe: timed out");
     }
-}
-
-TEST_F(RunGatherer, MayKeepItsCopyWhileThePlanIsStoredAnew)
-{
-    const Gatherer gatherer("gather report-here G SensorProbe 100 0 one gather report-here G "
-                            "SensorProbe 100 0 two sleep 60");
-    const Lines group = with_group({{"SensorProbe", ""}, {"Item", kPasses}});
-    EXPECT_EQ(run_fptest(group).status, 0);
-    EXPECT_EQ(run({"--plan", work("plan.xml"), "P/G/Item"}).status, 0);
-    EXPECT_EQ(run_fptest(group).status, 0);
 }
 
 TEST_F(RunGatherer, CostsTheItemsAfterItNothingByALateReportFromItsCopy)
@@ -261,17 +245,6 @@ TEST_F(RunGatherer, HasNoReportOfAnEarlierGatheringTakenForItsOwn)
             unlink(work(name).c_str());
         }
     }
-}
-
-TEST_F(RunGatherer, HasNoResultFromWhatItsCopyOfThePlanSaysOfAnEarlierRun)
-{
-    const Gatherer gatherer("gather report-here G SensorProbe 100 0 one gather report-here G Item "
-                            "0 -2 'by it' sleep 0.2 report-here G SensorProbe 100 1 two sleep 60");
-    const Items items = {{"SensorProbe", ""}, {"Item", kPasses}};
-    run_group(items);
-    EXPECT_THAT(outcomes(), ElementsAre("SensorProbe: passed", "Item: passed"));
-    run_group(items);
-    EXPECT_THAT(outcomes(), ElementsAre("SensorProbe: failed", "Item: passed"));
 }
 
 TEST_F(RunGatherer, ReportBeforeTriggerIsLate)
@@ -377,23 +350,6 @@ TEST_F(RunGatherer, MayRunAnotherProgramInItsOwnPlace)
     }
     EXPECT_THAT(told, HasSubstr("fptest: a gatherer is running already, as "
                                 "'/system/bin/SensorProbe.real gather "));
-}
-
-TEST_F(RunGatherer, OfAnEarlierRunIsEndedWithItsHelpers)
-{
-    if (is_in_place()) {
-        GTEST_SKIP() << "a shell cannot have another name there";
-    }
-    const support::Process gatherer(
-        {.arguments = {"sh", "-c",
-                       "exec -a " + std::string(kProbe) +
-                           " sh -c '/system/bin/Item gather; /system/bin/Third ignore-stop sleep "
-                           "1.2 report-here G SensorProbe 100 0 helper & wait'"}});
-    ASSERT_TRUE(eventually([] { return !processes_named(kProbe).empty(); }));
-    run_group({{"SensorProbe", "--help; exec sleep 30"}},
-              {"--repeat", "2", "--timeout", "0.5", "--grace", "0.3"});
-    EXPECT_THAT(outcomes(), ElementsAre("SensorProbe: timed out", "SensorProbe: timed out"));
-    EXPECT_THAT(events("progress"), IsEmpty());
 }
 
 TEST_F(RunGatherer, IsNotTheScriptThatRunsFptest)

@@ -314,6 +314,27 @@ TEST_F(RunCommand, BeginsAfterOneThatWasKilledWhenItsItemsHaveEnded)
     EXPECT_THAT(outcomes(), ElementsAre("SensorProbe: passed"));
 }
 
+TEST_F(RunCommand, IsStoppedByASignalToAllOfItsProcesses)
+{
+    const PlanItem gathers = {"SensorProbe", "--group G --seconds 60"};
+    const PlanItem sleeps = {"Item", "note /tmp/scene/begun sleep 60"};
+    for (const int number : {SIGINT, SIGTERM, SIGHUP}) {
+        for (const PlanItem &item : {gathers, sleeps}) {
+            SCOPED_TRACE(std::to_string(number) + " " + item.name);
+            fs::remove(work("begun"));
+            FptestProcess fptest(with_group({item, {"Other", kPasses}}));
+            ASSERT_TRUE(wait_for_events("start", 1));
+            ASSERT_TRUE(item.name == sleeps.name ? wait_for_file("begun") : eventually([] {
+                return !processes_named(kProbe).empty();
+            }));
+            kill(fptest.library(), number);
+            fptest.signal(number);
+            EXPECT_EQ(fptest.wait().status, 130);
+            EXPECT_THAT(outcomes(), ElementsAre(item.name + ": stopped", "Other: not run"));
+        }
+    }
+}
+
 TEST_F(RunCommand, LosesTheItemInWhichTheLibrarysProcessEndedAndNoOther)
 {
     FptestProcess fptest(with_group(

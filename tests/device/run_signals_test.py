@@ -61,6 +61,18 @@ def test_a_signal_comes_to_command_once(start, name, before_command, ways):
     assert device.out() == f"ready\n{name}\n"
 
 
+@pytest.mark.parametrize("name", ["INT", "QUIT", "TERM"])
+def test_a_signal_comes_to_what_a_shell_waits_for_as_well(start, name):
+    program = " ".join(map(str, SIGNAL_SAYER))
+    device = start("sh", "-c", f"sh -c '{program}; echo on'; echo on")
+    assert device.says("ready")
+
+    device.signal(signal.Signals["SIG" + name])
+
+    assert device.status() == 128 + signal.Signals["SIG" + name]
+    assert device.out() == f"ready\n{name}\n"
+
+
 def test_a_second_signal_is_handed_on_as_well(start):
     device = start(*SIGNAL_SAYER)
     assert device.says("ready")
