@@ -29,6 +29,12 @@ Comparison first_load_to_parser(int items);
 
 Comparison trigger();
 
+// quillmark-ps among 1,000 processes: all of them, and one that is not there; the
+// baseline is the bare reading, or Android's own program.
+Comparison ps_of_all();
+Comparison ps_of_one();
+Comparison ps_beside_toybox();
+
 // For the growth: the library's two lookups, and the search by Mini-XML that they
 // are made of. No baselines.
 Comparison lookup_by_name(int items);

@@ -31,6 +31,11 @@ if(TARGET vorlane)
     LIBRARY DESTINATION ${vorlane_directory} COMPONENT runtime)
 endif()
 
+if(TARGET quillmark_ps)
+  install(TARGETS quillmark_ps
+    RUNTIME DESTINATION ${CMAKE_INSTALL_LIBEXECDIR}/quillmark/bin COMPONENT fptest)
+endif()
+
 # --- for those who build on it ------------------------------------------------
 
 target_include_directories(quillmark INTERFACE $<INSTALL_INTERFACE:${CMAKE_INSTALL_INCLUDEDIR}>)

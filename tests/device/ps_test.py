@@ -1,16 +1,17 @@
 # SPDX-FileCopyrightText: 2026 The Quillmark authors
 # SPDX-License-Identifier: Apache-2.0
-"""ps on the virtual device."""
+"""quillmark-ps, which is the virtual device's ps."""
 import collections
 import re
 import shutil
 
 import pytest
 
-from support.outside import PS_HEADER, on_device, shell, way
+from support.outside import (BUILD, PS_HEADER, make_program, output_of, run, shell, way)
 
 pytestmark = pytest.mark.usefixtures("device")
 
+PS = BUILD / "libexec/quillmark/bin/ps"
 LINE = re.compile(r"([^ ]+) +([0-9]+) +([0-9]+) +([0-9]+) +([0-9]+) +([0-9a-f]{8}) "
                   r"([0-9a-f]{8}) ([A-Za-z]) (.+)")
 Process = collections.namedtuple(
@@ -133,9 +134,75 @@ def test_it_skips_processes_that_end_meanwhile():
     assert len(processes(*out.splitlines())) >= 5
 
 
-@pytest.mark.parametrize("arguments", [["-A"], ["a", "b"]])
-def test_it_takes_one_name_and_no_options(arguments):
-    status, out, err = on_device("ps", *arguments)
+LONG = "ItemWithANameOfMoreThanTwentyEightCharacters"
+
+
+@pytest.mark.parametrize("first_line", ["#!/system/bin/sh", "#!/system/bin/sh -e"])
+def test_it_finds_a_script_by_its_own_name(tmp_path, first_line):
+    make_program(tmp_path / LONG, f"{first_line}\nsleep 9; :\n")
+
+    found = own_processes(f"/system/bin/{LONG} one two & sleep 0.3; ps {LONG[:28]}",
+                          options=("--bin", tmp_path))
+
+    assert names(found) == [f"/system/bin/{LONG}"]
+
+
+def test_it_finds_a_script_by_its_path_and_not_by_its_interpreter(tmp_path):
+    make_program(tmp_path / "SensorProbe", "#!/system/bin/sh\nsleep 9; :\n")
+    start = "/system/bin/SensorProbe --group g & sleep 0.3; "
+
+    line, = shell(start + "ps | grep /system/bin/SensorProbe",
+                  options=("--bin", tmp_path)).out.splitlines()
+    assert line.endswith(" /system/bin/SensorProbe")
+    assert "/system/bin/SensorProbe" not in names(
+        own_processes(start + "ps sh", options=("--bin", tmp_path)))
+
+
+def test_it_finds_no_program_by_the_arguments_of_another():
+    assert names(own_processes("sh -c 'sleep 9; :' /x/Other Other & sleep 0.3; ps Other")) == []
+
+
+def test_it_needs_nothing_but_the_c_library():
+    needed = re.findall(r"NEEDED.*\[(.*)\]", output_of("readelf", "-d", PS))
+
+    assert [name for name in needed if not name.startswith("libc.")] == []
+
+
+def test_with_options_the_next_ps_in_path_answers():
+    other = "#!/system/bin/sh\necho other ps $*\n"
+    out = shell(f"mkdir /tmp/other; printf '{other}' >/tmp/other/ps; chmod 700 /tmp/other/ps; "
+                "PATH=/system/bin:/tmp/other; ps -A -o PID; ps a b").out
+
+    assert out == "other ps -A -o PID\nother ps a b\n"
+
+
+@pytest.mark.parametrize("path", ["/system/bin", "/system/bin:/tmp/copy", ""])
+@pytest.mark.parametrize("arguments", ["-A", "a b"])
+def test_with_options_and_no_other_ps_it_says_so(arguments, path):
+    status, out, err = shell("mkdir /tmp/copy; cp /system/bin/ps /tmp/copy/ps; "
+                             f"PATH={path}; /system/bin/ps {arguments}")
 
     assert (status, out) == (1, "")
-    assert err.splitlines()[-1] == "ps: it takes no options and one name at most: ps [NAME]"
+    assert err.splitlines()[-1] == (
+        "ps: it takes one name at most, and no options: ps [NAME]; no other ps in PATH could "
+        "be asked")
+
+
+# The first process of a namespace, which is not to be looked into; the words after it
+# run without privileges, on a /proc that hides what they may not look into.
+HIDDEN_FIRST = """
+import ctypes, subprocess, sys
+ctypes.CDLL(None).prctl(4, 0)
+subprocess.run(["mount", "-o", "remount,hidepid=4", "/proc"], check=True)
+sys.exit(subprocess.run(["setpriv", "--inh-caps=-all", "--bounding-set=-all", *sys.argv[1:]],
+                        stdout=sys.stderr).returncode)
+"""
+
+
+def test_it_says_where_proc_hides_processes(namespaces):
+    status, _, err = run("unshare", "--user", "--map-root-user", "--pid", "--fork",
+                         "--mount-proc", "/usr/bin/python3", "-c", HIDDEN_FIRST, PS, "sleep")
+
+    assert (status, err) == (
+        0, "ps: /proc hides other users' processes (hidepid): they are not listed; run as root, "
+           f"or with the group that /proc is mounted with\n{PS_HEADER}\n")

@@ -31,6 +31,7 @@ include/vorlane/vr_log.h
 {LIBDIR}/libquillmark.so.{VERSION}
 {LIBDIR}/pkgconfig/quillmark.pc
 {LIBDIR}/quillmark/libvorlane.so
+libexec/quillmark/bin/ps
 share/bash-completion/completions/fptest
 share/doc/quillmark/LICENSE
 share/man/man1/fptest.1
