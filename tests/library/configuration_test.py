@@ -73,7 +73,7 @@ def test_what_cannot_be_used_is_named(module, options, complaint, tmp_path):
 
 @pytest.mark.parametrize("preset, abi", [
     ("android-arm64", "arm64-v8a"), ("android-armv7", "armeabi-v7a"),
-    ("android-x86_64", "x86_64")])
+    ("android-x86_64", "x86_64"), ("android-x86", "x86")])
 def test_a_preset_asks_the_ndk_for_its_machine_and_no_cpp_runtime(preset, abi, tmp_path):
     (tmp_path / TOOLCHAIN).parent.mkdir(parents=True)
     (tmp_path / TOOLCHAIN).write_text(
