@@ -74,12 +74,13 @@ endif()
 if(NOT IS_ABSOLUTE "${CMAKE_INSTALL_INCLUDEDIR}")
   set(pc_includedir "\${prefix}/${CMAKE_INSTALL_INCLUDEDIR}")
 endif()
-# Mini-XML's own description goes with a Mini-XML that compilers find by themselves
+# Mini-XML's own description goes with a Mini-XML that compilers find by themselves;
+# another one may have none, and a place of its own on each machine
 set(pc_mxml "Requires.private: mxml >= 2.7, mxml < 4")
-set(pc_mxml_flags "")
 if(NOT MINIXML_INCLUDE_DIR IN_LIST CMAKE_CXX_IMPLICIT_INCLUDE_DIRECTORIES)
-  set(pc_mxml "Libs.private: \"${MINIXML_LIBRARY}\"")
-  set(pc_mxml_flags " \"-I${MINIXML_INCLUDE_DIR}\"")
+  get_filename_component(pc_mxml "${MINIXML_LIBRARY}" NAME)
+  string(REGEX REPLACE "^lib(.*)\\.(a|so)$" "\\1" pc_mxml "${pc_mxml}")
+  set(pc_mxml "Libs.private: -l${pc_mxml}")
 endif()
 configure_file(cmake/quillmark.pc.in ${generated}/quillmark.pc @ONLY)
 install(FILES ${generated}/quillmark.pc

@@ -70,7 +70,7 @@ __attribute__((noinline)) static void log_line(const char *format, const char *f
 }
 
 /* sizeof evaluates nothing; it only makes the compiler check the arguments against
-   the format. */
+   the format. A call stays on one line: of two, compilers differ in which is __LINE__. */
 #define LOG(format, ...)                                                                           \
     ((void)sizeof(vr_log_printf(VR_LOG_DEBUG, "", format __VA_OPT__(, ) __VA_ARGS__)),             \
      log_line("%-15s:%04d:pid=%d:ctid=%d => " format, __func__,                                    \
@@ -81,7 +81,7 @@ __attribute__((noinline)) static void log_line(const char *format, const char *f
 
 /* printf("%s", NULL) is undefined, and compilers may turn it into puts(NULL),
    which crashes. */
-static const char *null_text(const char *text)
+static const char *shown(const char *text)
 {
     return text != nullptr ? text : "(null)";
 }
@@ -245,7 +245,7 @@ static mxml_node_t *get_node_byIndex(mxml_node_t *tree, const char *groupname, i
     for (int counter = 0; node != nullptr && counter != nodeindex; ++counter) {
         node = mxmlGetNextSibling(node);
     }
-    LOG("curernt leaf node name = %s\n", null_text(mxmlElementGetAttr(node, "name")));
+    LOG("curernt leaf node name = %s\n", shown(mxmlElementGetAttr(node, "name")));
     LOG("leave...\n");
     return node;
 }
@@ -359,7 +359,7 @@ static void updateSrcXmlFile(const char *groupname, const char *inodename, int i
         LOG_PLACE(":mxml Find Path failed\n");
         return;
     }
-    LOG("curernt node name is: %s\n", null_text(mxmlElementGetAttr(item, "name")));
+    LOG("curernt node name is: %s\n", shown(mxmlElementGetAttr(item, "name")));
 
     LOG("start update progress!\n");
     format_text(tmp, 10, "%d", iprogress); /* readers expect at most 9 characters */
@@ -381,11 +381,11 @@ int FPTEST_SetTransation(const char *iGroupname, const char *iNodename, int iPro
                          const char *iDesc)
 {
     LOG("enter...\n");
-    LOG("input node name = %s\n", null_text(iNodename));
-    const int index = get_node_index(iGroupname, iNodename, 3);
+    LOG("input node name = %s\n", shown(iNodename));
+    const int at = get_node_index(iGroupname, iNodename, 3);
     LOG("iResult = %d\n", iResult);
-    LOG("index=%d - iResult=%d - iProgress=%d - iDesc=%s\n", index, iResult, iProgress,
-        null_text(iDesc));
+    LOG("index=%d - iResult=%d - iProgress=%d - iDesc=%s\n", at, iResult, iProgress, shown(iDesc));
+
     updateSrcXmlFile(iGroupname, iNodename, iResult, iDesc, iProgress);
     LOG("leave...\n");
     return 0;
@@ -576,7 +576,7 @@ static void SingleItemExecute(mxml_node_t *tree, const char *groupname, int inde
     }
     const char *tName = mxmlElementGetAttr(node, "name");
     const char *tArg = mxmlElementGetAttr(node, "args");
-    LOG("mxmlElementGetAttr name=%s- args=%s\n", null_text(tName), null_text(tArg));
+    LOG("mxmlElementGetAttr name=%s- args=%s\n", shown(tName), shown(tArg));
     if (tName == nullptr || tName[0] == '\0') {
         LOG("current node is null !\n");
         return;
@@ -611,13 +611,13 @@ static void SingleItemExecute(mxml_node_t *tree, const char *groupname, int inde
         return;
     }
     if (strcmp(tLine, gatherer) != 0) {
-        format_text(tpCmd, sizeof tpCmd, "%s/%s %s", rootPath, tLine, null_text(tArg));
+        format_text(tpCmd, sizeof tpCmd, "%s/%s %s", rootPath, tLine, shown(tArg));
         LOG("tpCmd:%s\n", tpCmd);
         [[maybe_unused]] const int ended = system(tpCmd);
         LOG("leave... !\n");
         return;
     }
-    format_text(tpCmd, sizeof tpCmd, "%s/%s %s", rootPath, gatherer, null_text(tArg));
+    format_text(tpCmd, sizeof tpCmd, "%s/%s %s", rootPath, gatherer, shown(tArg));
     LOG("tpCmd:%s\n", tpCmd);
     LOG("\nrow=%d\n", row);
     if (row == 1) {
@@ -666,7 +666,7 @@ int FPTEST_SuspendItemExecute(void)
     /* no dash before the 9, and none to be put there: a standard kill takes it
        for a process id and sends both the default signal, which lets an item
        put its sensor to rest as signal 9 would not */
-    format_text(sbuf, 32, "%s %s", "kill 9", null_text(token));
+    format_text(sbuf, 32, "%s %s", "kill 9", shown(token));
     mysystem(sbuf);
     return 0;
 }

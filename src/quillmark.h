@@ -27,6 +27,15 @@
  * suspension that meets the end of the item it wanted to stop may leave them
  * so; a host that depends on its own handlers sets them again after one. A host
  * should ignore SIGPIPE, because the gatherer is told by a plain write.
+ *
+ * The library asks the first ps in PATH. Android's own finds the gatherer up to
+ * Android 7, and the item to stop up to 5.1, by 15 characters of its name; none
+ * finds what /proc hides. So a host on a device puts the directory that holds
+ * quillmark-ps under the name ps, LIBEXECDIR/quillmark/bin, first in its PATH.
+ *
+ * Items run by the C library's shell. For a host in /vendor/bin that is
+ * /vendor/bin/sh on Android 9 to 13; where there is none, no item but the
+ * gatherer runs, and nothing says so.
  */
 #ifndef QUILLMARK_H
 #define QUILLMARK_H

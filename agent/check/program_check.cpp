@@ -94,12 +94,12 @@ void check_program(const CheckContext &context, const Item &item,
     if (name.empty()) {
         return;
     }
-    if (name.size() > kStopLimit && name.size() <= kNameLimit) {
+    if (name.size() > kKernelLimit && name.size() <= kNameLimit) {
         context.findings.warning(
             context.places.of(item.number, "name"),
-            "item {} may not be found to be stopped: ps is asked for the first {} of the {} bytes "
-            "of its name, and finds another or none; shorten it",
-            quoted_name(name), kStopLimit, name.size());
+            "item {} may not be found to be stopped: its name has {} bytes, but ps is asked for "
+            "the first {} alone, and up to Android 5.1 finds no name of more than {}; shorten it",
+            quoted_name(name), name.size(), kStopLimit, kKernelLimit);
     }
     shell.check(item);
     check_vendors(context, item, item_names);

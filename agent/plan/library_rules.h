@@ -18,6 +18,7 @@ inline constexpr std::size_t kPlanLimit = 2048;    // bytes that a command store
 inline constexpr std::size_t kPathLimit = 2047;    // bytes of a node path
 inline constexpr std::size_t kNameLimit = 63;      // characters of a name in a node path
 inline constexpr std::size_t kStopLimit = 28;      // characters of a name that a stop gives ps
+inline constexpr std::size_t kKernelLimit = 15;    // characters that the kernel keeps of it
 inline constexpr std::size_t kCommandLimit = 1024; // characters of an item's command line
 inline constexpr char kBlanks[] = " \t\n\v\f\r";   // to Mini-XML
 inline constexpr char kGatherer[] = "SensorProbe";

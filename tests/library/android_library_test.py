@@ -24,28 +24,51 @@ set(CMAKE_SHARED_LINKER_FLAGS_INIT "-nostdlib -fuse-ld=lld -L/usr/lib/{MUSL} -lc
 """
 
 
-@pytest.mark.skipif(platform.machine() != "x86_64",
-                    reason="the emulator's preset, but another machine")
-def test_it_is_a_small_one_for_16_kilobyte_pages_on_the_devices_platform(tmp_path):
-    toolchain = tmp_path / "build/cmake/android.toolchain.cmake"
+pytestmark = pytest.mark.skipif(platform.machine() != "x86_64",
+                                reason="the emulator's preset, but another machine")
+
+
+def build(directory, *options):
+    """Builds the emulator's preset with those options. Gives the place."""
+    toolchain = directory / "build/cmake/android.toolchain.cmake"
     toolchain.parent.mkdir(parents=True)
     toolchain.write_text(TOOLCHAIN)
     # alone, without its neighbours
-    shutil.copy(CACHE["MINIXML_INCLUDE_DIR"] + "/mxml.h", tmp_path)
-    output_of("cmake", "--preset", "android-x86_64", "-B", tmp_path / "built",
-              f"-DMINIXML_INCLUDE_DIR={tmp_path}",
-              f"-DMINIXML_LIBRARY={CACHE['MINIXML_LIBRARY']}",
-              f"-DVORLANE_LIBRARIES={make_platform_libraries(tmp_path)}",
-              cwd=TREE, env={"ANDROID_NDK_ROOT": tmp_path})
-    output_of("cmake", "--build", tmp_path / "built")
+    shutil.copy(CACHE["MINIXML_INCLUDE_DIR"] + "/mxml.h", directory)
+    built = directory / "built"
+    output_of("cmake", "--preset", "android-x86_64", "-B", built,
+              f"-DMINIXML_INCLUDE_DIR={directory}",
+              f"-DMINIXML_LIBRARY={CACHE['MINIXML_LIBRARY']}", *options,
+              cwd=TREE, env={"ANDROID_NDK_ROOT": directory})
+    output_of("cmake", "--build", built)
+    return built
 
-    library = tmp_path / "built/libquillmark.so"
+
+def expect_small_and_for_16_kilobyte_pages(library):
+    listing = output_of("readelf", "--segments", "--sections", "--wide", library)
+    assert set(re.findall(r"^ *LOAD .* (\S+)$", listing, re.M)) == {"0x4000"}
+    assert ".symtab" not in listing
+    assert library.stat().st_size <= 24 * 1024
+
+
+def test_it_is_a_small_one_for_16_kilobyte_pages_on_the_devices_platform(tmp_path):
+    built = build(tmp_path, f"-DVORLANE_LIBRARIES={make_platform_libraries(tmp_path)}")
+    library = built / "libquillmark.so"
     assert not library.is_symlink(), "Android knows no versions of libraries"
     assert entries_of(library, "SONAME") == ["libquillmark.so"]
     assert (entries_of(library, "NEEDED") ==
             ["libc.so", "libmxml.so.1", "libplatform.so", "libplatformlog.so"])
     assert exports_of(library) == INTERFACE
-    listing = output_of("readelf", "--segments", "--sections", "--wide", library)
-    assert set(re.findall(r"^ *LOAD .* (\S+)$", listing, re.M)) == {"0x4000"}
-    assert ".symtab" not in listing
-    assert library.stat().st_size <= 24 * 1024
+    expect_small_and_for_16_kilobyte_pages(library)
+
+
+def test_so_is_the_platforms_library_for_linux_and_own_flags_are_added_to_the_ndks(tmp_path):
+    # without the NDK's, neither would it compile nor link
+    built = build(tmp_path, "-DCMAKE_C_FLAGS=-DMINE", "-DCMAKE_CXX_FLAGS=-DMINE",
+                  "-DCMAKE_SHARED_LINKER_FLAGS=-Wl,-z,nodelete")
+    expect_small_and_for_16_kilobyte_pages(built / "libvorlane.so")
+    assert entries_of(built / "libquillmark.so", "NEEDED") == [
+        "libc.so", "libmxml.so.1", "libvorlane.so"]
+    assert "NODELETE" in output_of("readelf", "--dynamic", built / "libquillmark.so")
+    compiled = (built / "compile_commands.json").read_text()
+    assert compiled.count(" -DMINE ") == compiled.count('"command": ')

@@ -1,25 +1,67 @@
 # SPDX-FileCopyrightText: 2026 The Quillmark authors
 # SPDX-License-Identifier: Apache-2.0
-"""Android.bp, which builds the library in Android's own tree as CMake builds it here."""
+"""Android.bp, which builds in Android's own tree what CMake builds here, as it does."""
+import ast
+import collections
 import json
+import pathlib
 import re
 import shlex
 
+import pytest
 from libraries import entries_of
 from support.outside import BUILD, TREE, output_of
 
 BLUEPRINT = TREE / "Android.bp"
-# How CMake compiles the library: for each unit, the words of its command.
-COMMANDS = [shlex.split(unit["command"])
-            for unit in json.loads((BUILD / "compile_commands.json").read_text())
-            if " -o CMakeFiles/quillmark.dir/" in unit["command"]]
+UNITS = json.loads((BUILD / "compile_commands.json").read_text())
+ITEMS = [path.stem for path in (TREE / "device/items").glob("[A-Z]*.cpp")]
+
+# For each module, the file that CMake makes of it, and the targets it is made of.
+Made = collections.namedtuple("Made", "file targets")
+MODULES = {
+    "libquillmark": Made("libquillmark.so", ["quillmark"]),
+    "libvorlane_linux": Made("libvorlane.so", ["vorlane"]),
+    "fptest": Made("agent/fptest", ["fptest_parts", "fptest", "fmt_once"]),
+    **{item: Made(f"device/bin/{item}", ["device_item", item]) for item in ITEMS}}
+if (TREE / "ps").exists():
+    MODULES["quillmark-ps"] = Made("libexec/quillmark/bin/ps", ["quillmark_ps"])
 
 
-def strings_of(name):
-    """The strings of a property of the library."""
-    library = BLUEPRINT.read_text().partition("\ncc_library_shared {")[2]
-    value = re.search(rf"\n    {name}: (\[[^]]*\]|[^\n]*)", library)[1]
-    return sorted(re.findall('"([^"]*)"', value))
+def read_modules():
+    """The properties of each module, those of its defaults among them."""
+    modules = {}
+    for body in re.findall(r"^cc_\w+ {\n(.*?)^}", BLUEPRINT.read_text(), re.M | re.S):
+        body = re.sub("//.*", "", body)
+        found = re.findall(r'^    (\w+): (\[.*?\]|".*?"|true),$', body, re.M | re.S)
+        module = {name: ast.literal_eval(value.replace("true", "True")) for name, value in found}
+        for other in module.pop("defaults", []):
+            for name, value in modules[other].items():
+                if isinstance(value, list):
+                    module[name] = value + module.get(name, [])
+                else:
+                    module.setdefault(name, value)
+        modules[module.pop("name")] = module
+    return modules
+
+
+READ = read_modules()
+
+
+def units_of(target):
+    """How CMake compiles it: the file and the words of the command of each unit."""
+    units = [(unit["file"], shlex.split(unit["command"])) for unit in UNITS
+             if f" -o CMakeFiles/{target}.dir/" in unit["command"]]
+    assert units, target
+    return units
+
+
+def sources_of(target):
+    """Those in the tree that are compiled, also as a part of a larger unit."""
+    for file, _ in units_of(target):
+        if "/Unity/" in file:
+            yield from re.findall('^#include "(.*)"', pathlib.Path(file).read_text(), re.M)
+        elif not file.startswith(f"{BUILD}/"):
+            yield file
 
 
 def ends_of(beginning, words):
@@ -32,29 +74,54 @@ def test_it_is_formatted_as_androids_own():
     assert output_of("bpfmt", "-d", BLUEPRINT) == ""
 
 
-def test_it_compiles_what_cmake_does():
-    sources = [source for command in COMMANDS for source in ends_of(f"{TREE}/", command)]
-    assert sources
-    assert strings_of("srcs") == sorted(sources)
+def test_every_program_and_library_of_a_device_has_a_module():
+    made = {name for name, module in READ.items() if "srcs" in module}
+    assert made - {"quillmark_item"} == {*MODULES, "quillmark-ps"}
 
 
-def test_it_compiles_as_cmake_does():
-    # Android's build says these itself, or they are GCC's alone
-    others = {"-fPIC", f"-ffile-prefix-map={TREE}/=", "-Wno-restrict"}
-    flags = [word for word in COMMANDS[0] if re.match("-[fW]", word) and word not in others]
-    assert strings_of("cflags") == sorted([*flags, "-Os"])
-
-    assert strings_of("cpp_std") == ends_of("-std=", COMMANDS[0])
-    assert strings_of("stl") == ["none"]
-    exported = strings_of("export_include_dirs")
-    assert exported == ["src"]
-    assert (sorted(strings_of("local_include_dirs") + exported) ==
-            ends_of(f"-I{TREE}/", COMMANDS[0]))
+@pytest.mark.parametrize("name", MODULES)
+def test_it_compiles_what_cmake_does(name):
+    written = [path for pattern in READ[name]["srcs"] for path in TREE.glob(pattern)]
+    compiled = [pathlib.Path(source) for target in MODULES[name].targets
+                for source in sources_of(target)]
+    assert compiled
+    assert sorted(written) == sorted(compiled)
 
 
-def test_it_links_what_the_library_needs():
-    needed = {need.partition(".so")[0]
-              for need in entries_of(BUILD / "libquillmark.so", "NEEDED")}
-    # the C library is linked to everything there
-    assert strings_of("shared_libs") == sorted(needed - {"libc"})
-    assert strings_of("export_shared_lib_headers") == ["libmxml"]
+@pytest.mark.parametrize("name", MODULES)
+def test_it_compiles_as_cmake_does(name):
+    module = READ[name]
+    command = units_of(MODULES[name].targets[0])[0][1]
+    # Android's build says these itself, or they are GCC's alone, or CMake's
+    others = {"-fPIC", f"-ffile-prefix-map={TREE}/=", "-Wno-restrict", "-DNDEBUG"}
+    flags = [word for word in command if re.match("-[fWD]", word)
+             and word not in others and not word.endswith("_EXPORTS")]
+    assert sorted(module["cflags"]) == sorted(flags + ["-Os"] * (module.get("stl") == "none"))
+    assert [module["cpp_std"]] == ends_of("-std=", command)
+    # what CMake takes for granted, Android does not
+    with_runtime = "-fno-exceptions" not in flags
+    assert module.get("rtti", False) == with_runtime
+    assert module.get("cppflags", []) == ["-fexceptions"] * with_runtime
+
+    directories = module.get("local_include_dirs", []) + module.get("export_include_dirs", [])
+    for library in module.get("shared_libs", []):
+        directories += READ.get(library, {}).get("export_include_dirs", [])
+    assert (sorted(TREE / directory for directory in directories) ==
+            sorted(path for path in map(pathlib.Path, ends_of("-I", command))
+                   if path.is_relative_to(TREE)))
+
+
+@pytest.mark.parametrize("name", MODULES)
+def test_it_links_what_is_needed(name):
+    file = BUILD / MODULES[name].file
+    needed = {need.partition(".so")[0] for need in entries_of(file, "NEEDED")}
+    # what is linked to everything there
+    needed -= {"libc", "libgcc_s", "libm", "libstdc++"}
+    assert sorted(READ[name].get("shared_libs", [])) == sorted(needed)
+    assert READ[name].get("stem", name) == file.stem
+    links = [path.name for path in file.parent.glob(f"{name}_*") if path.is_symlink()]
+    assert READ[name].get("symlinks", []) == sorted(links)
+
+
+def test_what_the_header_includes_comes_with_the_library():
+    assert READ["libquillmark"]["export_shared_lib_headers"] == ["libmxml"]

@@ -12,12 +12,16 @@ TOOLCHAIN = "build/cmake/android.toolchain.cmake"
 
 def include(module, directory, options):
     """What comes of one of cmake/ in a project with those variables; in these,
-    HERE is the directory."""
-    for version in "2.6 2.7 2.12 3.0 3.2 3.3 4.0".split():
+    HERE is the directory. Mini-XML's headers up to 2.7 do not say their version."""
+    headers = {"2.7": "extern mxml_node_t\t*mxmlGetFirstChild(mxml_node_t *node);",
+               "2.5": "extern mxml_node_t\t*mxmlFindElement(mxml_node_t *node);"}
+    for version in "2.6 2.12 3.0 3.2 3.3 4.0".split():
         major, minor = version.split(".")
-        (directory / version).mkdir()
-        (directory / version / "mxml.h").write_text(
+        headers[version] = (
             f"#  define MXML_MAJOR_VERSION {major}\n#define MXML_MINOR_VERSION {minor}\n")
+    for version, text in headers.items():
+        (directory / version).mkdir()
+        (directory / version / "mxml.h").write_text(text)
     for header in "mxml_whitespace.h sockwrap.h sysparm.h".split():
         (directory / header).touch()
     (directory / "one.so").touch()
@@ -48,9 +52,9 @@ def test_mini_xml_from_2_7_to_3_may_be_named_by_relative_paths(version, tmp_path
     ("MiniXml", "MINIXML_INCLUDE_DIR=HERE/absent MINIXML_LIBRARY=HERE/one.so",
      "MINIXML_INCLUDE_DIR has no mxml.h: HERE/absent "),
     *[("MiniXml", f"MINIXML_INCLUDE_DIR=HERE/{version} MINIXML_LIBRARY=HERE/one.so",
-       f"is Mini-XML {version}, but Quillmark uses the interface of 2.7 to 3.x: install "
+       f"is Mini-XML {named}, but Quillmark uses the interface of 2.7 to 3.x: install "
        "libmxml-dev, or set MINIXML_INCLUDE_DIR and MINIXML_LIBRARY")
-      for version in ("2.6", "4.0")],
+      for version, named in (("2.5", "before 2.7"), ("2.6", "2.6"), ("4.0", "4.0"))],
     *[("Vorlane", f"VORLANE_INCLUDE_DIR=TREE/vorlane VORLANE_LIBRARIES=HERE/one.so;{other}",
        f"VORLANE_LIBRARIES names no file by its whole path: {other}; several are separated "
        "by ';'")
@@ -69,7 +73,7 @@ def test_what_cannot_be_used_is_named(module, options, complaint, tmp_path):
 
 @pytest.mark.parametrize("preset, abi", [
     ("android-arm64", "arm64-v8a"), ("android-armv7", "armeabi-v7a"),
-    ("android-x86_64", "x86_64")])
+    ("android-x86_64", "x86_64"), ("android-x86", "x86")])
 def test_a_preset_asks_the_ndk_for_its_machine_and_no_cpp_runtime(preset, abi, tmp_path):
     (tmp_path / TOOLCHAIN).parent.mkdir(parents=True)
     (tmp_path / TOOLCHAIN).write_text(

@@ -4,11 +4,12 @@
 import ctypes
 import platform
 import re
+import sys
 import sysconfig
 
 import pytest
 from libraries import INTERFACE, entries_of, exports_of
-from support.outside import BUILD, CACHE, TREE, output_of
+from support.outside import BUILD, CACHE, TREE, output_of, run
 
 LIBRARY = BUILD / "libquillmark.so"
 VORLANE = BUILD / "libvorlane.so"
@@ -68,6 +69,22 @@ def test_the_source_compiles_without_a_warning(compiler, options):
     output_of(compiler, "-std=c++20", *options.split(), *WARNINGS, "-Wconversion",
               "-Wshadow", "-fPIC", "-fno-exceptions", "-fno-rtti", f"-I{TREE}/vorlane",
               "-c", "-o", "/dev/null", SOURCE)
+
+
+REPORT = """import ctypes, sys
+ctypes.CDLL(sys.argv[1])
+ctypes.CDLL(sys.argv[2]).FPTEST_SetTransation(b"none", b"none", 1, 0, b"")"""
+
+
+@pytest.mark.parametrize("compiler", ["g++", "clang++"])
+def test_a_line_is_logged_with_the_number_where_its_call_begins(compiler, tmp_path):
+    library = tmp_path / "libquillmark.so"
+    output_of(compiler, "-std=c++20", "-fPIC", "-shared", "-o", library, SOURCE,
+              f"-I{TREE}/vorlane", VORLANE, CACHE["MINIXML_LIBRARY"])
+    outcome = run(sys.executable, "-c", REPORT, VORLANE, library, env={"VR_LOG_FILE": None})
+    assert outcome.status == 0, outcome.err
+    call = SOURCE.read_text().partition('LOG("index=')[0].count("\n") + 1
+    assert f":{call:04}:" in re.search("^.*=> index=.*$", outcome.err, re.M)[0]
 
 
 def test_the_source_includes_headers_of_the_c_library_alone():
