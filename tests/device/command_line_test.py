@@ -23,6 +23,8 @@ def assert_refused(words, *complaints, program=DEVICE_RUN, **others):
     ("--vendor 1a -- true", "--vendor wants a whole number, not '1a'"),
     ("--vendor '' -- true", "--vendor wants a whole number, not ''"),
     ("--vendor=x=1 -- true", "--vendor wants a whole number, not 'x=1'"),
+    ("--android 8 -- true", "--android wants 5, 7, 9 or 14, not '8'"),
+    ("--android= -- true", "--android wants 5, 7, 9 or 14, not ''"),
     ("--bin /dev/null -- true", "--bin /dev/null: no such directory"),
     ("--bin /dev -- true", "--bin /dev: the device has its own directory of that name"),
     ("--bin one --bin=other -- true",
@@ -37,7 +39,7 @@ def test_a_bad_command_line_gets_one_line_and_status_125(line, complaint):
     assert_refused(shlex.split(line), complaint, cwd=TREE)
 
 
-@pytest.mark.parametrize("option", ["--data", "--out", "--bin", "--build", "--vendor"])
+@pytest.mark.parametrize("option", ["--data", "--out", "--bin", "--build", "--vendor", "--android"])
 def test_every_option_wants_an_argument(option):
     assert_refused([option], f"{option} needs an argument; see device/run --help")
 
@@ -75,8 +77,8 @@ def test_help_fits_a_terminal_and_names_every_option():
 
     assert (status, err) == (0, "")
     assert max(map(len, out.splitlines())) <= 80
-    for text in ("--data DIR", "--out DIR", "--bin DIR", "--vendor N", "--build DIR",
-                 "--in-place", "--help", "125", "127"):
+    for text in ("--data DIR", "--out DIR", "--bin DIR", "--vendor N", "--android N",
+                 "--build DIR", "--in-place", "--help", "125", "127"):
         assert text in out
 
 

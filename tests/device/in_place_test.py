@@ -272,6 +272,9 @@ IN_PLACE = {
         "$1" --data /tmp/kept -- sh -c 'cat /data/vorlane/old; echo new >/data/vorlane/new'
         cat /tmp/kept/*; ls -d /data""",
         "old\nnew\nold\n"),
+    "it has the ps of the release that is named": (
+        """ "$1" --android 7 -- ps BurnIn; readlink /bin/sh """,
+        "bad pid 'BurnIn'\n/usr/bin/dash\n"),
     "it starts COMMAND in the directory whose files stay": ("""
         cd /tmp; "$1" --out out -- sh -c 'pwd; echo x >file'; cat out/file""",
         "/tmp/out\nx\n"),

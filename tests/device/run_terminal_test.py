@@ -2,27 +2,15 @@
 # SPDX-License-Identifier: Apache-2.0
 """How a device ends at a terminal: by keys typed there, and by its end."""
 import contextlib
-import os
 import shlex
 import time
 
 import pytest
 
-from support.outside import (DEVICE_RUN, SIGNAL_SAYER, content, eventually, started,
+from support.outside import (DEVICE_RUN, SIGNAL_SAYER, at_a_terminal, content, eventually,
                              status_of)
 
 pytestmark = pytest.mark.usefixtures("device")
-
-
-@contextlib.contextmanager
-def at_a_terminal(*words):
-    """A program at a terminal of its own: its process, and the terminal, until closed."""
-    terminal, other_side = os.openpty()
-    with open(terminal, "rb+", buffering=0) as terminal, \
-            started("setsid", "--ctty", *words, stdin=other_side, stdout=other_side,
-                    stderr=other_side) as process:
-        os.close(other_side)
-        yield process, terminal
 
 
 CTRL_C = b"\x03"

@@ -46,6 +46,17 @@ def started(*words, env=None, **options):
         process.wait()
 
 
+@contextlib.contextmanager
+def at_a_terminal(*words):
+    """A program at a terminal of its own: its process, and the terminal, until closed."""
+    terminal, other_side = os.openpty()
+    with open(terminal, "rb+", buffering=0) as terminal, \
+            started("setsid", "--ctty", *words, stdin=other_side, stdout=other_side,
+                    stderr=other_side) as process:
+        os.close(other_side)
+        yield process, terminal
+
+
 def status_of(process, seconds=60):
     """With what it ends within that time."""
     status = process.wait(seconds)
