@@ -19,13 +19,8 @@
 
 namespace fptest
 {
-namespace
-{
 
-std::function<void(int)> on_status;
-
-// The shell that the C library's system() would run.
-const char *shell()
+const char *shell_of_c_library()
 {
 #ifdef __ANDROID__
     const auto *program = reinterpret_cast<const char *>(getauxval(AT_EXECFN));
@@ -38,6 +33,11 @@ const char *shell()
     return "/bin/sh";
 #endif
 }
+
+namespace
+{
+
+std::function<void(int)> on_status;
 
 // The shell gets the caller's signal mask, and the defaults of those signals that only
 // system() ignores.
@@ -77,7 +77,7 @@ int run_by_shell(const char *command, const SpawnAttributes &attributes)
 {
     const std::array<const char *, 4> arguments{"sh", "-c", command, nullptr};
     pid_t child = -1;
-    const int error = posix_spawn(&child, shell(), nullptr, attributes.get(),
+    const int error = posix_spawn(&child, shell_of_c_library(), nullptr, attributes.get(),
                                   const_cast<char *const *>(arguments.data()), environ);
     if (error == EAGAIN || error == ENOMEM) {
         errno = error;
@@ -107,7 +107,7 @@ void set_status_handler(std::function<void(int)> handler)
 extern "C" int system(const char *command)
 {
     if (command == nullptr) {
-        return access(fptest::shell(), X_OK) == 0 ? 1 : 0;
+        return access(fptest::shell_of_c_library(), X_OK) == 0 ? 1 : 0;
     }
     sigset_t child_signal;
     sigset_t mask;

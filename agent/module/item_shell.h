@@ -15,4 +15,7 @@ namespace fptest
 // does not hit the library.
 void set_status_handler(std::function<void(int)> handler);
 
+// The shell that the C library's system() and popen() run.
+const char *shell_of_c_library();
+
 } // namespace fptest
