@@ -2,18 +2,13 @@
 // SPDX-License-Identifier: Apache-2.0
 
 #include "check/device_shell.h"
-#include "common/descriptor.h"
+
+#include "util/programs.h"
 
 #include <algorithm>
 #include <array>
 #include <cctype>
-#include <cerrno>
 #include <chrono>
-#include <csignal>
-#include <fcntl.h>
-#include <optional>
-#include <poll.h>
-#include <spawn.h>
 #include <string_view>
 #include <sys/wait.h>
 #include <unistd.h>
@@ -24,31 +19,6 @@ namespace
 {
 
 using Clock = std::chrono::steady_clock;
-
-// What a process writes until it closes its end; nullopt if that takes longer.
-std::optional<std::string> read_all(int descriptor, double seconds)
-{
-    const auto end = Clock::now() + std::chrono::duration<double>(seconds);
-    std::string text;
-    for (;;) {
-        seconds = std::chrono::duration<double>(end - Clock::now()).count();
-        if (seconds <= 0) {
-            return std::nullopt;
-        }
-        pollfd waiting{descriptor, POLLIN, 0};
-        if (poll(&waiting, 1, static_cast<int>(seconds * 1000) + 1) <= 0) {
-            continue;
-        }
-        std::array<char, 4096> buffer;
-        const ssize_t got = read(descriptor, buffer.data(), buffer.size());
-        if (got == 0) {
-            return text;
-        }
-        if (got > 0) {
-            text.append(buffer.data(), static_cast<std::size_t>(got));
-        }
-    }
-}
 
 bool may_be_in_a_name(unsigned char byte)
 {
@@ -101,48 +71,23 @@ DeviceShell::Answer DeviceShell::ask_timed(const std::string &option, const std:
 DeviceShell::Answer DeviceShell::ask_once(const std::string &option, const std::string &line,
                                           std::string &why) const
 {
-    std::array<int, 2> ends{};
-    if (left_ <= 0 || access("/system/bin/sh", X_OK) != 0 || pipe2(ends.data(), O_CLOEXEC) != 0) {
+    if (left_ <= 0 || access("/system/bin/sh", X_OK) != 0) {
         return Answer::unknown;
     }
-    const Descriptor output(ends[0]);
-    Descriptor errors(ends[1]);
-    posix_spawn_file_actions_t actions{};
-    posix_spawn_file_actions_init(&actions);
-    posix_spawn_file_actions_addopen(&actions, STDIN_FILENO, "/dev/null", O_RDONLY, 0);
-    posix_spawn_file_actions_addopen(&actions, STDOUT_FILENO, "/dev/null", O_WRONLY, 0);
-    posix_spawn_file_actions_adddup2(&actions, errors.get(), STDERR_FILENO);
-    std::string name = "sh";
-    std::string how = option;
-    std::string takes_text = "-c";
-    std::string no_more_options = "--"; // the text may begin with a '-'
-    std::string text = line;
-    const std::array<char *, 6> arguments = {
-        name.data(), how.data(), takes_text.data(), no_more_options.data(), text.data(), nullptr};
+    const auto end =
+        Clock::now() + std::chrono::ceil<Clock::duration>(std::chrono::duration<double>(left_));
     const std::array<char *, 1> environment = {nullptr};
-    pid_t process = -1;
-    const int error = posix_spawn(&process, "/system/bin/sh", &actions, nullptr, arguments.data(),
-                                  environment.data());
-    posix_spawn_file_actions_destroy(&actions);
-    if (error != 0) {
+    // the text may begin with a '-'
+    const Said said =
+        ask_program({"/system/bin/sh", option, "-c", "--", line}, end, environment.data());
+    if (!said.is_whole || !WIFEXITED(said.status)) {
         return Answer::unknown;
     }
-    errors = Descriptor(-1);
-    const auto said = read_all(output.get(), left_);
-    if (!said) {
-        kill(process, SIGKILL);
-    }
-    int status = 0;
-    while (waitpid(process, &status, 0) < 0 && errno == EINTR) {
-    }
-    if (!said || !WIFEXITED(status)) {
-        return Answer::unknown;
-    }
-    if (WEXITSTATUS(status) == 0) {
+    if (WEXITSTATUS(said.status) == 0) {
         return Answer::accepted;
     }
     // "E: sh: syntax error: ...", "sh: ..."
-    why = said->substr(0, said->find('\n'));
+    why = said.errors.substr(0, said.errors.find('\n'));
     if (const std::size_t begin = why.find("sh: "); begin != why.npos) {
         why.erase(0, begin + 4);
     }

@@ -53,6 +53,7 @@ class CommandLine
         fptest::add_show(app_, chosen_);
         fptest::add_report(app_, chosen_);
         fptest::add_send(app_, chosen_);
+        fptest::add_doctor(app_, chosen_);
     }
 
     Exit run(int argc, char **argv)

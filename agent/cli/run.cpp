@@ -222,7 +222,7 @@ Exit run(RunOptions options)
     choose_log(options.log);
     Signals signals;
     std::optional<LibraryProcess> library(std::in_place);
-    const int vendor = ask_vendor(*library);
+    const int vendor = refer_to_doctor([&] { return ask_vendor(*library); });
     if (options.list) {
         list_items(paths.empty() ? all_paths(plan) : paths, plan,
                    vendor_suffix(vendor).value_or(""));

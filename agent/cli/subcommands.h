@@ -31,5 +31,6 @@ void add_check(CLI::App &app, Action &chosen);
 void add_show(CLI::App &app, Action &chosen);
 void add_report(CLI::App &app, Action &chosen);
 void add_send(CLI::App &app, Action &chosen);
+void add_doctor(CLI::App &app, Action &chosen);
 
 } // namespace fptest

@@ -20,15 +20,8 @@
 
 namespace fptest
 {
-namespace
-{
 
-std::function<void(int)> on_status;
-std::mutex starting;
-bool starts_none = false;
-
-// The shell that the C library's system() would run.
-const char *shell()
+const char *shell_of_c_library()
 {
 #ifdef __ANDROID__
     const auto *program = reinterpret_cast<const char *>(getauxval(AT_EXECFN));
@@ -41,6 +34,13 @@ const char *shell()
     return "/bin/sh";
 #endif
 }
+
+namespace
+{
+
+std::function<void(int)> on_status;
+std::mutex starting;
+bool starts_none = false;
 
 // The shell gets the caller's signal mask, and the defaults of those signals that only
 // system() ignores.
@@ -83,7 +83,7 @@ int run_by_shell(const char *command, const SpawnAttributes &attributes)
     std::unique_lock lock(starting);
     const int error = starts_none
                           ? ECANCELED
-                          : posix_spawn(&child, shell(), nullptr, attributes.get(),
+                          : posix_spawn(&child, shell_of_c_library(), nullptr, attributes.get(),
                                         const_cast<char *const *>(arguments.data()), environ);
     lock.unlock();
     if (error == EAGAIN || error == ENOMEM) {
@@ -120,7 +120,7 @@ void start_no_more_items()
 extern "C" int system(const char *command)
 {
     if (command == nullptr) {
-        return access(fptest::shell(), X_OK) == 0 ? 1 : 0;
+        return access(fptest::shell_of_c_library(), X_OK) == 0 ? 1 : 0;
     }
     sigset_t child_signal;
     sigset_t mask;

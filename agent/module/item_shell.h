@@ -18,4 +18,7 @@ void set_status_handler(std::function<void(int)> handler);
 // From its return on system() fails, as if there were no shell.
 void start_no_more_items();
 
+// The shell that the C library's system() and popen() run.
+const char *shell_of_c_library();
+
 } // namespace fptest

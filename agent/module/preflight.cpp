@@ -3,16 +3,17 @@
 
 #include "module/preflight.h"
 
+#include "module/item_shell.h"
 #include "module/processes.h"
 #include "module/stored_plan.h"
 #include "plan/library_rules.h"
-#include "util/failure.h"
 #include "util/files.h"
 #include "util/text.h"
 
 #include <algorithm>
 #include <cerrno>
 #include <chrono>
+#include <cstdio>
 #include <cstring>
 #include <fcntl.h>
 #include <fmt/core.h>
@@ -38,16 +39,44 @@ std::vector<std::string> words_of(const std::string &text)
 
 } // namespace
 
-void require_device()
+void require_shell()
 {
     if (access("/system/bin/sh", X_OK) != 0) {
         throw Failure(Cause::device, "this machine is not a device: there is no /system/bin/sh; "
                                      "on a desk, run it as: device/run -- fptest ...");
     }
+    // not asked of the file: which one it is depends on the release, and on where the program lies
+    std::FILE *shell = popen("echo here", "re");
+    const bool runs = shell != nullptr && std::fgetc(shell) == 'h';
+    if (shell != nullptr) {
+        pclose(shell);
+    }
+    if (!runs) {
+        throw Failure(Cause::device,
+                      "the C library's shell, by which the library runs items, does not run; "
+                      "install {}{}",
+                      shell_of_c_library(),
+                      end_of_links("/proc/self/exe").starts_with("/vendor/")
+                          ? ", or /vendor/bin/sh, as Android 9 to 13 have it for a program in "
+                            "/vendor"
+                          : "");
+    }
+}
+
+void require_data()
+{
     if (access(kDataDirectory, W_OK | X_OK) != 0) {
         throw Failure(Cause::device, "{} is not writable: {}; make it, or run this as another user",
                       kDataDirectory, std::strerror(errno));
     }
+}
+
+void require_device()
+{
+    refer_to_doctor([] {
+        require_shell();
+        require_data();
+    });
     require_regular_plan();
 }
 
@@ -121,7 +150,7 @@ void require_programs(const std::vector<std::string> &items, int vendor, bool fo
                       one_line(found->first), found->second);
     }
     if (has_gatherer) {
-        require_trigger_port();
+        refer_to_doctor(require_trigger_port);
     }
 }
 

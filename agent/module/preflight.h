@@ -6,6 +6,7 @@
 #pragma once
 
 #include "common/descriptor.h"
+#include "util/failure.h"
 
 #include <string>
 #include <vector>
@@ -13,8 +14,24 @@
 namespace fptest
 {
 
-// That this is a device, and ready.
+// That the library, and the C library for it, can run commands.
+void require_shell();
+
+// That the plan's directory is there, and writable.
+void require_data();
+
+// That this is a device, and ready: both, and that the stored plan is a file.
 void require_device();
+
+// Asks, and adds to a Failure where more is said.
+template <typename Question> auto refer_to_doctor(const Question &ask)
+{
+    try {
+        return ask();
+    } catch (const Failure &lack) {
+        throw Failure(lack.cause(), "{}; see fptest doctor", lack.what());
+    }
+}
 
 // That nobody else runs a plan here while the descriptor is open.
 Descriptor lock_device();

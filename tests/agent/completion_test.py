@@ -47,7 +47,7 @@ def offered(tmp_path):
     return offered
 
 
-@pytest.mark.parametrize("command", ["", "run", "check", "show", "report", "send"])
+@pytest.mark.parametrize("command", ["", "run", "check", "show", "report", "send", "doctor"])
 def test_every_option_is_offered_that_the_help_tells(offered, command):
     help_text = run(BUILD / "agent/fptest", *command.split(), "--help").out
     options = re.findall(r"^  (?:-\w,)?(-\S+)", help_text, re.MULTILINE)
@@ -58,7 +58,7 @@ def test_every_option_is_offered_that_the_help_tells(offered, command):
 
 @pytest.mark.parametrize("words, expected", [
     # sub-commands
-    ("''", ["check", "report", "run", "send", "show"]),
+    ("''", ["check", "doctor", "report", "run", "send", "show"]),
     ("re", ["report"]),
     ("s", ["send", "show"]),
     ("x", []),

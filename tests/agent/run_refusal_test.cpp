@@ -229,7 +229,7 @@ TEST_F(Refusal, WhereThePlansDirectoryIsNotWritable)
                       .prepare = as_plain_user};
     expect(3,
            "fptest: /data/vorlane is not writable: Permission denied; make it, or run this as "
-           "another user",
+           "another user; see fptest doctor",
            start);
     EXPECT_FALSE(fs::exists(kPlanFile));
 }
@@ -244,7 +244,7 @@ TEST_F(Refusal, OutsideOfADevice)
     expect(
         3,
         "fptest: this machine is not a device: there is no /system/bin/sh; on a desk, run it as: "
-        "device/run -- fptest ...",
+        "device/run -- fptest ...; see fptest doctor",
         start);
 }
 
@@ -255,7 +255,8 @@ TEST_F(Refusal, WhereTheGatherersPortIsTaken)
         plan(group_of({{"Item", "note /tmp/scene/order"}, {"SensorProbe", "--group G"}}));
     const std::string line = "fptest: port 34952 is not available: Address already in use; the "
                              "gatherer's run would never "
-                             "end: stop what listens there (netstat -ltnp names it)";
+                             "end: stop what listens there (netstat -ltnp names it); see fptest "
+                             "doctor";
     expect(3, line, {"--plan", path, "P/G"});
     expect(3, line, {"--plan", path, "P/G/SensorProbe"});
     expect(3, line, {"--force", "--plan", path, "P/G/SensorProbe"});
@@ -296,7 +297,7 @@ TEST_F(Refusal, OfAVendorThatRunsNothing)
         expect(3,
                "fptest: the vendor selector is " + vendor +
                    ", and the library runs nothing then: set device/SysParam/Quillmark/vendor to "
-                   "0, 1 or 2 in /etc/vorlane/sysparms/vr_common_cfg.xml",
+                   "0, 1 or 2 in /etc/vorlane/sysparms/vr_common_cfg.xml; see fptest doctor",
                {"--plan", plan(kTwoGroups), "P/Bringup"});
         EXPECT_FALSE(fs::exists(kPlanFile));
     }

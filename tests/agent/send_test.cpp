@@ -286,7 +286,7 @@ TEST_F(Send, WantsADevice)
     EXPECT_EQ(ended.status, 3);
     EXPECT_EQ(ended.err,
               "fptest: this machine is not a device: there is no /system/bin/sh; on a desk, "
-              "run it as: device/run -- fptest ...\n");
+              "run it as: device/run -- fptest ...; see fptest doctor\n");
     EXPECT_FALSE(std::filesystem::exists(kPlanFile));
 }
 
