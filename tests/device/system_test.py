@@ -48,6 +48,10 @@ def test_the_devices_own_programs_and_files_are_there(system):
                           "/system/bin/ps\n/system/bin/grep\n", "")
 
 
+def test_there_is_the_place_for_ones_own_files(system):
+    assert with_system(system, "sh", "-c", "echo text >/data/local/tmp/file").status == 0
+
+
 def test_the_shell_of_the_c_library_is_the_devices(system):
     assert with_system(system, "sh", "-c", f"[[ /bin/sh -ef {system}/bin/mksh ]]").status == 0
 

@@ -18,7 +18,7 @@
 #include <cstring>
 #include <fcntl.h>
 #include <sstream>
-#include <sys/mman.h>
+#include <sys/syscall.h>
 #include <sys/wait.h>
 #include <unistd.h>
 #include <utility>
@@ -350,7 +350,7 @@ FILE *qm_popen(const char *command, const char *mode)
         output = state().outputs.front();
         state().outputs.pop_front();
     }
-    const int memory = memfd_create("output", 0);
+    const int memory = static_cast<int>(syscall(SYS_memfd_create, "output", 0));
     EXPECT_EQ(::write(memory, output.data(), output.size()), static_cast<ssize_t>(output.size()));
     ::lseek(memory, 0, SEEK_SET);
     FILE *stream = fdopen(memory, "r");
