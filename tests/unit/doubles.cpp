@@ -368,6 +368,15 @@ char *qm_fgets(char *buffer, int size, FILE *stream)
     return result;
 }
 
+#ifdef __GLIBC__
+char *qm_fgets_chk(char *text, size_t, int capacity, FILE *stream)
+#else
+char *qm_fgets_chk(char *text, int capacity, FILE *stream, size_t)
+#endif
+{
+    return qm_fgets(text, capacity, stream);
+}
+
 int qm_pclose(FILE *stream)
 {
     const Step step = next_step("pclose");
