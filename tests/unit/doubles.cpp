@@ -198,7 +198,7 @@ int qm_open(const char *path, int flags, ...)
     if ((flags & O_CREAT) != 0) {
         va_list arguments;
         va_start(arguments, flags);
-        mode = va_arg(arguments, mode_t);
+        mode = static_cast<mode_t>(va_arg(arguments, int));
         va_end(arguments);
         char octal[16];
         std::snprintf(octal, sizeof octal, ", %04o", mode);
@@ -327,7 +327,7 @@ void Bind(int descriptor, const sockaddr *address, socklen_t length)
 
 int Accept(int descriptor, sockaddr *address, socklen_t *length)
 {
-    std::memset(address, 0x5a, *length); // it is the callee's to write
+    std::memset(address, 0x5a, static_cast<std::size_t>(*length)); // it is the callee's to write
     const auto connection =
         static_cast<int>(outcome("Accept", [](const Step &) { return new_fake("connection"); }));
     record(call("Accept", name_of(descriptor), *length) + " = " + name_of(connection));
