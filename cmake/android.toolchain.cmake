@@ -14,6 +14,6 @@ if(complaint)
   message(FATAL_ERROR "ANDROID_NDK_ROOT ${complaint}: '${QUILLMARK_ANDROID_NDK}'; "
     "set it to the directory that holds build/cmake/android.toolchain.cmake")
 endif()
-# what is compiled to try the compiler reads this file as well
-list(APPEND CMAKE_TRY_COMPILE_PLATFORM_VARIABLES QUILLMARK_ANDROID_NDK)
 include("${QUILLMARK_ANDROID_NDK}/build/cmake/android.toolchain.cmake")
+# what is compiled to try the compiler reads this file as well; the NDK's own sets the list
+list(APPEND CMAKE_TRY_COMPILE_PLATFORM_VARIABLES QUILLMARK_ANDROID_NDK)

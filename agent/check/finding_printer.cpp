@@ -104,8 +104,8 @@ void print(std::FILE *stream, const CheckedPlan &plan)
     constexpr std::size_t kShown = 1000;
     FindingPrinter printer(plan.name, plan.text);
     // warnings get the room that errors leave
-    std::size_t errors =
-        std::min<std::size_t>(std::ranges::count_if(plan.findings, &Finding::is_error), kShown);
+    const auto found = std::ranges::count_if(plan.findings, &Finding::is_error);
+    std::size_t errors = std::min(static_cast<std::size_t>(found), kShown);
     std::size_t warnings = kShown - errors;
     std::size_t hidden = 0;
     for (const Finding &finding : plan.findings) {

@@ -25,7 +25,7 @@ dev_t disk_of(const fs::path &directory)
 {
     struct stat status {
     };
-    return stat(directory.c_str(), &status) == 0 ? status.st_dev : 0;
+    return stat(directory.c_str(), &status) == 0 ? static_cast<dev_t>(status.st_dev) : dev_t{0};
 }
 
 // device/run says which of its own two directories it keeps.

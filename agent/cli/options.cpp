@@ -8,8 +8,12 @@
 #include "util/text.h"
 
 #include <algorithm>
+#include <cerrno>
 #include <charconv>
+#include <cmath>
+#include <cstdlib>
 #include <fmt/core.h>
+#include <string_view>
 #include <system_error>
 #include <type_traits>
 #include <utility>
@@ -25,12 +29,33 @@ std::string refused(const std::string &value, const std::string &why)
     return value.empty() ? "its value is empty" : fmt::format("{} {}", in_quotes(value), why);
 }
 
+std::from_chars_result read_number(const char *first, const char *last, int &number)
+{
+    return std::from_chars(first, last, number);
+}
+
+// As std::from_chars, which Android's C++ library has not for a double: strtod, in the C
+// locale, without what it takes besides. The text ends with a zero.
+std::from_chars_result read_number(const char *first, const char *last, double &number)
+{
+    const std::string_view text(first, last);
+    char *stop = nullptr;
+    errno = 0;
+    number = std::strtod(first, &stop);
+    if (stop == first || text.find_first_of("+ \t\n\v\f\r") == 0 ||
+        text.find_first_of("xX") != text.npos) {
+        return {first, std::errc::invalid_argument};
+    }
+    const bool is_too_far = errno == ERANGE && (number == 0 || std::isinf(number));
+    return {stop, is_too_far ? std::errc::result_out_of_range : std::errc{}};
+}
+
 template <typename Number> CLI::Validator number_in(Number least, Number most)
 {
     return {[least, most](std::string &text) {
                 Number number{};
                 const char *end = text.data() + text.size();
-                const auto [stop, error] = std::from_chars(text.data(), end, number);
+                const auto [stop, error] = read_number(text.data(), end, number);
                 const bool is_number = error == std::errc{} && stop == end;
                 // written so that NaN is rejected
                 if (is_number && number >= least && number <= most) {
@@ -74,7 +99,7 @@ CLI::Validator time_span()
                     {'s', 1}, {'m', 60}, {'h', 3600}, {'d', 86400}};
                 double number = 0;
                 const char *const last = text.data() + text.size();
-                const auto [stop, error] = std::from_chars(text.data(), last, number);
+                const auto [stop, error] = read_number(text.data(), last, number);
                 double seconds = error == std::errc{} && stop == last ? number : 0;
                 for (const auto &[unit, size] : kUnits) {
                     if (error == std::errc{} && stop + 1 == last && *stop == unit) {

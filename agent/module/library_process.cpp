@@ -173,7 +173,7 @@ bool LibraryProcess::has_news(std::chrono::milliseconds longest,
     for (const int other : others) {
         polled.push_back({other, POLLIN, 0});
     }
-    poll(polled.data(), polled.size(), static_cast<int>(longest.count()));
+    poll(polled.data(), static_cast<nfds_t>(polled.size()), static_cast<int>(longest.count()));
     return polled[0].revents != 0;
 }
 

@@ -46,7 +46,7 @@ struct Writer::State {
     // set before the thread starts; afterwards only the thread uses them
     std::string name;
     int flags = 0;
-    int mode = 0;
+    mode_t mode = 0;
     Descriptor file{-1}; // if it is not the caller's
     int descriptor = -1;
 
@@ -106,7 +106,7 @@ Writer::Writer(std::string name, int descriptor) : state_(std::make_shared<State
     }
 }
 
-Writer::Writer(const std::string &path, int flags, int mode)
+Writer::Writer(const std::string &path, int flags, mode_t mode)
     : state_(std::make_shared<State>()), is_own_((flags & O_CREAT) != 0)
 {
     state_->name = path;

@@ -22,7 +22,7 @@ class Writer
     Writer(std::string name, int descriptor);
     // To a file, opened with these flags, O_APPEND among them. With O_CREAT, a text that
     // does not fit into a regular file is taken back.
-    Writer(const std::string &path, int flags, int mode);
+    Writer(const std::string &path, int flags, mode_t mode);
     Writer(const Writer &) = delete;
     Writer &operator=(const Writer &) = delete;
     // Pending text may be lost.

@@ -115,14 +115,15 @@ TEST_F(Usage, SaysWhatIsWrongWithAValue)
         std::string what; // they are
     } wrong[] = {
         {{"run", "--plan", path, "P/G", "--timeout"},
-         {"0", "-1", "x", "nan"},
+         {"0", "-1", "x", "nan", "+1", " 1", "0x1", "1 ", "1e999"},
          "is not a number from 0.001 to 1000000"},
         {{"run", "--plan", path, "P/G", "--repeat"},
          {"0", "-1", "x", "1.5"},
          "is not a whole number from 1 to 1000000"},
         {{"run", "--plan", path, "P/G", "--pass-code"}, {"2", "7", "-1", "x"}, "is not 0, 1 or -2"},
         {{"run", "P/G", "--for"},
-         {"0", "-1", "x", "1w", "10mm", "1 h", "h", "nan", "0.0001"},
+         {"0", "-1", "x", "1w", "10mm", "1 h", "h", "nan", "0.0001", "+1", " 1", "0x1", "0x1d",
+          "1e999"},
          "is not a time such as 90, 90s, 10m, 2h or 1d"},
         {{"run", "P/G", "--for"}, {"1001d", "99999999999d", "1e300d"}, "is longer than 1000 days"},
         {{"report", "G", "Item", "--progress", "1", "--result"},

@@ -11,6 +11,12 @@ from libraries import INTERFACE, entries_of, exports_of, make_platform_libraries
 from support.outside import CACHE, TREE, output_of
 
 MUSL = "x86_64-linux-musl"
+# those of an NDK's toolchain file
+NDK_FLAGS = ("-DANDROID -fdata-sections -ffunction-sections -funwind-tables "
+             "-fstack-protector-strong -no-canonical-prefixes -D_FORTIFY_SOURCE=2 "
+             "-Wformat -Werror=format-security")
+NDK_LINKER_FLAGS = ("-Wl,--build-id=sha1 -Wl,--no-rosegment -Wl,--fatal-warnings "
+                    "-Qunused-arguments -Wl,--no-undefined")
 TOOLCHAIN = f"""
 set(CMAKE_SYSTEM_NAME Android)
 set(CMAKE_SYSTEM_VERSION 1)
@@ -19,8 +25,9 @@ set(CMAKE_CXX_COMPILER clang++)
 set(CMAKE_C_COMPILER_TARGET x86_64-linux-android28)
 set(CMAKE_CXX_COMPILER_TARGET x86_64-linux-android28)
 set(CMAKE_TRY_COMPILE_TARGET_TYPE STATIC_LIBRARY)
-set(CMAKE_CXX_FLAGS_INIT "-nostdlibinc -nostdinc++ -isystem /usr/include/{MUSL}")
-set(CMAKE_SHARED_LINKER_FLAGS_INIT "-nostdlib -fuse-ld=lld -L/usr/lib/{MUSL} -lc")
+set(CMAKE_CXX_FLAGS_INIT "-nostdlibinc -nostdinc++ -isystem /usr/include/{MUSL} {NDK_FLAGS}")
+set(CMAKE_SHARED_LINKER_FLAGS_INIT
+  "-nostdlib -fuse-ld=lld {NDK_LINKER_FLAGS} -L/usr/lib/{MUSL} -lc")
 """
 
 
@@ -48,6 +55,7 @@ def expect_small_and_for_16_kilobyte_pages(library):
     listing = output_of("readelf", "--segments", "--sections", "--wide", library)
     assert set(re.findall(r"^ *LOAD .* (\S+)$", listing, re.M)) == {"0x4000"}
     assert ".symtab" not in listing
+    assert ".eh_frame" not in listing
     assert library.stat().st_size <= 24 * 1024
 
 

@@ -267,7 +267,7 @@ TEST_F(PlanSave, SavingTakesDescriptorZeroForAFailureAndLeavesItOpen)
 
     plan_steps("open", {gives(0, EIO)});
     internals::save_XmlFile(tree);
-    EXPECT_EQ(events(), not_saved("plan#2", "(5),Input/output error"));
+    EXPECT_EQ(events(), not_saved("plan#2", "(5)," + std::string(std::strerror(EIO))));
 }
 
 TEST_F(PlanSave, SavingTakesDescriptorOneForASuccess)

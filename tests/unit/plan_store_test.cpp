@@ -6,6 +6,7 @@
 
 #include <cerrno>
 #include <climits>
+#include <cstring>
 #include <memory>
 
 namespace
@@ -69,8 +70,8 @@ TEST_F(PlanStore, FileThatCannotBeOpenedIsLoggedWithItsPathAndItsError)
     EXPECT_EQ(internals::load_configs_file("/data/vorlane/other.xml"), nullptr);
     EXPECT_EQ(events(),
               (Lines{"mxmlSetLoneWhitespaceOff(1)", "open(/data/vorlane/other.xml, O_RDONLY) = -1",
-                     "load_configs_file| Open /data/vorlane/other.xml file failed(13),"
-                     "Permission denied\n"}));
+                     "load_configs_file| Open /data/vorlane/other.xml file failed(13)," +
+                         std::string(std::strerror(EACCES)) + "\n"}));
 }
 
 TEST_F(PlanStore, LoadingTakesDescriptorZeroForAFailureAndLeavesItOpen)

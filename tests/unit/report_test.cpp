@@ -11,7 +11,7 @@
 namespace
 {
 
-const std::string kReason = "(" + std::to_string(EACCES) + "),Permission denied";
+const std::string kReason = "(" + std::to_string(EACCES) + ")," + std::strerror(EACCES);
 
 class Report : public LibraryTest
 {
