@@ -9,6 +9,7 @@
 #include "cli/run_options.h"
 #include "module/library_process.h"
 #include "module/log_file.h"
+#include "module/own_ps.h"
 #include "module/preflight.h"
 #include "module/processes.h"
 #include "module/stored_plan.h"
@@ -220,6 +221,9 @@ Exit run(RunOptions options)
     }
     require_writable_results(options);
     choose_log(options.log);
+    if (const std::string said = choose_ps(); !said.empty() && !options.quiet) {
+        say("{}", said);
+    }
     Signals signals;
     std::optional<LibraryProcess> library(std::in_place);
     const int vendor = refer_to_doctor([&] { return ask_vendor(*library); });

@@ -5,6 +5,7 @@
 #include "cli/options.h"
 #include "module/library_process.h"
 #include "module/log_file.h"
+#include "module/own_ps.h"
 #include "module/preflight.h"
 #include "module/stored_plan.h"
 #include "plan/plan.h"
@@ -154,6 +155,9 @@ Exit send(const SendOptions &options)
             return plan_of(command) || head_of(command).starts_with("XMLNodePath");
         })) {
         lock = lock_device();
+        if (const std::string said = choose_ps(); !said.empty()) {
+            say("{}", said);
+        }
     }
     Sender sender;
     for (const std::string &command : commands) {
