@@ -5,6 +5,7 @@
 
 #include "module/item_shell.h"
 #include "module/library_process.h"
+#include "module/own_ps.h"
 #include "module/preflight.h"
 #include "module/ps_query.h"
 #include "module/stored_plan.h"
@@ -74,12 +75,18 @@ DeviceAnswer about_shell()
 
 DeviceAnswer about_ps()
 {
-    constexpr char kAdvice[] = "put quillmark-ps first in PATH";
+    const auto own = directory_of_own_ps();
+    const std::string advice =
+        own ? fmt::format("fptest uses {}/ps instead: put that directory first in the PATH of "
+                          "other agents",
+                          one_line(*own))
+            : "put quillmark-ps first in PATH";
+    const auto &tell = own ? warning : error;
     const PsAnswers answers = ask_ps();
     const std::string said = one_line(answers.complaint);
     if (answers.header.empty()) {
-        return error("ps", fmt::format("ps does not list processes{}; {}",
-                                       said.empty() ? "" : ": " + said, kAdvice));
+        return tell("ps", fmt::format("ps does not list processes{}; {}",
+                                      said.empty() ? "" : ": " + said, advice));
     }
     const std::string about =
         dialect_of(answers) + (said.empty() ? "" : fmt::format(" ({})", said));
@@ -94,12 +101,12 @@ DeviceAnswer about_ps()
         lacks.emplace_back("a gatherer where none runs (none is started)");
     }
     if (!lacks.empty()) {
-        return error("ps", fmt::format("{} finds {}; {}", about, join_and(lacks), kAdvice));
+        return tell("ps", fmt::format("{} finds {}; {}", about, join_and(lacks), advice));
     }
     if (!answers.finds_name) {
         return warning("ps", fmt::format("{} finds an item to stop by 15 characters of its name "
-                                         "at most, and no script; {}",
-                                         about, kAdvice));
+                                         "at most; {}",
+                                         about, advice));
     }
     return ok("ps", fmt::format("{} finds gatherers and items", about));
 }

@@ -57,8 +57,7 @@ std::string choose_ps()
     }
     if (!own) {
         return "this device's ps does not answer the library, and there is no quillmark-ps beside "
-               "fptest: a stop takes longer, and a second gatherer may be started; fptest doctor "
-               "says more";
+               "fptest: a second gatherer may be started; see fptest doctor";
     }
     const char *path = std::getenv("PATH");
     setenv("PATH",

@@ -30,7 +30,6 @@ namespace
 
 using Moment = std::chrono::steady_clock::time_point;
 
-constexpr std::size_t kKernelLimit = 15; // characters of a name that the kernel keeps
 
 // A shell under another name, to the kernel as well, which waits for this process's end at
 // the latest.

@@ -16,6 +16,7 @@ pytestmark = pytest.mark.usefixtures("namespaces")
 QUESTIONS = ["descriptors", "proc", "shell", "ps", "grep", "kill", "data", "vendor", "port",
              "process-9", "mini-xml", "library"]
 FPTEST = BUILD / "agent/fptest"
+OWN_PS = BUILD / "libexec/quillmark/bin"
 FILE = "/etc/vorlane/sysparms/vr_common_cfg.xml"
 
 
@@ -42,7 +43,7 @@ def examined(script="", **others):
 
 def on_bare_machine(script, shell_link="/usr/bin/mksh", options=()):
     """A script's doctor where the device's own directories are to be had otherwise."""
-    return on_machine(f"PATH={BUILD}/device/bin:$PATH; {script}", options=(
+    return on_machine(f"PATH={OWN_PS}:$PATH; {script}", options=(
         "--dir", "/data", "--tmpfs", "/data/vorlane", "--dir", "/system/bin",
         "--symlink", shell_link, "/system/bin/sh", *options))
 
@@ -125,14 +126,16 @@ def test_an_argument_is_one_too_many():
 
 # ---- what is missing -----------------------------------------------------------------
 
-PS_ADVICE = "; put quillmark-ps first in PATH"
+PS_ADVICE = (f"; fptest uses {OWN_PS}/ps instead: put that directory first in the PATH of other "
+             "agents")
+LONE_PS_ADVICE = "; put quillmark-ps first in PATH"
 NO_GATHERER = "no running gatherer (each trigger starts another one)"
 NO_ITEM = "no item to stop (it runs on)"
 
 
 @pytest.mark.parametrize("kind, mark, text", [
     ("toolbox5", "! ", "toolbox's ps, of Android up to 5.1, finds an item to stop by 15 "
-                       "characters of its name at most, and no script"),
+                       "characters of its name at most"),
     ("toolbox6", "!!", f"toolbox's ps, of Android 6 or 7, finds {NO_ITEM}"),
     ("toolbox7", "!!", f"toolbox's ps, of Android 6 or 7, (bad pid 'NAME') finds {NO_ITEM}"),
     ("toybox", "!!", "toybox's ps, of Android 8 and later, (ps: bad NAME) finds "
@@ -141,15 +144,19 @@ NO_ITEM = "no item to stop (it runs on)"
                         "started)"),
     ("hangs", "!!", "ps does not list processes: ps has not answered within 2 s"),
 ])
-def test_a_ps_that_does_not_answer(tmp_path, kind, mark, text):
+@pytest.mark.parametrize("has_own", [True, False])
+def test_a_ps_that_does_not_answer(tmp_path, kind, mark, text, has_own):
+    if not has_own:
+        shutil.copy(FPTEST, tmp_path / "fptest")
     (tmp_path / kind).mkdir()
     shutil.copy(TREE / "tests/support/any_ps.py", tmp_path / kind / "ps")
     (tmp_path / kind / "ps").chmod(0o755)
 
-    found, said = said_of("ps", examined(f"PATH=$PWD/{kind}:$PATH", cwd=tmp_path))
+    found, said = said_of("ps", examined(f"PATH=$PWD:$PWD/{kind}:$PATH", cwd=tmp_path))
 
-    assert found == mark
-    assert re.sub(r"Fptest\d+Asks\w+", "NAME", said) == text + PS_ADVICE
+    assert found == ("! " if has_own else mark)
+    assert re.sub(r"Fptest\d+Asks\w+", "NAME", said) == text + (
+        PS_ADVICE if has_own else LONE_PS_ADVICE)
 
 
 def test_a_ps_that_hangs_is_ended(tmp_path):
@@ -196,7 +203,7 @@ def test_no_shell():
     lines = lines_of(on_bare_machine(f"{FPTEST} doctor", "/nowhere"))
 
     assert lines["shell"] == ("!!", NO_DEVICE)
-    assert lines["ps"] == ("!!", "ps does not list processes: it could not be asked: "
+    assert lines["ps"] == ("! ", "ps does not list processes: it could not be asked: "
                            "/system/bin/sh does not run" + PS_ADVICE)
     assert lines["kill"][0] == "!!"
 

@@ -12,7 +12,8 @@ import pytest
 from support.outside import (BUILD, DEVICE_RUN, TREE, at_a_terminal, make_program, on_device,
                              shell, status_of)
 
-pytestmark = pytest.mark.usefixtures("device")
+# in place, where ps is the same, in_place_test.py tries one of them
+pytestmark = pytest.mark.usefixtures("namespaces")
 
 TOOLBOX, TOYBOX = (5, 7), (9, 14)
 RELEASES = TOOLBOX + TOYBOX
@@ -318,7 +319,7 @@ os._exit(0)
 """
 
 # PATH with a ps in front that answers on every device.
-HELPED = f"{BUILD}/device/bin:/system/bin"
+HELPED = f"{BUILD}/libexec/quillmark/bin:/system/bin"
 
 
 def library_does(program, name, release, items, path="/system/bin"):
@@ -358,8 +359,10 @@ def test_another_ps_in_front_of_the_devices_answers_the_library(items, release):
 
 @pytest.mark.parametrize("release", RELEASES)
 def test_the_demo_passes(release):
-    status, out, _ = on_device(TREE / "agent/demo", BUILD / "agent/fptest", "plans/demo.xml",
-                               options=("--android", str(release), "--vendor", "0"),
-                               start_new_session=True)
+    status, out, err = on_device(TREE / "agent/demo", BUILD / "agent/fptest", "plans/demo.xml",
+                                 options=("--android", str(release), "--vendor", "0"),
+                                 start_new_session=True)
 
     assert status == 0, out
+    assert "this device's ps does not answer the library: " in out + err
+    assert "gathering 2, 64 samples\n" in out

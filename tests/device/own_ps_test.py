@@ -3,40 +3,63 @@
 """fptest where the device's own ps does not answer the library."""
 import json
 import re
+import shutil
 
 import pytest
 
-from support.outside import BUILD, make_program, on_device
+from support.outside import BUILD, on_device
 
-pytestmark = pytest.mark.usefixtures("device")
+pytestmark = pytest.mark.usefixtures("namespaces")
 
-SAYS_NOTHING = "#!/system/bin/sh\necho 'ps: bad arguments' >&2\nexit 1\n"
+OWN_PS = BUILD / "libexec/quillmark/bin/ps"
 PLAN = """<P><CmdGroup name="G"><Cmd name="SensorProbe" args="--group G --seconds 0.1"/>
 <Cmd name="BurnIn" args="--group G --seconds 60"/></CmdGroup></P>"""
 
 
-@pytest.fixture(name="run")
-def run_of_a_plan(tmp_path):
-    """Runs PLAN, and gives what fptest said, the results, and the library's log."""
-    def run(*options, script=SAYS_NOTHING):
-        (tmp_path / "bin").mkdir()
-        make_program(tmp_path / "bin/ps", script)
-        (tmp_path / "plan.xml").write_text(PLAN)
-        outcome = on_device("fptest", "run", "--plan", "plan.xml", "--json", "results", "--log",
-                            "log", "--timeout", "2", "--grace", "9", *options, "P/G",
-                            options=("--out", tmp_path, "--bin", tmp_path / "bin"))
-        events = [json.loads(line) for line in (tmp_path / "results").read_text().splitlines()]
-        ends = [event for event in events if event["event"] == "end"]
-        return outcome, ends, (tmp_path / "log").read_text()
-    return run
+def run(directory, *options, fptest="fptest", release="14"):
+    """What fptest says, the outcomes and times of the items, and what the library logs."""
+    (directory / "plan.xml").write_text(PLAN)
+    outcome = on_device(fptest, "run", "--plan", "plan.xml", "--json", "results", "--log", "log",
+                        "--timeout", "1.5", "--grace", "9", *options, "P/G",
+                        options=("--out", directory, "--android", release))
+    ends = [(end["outcome"], end["seconds"])
+            for end in map(json.loads, (directory / "results").read_text().splitlines())
+            if end["event"] == "end"]
+    return outcome.err.splitlines(), ends, (directory / "log").read_text()
 
 
-def test_its_own_answers_in_its_place_and_it_says_so(run):
-    outcome, ends, log = run("--repeat", "2")
+@pytest.mark.parametrize("release", ["5", "7", "9", "14"])
+def test_its_own_answers_in_its_place_and_it_says_so(tmp_path, release):
+    said, ends, log = run(tmp_path, "--repeat", "2", release=release)
 
-    assert outcome.err.splitlines().count(
-        f"fptest: this device's ps does not answer the library: "
-        f"{BUILD}/libexec/quillmark/bin/ps is used instead") == 1
-    assert [end["outcome"] for end in ends] == ["passed", "timed out"] * 2
-    assert all(end["seconds"] < 2.9 for end in ends), "the library's own stop ends an item"
+    assert said.count("fptest: this device's ps does not answer the library: "
+                      f"{OWN_PS} is used instead") == 1
+    assert [outcome for outcome, _ in ends] == ["passed", "timed out"] * 2
+    assert all(seconds < 2.9 for _, seconds in ends), "the library's own stop ends an item"
+    assert "target process not exist" not in log.split("FPTEST_SuspendItemExecute", 1)[1]
     assert re.findall("row=(.)", log) == ["0", "1"]
+
+
+def test_without_one_it_says_what_follows(tmp_path):
+    shutil.copy(BUILD / "agent/fptest", tmp_path / "fptest")
+
+    said, ends, log = run(tmp_path, fptest="./fptest")
+
+    assert said == ["fptest: this device's ps does not answer the library, and there is no "
+                    "quillmark-ps beside fptest: a second gatherer may be started; see fptest "
+                    "doctor"]
+    assert [outcome for outcome, _ in ends] == ["passed", "timed out"]
+    assert ends[1][1] < 2.9, "fptest itself ends the item"
+    assert "target process not exist" in log.split("FPTEST_SuspendItemExecute", 1)[1]
+
+
+def test_one_beside_fptest_is_found(tmp_path):
+    shutil.copy(BUILD / "agent/fptest", tmp_path / "fptest")
+    (tmp_path / "quillmark/bin").mkdir(parents=True)
+    shutil.copy(OWN_PS, tmp_path / "quillmark/bin/ps")
+
+    said, ends, _ = run(tmp_path, fptest="./fptest")
+
+    assert said == ["fptest: this device's ps does not answer the library: "
+                    f"{tmp_path}/quillmark/bin/ps is used instead"]
+    assert ends[1][1] < 2.9

@@ -47,7 +47,7 @@ def build(directory, *options):
               f"-DMINIXML_INCLUDE_DIR={directory}",
               f"-DMINIXML_LIBRARY={CACHE['MINIXML_LIBRARY']}", *options,
               cwd=TREE, env={"ANDROID_NDK_ROOT": directory})
-    output_of("cmake", "--build", built)
+    output_of("cmake", "--build", built, "--target", "quillmark")
     return built
 
 
