@@ -221,10 +221,10 @@ Exit run(RunOptions options)
     }
     require_writable_results(options);
     choose_log(options.log);
+    Signals signals;
     if (const std::string said = choose_ps(); !said.empty() && !options.quiet) {
         say("{}", said);
     }
-    Signals signals;
     std::optional<LibraryProcess> library(std::in_place);
     const int vendor = refer_to_doctor([&] { return ask_vendor(*library); });
     if (options.list) {

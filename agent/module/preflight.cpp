@@ -37,6 +37,21 @@ std::vector<std::string> words_of(const std::string &text)
     return {std::istream_iterator<std::string>(stream), {}};
 }
 
+// On Android it is tried: which file it is depends on the release, and on where the program lies.
+bool has_shell_of_c_library()
+{
+#ifdef __ANDROID__
+    std::FILE *shell = popen("echo here", "re");
+    const bool runs = shell != nullptr && std::fgetc(shell) == 'h';
+    if (shell != nullptr) {
+        pclose(shell);
+    }
+    return runs;
+#else
+    return access(shell_of_c_library(), X_OK) == 0;
+#endif
+}
+
 } // namespace
 
 void require_shell()
@@ -45,13 +60,7 @@ void require_shell()
         throw Failure(Cause::device, "this machine is not a device: there is no /system/bin/sh; "
                                      "on a desk, run it as: device/run -- fptest ...");
     }
-    // not asked of the file: which one it is depends on the release, and on where the program lies
-    std::FILE *shell = popen("echo here", "re");
-    const bool runs = shell != nullptr && std::fgetc(shell) == 'h';
-    if (shell != nullptr) {
-        pclose(shell);
-    }
-    if (!runs) {
+    if (!has_shell_of_c_library()) {
         throw Failure(Cause::device,
                       "the C library's shell, by which the library runs items, does not run; "
                       "install {}{}",

@@ -30,9 +30,10 @@ struct Process {
     pid_t group = 0;
     unsigned long long born = 0;
     char state = '?';
-    std::string program; // argv[0], or the kernel's name for it
-    std::string name;    // without the path
-    std::string script;  // what an interpreter runs
+    std::string program;   // argv[0], or the kernel's name for it
+    std::string name;      // without the path
+    std::string script;    // what an interpreter runs
+    std::string listed_as; // by ps: its name, or the script's
     bool gathers = false;
 };
 
@@ -72,10 +73,12 @@ std::optional<Process> read_process(const std::filesystem::path &directory)
     const std::string script = at < arguments.size() ? &arguments[at] : "";
     constexpr std::array kShells{"sh", "mksh", "ksh", "ash", "dash", "bash"};
     const std::string kernels_name = stat.substr(open + 1, close - open - 1);
-    if (std::ranges::find(kShells, process.name) != kShells.end() ||
-        (!script.empty() && last_part(script).substr(0, kKernelsName) == kernels_name)) {
+    const bool is_script =
+        !script.empty() && last_part(script).substr(0, kKernelsName) == kernels_name;
+    if (is_script || std::ranges::find(kShells, process.name) != kShells.end()) {
         process.script = script;
     }
+    process.listed_as = is_script ? last_part(script) : process.name;
     return process;
 }
 
@@ -219,7 +222,7 @@ bool runs_below(pid_t ancestor, const std::vector<std::string> &items)
 std::optional<pid_t> met_by_stop(const std::string &item)
 {
     for (const auto &[pid, process] : read_processes()) {
-        if (process.name.starts_with(item.substr(0, kStopLimit))) {
+        if (process.listed_as.starts_with(item.substr(0, kStopLimit))) {
             return pid;
         }
     }

@@ -49,6 +49,16 @@ TEST_F(RunCommand, AsksTheItemToStopWhereAnotherProcessHasItsName)
     EXPECT_EQ(read_file(work("signal")), "SIGTERM\n");
 }
 
+TEST_F(RunCommand, AsksTheItemToStopWhereAScriptsNameBeginsAsItsOwn)
+{
+    run_group({{"Script", script("trap true TERM; " + script_report("0", "fine") +
+                                 "; while true; do sleep 0.1; done &amp;")},
+               {"Scrip", kSleeps}},
+              {"--timeout", "1"});
+    EXPECT_THAT(reasons(), ElementsAre("", StartsWith("stopped after 1.")));
+    EXPECT_EQ(read_file(work("signal")), "SIGTERM\n");
+}
+
 TEST_F(RunCommand, StopsItemsOfAGroupsCommandOneByOne)
 {
     const Ended ended =
