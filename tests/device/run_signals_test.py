@@ -104,8 +104,8 @@ def test_a_command_that_goes_on_is_ended_with_it_ten_seconds_later(start):
         assert device.out() == "ready\n" + GOES_ON
 
 
-@pytest.mark.parametrize("number", [signal.SIGTERM, signal.SIGHUP])
-@pytest.mark.parametrize("milliseconds", range(0, 201, 20))
+@pytest.mark.parametrize("milliseconds, number", [
+    (at, signal.SIGHUP if at % 40 else signal.SIGTERM) for at in range(0, 241, 20)])
 def test_a_signal_at_its_start_ends_it_and_leaves_nothing_running(
         start, milliseconds, number):
     length = unique_length()
