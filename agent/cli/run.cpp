@@ -106,8 +106,8 @@ bool has_gatherer_of_another_plan(const std::string &text)
 void report_other_gatherer(const RoundPlan &round, const Plan &plan, int vendor, bool is_ended)
 {
     if (is_ended) {
-        say("the gatherer of an earlier run is ended first: it may have kept that run's plan, and "
-            "would write it back");
+        say("the running gatherer is ended first: it may have kept an earlier plan, and would "
+            "write it back");
         return;
     }
     std::vector<std::string> args;
@@ -266,8 +266,7 @@ Exit run(RunOptions options)
     for (const auto &reporter : owned) {
         reporters.push_back(reporter.get());
     }
-    if (!run_rounds(reporters, for_runner, *library, signals, run, round,
-                    store_plan)) {
+    if (!run_rounds(reporters, for_runner, *library, signals, run, round, store_plan)) {
         return Exit::interrupted;
     }
     const Counts counts = count(run);

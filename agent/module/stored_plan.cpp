@@ -104,13 +104,14 @@ void require_room(std::size_t bytes)
     }
 }
 
-StoredPlan whole_stored_plan()
+StoredPlan whole_stored_plan(std::chrono::milliseconds patience)
 {
     StoredPlan read;
-    read.is_usable = made_of_stored_plan(read.text, [&read](const std::string &text) {
+    const auto make = [&read](const std::string &text) {
         read.annotated = Plan::parse_annotated(text);
         return read.annotated || Plan::load_as_library(text);
-    });
+    };
+    read.is_usable = made_of_stored_plan(read.text, make, patience);
     return read;
 }
 
@@ -169,6 +170,12 @@ void store_as_file(const std::string &text)
 
 void require_stored(const std::string &found, const std::string &wanted)
 {
+    if (found.size() >= wanted.size() && found != wanted) {
+        throw Failure(Cause::device,
+                      "another process has written {} in the moment when the plan was stored; end "
+                      "it, or store the plan again",
+                      kStoredPlan);
+    }
     if (found != wanted) {
         throw Failure(Cause::device,
                       "the plan was not stored: {} of {} bytes are in {}; make room and store it "

@@ -36,9 +36,13 @@ void require_regular_plan();
 // Throws a Failure if the disk has no room for a stored plan of that size.
 void require_room(std::size_t bytes);
 
-// What make() returns for its text. As long as that is empty, the text is read again for
-// half a second: somebody may be writing it.
-template <typename Make> auto made_of_stored_plan(std::string &text, const Make &make)
+// How long a text that is not whole is read again: somebody may be writing it.
+inline constexpr std::chrono::milliseconds kForWholePlan{500};
+
+// What make() returns for its text. As long as that is empty, the text is read again.
+template <typename Make>
+auto made_of_stored_plan(std::string &text, const Make &make,
+                         std::chrono::milliseconds patience = kForWholePlan)
 {
     using Clock = std::chrono::steady_clock;
     const auto begin = Clock::now();
@@ -46,7 +50,7 @@ template <typename Make> auto made_of_stored_plan(std::string &text, const Make 
         text = read_stored_plan().value_or("");
         auto made = make(text);
         // each try takes long if the plan is large and damaged
-        if (made || (tries > 1 && Clock::now() - begin > std::chrono::milliseconds(500))) {
+        if (made || (tries > 1 && Clock::now() - begin > patience)) {
             return made;
         }
         std::this_thread::sleep_for(std::chrono::milliseconds(10));
@@ -59,8 +63,8 @@ struct StoredPlan {
     bool is_usable = false;        // it is whole, or loads
 };
 
-// Reads it again for half a second if it is not usable.
-StoredPlan whole_stored_plan();
+// Reads it again if it is not usable.
+StoredPlan whole_stored_plan(std::chrono::milliseconds patience = kForWholePlan);
 
 // Makes it load again after a report that spoiled it, so that the next items can report: the
 // library writes a result that it has no text for, and a null description, without a value,

@@ -38,6 +38,10 @@ void append_output(std::string &output, const std::string &text)
 constexpr auto kBeforeMissed = 500ms;
 constexpr auto kBetweenPolls = 250ms;
 
+// Long enough for a save that is under way as an item ends, and not for the next report of
+// what it left running.
+constexpr auto kForPlanBesideOthers = 50ms;
+
 // The signal that killed the item, or 0. A shell that did not exec the item (because of
 // quotes in its arguments, say) reports it by its own exit status.
 int signal_of(int status)
@@ -329,8 +333,10 @@ void Runner::end_item(const LibraryProcess::Event &event)
     const std::string output = library_.output().take(event.output);
     const bool is_watched = !running_.items.empty() && !running_.items.back().moved_on;
     if (is_watched) {
-        const auto plan = whole_stored_plan().annotated;
-        reader_.read(plan); // before anything that it left running can report again
+        // before anything that it left running can report again
+        const auto plan =
+            whole_stored_plan(event.left_running ? kForPlanBesideOthers : kForWholePlan).annotated;
+        reader_.read(plan);
         running_.items.back().reporting.lost = !plan;
     }
     const std::vector<Leftover> left =

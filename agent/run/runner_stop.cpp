@@ -53,8 +53,8 @@ void Runner::read_signals()
         if (signal_ != 0 && signal == SIGHUP) {
             continue; // a terminal that closes sends it once more, or after its Ctrl-C
         }
-        if (signal_ == SIGHUP && signal == SIGTERM && now() - signal_taken_at_ < 1s) {
-            continue; // a shell that is left sends a job that it had stopped both
+        if (signal_ != 0 && signal == SIGTERM && now() - signal_taken_at_ < 1s) {
+            continue; // sent to all processes, and handed on by a script or by timeout
         }
         if (signal_ != 0) {
             options_.on_second_interrupt();

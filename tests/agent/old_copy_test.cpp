@@ -135,6 +135,19 @@ TEST_F(OldCopy, OfAnItemsDaemonIsNoReportOfASilentGatherer)
                                         "SensorProbe: timed out"));
 }
 
+TEST_F(OldCopy, OfWhatAnItemLeftRunningIsNoReportWhereTheItemDestroyedThePlan)
+{
+    for (const std::string way : {"--quiet", "--as-group"}) {
+        SCOPED_TRACE(way);
+        run_group({{"Script", script("/system/bin/Item report-here G Script 10 -2 begun sleep 0.4 "
+                                     "report-here G Script 100 0 late &amp; sleep 0.2; " +
+                                     script_report("1", "broken") +
+                                     "; echo broken >/data/vorlane/src1.xml")}},
+                  {way});
+        EXPECT_THAT(outcomes(), ElementsAre("Script: no result"));
+    }
+}
+
 TEST_F(OldCopy, IsTheReasonWhereItIsOfAnotherPlan)
 {
     file("other", device::plan_of({{"Q", {{"Other", ""}}}}));
