@@ -266,8 +266,7 @@ Exit run(RunOptions options)
     for (const auto &reporter : owned) {
         reporters.push_back(reporter.get());
     }
-    if (!run_rounds(reporters, for_runner, *library, signals, run, round,
-                    store_plan)) {
+    if (!run_rounds(reporters, for_runner, *library, signals, run, round, store_plan)) {
         return Exit::interrupted;
     }
     const Counts counts = count(run);
