@@ -29,13 +29,14 @@
  * should ignore SIGPIPE, because the gatherer is told by a plain write.
  *
  * The library asks the first ps in PATH. Android's own finds the gatherer up to
- * Android 7, and the item to stop up to 5.1, by 15 characters of its name; none
- * finds what /proc hides. So a host on a device puts the directory that holds
- * quillmark-ps under the name ps, LIBEXECDIR/quillmark/bin, first in its PATH.
+ * Android 7, and the item to stop up to 5.1, if its name has at most 15
+ * characters; no ps finds what /proc hides. So a host on a device puts first in
+ * its PATH the directory with quillmark-ps, which is installed as
+ * LIBEXECDIR/quillmark/bin/ps.
  *
- * Items run by the C library's shell. For a host in /vendor/bin that is
- * /vendor/bin/sh on Android 9 to 13; where there is none, no item but the
- * gatherer runs, and nothing says so.
+ * The C library's shell runs the items. For a host in /vendor/bin that is
+ * /vendor/bin/sh on Android 9 to 13; if it is missing, no item but the gatherer
+ * runs, and nothing says so.
  */
 #ifndef QUILLMARK_H
 #define QUILLMARK_H

@@ -30,7 +30,6 @@ namespace
 
 using Moment = std::chrono::steady_clock::time_point;
 
-
 // A shell under another name, to the kernel as well, which waits for this process's end at
 // the latest.
 class NamedProcess

@@ -27,7 +27,7 @@ class Runner
         std::optional<std::chrono::duration<double>> timeout; // then an item is stopped
         std::chrono::duration<double> grace{2};               // and after that it is killed
         bool fail_on_exit_status = false;
-        bool ends_gatherer = false; // one that runs already
+        bool ends_gatherer = false;                // one that runs already
         std::function<void()> on_second_interrupt; // does not return
     };
 

@@ -22,9 +22,8 @@ MODULES = {
     "libquillmark": Made("libquillmark.so", ["quillmark"]),
     "libvorlane_linux": Made("libvorlane.so", ["vorlane"]),
     "fptest": Made("agent/fptest", ["fptest_parts", "fptest", "fmt_once"]),
+    "quillmark-ps": Made("libexec/quillmark/bin/ps", ["quillmark_ps"]),
     **{item: Made(f"device/bin/{item}", ["device_item", item]) for item in ITEMS}}
-if (TREE / "ps").exists():
-    MODULES["quillmark-ps"] = Made("libexec/quillmark/bin/ps", ["quillmark_ps"])
 
 
 def read_modules():
@@ -76,7 +75,7 @@ def test_it_is_formatted_as_androids_own():
 
 def test_every_program_and_library_of_a_device_has_a_module():
     made = {name for name, module in READ.items() if "srcs" in module}
-    assert made - {"quillmark_item"} == {*MODULES, "quillmark-ps"}
+    assert made - {"quillmark_item"} == {*MODULES}
 
 
 @pytest.mark.parametrize("name", MODULES)
