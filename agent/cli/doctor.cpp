@@ -21,7 +21,7 @@ namespace
 {
 
 constexpr char kDoctorExamples[] =
-    "Each line begins with \"ok\", with \"!\" for what to know, or with \"!!\" for what\n"
+    "Each line begins with \"ok\", with \"!\" for something to know, or with \"!!\" for what\n"
     "keeps the device from being ready, and then says what to do.\n"
     "\n"
     "Examples:\n"

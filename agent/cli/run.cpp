@@ -194,6 +194,30 @@ Run run_of(const RunOptions &options, const std::string &plan, int vendor)
     return run;
 }
 
+std::vector<Path> paths_of(const RunOptions &options, const CheckedPlan &checked)
+{
+    const Plan &plan = *checked.loaded.plan;
+    std::vector<Path> paths;
+    for (const std::string &text : options.paths) {
+        paths.push_back(parse_path(text, plan, checked.name, options.force));
+    }
+    if (paths.empty() && !options.list) {
+        throw Failure(Cause::input,
+                      "no PATH given: say what to run, as root/group or root/group/item{}",
+                      known_groups(plan));
+    }
+    return paths;
+}
+
+// A list asks nothing of the device but its vendor.
+void choose_ps_for(const RunOptions &options)
+{
+    const std::string said = options.list ? "" : choose_ps();
+    if (!said.empty() && !options.quiet) {
+        say("{}", said);
+    }
+}
+
 Exit run(RunOptions options)
 {
     refuse_list_with_results(options);
@@ -210,21 +234,11 @@ Exit run(RunOptions options)
     const Descriptor lock = options.list ? Descriptor(-1) : ready_device();
     const CheckedPlan checked = open_plan(options);
     const Plan &plan = *checked.loaded.plan;
-    std::vector<Path> paths;
-    for (const std::string &text : options.paths) {
-        paths.push_back(parse_path(text, plan, checked.name, options.force));
-    }
-    if (paths.empty() && !options.list) {
-        throw Failure(Cause::input,
-                      "no PATH given: say what to run, as root/group or root/group/item{}",
-                      known_groups(plan));
-    }
+    const std::vector<Path> paths = paths_of(options, checked);
     require_writable_results(options);
     choose_log(options.log);
     Signals signals;
-    if (const std::string said = choose_ps(); !said.empty() && !options.quiet) {
-        say("{}", said);
-    }
+    choose_ps_for(options);
     std::optional<LibraryProcess> library(std::in_place);
     const int vendor = refer_to_doctor([&] { return ask_vendor(*library); });
     if (options.list) {

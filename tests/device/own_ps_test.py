@@ -53,6 +53,15 @@ def test_without_one_it_says_what_follows(tmp_path):
     assert "target process not exist" in log.split("FPTEST_SuspendItemExecute", 1)[1]
 
 
+def test_what_would_be_run_is_listed_without_asking(tmp_path):
+    (tmp_path / "plan.xml").write_text(PLAN)
+
+    outcome = on_device("fptest", "run", "--list", "--plan", "plan.xml",
+                        options=("--out", tmp_path, "--android", "14"))
+
+    assert (outcome.status, outcome.err) == (0, "")
+
+
 def test_one_beside_fptest_is_found(tmp_path):
     shutil.copy(BUILD / "agent/fptest", tmp_path / "fptest")
     (tmp_path / "quillmark/bin").mkdir(parents=True)
