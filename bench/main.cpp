@@ -76,7 +76,7 @@ std::vector<Factory> all_comparisons(const Pace &pace)
         all.emplace_back([items] { return first_load_to_parser(items); });
     }
     for (Comparison (*make)() : {trigger, ps_of_all, ps_beside_toybox, ps_of_one}) {
-        all.push_back(make);
+        all.emplace_back(make);
     }
     return all;
 }

@@ -25,7 +25,7 @@ fs::path first_ps()
     const char *path = std::getenv("PATH");
     std::istringstream directories(path != nullptr ? path : "");
     for (std::string directory; std::getline(directories, directory, ':');) {
-        const fs::path ps = fs::path(directory) / "ps";
+        fs::path ps = fs::path(directory) / "ps";
         if (access(ps.c_str(), X_OK) == 0) {
             return ps;
         }
