@@ -171,6 +171,7 @@ std::string other_gatherer(const std::vector<std::string> &args, const std::stri
         return {};
     }
     std::string started = read_file(fmt::format("/proc/{}/cmdline", running->second)).value_or("");
+    started.erase(0, started.rfind(running->first)); // the interpreter of one that is a script
     started.erase(started.find_last_not_of('\0') + 1);
     std::ranges::replace(started, '\0', ' ');
     const bool is_other = std::ranges::any_of(args, [&](const std::string &one) {

@@ -33,7 +33,7 @@ struct Process {
     std::string program;   // argv[0], or the kernel's name for it
     std::string name;      // without the path
     std::string script;    // what an interpreter runs
-    std::string listed_as; // by ps: its name, or the script's
+    std::string listed_as; // by quillmark-ps: its program, or the script
     bool gathers = false;
 };
 
@@ -78,7 +78,7 @@ std::optional<Process> read_process(const std::filesystem::path &directory)
     if (is_script || std::ranges::find(kShells, process.name) != kShells.end()) {
         process.script = script;
     }
-    process.listed_as = is_script ? last_part(script) : process.name;
+    process.listed_as = is_script ? script : process.program;
     return process;
 }
 
@@ -185,7 +185,7 @@ bool comes_of_gatherer(const Processes &processes, pid_t pid)
 // As ps lists it and grep finds it.
 bool is_found_as_gatherer(const Process &process)
 {
-    return lives(process) && process.program.starts_with(program_of(kGatherer, ""));
+    return lives(process) && process.listed_as.starts_with(program_of(kGatherer, ""));
 }
 
 template <typename Predicate>
@@ -222,7 +222,7 @@ bool runs_below(pid_t ancestor, const std::vector<std::string> &items)
 std::optional<pid_t> met_by_stop(const std::string &item)
 {
     for (const auto &[pid, process] : read_processes()) {
-        if (process.listed_as.starts_with(item.substr(0, kStopLimit))) {
+        if (last_part(process.listed_as).starts_with(item.substr(0, kStopLimit))) {
             return pid;
         }
     }
@@ -252,7 +252,7 @@ std::optional<std::pair<std::string, pid_t>> found_as_gatherer()
 {
     for (const auto &[pid, process] : read_processes()) {
         if (is_found_as_gatherer(process)) {
-            return std::pair(process.program, pid);
+            return std::pair(process.listed_as, pid);
         }
     }
     return std::nullopt;

@@ -320,7 +320,7 @@ void Runner::make_way_for(const Job &job)
             return left;
         });
         reader_.note_gathered(read_stored_plan().value_or(""), vendor_);
-        // the library does not see one that is a script, and would start another beside it
+        // the library does not see one under another name, and would start another beside it
         const std::vector<Leftover> running = gatherer_processes();
         if (gatherer_may_report_late_ || (!running.empty() && !found_as_gatherer())) {
             end_gatherer();

@@ -452,7 +452,7 @@ TEST_F(RunGatherer, IsKilledInAGroupsCommandWhereItIgnoresTheStop)
     EXPECT_THAT(processes_named("/system/bin/Stubborn"), IsEmpty());
 }
 
-TEST_F(RunGatherer, IsStartedOnceForAllRoundsWhereItIsAScript)
+TEST_F(RunGatherer, IsStartedOnceForAllRoundsWhereItHasAnotherName)
 {
     // the library does not find it by its name
     run_group({{"SensorProbe", "--help >/dev/null; exec /system/bin/Item gather report-here G "
