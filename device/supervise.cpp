@@ -31,6 +31,7 @@
 #include <cstdlib>
 #include <cstring>
 #include <fcntl.h>
+#include <filesystem>
 #include <fstream>
 #include <iterator>
 #include <map>
@@ -42,6 +43,7 @@
 #include <string_view>
 #include <sys/prctl.h>
 #include <sys/wait.h>
+#include <system_error>
 #include <unistd.h>
 #include <vector>
 
@@ -137,11 +139,14 @@ pid_t first_child(pid_t pid)
     return all.empty() ? 0 : all.front();
 }
 
+// By its file, as a script has another name; by its name under an emulator.
 bool is_shell(pid_t pid)
 {
+    std::error_code gone;
     std::string name;
     std::getline(std::ifstream(proc(pid, "comm")), name);
-    return name == "sh" || name == "mksh";
+    const std::string file = std::filesystem::read_symlink(proc(pid, "exe"), gone).filename();
+    return file == "sh" || file == "mksh" || name == "sh" || name == "mksh";
 }
 
 // A shell acts on a signal when the program that it waits for has ended: so that gets the

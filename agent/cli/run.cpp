@@ -95,10 +95,10 @@ std::vector<std::string> names_of(const RoundPlan &round)
 
 // Whether a gatherer runs that may save another plan than this with its next report, or may
 // still work for a run that was killed.
-bool has_gatherer_of_another_plan(const std::string &text)
+bool has_gatherer_of_another_plan(const std::string &text, int vendor)
 {
     const std::string earlier = read_stored_plan().value_or("");
-    return !earlier.empty() && found_as_gatherer() &&
+    return !earlier.empty() && !ChildProcesses(getpid(), getpid(), vendor).of_gatherer().empty() &&
            (has_marks(earlier) || !is_same_plan(earlier, text));
 }
 
@@ -253,7 +253,7 @@ Exit run(RunOptions options)
     const bool is_placed = !is_sent && !options.plan.empty();
     Runner::Options for_runner = runner_options(options);
     for_runner.ends_gatherer =
-        has_gatherer_of_another_plan(is_sent ? checked.stored : checked.text);
+        has_gatherer_of_another_plan(is_sent ? checked.stored : checked.text, vendor);
     if (!options.quiet) {
         report_other_gatherer(round, plan, vendor, for_runner.ends_gatherer);
     }
@@ -272,6 +272,7 @@ Exit run(RunOptions options)
         } else if (is_placed) {
             store_as_file(checked.text);
             library.emplace(); // the old one still holds the plan from before
+            library->hold_at_ends();
         }
     };
     Run run = run_of(options, checked.name, vendor);

@@ -193,22 +193,26 @@ bool run_rounds(const std::vector<Reporter *> &reporters, const Runner::Options 
     run.suites = plan.suites;
     run.start = std::chrono::system_clock::now();
     begin(run, reporters, signals);
-    const std::string earlier_plan = read_stored_plan().value_or("");
+    Runner runner(library, signals, run, reporters, options);
+    runner.begin(read_stored_plan().value_or(""));
+    const bool goes_on = !options.ends_gatherer || runner.goes_on();
     try {
-        store();
+        if (goes_on) {
+            store();
+        }
     } catch (const Failure &failure) {
         run_nothing(failure.what(), run, reporters, signals);
     }
-    Runner runner(library, signals, run, reporters, options);
-    runner.begin(earlier_plan);
     try {
         std::vector<std::size_t> all; // also of those that will not be reached
         for (const Job &job : plan.jobs) {
             const auto elements = job.elements();
             all.insert(all.end(), elements.begin(), elements.end());
         }
-        clear_reports(all);
-        run.finished = Rounds(runner, run, reporters, plan).run_all();
+        if (goes_on) {
+            clear_reports(all);
+            run.finished = Rounds(runner, run, reporters, plan).run_all();
+        }
         if (!runner.broken()) {
             remove_marks();
         }

@@ -334,8 +334,9 @@ void Runner::end_item(const LibraryProcess::Event &event)
     const bool is_watched = !running_.items.empty() && !running_.items.back().moved_on;
     if (is_watched) {
         // before anything that it left running can report again
+        const bool is_beside_others = event.left_running && !item_processes().empty();
         const auto plan =
-            whole_stored_plan(event.left_running ? kForPlanBesideOthers : kForWholePlan).annotated;
+            whole_stored_plan(is_beside_others ? kForPlanBesideOthers : kForWholePlan).annotated;
         reader_.read(plan);
         running_.items.back().reporting.lost = !plan;
     }

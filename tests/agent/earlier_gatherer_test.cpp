@@ -34,19 +34,21 @@ TEST_F(EarlierGatherer, IsEndedWithItsHelpers)
 
 TEST_F(EarlierGatherer, IsEndedLestItWriteAnotherPlanBack)
 {
-    const std::string report = "gather report-here G SensorProbe 100 0 done ";
+    std::string words = "gather report-here G SensorProbe 100 0 done ignore-stop";
+    for (int times = 0; times < 60; ++times) {
+        words += " sleep 0.05 report-here G SensorProbe 50 -2 more";
+    }
     const Items before = {{"SensorProbe", "--group G --seconds 0"}, {"Item", kPasses}};
     Items after = before;
     after[1].args += " say more";
     for (const std::string way : {"--quiet", "--as-group"}) {
         SCOPED_TRACE(way);
         write_file(kPlanFile, group_of(before));
-        const Gatherer gatherer(report + report + "sleep 60");
+        const Gatherer gatherer(words);
         EXPECT_EQ(run({"P/G/SensorProbe"}).err,
-                  "fptest: a gatherer is running already, as '/system/bin/SensorProbe gather "
-                  "report-here G SensorProbe 100 0 done gather report-here G SensorProbe 100 0 "
-                  "done sleep 60': the library triggers that one, and starts none\n");
-        const Ended ended = run_group(after, {way});
+                  "fptest: a gatherer is running already, as '/system/bin/SensorProbe " + words +
+                      "': the library triggers that one, and starts none\n");
+        const Ended ended = run_group(after, {way, "--grace", "0.5"});
         EXPECT_EQ(ended.err, way == "--quiet" ? "" : kEndedFirst);
         EXPECT_THAT(outcomes(), ElementsAre("SensorProbe: passed", "Item: passed"));
         EXPECT_THAT(read_file(kPlanFile), HasSubstr("say more"));

@@ -4,9 +4,11 @@
 #include "module/ps_query.h"
 
 #include <cerrno>
+#include <cstdlib>
 #include <filesystem>
 #include <gmock/gmock.h>
 #include <iterator>
+#include <string_view>
 #include <sys/wait.h>
 
 namespace fptest
@@ -19,6 +21,9 @@ using testing::IsEmpty;
 
 TEST(PsQuery, IsAnsweredAndLeavesNoChild)
 {
+    if (std::getenv("QUILLMARK_DEVICE") == std::string_view("in-place")) {
+        GTEST_SKIP() << "the shell that is asked about cannot have another name there";
+    }
     const PsAnswers answers = ask_ps();
 
     EXPECT_TRUE(answers.is_enough());

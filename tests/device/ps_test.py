@@ -138,7 +138,8 @@ LONG = "ItemWithANameOfMoreThanTwentyEightCharacters"
 
 
 @pytest.mark.parametrize("first_line", ["#!/system/bin/sh", "#!/system/bin/sh -e"])
-def test_it_finds_a_script_by_its_own_name(tmp_path, first_line):
+def test_it_finds_a_script_by_its_own_name(namespaces, tmp_path, first_line):
+    # in place another program is the shell's guard, and scripts have its shell's name
     make_program(tmp_path / LONG, f"{first_line}\nsleep 9; :\n")
 
     found = own_processes(f"/system/bin/{LONG} one two & sleep 0.3; ps {LONG[:28]}",
@@ -147,7 +148,7 @@ def test_it_finds_a_script_by_its_own_name(tmp_path, first_line):
     assert names(found) == [f"/system/bin/{LONG}"]
 
 
-def test_it_finds_a_script_by_its_path_and_not_by_its_interpreter(tmp_path):
+def test_it_finds_a_script_by_its_path_and_not_by_its_interpreter(namespaces, tmp_path):
     make_program(tmp_path / "SensorProbe", "#!/system/bin/sh\nsleep 9; :\n")
     start = "/system/bin/SensorProbe --group g & sleep 0.3; "
 

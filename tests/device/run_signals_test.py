@@ -7,8 +7,8 @@ import time
 import pytest
 
 from support.outside import (DEVICE_RUN, GOES_ON, SIGNAL_SAYER, TREE, SignalledDevice,
-                             content, eventually, is_running, run, shell, unique_length,
-                             way)
+                             content, eventually, is_running, make_program, run, shell,
+                             unique_length, way)
 
 pytestmark = pytest.mark.usefixtures("device")
 
@@ -62,9 +62,10 @@ def test_a_signal_comes_to_command_once(start, name, before_command, ways):
 
 
 @pytest.mark.parametrize("name", ["INT", "QUIT", "TERM"])
-def test_a_signal_comes_to_what_a_shell_waits_for_as_well(start, name):
+def test_a_signal_comes_to_what_a_script_waits_for_as_well(start, name, tmp_path):
     program = " ".join(map(str, SIGNAL_SAYER))
-    device = start("sh", "-c", f"sh -c '{program}; echo on'; echo on")
+    make_program(tmp_path / "script", f"#!/system/bin/sh\nsh -c '{program}; echo on'; echo on\n")
+    device = start("./script", options=("--out", tmp_path))
     assert device.says("ready")
 
     device.signal(signal.Signals["SIG" + name])

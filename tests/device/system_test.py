@@ -10,7 +10,7 @@ import pytest
 
 from support.outside import make_program, on_device, output_of
 
-pytestmark = pytest.mark.usefixtures("device")
+pytestmark = pytest.mark.usefixtures("namespaces")
 
 BITS64 = {"x86_64": 62, "aarch64": 183}
 SHELL = shutil.which("mksh")
