@@ -76,14 +76,20 @@ pid_t start(const std::vector<std::string> &words, int output, int errors, char 
     return error == 0 ? process : -1;
 }
 
-// What the program has started becomes a child of this process, to be waited for.
+// What the program has started becomes a child of this process, to be waited for: not for
+// long, as one in the kernel's hands does not end.
 void kill_group(pid_t group)
 {
     int adopts = 0;
     prctl(PR_GET_CHILD_SUBREAPER, &adopts);
     prctl(PR_SET_CHILD_SUBREAPER, 1);
     kill(-group, SIGKILL);
-    while (waitpid(-group, nullptr, 0) > 0 || errno == EINTR) {
+    const Moment end = std::chrono::steady_clock::now() + std::chrono::milliseconds(500);
+    for (pid_t ended = 0; ended >= 0 && std::chrono::steady_clock::now() < end;) {
+        ended = waitpid(-group, nullptr, WNOHANG);
+        if (ended == 0) {
+            std::this_thread::sleep_for(std::chrono::milliseconds(1));
+        }
     }
     prctl(PR_SET_CHILD_SUBREAPER, adopts);
 }
