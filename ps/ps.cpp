@@ -32,8 +32,10 @@
 namespace
 {
 
-constexpr size_t kKernelsName = 15;  // characters that the kernel keeps of a program's name
-constexpr int kMostBeforeScript = 2; // arguments: an interpreter and its option
+constexpr size_t kKernelsName = 15; // characters that the kernel keeps of a program's name
+// Arguments: an interpreter and its option; where the processor is emulated, the emulator and
+// the interpreter's path come first.
+constexpr int kMostBeforeScript = 4;
 
 // proc(5) numbers the fields of "stat" from 1.
 enum Field { parent = 4, virtual_bytes = 23, resident_pages = 24, counter = 30, channel = 35 };
@@ -230,8 +232,10 @@ void become_next_ps(char **arguments)
     constexpr const char *asked = "QUILLMARK_PS_ASKED"; // lest two of these ask each other
     struct stat own {
     };
+    char program[PATH_MAX] = ""; // an emulator answers for its own file otherwise
     const char *directory = getenv("PATH");
-    if (getenv(asked) != nullptr || stat("/proc/self/exe", &own) != 0) {
+    if (getenv(asked) != nullptr || readlink("/proc/self/exe", program, sizeof program - 1) < 0 ||
+        stat(program, &own) != 0) {
         return;
     }
     setenv(asked, "", 1);

@@ -1,44 +1,17 @@
 # SPDX-FileCopyrightText: 2026 The Quillmark authors
 # SPDX-License-Identifier: Apache-2.0
 """quillmark-ps, which is the virtual device's ps."""
-import collections
 import re
 import shutil
 
 import pytest
 
-from support.outside import (BUILD, PS_HEADER, make_program, output_of, run, shell, way)
+from support.outside import BUILD, PS_HEADER, output_of, shell, way
+from support.ps_list import names, own_processes, processes
 
 pytestmark = pytest.mark.usefixtures("device")
 
 PS = BUILD / "libexec/quillmark/bin/ps"
-LINE = re.compile(r"([^ ]+) +([0-9]+) +([0-9]+) +([0-9]+) +([0-9]+) +([0-9a-f]{8}) "
-                  r"([0-9a-f]{8}) ([A-Za-z]) (.+)")
-Process = collections.namedtuple(
-    "Process", "user pid parent size resident wchan pc state name")
-
-
-def processes(header, *lines):
-    """Those that ps lists."""
-    assert header == PS_HEADER
-    listed = [LINE.fullmatch(line) for line in lines]
-    assert None not in listed, lines
-    return [Process(*line.groups()) for line in listed]
-
-
-def own_processes(script, **others):
-    """Those that the script lists and that are its shell or below it: in a container
-    others run beside."""
-    first, *lines = shell("echo $$; " + script, **others).out.splitlines()
-    listed = processes(*lines)
-    own = {first}
-    while more := {each.pid for each in listed if each.parent in own} - own:
-        own |= more
-    return [each for each in listed if each.pid in own]
-
-
-def names(listed):
-    return [each.name for each in listed]
 
 
 def test_it_prints_the_old_toolboxs_columns():
@@ -134,31 +107,6 @@ def test_it_skips_processes_that_end_meanwhile():
     assert len(processes(*out.splitlines())) >= 5
 
 
-LONG = "ItemWithANameOfMoreThanTwentyEightCharacters"
-
-
-@pytest.mark.parametrize("first_line", ["#!/system/bin/sh", "#!/system/bin/sh -e"])
-def test_it_finds_a_script_by_its_own_name(namespaces, tmp_path, first_line):
-    # in place another program is the shell's guard, and scripts have its shell's name
-    make_program(tmp_path / LONG, f"{first_line}\nsleep 9; :\n")
-
-    found = own_processes(f"/system/bin/{LONG} one two & sleep 0.3; ps {LONG[:28]}",
-                          options=("--bin", tmp_path))
-
-    assert names(found) == [f"/system/bin/{LONG}"]
-
-
-def test_it_finds_a_script_by_its_path_and_not_by_its_interpreter(namespaces, tmp_path):
-    make_program(tmp_path / "SensorProbe", "#!/system/bin/sh\nsleep 9; :\n")
-    start = "/system/bin/SensorProbe --group g & sleep 0.3; "
-
-    line, = shell(start + "ps | grep /system/bin/SensorProbe",
-                  options=("--bin", tmp_path)).out.splitlines()
-    assert line.endswith(" /system/bin/SensorProbe")
-    assert "/system/bin/SensorProbe" not in names(
-        own_processes(start + "ps sh", options=("--bin", tmp_path)))
-
-
 def test_it_finds_no_program_by_the_arguments_of_another():
     assert names(own_processes("sh -c 'sleep 9; :' /x/Other Other & sleep 0.3; ps Other")) == []
 
@@ -187,23 +135,3 @@ def test_with_options_and_no_other_ps_it_says_so(arguments, path):
     assert err.splitlines()[-1] == (
         "ps: it takes one name at most, and no options: ps [NAME]; no other ps in PATH could "
         "be asked")
-
-
-# The first process of a namespace, which is not to be looked into; the words after it
-# run without privileges, on a /proc that hides what they may not look into.
-HIDDEN_FIRST = """
-import ctypes, subprocess, sys
-ctypes.CDLL(None).prctl(4, 0)
-subprocess.run(["mount", "-o", "remount,hidepid=4", "/proc"], check=True)
-sys.exit(subprocess.run(["setpriv", "--inh-caps=-all", "--bounding-set=-all", *sys.argv[1:]],
-                        stdout=sys.stderr).returncode)
-"""
-
-
-def test_it_says_where_proc_hides_processes(namespaces):
-    status, _, err = run("unshare", "--user", "--map-root-user", "--pid", "--fork",
-                         "--mount-proc", "/usr/bin/python3", "-c", HIDDEN_FIRST, PS, "sleep")
-
-    assert (status, err) == (
-        0, "ps: /proc hides other users' processes (hidepid): they are not listed; run as root, "
-           f"or with the group that /proc is mounted with\n{PS_HEADER}\n")
