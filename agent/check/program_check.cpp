@@ -3,9 +3,11 @@
 
 #include "check/document_checks.h"
 #include "check/plan_checks.h"
+#include "module/device_property.h"
 #include "util/text.h"
 
 #include <array>
+#include <cstdlib>
 #include <string_view>
 
 namespace fptest
@@ -85,6 +87,32 @@ void check_command_line(const CheckContext &context, const Item &item)
             item.args->empty() ? "name" : "args");
     }
 }
+
+// Whether a stop finds the item. The release is known on a device.
+void check_stop(const CheckContext &context, const Item &item)
+{
+    const std::string &name = item.name;
+    if (name.size() <= kKernelLimit || name.size() > kNameLimit) {
+        return;
+    }
+    static const std::string release = device_property("ro.build.version.release");
+    const bool is_known = std::atoi(release.c_str()) > 0;
+    const bool knows_less = std::atoi(release.c_str()) < 6;
+    if (is_known && !knows_less && name.size() <= kStopLimit) {
+        return;
+    }
+    const std::string asked = fmt::format("ps is asked for the first {} alone", kStopLimit);
+    const std::string found = fmt::format("Android {} finds no name of more than {}",
+                                          is_known ? one_line(release) : "5.1", kKernelLimit);
+    context.findings.warning(
+        context.places.of(item.number, "name"),
+        "item {} may not be found to be stopped: its name has {} bytes, but {}; shorten it",
+        quoted_name(name), name.size(),
+        !is_known    ? fmt::format("{}, and up to {}", asked, found)
+        : knows_less ? fmt::format("ps of {}", found)
+                     : asked);
+}
+
 } // namespace
 
 void check_program(const CheckContext &context, const Item &item,
@@ -94,13 +122,7 @@ void check_program(const CheckContext &context, const Item &item,
     if (name.empty()) {
         return;
     }
-    if (name.size() > kKernelLimit && name.size() <= kNameLimit) {
-        context.findings.warning(
-            context.places.of(item.number, "name"),
-            "item {} may not be found to be stopped: its name has {} bytes, but ps is asked for "
-            "the first {} alone, and up to Android 5.1 finds no name of more than {}; shorten it",
-            quoted_name(name), name.size(), kStopLimit, kKernelLimit);
-    }
+    check_stop(context, item);
     shell.check(item);
     check_vendors(context, item, item_names);
     check_command_line(context, item);

@@ -181,7 +181,7 @@ DeviceAnswer about_kill()
     if (first.pid() > 0 && second.pid() > 0) {
         const Said said = ask_program(
             {"/system/bin/sh", "-c", fmt::format("kill {} {}", first.pid(), second.pid())}, soon());
-        const auto end = std::chrono::steady_clock::now() + std::chrono::milliseconds(200);
+        const auto end = soon();
         if (said.is_whole && first.is_ended_by(end) && second.is_ended_by(end)) {
             return ok("kill", "ends the processes that it is given");
         }

@@ -57,7 +57,7 @@ std::string choose_ps()
     }
     if (!own) {
         return "this device's ps does not answer the library, and there is no quillmark-ps beside "
-               "fptest: a second gatherer may be started; see fptest doctor";
+               "fptest: fptest doctor says what that leads to";
     }
     const char *path = std::getenv("PATH");
     setenv("PATH",

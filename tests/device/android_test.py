@@ -366,3 +366,33 @@ def test_the_demo_passes(release):
     assert status == 0, out
     assert "this device's ps does not answer the library: " in out + err
     assert "gathering 2, 64 samples\n" in out
+
+
+def getprop(release, *names):
+    return shell("; ".join(f"getprop {name}" for name in names),
+                 options=("--android", str(release))).out.splitlines()
+
+
+@pytest.mark.parametrize("release, full, sdk", [
+    (5, "5.1.1", "22"), (7, "7.1.2", "25"), (9, "9", "28"), (14, "14", "34")])
+def test_getprop_tells_the_release(release, full, sdk):
+    assert getprop(release, "ro.build.version.release", "ro.build.version.sdk",
+                   "ro.no.such.name", "ro.no.such.name 7") == [full, sdk, "", "7"]
+
+
+@pytest.mark.parametrize("release, size, why", [
+    (5, 15, None),
+    (5, 16, "ps of Android 5.1.1 finds no name of more than 15"),
+    (7, 28, None),
+    (14, 28, None),
+    (14, 29, "ps is asked for the first 28 alone"),
+])
+def test_check_knows_how_much_of_a_name_ps_finds(tmp_path, release, size, why):
+    (tmp_path / "plan.xml").write_text(
+        f'<?xml version="1.0"?><P><CmdGroup name="G"><Cmd name="{size * "n"}" args=""/>'
+        "</CmdGroup></P>\n")
+
+    out = on_device("fptest", "check", "plan.xml",
+                    options=("--out", tmp_path, "--android", str(release))).out
+
+    assert (f"has {size} bytes, but {why}; shorten it" in out) if why else ("stopped" not in out)

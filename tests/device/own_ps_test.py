@@ -87,8 +87,7 @@ def test_without_one_it_says_what_follows(tmp_path):
     said, ends, log = run(tmp_path, fptest="./fptest")
 
     assert said == ["fptest: this device's ps does not answer the library, and there is no "
-                    "quillmark-ps beside fptest: a second gatherer may be started; see fptest "
-                    "doctor"]
+                    "quillmark-ps beside fptest: fptest doctor says what that leads to"]
     assert [outcome for outcome, _ in ends] == ["passed", "timed out"]
     assert ends[1][1] < 2.9, "fptest itself ends the item"
     assert "target process not exist" in log.split("FPTEST_SuspendItemExecute", 1)[1]
