@@ -124,8 +124,8 @@ void say_at_end(const std::string &text)
     }
 }
 
-// Waits for the readers of results, but not for long after an interrupt. False if a signal
-// comes first, or the time is up.
+// Waits for the readers of results, but not for long after an interrupt, which several
+// processes may hand on once more. False if another one comes first, or the time is up.
 bool flush(const std::vector<Reporter *> &reporters, Signals &signals, bool is_interrupted)
 {
     const auto begin = Clock::now();
@@ -139,7 +139,7 @@ bool flush(const std::vector<Reporter *> &reporters, Signals &signals, bool is_i
         const int taken = signals.take();
         if (taken == SIGTSTP) {
             Signals::suspend();
-        } else if (taken != 0) {
+        } else if (taken == SIGINT || (taken != 0 && !is_interrupted)) {
             return false;
         }
     }

@@ -162,7 +162,9 @@ TEST_F(Output, InterruptedRunEndsItsItemWhileNobodyReads)
     expect_items_to_end();
     EXPECT_TRUE(
         eventually([&] { return fptest.out().find("Bail out!") != std::string::npos; }, 20));
-    fptest.signal(SIGTERM);
+    fptest.signal(SIGTERM); // the same interruption, handed on
+    usleep(100'000);
+    EXPECT_THAT(events_of(read_to_end(reader), "finish"), SizeIs(1));
     EXPECT_EQ(fptest.wait(5).status, 130);
 }
 
