@@ -11,6 +11,7 @@
 #include <cctype>
 #include <expat.h>
 #include <string_view>
+#include <strings.h>
 #include <vector>
 
 namespace fptest
@@ -241,6 +242,13 @@ class FormChecker
         if (offset != kNone && text_.find('\0') == kNone) {
             findings_.error(offset, "not UTF-8: the library looks at no encoding declaration, and "
                                     "would read something else here; save it as UTF-8");
+        }
+        const std::string_view declared = declared_encoding(text_);
+        if (offset == kNone && !declared.empty() &&
+            strcasecmp(std::string(declared).c_str(), "UTF-8") != 0) {
+            findings_.warning(static_cast<std::size_t>(declared.data() - text_.data()),
+                              "the library looks at no encoding declaration, and saves reports in "
+                              "UTF-8: other readers would misread them; declare UTF-8");
         }
     }
 

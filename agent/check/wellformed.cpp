@@ -3,7 +3,10 @@
 
 #include "check/wellformed.h"
 
+#include "plan/markup.h"
+
 #include <algorithm>
+#include <cctype>
 #include <expat.h>
 #include <memory>
 #include <new>
@@ -23,13 +26,40 @@ void XMLCALL stop_at_entity(void *parser, const XML_Char *, int, const XML_Char 
     XML_StopParser(static_cast<XML_Parser>(parser), XML_FALSE);
 }
 
+// What to parse it as, whatever it declares; null for what it declares. Into a plan that was
+// declared to be in ASCII the library saves reports in UTF-8.
+const char *imposed_encoding(std::string_view text)
+{
+    const std::string_view ascii = "us-ascii";
+    const auto is_same = [](char one, char other) { return std::tolower(one) == other; };
+    return std::ranges::equal(declared_encoding(text), ascii, is_same) ? "UTF-8" : nullptr;
+}
+
 } // namespace
+
+std::string_view declared_encoding(std::string_view text)
+{
+    constexpr std::string_view kName = "encoding";
+    if (text.starts_with(kByteOrderMark)) {
+        text.remove_prefix(kByteOrderMark.size());
+    }
+    if (!text.starts_with("<?xml")) {
+        return {};
+    }
+    text = text.substr(0, text.find("?>"));
+    const std::size_t name = text.find(kName);
+    const std::size_t begin = text.find_first_of("\"'", name);
+    if (name == text.npos || begin == text.npos) {
+        return {};
+    }
+    return text.substr(begin + 1, text.find(text[begin], begin + 1) - begin - 1);
+}
 
 std::optional<Flaw> find_flaw(std::string_view text)
 {
     constexpr std::size_t kPiece = 1U << 30U; // the parser counts in int
     const std::unique_ptr<std::remove_pointer_t<XML_Parser>, decltype(&XML_ParserFree)> parser(
-        XML_ParserCreate(nullptr), &XML_ParserFree);
+        XML_ParserCreate(imposed_encoding(text)), &XML_ParserFree);
     if (!parser) {
         throw std::bad_alloc();
     }

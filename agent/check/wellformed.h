@@ -17,6 +17,9 @@ struct Flaw {
     XML_Error error = XML_ERROR_NONE;
 };
 
+// The name in the text's declaration, a part of the text; empty if it has none.
+std::string_view declared_encoding(std::string_view text);
+
 std::optional<Flaw> find_flaw(std::string_view text);
 
 } // namespace fptest

@@ -81,9 +81,10 @@ std::optional<std::string> without_reports(const std::string &text,
 
 std::optional<std::string> made_loadable(const std::string &text)
 {
-    // Mini-XML loads what sanitize_xml() replaces besides
-    const bool is_xml =
-        text.find("\xEF\xBF\xBE") == text.npos && text.find("\xEF\xBF\xBF") == text.npos;
+    // not all that sanitize_xml() replaces: control characters from U+007F on are XML's
+    const bool is_xml = first_not_utf8(text) == text.npos &&
+                        text.find("\xEF\xBF\xBE") == text.npos &&
+                        text.find("\xEF\xBF\xBF") == text.npos;
     if ((is_xml && Plan::load_as_library(text)) || !Plan::parse_annotated(text)) {
         return std::nullopt;
     }

@@ -111,7 +111,7 @@ void ReportReader::poll(When when)
         changed_ = std::chrono::seconds(status->st_mtim.tv_sec) +
                    std::chrono::nanoseconds(status->st_mtim.tv_nsec);
         read(plan);
-        if (!Plan::load_as_library(text)) {
+        if (made_loadable(text)) {
             mend_stored_plan(); // or nobody else could report
         }
     }

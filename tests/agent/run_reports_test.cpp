@@ -46,6 +46,30 @@ TEST_F(RunCommand, TellsTheSameCountsInEveryReport)
     }
 }
 
+// As after a text that was cut to a size, and of Java's own UTF-8.
+TEST_F(RunCommand, ReportWithAPartOfACharacterCostsNoOther)
+{
+    run_group({{"Item", "report G 100 0 $(printf '25\\302')"},
+               {"Other", "report G 100 0 $(printf '\\355\\240\\275')"},
+               {"Third", kPasses}});
+    EXPECT_THAT(outcomes(), Each(EndsWith(": passed")));
+    EXPECT_EQ(end_of(0).at("description"), "25\uFFFD");
+    EXPECT_THAT(events("late"), IsEmpty());
+    const Ended again = run({"P/G/Third"});
+    EXPECT_EQ(again.status, 0) << again.err;
+}
+
+// The library takes every plan for UTF-8, and saves it as that.
+TEST_F(RunCommand, ReportBeyondAPlansDeclaredEncodingCostsNoLaterRun)
+{
+    std::string text = "<?xml version='1.0' encoding='us-ascii'?>" +
+                       group_of({{"Item", "report G 100 0 25*C"}, {"Other", kPasses}});
+    text.replace(text.find('*'), 1, "&#176;");
+    EXPECT_EQ(run({"--plan", plan(text), "P/G"}).status, 0);
+    const Ended again = run({"P/G/Other"});
+    EXPECT_EQ(again.status, 0) << again.err;
+}
+
 TEST_F(RunCommand, WritesJsonToStandardOutputInPlaceOfTheView)
 {
     const Ended ended =
