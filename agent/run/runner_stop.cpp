@@ -53,8 +53,11 @@ void Runner::read_signals()
         if (signal_ != 0 && signal == SIGHUP) {
             continue; // a terminal that closes sends it once more, or after its Ctrl-C
         }
-        if (signal_ != 0 && signal == SIGTERM && now() - signal_taken_at_ < 1s) {
-            continue; // sent to all processes, and handed on by a script or by timeout
+        // sent to all processes, and handed on by a script or by timeout; of two that are
+        // pending, SIGHUP is taken before the Ctrl-C that came first
+        if (signal_ != 0 && (signal == SIGTERM || signal_ == SIGHUP) &&
+            now() - signal_taken_at_ < 1s) {
+            continue;
         }
         if (signal_ != 0) {
             options_.on_second_interrupt();

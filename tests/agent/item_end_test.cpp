@@ -183,11 +183,10 @@ TEST_F(ItemEnd, RunIsOverWhenAllThatItLeftRunningHasEnded)
 
 TEST_F(ItemEnd, SignalThatIsSentToAllAndHandedOnIsOneInterruption)
 {
-    for (const auto &[first, second] : {std::pair{SIGINT, SIGHUP},
-                                        {SIGHUP, SIGHUP},
-                                        {SIGHUP, SIGTERM},
-                                        {SIGTERM, SIGTERM},
-                                        {SIGINT, SIGTERM}}) {
+    using Pair = std::pair<int, int>;
+    for (const auto &[first, second] :
+         {Pair(SIGINT, SIGHUP), Pair(SIGHUP, SIGHUP), Pair(SIGHUP, SIGTERM), Pair(SIGHUP, SIGINT),
+          Pair(SIGTERM, SIGTERM), Pair(SIGINT, SIGTERM)}) {
         FptestProcess fptest(with_group(
             {{"Stubborn", "note /tmp/scene/begun ignore-stop sleep 60"}}, {"--grace", "0.4"}));
         ASSERT_TRUE(wait_for_file("begun"));
