@@ -48,6 +48,15 @@ OpenedLog &opened()
     return log;
 }
 
+// A limit of its size, or a disk that was full for a moment, may have cut it.
+bool ends_within_line(const Descriptor &log, off_t size)
+{
+    const Descriptor reader(
+        open(fmt::format("/proc/self/fd/{}", log.get()).c_str(), O_RDONLY | O_CLOEXEC));
+    char last = '\n';
+    return size > 0 && pread(reader.get(), &last, 1, size - 1) == 1 && last != '\n';
+}
+
 } // namespace
 
 std::string label(const NamedFile &file)
@@ -87,15 +96,21 @@ std::string log_loss()
 {
     struct stat status {
     };
-    // is there room for one more byte?
     const auto &[log, name] = opened();
-    if (name.empty() || fstat(log.get(), &status) != 0 || !S_ISREG(status.st_mode) ||
-        fallocate(log.get(), FALLOC_FL_KEEP_SIZE, status.st_size, 1) == 0 ||
-        (errno != ENOSPC && errno != EDQUOT)) {
+    if (name.empty() || fstat(log.get(), &status) != 0 || !S_ISREG(status.st_mode)) {
         return {};
     }
-    return fmt::format("{} is incomplete: {}; make room, or name another file", name,
-                       std::strerror(errno));
+    std::string why;
+    // is there room for one more byte?
+    if (fallocate(log.get(), FALLOC_FL_KEEP_SIZE, status.st_size, 1) != 0 &&
+        (errno == ENOSPC || errno == EDQUOT)) {
+        why = std::strerror(errno);
+    } else if (ends_within_line(log, status.st_size)) {
+        why = "its last line is cut";
+    }
+    return why.empty()
+               ? why
+               : fmt::format("{} is incomplete: {}; make room, or name another file", name, why);
 }
 
 } // namespace fptest

@@ -16,6 +16,7 @@
 #include <fcntl.h>
 #include <regex>
 #include <string>
+#include <sys/resource.h>
 #include <sys/stat.h>
 #include <unistd.h>
 #include <utility>
@@ -352,6 +353,22 @@ TEST_F(Output, LogIsNotStandardOutput)
 }
 
 // In the library's process it would be where items print.
+TEST_F(Output, LogThatIsCutIsIncomplete)
+{
+    Start start;
+    start.arguments = {"send", "--log", work("log"), "pingtest"};
+    start.prepare = [] {
+        const rlimit limit{100, 100};
+        setrlimit(RLIMIT_FSIZE, &limit);
+    };
+    const Ended ended = run_fptest(start);
+    EXPECT_EQ(read_file(work("log")).size(), 100U);
+    EXPECT_EQ(ended.status, 3);
+    EXPECT_EQ(ended.err, "fptest: --log " + work("log") +
+                             " is incomplete: its last line is cut; make room, or name another "
+                             "file\n");
+}
+
 TEST_F(Output, LogMayBeStandardError)
 {
     const Ended ended = run_fptest({"run", "--log", "/dev/stderr", "--json", work("json"), "--plan",
