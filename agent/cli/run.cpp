@@ -13,6 +13,7 @@
 #include "module/preflight.h"
 #include "module/processes.h"
 #include "module/stored_plan.h"
+#include "module/vendor_file.h"
 #include "plan/plan.h"
 #include "plan/plan_text.h"
 #include "run/planner.h"
@@ -218,6 +219,15 @@ void choose_ps_for(const RunOptions &options)
     }
 }
 
+// As the library takes 0 for it in silence.
+void report_no_vendor(const RunOptions &options)
+{
+    const std::string why = why_no_vendor();
+    if (is_vendor_file_there() && !why.empty() && !options.quiet) {
+        say("{}: the library takes 0 for the vendor selector", why);
+    }
+}
+
 Exit run(RunOptions options)
 {
     refuse_list_with_results(options);
@@ -239,6 +249,7 @@ Exit run(RunOptions options)
     choose_log(options.log);
     Signals signals;
     choose_ps_for(options);
+    report_no_vendor(options);
     std::optional<LibraryProcess> library(std::in_place);
     const int vendor = refer_to_doctor([&] { return ask_vendor(*library); });
     if (options.list) {

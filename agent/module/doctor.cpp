@@ -9,6 +9,7 @@
 #include "module/preflight.h"
 #include "module/ps_query.h"
 #include "module/stored_plan.h"
+#include "module/vendor_file.h"
 #include "util/files.h"
 #include "util/programs.h"
 #include "util/text.h"
@@ -73,8 +74,26 @@ DeviceAnswer about_shell()
     return required("shell", require_shell, "/system/bin/sh is there, and the C library's runs");
 }
 
+DeviceAnswer about_grep()
+{
+    const Said said = ask_program(
+        {shell_of_c_library(), "-c", "echo /system/bin/SensorProbe | grep /system/bin/SensorProbe"},
+        soon());
+    if (said.output == "/system/bin/SensorProbe\n") {
+        return ok("grep", "finds the gatherer's path");
+    }
+    const std::string &why = said.errors;
+    return error("grep",
+                 fmt::format("grep does not find the gatherer's path{}, so that each "
+                             "trigger starts another gatherer; install it in PATH",
+                             why.empty() ? "" : ": " + one_line(why.substr(0, why.find('\n')))));
+}
+
 DeviceAnswer about_ps()
 {
+    if (about_grep().verdict != Verdict::ok) {
+        return warning("ps", "it cannot be asked for the gatherer without grep");
+    }
     const auto own = directory_of_own_ps();
     const std::string advice =
         own ? fmt::format("fptest uses {}/ps instead: put that directory first in the PATH of "
@@ -109,21 +128,6 @@ DeviceAnswer about_ps()
                                          about, advice));
     }
     return ok("ps", fmt::format("{} finds gatherers and items", about));
-}
-
-DeviceAnswer about_grep()
-{
-    const Said said = ask_program(
-        {shell_of_c_library(), "-c", "echo /system/bin/SensorProbe | grep /system/bin/SensorProbe"},
-        soon());
-    if (said.output == "/system/bin/SensorProbe\n") {
-        return ok("grep", "finds the gatherer's path");
-    }
-    const std::string &why = said.errors;
-    return error("grep",
-                 fmt::format("grep does not find the gatherer's path{}, so that each "
-                             "trigger starts another gatherer; install it in PATH",
-                             why.empty() ? "" : ": " + one_line(why.substr(0, why.find('\n')))));
 }
 
 // A process that waits for a signal, and ends with this one.
@@ -197,25 +201,27 @@ DeviceAnswer about_data()
     const auto ask = [] {
         require_data();
         require_regular_plan();
+        require_room(kPlanLimit);
     };
     return required("data", ask, "plans can be stored in /data/vorlane");
 }
 
 DeviceAnswer about_vendor()
 {
-    constexpr char kFile[] = "/etc/vorlane/sysparms/vr_common_cfg.xml";
     constexpr char kName[] = "vendor";
-    const bool is_there = access(kFile, R_OK) == 0;
-    if (!is_there && errno != ENOENT) {
-        return error(kName, fmt::format("{} is not readable: {}, and the vendor selector would be "
-                                        "0; let this user read it, or run this as another one",
-                                        kFile, std::strerror(errno)));
-    }
     try {
+        const std::string why = why_no_vendor();
+        require_regular_plan(); // the library opens it
         LibraryProcess library;
-        const int vendor = ask_vendor(library);
-        return ok(kName, fmt::format("the vendor selector is {}{}", vendor,
-                                     is_there ? "" : fmt::format(", as there is no {}", kFile)));
+        const std::string text = fmt::format("the vendor selector is {}", ask_vendor(library));
+        if (why.empty()) {
+            return ok(kName, text);
+        }
+        return is_vendor_file_there()
+                   ? warning(kName, fmt::format("{}, as {}; mend that if this device's programs "
+                                                "have a vendor's suffix",
+                                                text, why))
+                   : ok(kName, fmt::format("{}, as {}", text, why));
     } catch (const std::exception &lack) {
         return error(kName, lack.what());
     }
@@ -346,7 +352,7 @@ DeviceAnswer about_library()
 void examine_device(const std::function<void(const DeviceAnswer &)> &tell)
 {
     for (const auto ask :
-         {about_descriptors, about_proc, about_shell, about_ps, about_grep, about_kill, about_data,
+         {about_descriptors, about_proc, about_shell, about_grep, about_ps, about_kill, about_data,
           about_vendor, about_port, about_process_9, about_mini_xml, about_library}) {
         tell(ask());
     }

@@ -13,7 +13,7 @@ from support.outside import (BUILD, DEVICE_RUN, PS_HEADER, TREE, make_program, o
 
 pytestmark = pytest.mark.usefixtures("namespaces")
 
-QUESTIONS = ["descriptors", "proc", "shell", "ps", "grep", "kill", "data", "vendor", "port",
+QUESTIONS = ["descriptors", "proc", "shell", "grep", "ps", "kill", "data", "vendor", "port",
              "process-9", "mini-xml", "library"]
 FPTEST = BUILD / "agent/fptest"
 OWN_PS = BUILD / "libexec/quillmark/bin"
@@ -173,8 +173,8 @@ def test_no_ps_and_no_grep():
     lines = lines_of(outcome)
 
     assert outcome.status == 3
-    assert [name for name, (mark, _) in lines.items() if mark != "ok"] == ["ps", "grep"]
-    assert re.fullmatch("ps does not list processes: .*not found" + PS_ADVICE, lines["ps"][1])
+    assert [name for name, (mark, _) in lines.items() if mark != "ok"] == ["grep", "ps"]
+    assert lines["ps"] == ("! ", "it cannot be asked for the gatherer without grep")
     assert re.fullmatch("grep does not find the gatherer's path: .*not found, so that each "
                         "trigger starts another gatherer; install it in PATH", lines["grep"][1])
 
@@ -224,10 +224,20 @@ def test_no_shell_of_the_c_library(program, advice):
 @pytest.mark.parametrize("script, text", [
     ("chmod 500 /data/vorlane",
      "/data/vorlane is not writable: Permission denied; make it, or run this as another user"),
-    ("mkdir /data/vorlane/src1.xml", "/data/vorlane/src1.xml is not a regular file: remove it"),
+    ("head -c 17000000 /dev/zero >/data/vorlane/fill 2>/dev/null",
+     "the disk of /data/vorlane is full: make room for 2048 bytes; the stored plan is as it was"),
 ])
 def test_plans_that_cannot_be_stored(script, text):
     assert said_of("data", examined(script)) == ("!!", text)
+
+
+@pytest.mark.parametrize("make", ["mkdir", "mkfifo"])
+def test_something_else_in_the_stored_plans_place(make):
+    lines = lines_of(examined(f"{make} /data/vorlane/src1.xml"))
+    found = {name: line for name, line in lines.items() if line[0] != "ok"}
+
+    what = ("!!", "/data/vorlane/src1.xml is not a regular file: remove it")
+    assert found == {"data": what, "vendor": what}
 
 
 def test_no_directory_for_plans():
@@ -254,10 +264,26 @@ def test_a_vendor_selector_that_runs_nothing():
         f"device/SysParam/Quillmark/vendor to 0, 1 or 2 in {FILE}")
 
 
-def test_a_vendor_selector_that_cannot_be_read():
-    assert said_of("vendor", examined(f"chmod 0 {FILE}", options=("--vendor", "1"))) == (
-        "!!", f"{FILE} is not readable: Permission denied, and the vendor selector would be 0; "
-        "let this user read it, or run this as another one")
+@pytest.mark.parametrize("script, why", [
+    (f"chmod 0 {FILE}", "is not readable: Permission denied"),
+    (f"echo '<a' >{FILE}", "has no device/SysParam/Quillmark/vendor"),
+])
+def test_a_vendor_selector_that_cannot_be_read(script, why):
+    plan = "/tmp/plan.xml"
+    asked = examined(script, options=("--vendor", "1"))
+    _, _, err = shell(
+        f"{script}\necho '<?xml version=\"1.0\"?><P><CmdGroup name=\"G\"><Cmd name=\"true\" "
+        f"args=\"\"/></CmdGroup></P>' >{plan}; fptest run --plan {plan} P/G", options=("--vendor", "1"))
+
+    assert said_of("vendor", asked) == (
+        "! ", f"the vendor selector is 0, as {FILE} {why}; mend that if this device's programs "
+        "have a vendor's suffix")
+    assert err == f"fptest: {FILE} {why}: the library takes 0 for the vendor selector\n"
+
+
+def test_a_vendor_file_that_would_never_be_read():
+    assert said_of("vendor", examined(f"rm {FILE}; mkfifo {FILE}", options=("--vendor", "1"))) == (
+        "!!", f"{FILE} is not a regular file: remove it")
 
 
 def test_a_port_that_is_taken():
