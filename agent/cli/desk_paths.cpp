@@ -51,12 +51,14 @@ void warn_of_lost_outputs(const std::vector<std::pair<std::string, std::string>>
     for (const auto &[option, file] : files) {
         std::error_code none;
         const fs::file_status status = fs::status(file, none);
-        if (file.empty() || file == "-" || (fs::exists(status) && !fs::is_regular_file(status))) {
+        const bool is_directory = fs::is_directory(status);
+        if (file.empty() || file == "-" ||
+            (fs::exists(status) && !is_directory && !fs::is_regular_file(status))) {
             continue;
         }
         const std::string name = option + " " + one_line(file);
         const fs::path parent = fs::path(file).parent_path();
-        const fs::path directory = parent.empty() ? "." : parent;
+        const fs::path directory = is_directory ? fs::path(file) : parent.empty() ? "." : parent;
         if (access(directory.c_str(), W_OK) != 0 && errno == EROFS) {
             throw Failure(Cause::device,
                           "{}: the host's directories are read-only on the virtual device: "

@@ -52,6 +52,7 @@ class CommandLine
         fptest::add_check(app_, chosen_);
         fptest::add_show(app_, chosen_);
         fptest::add_report(app_, chosen_);
+        fptest::add_measure(app_, chosen_);
         fptest::add_send(app_, chosen_);
         fptest::add_doctor(app_, chosen_);
     }
@@ -62,6 +63,7 @@ class CommandLine
         std::vector<std::string> words(argv + std::min(argc, 1), argv + argc);
         if (const CLI::App *command = words.empty() ? nullptr : find(words.front())) {
             words = fptest::split_empty_values(*command, std::move(words));
+            words = fptest::mark_numbers(*command, std::move(words));
         }
         std::ranges::reverse(words); // as the parser wants them
         try {

@@ -5,15 +5,11 @@
 
 #include "cli/desk_paths.h"
 #include "cli/usage.h"
+#include "util/numbers.h"
 #include "util/text.h"
 
 #include <algorithm>
-#include <cerrno>
-#include <charconv>
-#include <cmath>
-#include <cstdlib>
 #include <fmt/core.h>
-#include <string_view>
 #include <system_error>
 #include <type_traits>
 #include <utility>
@@ -27,27 +23,6 @@ namespace
 std::string refused(const std::string &value, const std::string &why)
 {
     return value.empty() ? "its value is empty" : fmt::format("{} {}", in_quotes(value), why);
-}
-
-std::from_chars_result read_number(const char *first, const char *last, int &number)
-{
-    return std::from_chars(first, last, number);
-}
-
-// As std::from_chars, which Android's C++ library has not for a double: strtod, in the C
-// locale, without what it takes besides. The text ends with a zero.
-std::from_chars_result read_number(const char *first, const char *last, double &number)
-{
-    const std::string_view text(first, last);
-    char *stop = nullptr;
-    errno = 0;
-    number = std::strtod(first, &stop);
-    if (stop == first || text.find_first_of("+ \t\n\v\f\r") == 0 ||
-        text.find_first_of("xX") != text.npos) {
-        return {first, std::errc::invalid_argument};
-    }
-    const bool is_too_far = errno == ERANGE && (number == 0 || std::isinf(number));
-    return {stop, is_too_far ? std::errc::result_out_of_range : std::errc{}};
 }
 
 template <typename Number> CLI::Validator number_in(Number least, Number most)

@@ -6,6 +6,7 @@
 #include "cli/log_option.h"
 #include "module/log_file.h"
 #include "reporters/reporters.h"
+#include "run/item_files.h"
 #include "util/failure.h"
 #include "util/files.h"
 #include "util/text.h"
@@ -40,6 +41,7 @@ void resolve_output_conflicts(RunOptions &options)
     require_different({{"--plan", options.plan == "-" ? kStandardInput : options.plan},
                        {"--json", options.json},
                        {"--junit", options.junit},
+                       {"--files", options.files},
                        log_file(options.log)});
     const auto results = results_on_standard_output(options);
     if (results.size() > 1) {
@@ -71,7 +73,8 @@ void require_writable_results(const RunOptions &options)
 {
     for (const std::string &obstacle :
          {options.json.empty() ? "" : json_obstacle(options.json),
-          options.junit.empty() ? "" : junit_obstacle(options.junit)}) {
+          options.junit.empty() ? "" : junit_obstacle(options.junit),
+          options.files.empty() ? "" : files_obstacle(options.files)}) {
         if (!obstacle.empty()) {
             throw Failure(Cause::device, "{}; nothing was run", one_line(obstacle));
         }

@@ -17,7 +17,8 @@ namespace fptest
 // other name of standard output into "-".
 void resolve_output_conflicts(RunOptions &options);
 
-// Refuses the run unless every result file can be begun, before any is overwritten.
+// Refuses the run unless every result file can be begun, before any is overwritten, and
+// items can have directories.
 void require_writable_results(const RunOptions &options);
 
 // Those of the result files, and the view if no results go to standard output.

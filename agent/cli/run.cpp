@@ -154,6 +154,7 @@ void refuse_list_with_results(const RunOptions &options)
     const std::string results = options.tap              ? "--tap"
                                 : !options.json.empty()  ? "--json"
                                 : !options.junit.empty() ? "--junit"
+                                : !options.files.empty() ? "--files"
                                                          : "";
     if (options.list && !results.empty()) {
         throw Failure(Cause::input,
@@ -176,6 +177,8 @@ Runner::Options runner_options(const RunOptions &options)
     }
     runner.grace = std::chrono::duration<double>(options.grace);
     runner.fail_on_exit_status = options.fail_on_exit_status;
+    runner.judge_limits = options.judge_limits;
+    runner.files = options.files;
     runner.on_second_interrupt = exit_at_once;
     return runner;
 }
@@ -238,8 +241,10 @@ Exit run(RunOptions options)
     if (options.list) {
         require_standard_output("--list");
     } else {
-        warn_of_lost_outputs(
-            {{"--json", options.json}, {"--junit", options.junit}, {"--log", options.log}});
+        warn_of_lost_outputs({{"--json", options.json},
+                              {"--junit", options.junit},
+                              {"--files", options.files},
+                              {"--log", options.log}});
     }
     const Descriptor lock = options.list ? Descriptor(-1) : ready_device();
     const CheckedPlan checked = open_plan(options);
@@ -330,6 +335,9 @@ void add_run(CLI::App &app, Action &chosen)
     command.add_flag("--exit-status", options->fail_on_exit_status,
                      "an item that ends with a status other than\n"
                      "0 has failed");
+    command.add_flag("--judge-limits", options->judge_limits,
+                     "an item that measures out of limits has\n"
+                     "failed");
     command.add_option("--repeat", options->repeat, "run everything N times")
         ->type_name("N")
         ->transform(range(1, 1000000));
@@ -356,6 +364,12 @@ void add_run(CLI::App &app, Action &chosen)
                     "write them as JSON lines, as they come\n"
                     "('-': standard output)")
         ->type_name("FILE")
+        ->check(not_empty());
+    command
+        .add_option("--files", options->files,
+                    "a directory, made if need be, with one for the\n"
+                    "files of each item: FPTEST_ITEM_DIR")
+        ->type_name("DIR")
         ->check(not_empty());
     command.add_flag("--tap", options->tap,
                      "write them as TAP to standard output, in\n"

@@ -23,6 +23,7 @@ struct RunOptions {
     std::optional<double> timeout; // seconds for each item
     double grace = 2;              // seconds before a stopped item is killed
     bool fail_on_exit_status = false;
+    bool judge_limits = false; // of measurements
     std::optional<int> repeat;
     std::optional<double> time_limit; // seconds after which no new round begins
     bool until_fail = false;
@@ -30,6 +31,7 @@ struct RunOptions {
     std::string junit; // files, "-" for standard output; empty for none
     std::string json;
     std::string log;
+    std::string files; // a directory for those of items; empty for none
 };
 
 } // namespace fptest

@@ -19,6 +19,7 @@
 #include <cstdio>
 #include <memory>
 #include <string>
+#include <string_view>
 #include <unistd.h>
 #include <vector>
 
@@ -107,18 +108,23 @@ class Sender
         // nobody may be writing the plan while the library loads it
         Descriptor plan =
             head_of(command).starts_with("XMLNodePath") ? lock_stored_plan() : Descriptor(-1);
+        const auto pass = [](std::string_view text) {
+            std::fwrite(text.data(), 1, text.size(), stderr);
+        };
         const auto items = items_of(command);
         library_.command(command, items);
         for (;;) {
             const auto event = library_.wait(100ms, {signals_.descriptor()});
             if (event) {
                 plan = Descriptor(-1); // the library loads it before it names the first item
-                library_.output().pass(stderr, event->output);
+                library_.output().take(event->output, pass);
             }
             if (event && event->kind == LibraryProcess::Event::Kind::item) {
                 print_to(stderr, "vendor = {}\n", event->value);
             }
-            library_.pass_output(stderr);
+            if (const auto size = library_.output_size()) {
+                library_.output().take(*size, pass);
+            }
             if (event && event->kind == LibraryProcess::Event::Kind::gone) {
                 throw Failure(Cause::device, "{}", gone_text(*event));
             }

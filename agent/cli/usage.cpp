@@ -69,7 +69,8 @@ std::string without_option(const CLI::App &command, const std::string &word)
 
 std::string surplus(const CLI::App &app, const CLI::App &command, const std::string &text)
 {
-    const std::vector<std::string> words = app.remaining(true);
+    std::vector<std::string> words = app.remaining(true);
+    std::erase(words, "--"); // see mark_numbers()
     if (words.empty()) {
         return text;
     }
@@ -106,6 +107,18 @@ std::vector<std::string> split_empty_values(const CLI::App &command, std::vector
         }
         words[at].pop_back();
         words.insert(words.begin() + static_cast<std::ptrdiff_t>(++at), "");
+    }
+    return words;
+}
+
+std::vector<std::string> mark_numbers(const CLI::App &command, std::vector<std::string> words)
+{
+    const auto is_given = [&words](const char *word) {
+        return std::ranges::find(words, word) != words.end();
+    };
+    if (command.get_name() == "measure" && !is_given("--") && !is_given("--help") &&
+        !is_given("-h")) {
+        words.insert(words.begin() + 1, "--");
     }
     return words;
 }

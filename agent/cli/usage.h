@@ -21,6 +21,9 @@ std::string usage_line(const CLI::App *app, const CLI::Error &error);
 std::vector<std::string> split_empty_values(const CLI::App &command,
                                             std::vector<std::string> words);
 
+// Puts a "--" before the words of fptest measure: the parser would take "-.5" for an option.
+std::vector<std::string> mark_numbers(const CLI::App &command, std::vector<std::string> words);
+
 // Says that the program has no such option, without "fptest: " and a line feed.
 std::string unknown_option(const std::string &word, const CLI::App &app);
 

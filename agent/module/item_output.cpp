@@ -9,6 +9,7 @@
 #include <array>
 #include <cerrno>
 #include <fcntl.h>
+#include <string>
 #include <sys/mman.h>
 #include <sys/stat.h>
 #include <system_error>
@@ -19,6 +20,7 @@ namespace fptest
 namespace
 {
 
+constexpr off_t kPiece = off_t{64} * 1024;
 constexpr off_t kRoomLeft = off_t{1024} * 1024;
 
 } // namespace
@@ -69,28 +71,23 @@ void ItemOutput::note_truncation(off_t end)
     }
 }
 
-void ItemOutput::pass(std::FILE *stream, off_t end)
+bool ItemOutput::take(off_t end, const Use &use, off_t most)
 {
     note_truncation(end);
-    while (taken_ < end) {
-        const std::string piece = take(std::min(end, taken_ + kKept));
-        std::fwrite(piece.data(), 1, piece.size(), stream);
+    const bool is_all = end - taken_ <= most;
+    taken_ = is_all ? taken_ : end - most;
+    for (std::string text;;) {
+        fallocate(file_.get(), FALLOC_FL_PUNCH_HOLE | FALLOC_FL_KEEP_SIZE, 0, taken_);
+        if (taken_ >= end) {
+            return is_all;
+        }
+        text.resize(static_cast<std::size_t>(std::min(end - taken_, kPiece)));
+        const ssize_t got = pread(file_.get(), text.data(), text.size(), taken_);
+        taken_ = got > 0 ? taken_ + got : end;
+        if (got > 0) {
+            use(std::string_view(text).substr(0, static_cast<std::size_t>(got)));
+        }
     }
-}
-
-std::string ItemOutput::take(off_t end)
-{
-    note_truncation(end);
-    if (end <= taken_) {
-        return {};
-    }
-    const off_t begin = std::max(taken_, end - kKept);
-    std::string text(static_cast<std::size_t>(end - begin), '\0');
-    const ssize_t got = pread(file_.get(), text.data(), text.size(), begin);
-    text.resize(static_cast<std::size_t>(std::max<ssize_t>(got, 0)));
-    taken_ = end;
-    fallocate(file_.get(), FALLOC_FL_PUNCH_HOLE | FALLOC_FL_KEEP_SIZE, 0, taken_);
-    return text;
 }
 
 } // namespace fptest

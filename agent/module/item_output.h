@@ -6,8 +6,9 @@
 
 #include "common/descriptor.h"
 
-#include <cstdio>
-#include <string>
+#include <functional>
+#include <limits>
+#include <string_view>
 #include <sys/types.h>
 
 namespace fptest
@@ -16,8 +17,6 @@ namespace fptest
 class ItemOutput
 {
   public:
-    static constexpr off_t kKept = off_t{64} * 1024;
-
     // Throws std::system_error if there is no memory for it.
     ItemOutput();
 
@@ -27,12 +26,11 @@ class ItemOutput
     }
     off_t size() const;
 
-    // What was printed since the last call, up to that size; only the end of it if it is
-    // longer than kKept.
-    std::string take(off_t end);
-
-    // Writes all that was printed since the last call, up to that size.
-    void pass(std::FILE *stream, off_t end);
+    // Hands on what was printed since the last call, up to that size, in pieces; only the end
+    // of it, and returns false, if there is more than that.
+    using Use = std::function<void(std::string_view)>;
+    static constexpr off_t kNoLimit = std::numeric_limits<off_t>::max();
+    bool take(off_t end, const Use &use, off_t most = kNoLimit);
 
     // Begins anew if all of it was taken: a limit on a file's size counts whatever was
     // printed before. A process that was left running may lose what it prints right now.

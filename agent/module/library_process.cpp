@@ -95,6 +95,17 @@ void LibraryProcess::command(const std::string &text, const std::vector<std::str
     send_message(control_.get(), {MessageKind::command, message});
 }
 
+void LibraryProcess::give_directories(const std::vector<std::string> &directories)
+{
+    std::string message;
+    for (const std::string &directory : directories) {
+        message += directory + '\0';
+    }
+    if (!message.empty()) {
+        send_message(control_.get(), {MessageKind::directories, message});
+    }
+}
+
 void LibraryProcess::stop(const std::string &item)
 {
     send_message(control_.get(), {MessageKind::stop, item});
@@ -254,24 +265,16 @@ void LibraryProcess::rewind_output()
     }
 }
 
-std::string LibraryProcess::take_output()
+std::optional<off_t> LibraryProcess::output_size() const
 {
     const off_t size = output_.size();
-    return has_events() ? "" : output_.take(size);
+    return has_events() ? std::nullopt : std::optional(size);
 }
 
 // What was printed after an event must not be taken before the event.
 bool LibraryProcess::has_events() const
 {
     return !events_.empty() || has_news(std::chrono::milliseconds(0));
-}
-
-void LibraryProcess::pass_output(std::FILE *stream)
-{
-    const off_t size = output_.size();
-    if (!has_events()) {
-        output_.pass(stream, size);
-    }
 }
 
 std::string gone_text(const LibraryProcess::Event &event)

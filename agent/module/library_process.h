@@ -12,7 +12,6 @@
 
 #include <chrono>
 #include <cstddef>
-#include <cstdio>
 #include <deque>
 #include <initializer_list>
 #include <optional>
@@ -55,6 +54,10 @@ class LibraryProcess
     // Starts a command that runs items of these names. The last one must have returned.
     void command(const std::string &text, const std::vector<std::string> &items = {});
 
+    // What the items of the next command find in FPTEST_ITEM_DIR, one for each that the
+    // library reaches; empty for none.
+    void give_directories(const std::vector<std::string> &directories);
+
     // Has FPTEST_SuspendItemExecute called, if the item has a process: otherwise the
     // library would stop the first process of the system.
     void stop(const std::string &item);
@@ -93,10 +96,8 @@ class LibraryProcess
     {
         return output_;
     }
-    // Takes, or passes on, what was printed up to now; nothing while there are events, which
-    // come first.
-    std::string take_output();
-    void pass_output(std::FILE *stream);
+    // How much was printed up to now; nullopt while there are events, which come first.
+    std::optional<off_t> output_size() const;
 
   private:
     void start();

@@ -14,11 +14,12 @@ inline constexpr int kNothingToStop = -2;
 
 enum class MessageKind : char {
     // to the library's process
-    command = 'c',   // the command and the names of its items, a zero byte between each
-    stop = 's',      // the item's name
-    read_back = 'b', // nothing
-    hold = 'h',      // nothing: from here on the library is held at ended and connected
-    go_on = 'g',     // nothing: it may go on
+    command = 'c',     // the command and the names of its items, a zero byte between each
+    directories = 'f', // of the next command's items, a zero byte after each
+    stop = 's',        // the item's name
+    read_back = 'b',   // nothing
+    hold = 'h',        // nothing: from here on the library is held at ended and connected
+    go_on = 'g',       // nothing: it may go on
     // from it
     item = 'i',      // "MOMENT VENDOR": the command has reached an item
     ended = 'e',     // "MOMENT STATUS LEFT": the item's process; LEFT is 1 if others may be left

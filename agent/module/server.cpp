@@ -18,6 +18,7 @@
 #include <csignal>
 #include <cstdio>
 #include <cstdlib>
+#include <deque>
 #include <dlfcn.h>
 #include <fcntl.h>
 #include <fmt/core.h>
@@ -40,6 +41,7 @@ namespace
 {
 
 constexpr std::size_t kReplyRoom = 1025;
+constexpr char kItemDirectory[] = "FPTEST_ITEM_DIR";
 constexpr std::chrono::seconds kGrace{2}; // for items to end when the agent has gone
 
 std::function<void()> on_connection;
@@ -63,6 +65,9 @@ class Server
             switch (message.kind) {
             case MessageKind::command:
                 start(message.text);
+                break;
+            case MessageKind::directories:
+                take_directories(message.text);
                 break;
             case MessageKind::stop:
                 answer_stop(message.text);
@@ -141,7 +146,14 @@ class Server
         const auto number = line.find_first_of("-0123456789");
         const std::string vendor = number == std::string::npos ? "0" : line.substr(number);
         vendor_ = std::atoi(vendor.c_str());
-        answer({MessageKind::item, moment() + vendor});
+        const std::lock_guard lock(mutex_); // a stop starts programs as well
+        if (!directories_.empty()) {
+            const std::string &directory = directories_.front();
+            directory.empty() ? unsetenv(kItemDirectory)
+                              : setenv(kItemDirectory, directory.c_str(), 1);
+            directories_.pop_front();
+        }
+        send_message(socket_, {MessageKind::item, moment() + vendor});
     }
 
     void send_ended(int status)
@@ -227,6 +239,15 @@ class Server
         }
     }
 
+    void take_directories(const std::string &message)
+    {
+        std::istringstream fields(message);
+        directories_.clear();
+        for (std::string directory; std::getline(fields, directory, '\0');) {
+            directories_.push_back(directory);
+        }
+    }
+
     void start(const std::string &message)
     {
         std::istringstream fields(message);
@@ -271,6 +292,7 @@ class Server
     std::atomic<bool> hold_requested_ = false;
     std::thread command_;
     std::vector<std::string> items_;
+    std::deque<std::string> directories_; // of items that the command has not reached
     std::atomic<bool> busy_ = false;
     std::atomic<int> vendor_ = 0; // of the library's last item
 };

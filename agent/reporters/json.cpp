@@ -67,6 +67,34 @@ void add_end(Json &json, const ItemRun &item)
     json["left_running"] = std::move(left);
 }
 
+Json number_or_null(const std::optional<double> &number)
+{
+    return number ? Json(*number) : Json();
+}
+
+void add_measurements(Json &json, const ItemRun &item)
+{
+    Json all = Json::array();
+    for (const Measurement &one : item.measured.kept) {
+        all.push_back({{"name", one.name},
+                       {"value", one.value},
+                       {"unit", words_or_null(one.unit)},
+                       {"low", number_or_null(one.low)},
+                       {"high", number_or_null(one.high)}});
+    }
+    json["measurements"] = std::move(all);
+}
+
+void add_files(Json &json, const ItemRun &item)
+{
+    Json files = Json::array();
+    for (const std::string &file : item.files) {
+        files.push_back(sanitize_utf8(file));
+    }
+    json["directory"] = words_or_null(item.directory);
+    json["files"] = std::move(files);
+}
+
 Json summary_of(const Run &run)
 {
     Json items = Json::array();
@@ -149,6 +177,9 @@ class JsonReporter : public Reporter
         json["start"] = start_of(item);
         json["seconds"] = seconds_or_null(item.seconds);
         add_end(json, item);
+        add_measurements(json, item);
+        add_files(json, item);
+        json["warning"] = words_or_null(item.warning);
         json["output"] = sanitize_utf8(item.output);
         write(json);
     }

@@ -152,6 +152,24 @@ std::string verdict(const Run &run, const ItemRun &item)
                        xml_escaped(details(item)));
 }
 
+std::optional<std::string> value_of(const std::string &text)
+{
+    return text.empty() ? std::nullopt : std::optional(text);
+}
+
+// As Jenkins and GitLab find files.
+std::string attachments(const ItemRun &item)
+{
+    std::string lines;
+    for (const std::string &file : item.files) {
+        lines += fmt::format(
+            "{}[[ATTACHMENT|{}]]\n",
+            lines.empty() && !item.output.empty() && !item.output.ends_with('\n') ? "\n" : "",
+            one_line(item.directory + "/" + file));
+    }
+    return lines;
+}
+
 std::string test_case(const Run &run, const ItemRun &item)
 {
     const std::string indent(8, ' ');
@@ -161,15 +179,20 @@ std::string test_case(const Run &run, const ItemRun &item)
     const Value status = item.exit_status ? Value(std::to_string(*item.exit_status)) : Value();
     const Value signal = item.signal != 0 ? Value(name_of_signal(item.signal)) : Value();
     const Value left = item.left_running.empty() ? Value() : Value(left_running(item));
-    const std::string inside =
+    std::string inside =
         property(indent, "progress", report.progress) + property(indent, "result", result) +
         property(indent, "description", report.description) +
         property(indent, "exit_status", status) + property(indent, "signal", signal) +
         property(indent, "left_running", left);
+    for (const Measurement &one : item.measured.kept) {
+        inside += property(indent, ("measure " + one.name).c_str(), words_of(one));
+    }
+    inside += property(indent, "directory", value_of(item.directory)) +
+              property(indent, "warning", value_of(item.warning));
+    const std::string printed = item.output + attachments(item);
     const std::string output =
-        item.output.empty()
-            ? ""
-            : fmt::format("      <system-out>{}</system-out>\n", xml_escaped(item.output));
+        printed.empty() ? ""
+                        : fmt::format("      <system-out>{}</system-out>\n", xml_escaped(printed));
     return fmt::format(
         "    <testcase{}{}{}>\n{}{}{}    </testcase>\n", attribute("classname", item.group),
         attribute("name", item.name + of_round(run)), time_attribute(item.seconds.value_or(0)),

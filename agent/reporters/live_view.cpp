@@ -98,11 +98,11 @@ class LiveView : public Reporter
         if (!has_room) {
             keep_text("      " + said);
         }
-        if (const std::string left = left_running_line(item); !left.empty()) {
-            keep_text("      " + left, Colour::yellow);
+        for (const Note &note : notes(item)) {
+            keep_text("      " + note.text, note.is_bad ? Colour::yellow : Colour::none);
         }
         if (item.outcome != Outcome::passed) {
-            for (const std::string &text : last_lines(item.output)) {
+            for (const std::string &text : last_lines(item)) {
                 keep_text("    | " + text);
             }
         }

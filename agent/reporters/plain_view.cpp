@@ -12,6 +12,7 @@
 #include <fmt/core.h>
 #include <string>
 #include <string_view>
+#include <vector>
 
 namespace fptest
 {
@@ -54,7 +55,7 @@ class PlainView : public Reporter
             "{}: {}{}, {}", one_line(title(run, item)), item.stopping ? "stopping" : "running",
             item.report.progress ? ", progress " + one_line(*item.report.progress) : "",
             duration(item.running)));
-        print_output(new_output(item.output));
+        print_lines(last_lines(new_output(item.output)));
         output_said_ = item.output;
     }
 
@@ -76,11 +77,11 @@ class PlainView : public Reporter
         }
         const std::string said = remark(item);
         print(text + (said.empty() ? "" : ": " + said));
-        if (const std::string left = left_running_line(item); !left.empty()) {
-            print("    " + left);
+        for (const Note &note : notes(item)) {
+            print("    " + note.text);
         }
         if (!passed) {
-            print_output(item.output);
+            print_lines(last_lines(item));
         }
     }
 
@@ -121,9 +122,9 @@ class PlainView : public Reporter
         return std::string_view(output).substr(is_more ? output_said_.size() : 0);
     }
 
-    void print_output(std::string_view output)
+    void print_lines(const std::vector<std::string> &lines)
     {
-        for (const std::string &line : last_lines(output)) {
+        for (const std::string &line : lines) {
             print("    | " + line);
         }
     }

@@ -80,6 +80,41 @@ std::string entry(const char *name, const std::optional<std::string> &text)
     return text ? entry(name, yaml_quoted(*text)) : "";
 }
 
+// The head of a list; each entry's first line begins with "  - ".
+std::string list(const char *name, bool is_empty)
+{
+    return is_empty ? "" : fmt::format("{}  {}:\n", kIndent, name);
+}
+
+// What it has measured and left in files, in the YAML that Perl's reader of TAP knows.
+std::string notes_of(const ItemRun &item)
+{
+    std::string text = list("measurements", item.measured.kept.empty());
+    for (const Measurement &one : item.measured.kept) {
+        const auto value = [&text](const char *name, const std::optional<double> &number) {
+            text += number ? entry(name, fmt::format("{}", *number)) : "";
+        };
+        text += entry("  - name", yaml_quoted(one.name));
+        value("    value", one.value);
+        if (!one.unit.empty()) {
+            text += entry("    unit", yaml_quoted(one.unit));
+        }
+        value("    low", one.low);
+        value("    high", one.high);
+    }
+    if (!item.directory.empty()) {
+        text += entry("directory", yaml_quoted(item.directory));
+    }
+    text += list("files", item.files.empty());
+    for (const std::string &file : item.files) {
+        text += entry("  - path", yaml_quoted(file));
+    }
+    if (!item.warning.empty()) {
+        text += entry("warning", yaml_quoted(item.warning));
+    }
+    return text;
+}
+
 // What is known of an item that has been run.
 std::string diagnosis(const ItemRun &item)
 {
@@ -106,7 +141,7 @@ std::string diagnosis(const ItemRun &item)
     if (!left.empty()) {
         text += entry("left_running", yaml_quoted(left));
     }
-    return text + kIndent + "  ...\n";
+    return text + notes_of(item) + kIndent + "  ...\n";
 }
 
 std::string item_point(const Run &run, const ItemRun &item, std::size_t number)

@@ -115,9 +115,37 @@ std::string left_running(const ItemRun &item)
     return text;
 }
 
-std::string left_running_line(const ItemRun &item)
+std::vector<Note> notes(const ItemRun &item)
 {
-    return item.left_running.empty() ? "" : "left running: " + one_line(left_running(item));
+    std::vector<Note> all;
+    if (!item.left_running.empty()) {
+        all.push_back({"left running: " + one_line(left_running(item)), true});
+    }
+    const auto &measured = item.measured.kept;
+    std::vector<Note> lines;
+    for (const Measurement &one : measured) {
+        lines.push_back(
+            {fmt::format("measured {}{}", text_of(one), is_out(one) ? ": out of limits" : ""),
+             is_out(one)});
+    }
+    // if not all can be shown
+    std::stable_partition(lines.begin(), lines.end(), [](const Note &one) { return one.is_bad; });
+    const std::size_t shown = std::min(lines.size(), kOutputLines);
+    all.insert(all.end(), lines.begin(), lines.begin() + static_cast<std::ptrdiff_t>(shown));
+    if (const std::size_t rest = lines.size() + item.measured.left_out - shown; rest > 0) {
+        all.push_back({fmt::format("({} more)", plural(rest, "measurement"))});
+    }
+    if (!item.directory.empty()) {
+        std::string files;
+        for (const std::string &file : item.files) {
+            files += (files.empty() ? ": " : ", ") + one_line(file);
+        }
+        all.push_back({ellipsize("files in " + one_line(item.directory) + files, kOutputColumns)});
+    }
+    if (!item.warning.empty()) {
+        all.push_back({"warning: " + one_line(item.warning), true});
+    }
+    return all;
 }
 
 std::string result_of(const ItemReport &report)
@@ -173,6 +201,20 @@ std::vector<std::string> last_lines(std::string_view output)
         lines.insert(lines.begin(), fmt::format("({} before)", plural(left_out, "line")));
     }
     return lines;
+}
+
+std::vector<std::string> last_lines(const ItemRun &item)
+{
+    std::string others;
+    const std::string_view output = item.output;
+    for (std::size_t at = 0; at < output.size();) {
+        const std::size_t end = std::min(output.find('\n', at), output.size());
+        if (!is_measurement(output.substr(at, end - at))) {
+            others.append(output.substr(at, end + 1 - at));
+        }
+        at = end + 1;
+    }
+    return last_lines(others);
 }
 
 std::vector<std::string> summary_table(const Run &run)

@@ -34,8 +34,13 @@ std::string how_it_ended(const ItemRun &item);
 
 // "sh (pid 812), logcat (pid 815)", with the names as they are; empty if nothing is left.
 std::string left_running(const ItemRun &item);
-// "left running: sh (pid 812)"; empty if nothing is left.
-std::string left_running_line(const ItemRun &item);
+// What a view says below an ended item's line: what it left running, measured and left in
+// files, and warnings.
+struct Note {
+    std::string text;
+    bool is_bad = false;
+};
+std::vector<Note> notes(const ItemRun &item);
 
 // "?" for a result without a value, "-" for none.
 std::string result_of(const ItemReport &report);
@@ -51,6 +56,8 @@ std::string late_report(const Run &run, Place place, const ItemReport &report);
 
 // The last lines that an item printed, long ones cut.
 std::vector<std::string> last_lines(std::string_view output);
+// Without its measurements, which are notes.
+std::vector<std::string> last_lines(const ItemRun &item);
 
 // Each item over its rounds, in lines of at most 80 columns, under a line of
 // headings. Empty after a single round.

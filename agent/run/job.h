@@ -96,6 +96,7 @@ struct RunningItem {
     TimePoint moved_on_at;
     bool done = false;
     Reporting reporting;
+    MeasureReader measuring;
 
     std::optional<Outcome> stop; // timed_out or stopped, once it has to stop
     bool meets_other = false;    // the library's stop hits another process

@@ -6,6 +6,7 @@
 
 #include "module/leftover.h"
 #include "plan/item_report.h"
+#include "run/measurements.h"
 #include "util/duration_stats.h"
 
 #include <chrono>
@@ -43,6 +44,10 @@ struct ItemRun {
     int signal = 0;
     bool overruled = false; // it failed whatever it reported; see the reason
     std::vector<Leftover> left_running = {};
+    Measured measured = {};
+    std::string directory = {};          // for its files; empty if there is none
+    std::vector<std::string> files = {}; // that it has left there, by their paths below it
+    std::string warning = {};            // about its measurements or files
 };
 
 // Items of one group that run in a row.

@@ -25,14 +25,16 @@ namespace
 using namespace std::chrono_literals;
 using Seconds = std::chrono::duration<double>;
 
-void append_output(std::string &output, const std::string &text)
+void append_output(std::string &output, std::string_view text)
 {
     output += text;
-    constexpr auto kKept = static_cast<std::size_t>(ItemOutput::kKept);
+    constexpr std::size_t kKept = std::size_t{64} << 10U;
     if (output.size() > kKept) {
         output.erase(0, output.size() - kKept);
     }
 }
+
+constexpr off_t kMostWaiting = off_t{64} << 20U; // of output
 
 // A gatherer that is just starting may not be visible yet.
 constexpr auto kBeforeMissed = 500ms;
@@ -62,7 +64,7 @@ int signal_of(int status)
 Runner::Runner(LibraryProcess &library, Signals &signals, Run &run,
                const std::vector<Reporter *> &reporters, Options options)
     : library_(library), signals_(signals), run_(run), reporters_(reporters),
-      options_(std::move(options)), reader_(run, reporters, running_)
+      options_(std::move(options)), reader_(run, reporters, running_), files_(options_.files)
 {
     signals_.take_suspensions();
     library_.hold_at_ends();
@@ -112,6 +114,7 @@ bool Runner::run(const Job &job)
     }
     drain_events();
     library_.restart(); // if something ended it since the last job
+    library_.give_directories(make_directories(job));
     // the library loads the plan until it reaches the first item, and a process that
     // reports meanwhile, such as a gatherer, truncates the plan before it writes it
     Descriptor plan = lock_stored_plan();
@@ -128,12 +131,45 @@ bool Runner::run(const Job &job)
         }
         watch();
     }
+    settle_directories();
     if (!broken_) {
         require_all_started();
         require_plan();
     }
     notify_ended();
     return run_.why_unfinished.empty();
+}
+
+// One for each target.
+std::vector<std::string> Runner::make_directories(const Job &job)
+{
+    std::vector<std::string> directories;
+    if (options_.files.empty()) {
+        return directories;
+    }
+    for (const auto &target : job.targets) {
+        if (target) {
+            ItemRun &item = item_at(run_, {job.suite, target->item});
+            directories.push_back(files_.make(item, has_rounds(run_) ? run_.round : 0,
+                                              is_gatherer(item.name, vendor_)));
+        } else {
+            directories.emplace_back();
+        }
+    }
+    return directories;
+}
+
+// Of the items that were not reached, or not waited for.
+void Runner::settle_directories()
+{
+    for (const auto &target : running_.job.targets) {
+        if (target) {
+            ItemRun &item = item_at(run_, {running_.job.suite, target->item});
+            if (item.outcome == Outcome::not_run) {
+                files_.settle(item, is_gatherer(item.name, vendor_));
+            }
+        }
+    }
 }
 
 // A command that returns without reaching its items is no success, whatever the cause.
@@ -214,10 +250,7 @@ void Runner::lose_library(const LibraryProcess::Event &event)
 {
     library_gone_ = gone_text(event);
     stop_asked_ = false;
-    if (!running_.items.empty()) {
-        append_output(item_at(run_, running_.items.back().place).output,
-                      library_.output().take(event.output));
-    }
+    take_output(event.output);
     reader_.read(whole_stored_plan().annotated);
     for (RunningItem &active : running_.items) {
         finish(active, on_run_clock(event.time));
@@ -277,13 +310,36 @@ void Runner::poll_gatherer(RunningItem &active)
     }
 }
 
+// What is printed is the current item's. All of it is read for measurements, unless it
+// comes faster than that.
+void Runner::take_output(off_t end)
+{
+    if (running_.items.empty()) {
+        library_.output().take(end, {}, 0);
+        return;
+    }
+    RunningItem &active = running_.items.back();
+    ItemRun &result = item_at(run_, active.place);
+    const auto use = [&](std::string_view text) {
+        append_output(result.output, text);
+        active.measuring.read(text, result.measured);
+    };
+    if (!library_.output().take(end, use, kMostWaiting)) {
+        result.measured.is_read = false;
+    }
+}
+
+void Runner::take_output()
+{
+    if (const auto size = library_.output_size()) {
+        take_output(*size);
+    }
+}
+
 void Runner::tick()
 {
     run_.seconds = Seconds(now() - began_).count();
-    const std::string output = library_.take_output();
-    if (!running_.items.empty()) {
-        append_output(item_at(run_, running_.items.back().place).output, output);
-    }
+    take_output();
     for (const RunningItem &active : running_.items) {
         item_at(run_, active.place).running = std::max(0.0, Seconds(now() - active.start).count());
         item_at(run_, active.place).stopping = active.stop.has_value();
@@ -330,8 +386,12 @@ void Runner::start_next(const LibraryProcess::Event &event)
 // The library is held, so the plan has what the item reported, and nothing newer.
 void Runner::end_item(const LibraryProcess::Event &event)
 {
-    const std::string output = library_.output().take(event.output);
     const bool is_watched = !running_.items.empty() && !running_.items.back().moved_on;
+    if (is_watched) {
+        take_output(event.output);
+    } else {
+        library_.output().take(event.output, {}, 0);
+    }
     if (is_watched) {
         // before anything that it left running can report again
         const bool is_beside_others = event.left_running && !item_processes().empty();
@@ -347,7 +407,6 @@ void Runner::end_item(const LibraryProcess::Event &event)
     if (is_watched) {
         RunningItem &active = running_.items.back();
         ItemRun &result = item_at(run_, active.place);
-        append_output(result.output, output);
         active.moved_on = true;
         active.moved_on_at = on_run_clock(event.time);
         const int signal = signal_of(event.value);
@@ -371,12 +430,11 @@ void Runner::end_item(const LibraryProcess::Event &event)
 // could not be started.
 void Runner::move_on(const LibraryProcess::Event &event)
 {
-    const std::string output = library_.output().take(event.output);
+    take_output(event.output);
     if (running_.items.empty()) {
         return;
     }
     RunningItem &active = running_.items.back();
-    append_output(item_at(run_, active.place).output, output);
     if (active.moved_on) {
         return;
     }
@@ -399,17 +457,22 @@ void Runner::finish(RunningItem &active, TimePoint end)
     }
     if (active.gathers) {
         reader_.poll(ReportReader::When::at_once);
+        take_output(); // which it has printed before its report
     }
     active.done = true;
     ItemRun &result = item_at(run_, active.place);
+    active.measuring.end(result.measured);
+    files_.settle(result, active.gathers);
+    add_warning(result, warning_of(result.measured));
     result.seconds = std::max(0.0, Seconds(end - active.start).count());
     result.stopping = false;
     if (!active.stop && options_.timeout && *result.seconds > options_.timeout->count()) {
         active.stop = Outcome::timed_out; // ended before the limit was checked
     }
-    const Verdict verdict = judge(active, result,
-                                  {run_.pass_code, vendor_, options_.timeout,
-                                   options_.fail_on_exit_status, signal_, library_gone_});
+    const Verdict verdict =
+        judge(active, result,
+              {run_.pass_code, vendor_, options_.timeout, options_.fail_on_exit_status,
+               options_.judge_limits, signal_, library_gone_});
     result.outcome = verdict.outcome;
     result.reason = verdict.reason;
     result.overruled = verdict.overruled;

@@ -5,6 +5,7 @@
 #pragma once
 
 #include "module/library_process.h"
+#include "run/item_files.h"
 #include "run/job.h"
 #include "run/report_reader.h"
 #include "run/results.h"
@@ -15,6 +16,7 @@
 #include <functional>
 #include <optional>
 #include <string>
+#include <sys/types.h>
 #include <vector>
 
 namespace fptest
@@ -27,6 +29,8 @@ class Runner
         std::optional<std::chrono::duration<double>> timeout; // then an item is stopped
         std::chrono::duration<double> grace{2};               // and after that it is killed
         bool fail_on_exit_status = false;
+        bool judge_limits = false;                 // of measurements
+        std::string files;                         // a directory; empty for none
         bool ends_gatherer = false;                // one that runs already
         std::function<void()> on_second_interrupt; // does not return
     };
@@ -83,6 +87,8 @@ class Runner
     void move_on(const LibraryProcess::Event &event);
     void drain_events();
     void lose_library(const LibraryProcess::Event &event);
+    std::vector<std::string> make_directories(const Job &job);
+    void settle_directories();
     void require_all_started();
     void require_plan();
     void poll_gatherers();
@@ -107,6 +113,8 @@ class Runner
     template <typename Find> void end_all(const Find &find);
     void finish(RunningItem &active, TimePoint end);
     void notify_ended();
+    void take_output(off_t end);
+    void take_output();
     void tick();
 
     LibraryProcess &library_;
@@ -116,6 +124,7 @@ class Runner
     Options options_;
     RunningJob running_;
     ReportReader reader_;
+    ItemFiles files_;
     std::vector<Leftover> left_;             // by items of this round
     std::vector<Leftover> gatherers_;        // also helpers that outlive the gatherer
     std::vector<std::size_t> left_elements_; // the items' elements

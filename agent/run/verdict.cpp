@@ -112,6 +112,9 @@ class Judge
                                 one_line(report_.progress.value_or("-"))),
                     true};
         }
+        if (context_.judge_limits && item_.measured.out > 0) {
+            return {Outcome::failed, what_is_out(item_.measured) + though_reported(), true};
+        }
         return {Outcome::passed};
     }
 

@@ -29,8 +29,9 @@ struct JudgeContext {
     int vendor = 0;
     std::optional<std::chrono::duration<double>> timeout;
     bool fail_on_exit_status = false;
-    int signal = 0;           // that interrupted the run
-    std::string library_gone; // why, if the library's process ended
+    bool judge_limits = false; // of measurements
+    int signal = 0;            // that interrupted the run
+    std::string library_gone;  // why, if the library's process ended
 };
 
 Verdict judge(const RunningItem &active, const ItemRun &item, const JudgeContext &context);

@@ -47,7 +47,8 @@ def offered(tmp_path):
     return offered
 
 
-@pytest.mark.parametrize("command", ["", "run", "check", "show", "report", "send", "doctor"])
+@pytest.mark.parametrize("command", ["", "run", "check", "show", "report", "measure", "send",
+                                     "doctor"])
 def test_every_option_is_offered_that_the_help_tells(offered, command):
     help_text = run(BUILD / "agent/fptest", *command.split(), "--help").out
     options = re.findall(r"^  (?:-\w,)?(-\S+)", help_text, re.MULTILINE)
@@ -58,13 +59,13 @@ def test_every_option_is_offered_that_the_help_tells(offered, command):
 
 @pytest.mark.parametrize("words, expected", [
     # sub-commands
-    ("''", ["check", "doctor", "report", "run", "send", "show"]),
+    ("''", ["check", "doctor", "measure", "report", "run", "send", "show"]),
     ("re", ["report"]),
     ("s", ["send", "show"]),
     ("x", []),
     # options
     ("run --pl", ["--plan"]),
-    ("run --plan x demo/Bringup --j", ["--json", "--junit"]),
+    ("run --plan x demo/Bringup --j", ["--json", "--judge-limits", "--junit"]),
     ("send --p", []),
     # files
     *((words, ["plans"]) for words in (
@@ -72,6 +73,9 @@ def test_every_option_is_offered_that_the_help_tells(offered, command):
         "run --plan = pl", "send --log pl", "report --log pl", "check pl", "check x pl",
         "show pl", "show --help pl")),
     ("show plans/", ["plans/demo.xml", "plans/other plan.xml"]),
+    # directories
+    ("run --files pl", ["plans"]),
+    ("run --files plans/", []),
     ("run --plan =", ["fptest", "list", "plans"]),
     ("show plans/demo.xml pl", []),
     # codes that the library knows

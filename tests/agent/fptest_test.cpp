@@ -59,7 +59,8 @@ std::set<std::string> options_of(const std::string &command)
 
 TEST_F(Fptest, HasHelpWithExamplesForEveryCommand)
 {
-    for (const std::string &command : Lines{"", "run", "check", "show", "report", "send"}) {
+    for (const std::string &command :
+         Lines{"", "run", "check", "show", "report", "measure", "send"}) {
         SCOPED_TRACE(command);
         const std::string help = help_of(command);
         EXPECT_THAT(help, HasSubstr("\nExamples:\n  fptest " + command));
@@ -87,9 +88,10 @@ TEST_F(Fptest, NamesEveryOptionInItsHelp)
 {
     EXPECT_THAT(
         options_of("run"),
-        IsSupersetOf({"--plan", "--as-sent", "--as-group", "--timeout", "--grace", "--exit-status",
-                      "--repeat", "--for", "--until-fail", "--list", "--junit", "--json", "--tap",
-                      "--pass-code", "--force", "--quiet", "--log", "--help"}));
+        IsSupersetOf({"--plan",        "--as-sent", "--as-group", "--timeout",      "--grace",
+                      "--exit-status", "--repeat",  "--for",      "--until-fail",   "--list",
+                      "--junit",       "--json",    "--tap",      "--pass-code",    "--force",
+                      "--quiet",       "--log",     "--help",     "--judge-limits", "--files"}));
     EXPECT_THAT(options_of("report"),
                 IsSupersetOf({"--progress", "--result", "--description", "--log"}));
     EXPECT_THAT(options_of("check"), IsSupersetOf({"--for"}));

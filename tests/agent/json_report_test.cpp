@@ -62,7 +62,8 @@ TEST_F(JsonReporter, TellsEveryEventOfAnItem)
         "item": "DeadPixel", "round": 1, "outcome": "failed", "progress": "100",
         "result": "1", "description": "3 dead pixels", "reason": "result 1",
         "start": "2024-05-06T07:08:10.123Z", "seconds": 0.301, "exit_status": null,
-        "signal": null, "left_running": [], "output": "row 7\nrow 9\n"})"));
+        "signal": null, "left_running": [], "measurements": [], "directory": null,
+        "files": [], "warning": null, "output": "row 7\nrow 9\n"})"));
 }
 
 TEST_F(JsonReporter, ProgressIsTimedByTheClock)

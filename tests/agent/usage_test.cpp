@@ -96,10 +96,11 @@ TEST_F(Usage, IsExplainedInOneLine)
         {{"send"}, "give COMMANDs as arguments, or with -0 on standard input"},
         {{"send", "-0", "pingtest"}, "give COMMANDs as arguments, or with -0 on standard input"},
         {{"bogus"},
-         "there is no command 'bogus'; the commands are run, check, show, report, send and doctor"},
+         "there is no command 'bogus'; the commands are run, check, show, report, measure, send "
+         "and doctor"},
         {{"rum"},
          "there is no command 'rum'; did you mean 'run'? The commands are run, check, show, "
-         "report, send and doctor"},
+         "report, measure, send and doctor"},
         {{}, "no command is given; see fptest --help"}};
     for (const auto &[arguments, text] : wrong) {
         expect_wrong(arguments, text);

@@ -1,0 +1,292 @@
+// SPDX-FileCopyrightText: 2026 The Quillmark authors
+// SPDX-License-Identifier: Apache-2.0
+
+#include "run/measurements.h"
+
+#include "util/numbers.h"
+#include "util/text.h"
+
+#include <algorithm>
+#include <cctype>
+#include <cmath>
+#include <fmt/core.h>
+#include <system_error>
+#include <utility>
+
+namespace fptest
+{
+namespace
+{
+
+constexpr std::string_view kMark = "#measure";
+constexpr std::size_t kLongestLine = 512;
+constexpr std::size_t kLongestName = 64;
+constexpr std::size_t kLongestUnit = 16;
+constexpr std::size_t kMostJudged = 10'000; // beyond, a program goes wild
+constexpr std::size_t kShownColumns = 80;   // of a malformed line
+
+bool is_blank(char c)
+{
+    return c == ' ' || c == '\t';
+}
+
+// What has been read of a line may become "#measure", or "#measure" and a blank.
+bool may_be_about_one(std::string_view line)
+{
+    const std::size_t size = std::min(line.size(), kMark.size());
+    return line.substr(0, size) == kMark.substr(0, size) &&
+           (line.size() <= kMark.size() || is_blank(line[kMark.size()]) ||
+            line.substr(kMark.size()) == "\r");
+}
+
+bool is_about_one(std::string_view line)
+{
+    return line.size() >= kMark.size() && may_be_about_one(line);
+}
+
+std::vector<std::string> words_after_mark(std::string_view line)
+{
+    line.remove_prefix(kMark.size());
+    if (line.ends_with('\r')) {
+        line.remove_suffix(1);
+    }
+    std::vector<std::string> words;
+    for (std::size_t at = 0; at < line.size();) {
+        const std::size_t end = std::min(line.find_first_of(" \t", at), line.size());
+        if (end > at) {
+            words.emplace_back(line.substr(at, end - at));
+        }
+        at = end + 1;
+    }
+    return words;
+}
+
+bool is_name(const std::string &word)
+{
+    const auto is_letter_or_digit = [](unsigned char c) {
+        return c < 0x80 && std::isalnum(c) != 0;
+    };
+    return !word.empty() && word.size() <= kLongestName &&
+           (is_letter_or_digit(word.front()) || word.front() == '_') &&
+           std::ranges::all_of(word, [&](char c) {
+               return is_letter_or_digit(c) || c == '_' || c == '.' || c == '-';
+           });
+}
+
+bool is_unit(const std::string &word)
+{
+    return !word.empty() && word.find(' ') == word.npos && one_line(word) == word &&
+           characters(word).size() <= kLongestUnit;
+}
+
+// printf() writes a plus if it is asked to.
+std::optional<double> finite_number(const std::string &word)
+{
+    const std::size_t sign = word.starts_with('+') && !word.starts_with("+-") ? 1 : 0;
+    const char *const last = word.data() + word.size();
+    double number = 0;
+    const auto [stop, error] = read_number(word.data() + sign, last, number);
+    return error == std::errc{} && stop == last && std::isfinite(number) ? std::optional(number)
+                                                                         : std::nullopt;
+}
+
+bool is_below(const Measurement &one)
+{
+    return one.low && one.value < *one.low;
+}
+
+std::string limits_of(const Measurement &one)
+{
+    return one.low && one.high ? fmt::format(" ({} to {})", *one.low, *one.high)
+           : one.low           ? fmt::format(" (at least {})", *one.low)
+           : one.high          ? fmt::format(" (at most {})", *one.high)
+                               : "";
+}
+
+} // namespace
+
+std::optional<Measurement> measurement_of(const std::vector<std::string> &words, std::string &why)
+{
+    const auto refuse = [&why](std::string text) {
+        why = std::move(text);
+        return std::nullopt;
+    };
+    if (words.size() < 2) {
+        return refuse("it needs a name and a value");
+    }
+    Measurement one;
+    one.name = words[0];
+    if (!is_name(one.name)) {
+        return refuse(in_quotes(one.name) + " is not a name: letters, digits, '_', '.' and '-', "
+                                            "at most 64");
+    }
+    std::vector<std::optional<double>> numbers;
+    for (const std::size_t at : {1U, 3U, 4U}) {
+        const bool is_none = at >= words.size() || (at > 1 && words[at] == "-");
+        numbers.push_back(is_none ? std::nullopt : finite_number(words[at]));
+        if (!is_none && !numbers.back()) {
+            return refuse(in_quotes(words[at]) + " is not a number such as -1.5 or 2e-6");
+        }
+    }
+    one.value = *numbers[0];
+    one.low = numbers[1];
+    one.high = numbers[2];
+    if (words.size() > 2 && words[2] != "-") {
+        one.unit = words[2];
+        if (finite_number(one.unit)) {
+            return refuse(in_quotes(one.unit) + " is in the unit's place: write '-' for none");
+        }
+        if (!is_unit(one.unit)) {
+            return refuse(in_quotes(one.unit) + " is not a unit of 1 to 16 characters");
+        }
+    }
+    if (words.size() == 4) {
+        return refuse("LOW is there without HIGH: write '-' for no limit");
+    }
+    if (words.size() > 5) {
+        return refuse(in_quotes(words[5]) + " is one word too many");
+    }
+    if (one.low && one.high && *one.low > *one.high) {
+        return refuse(fmt::format("LOW {} is above HIGH {}", *one.low, *one.high));
+    }
+    return one;
+}
+
+bool is_out(const Measurement &one)
+{
+    return is_below(one) || (one.high && one.value > *one.high);
+}
+
+std::string words_of(const Measurement &one)
+{
+    const auto number = [](const std::optional<double> &limit) {
+        return limit ? fmt::format("{}", *limit) : "-";
+    };
+    std::string text = fmt::format("{}", one.value);
+    if (!one.unit.empty() || one.low || one.high) {
+        text += " " + (one.unit.empty() ? "-" : one.unit);
+    }
+    if (one.low || one.high) {
+        text += " " + number(one.low) + " " + number(one.high);
+    }
+    return text;
+}
+
+std::string text_of(const Measurement &one)
+{
+    return fmt::format("{} {}{}{}{}", one.name, one.value, one.unit.empty() ? "" : " ", one.unit,
+                       limits_of(one));
+}
+
+std::string what_is_out(const Measured &measured)
+{
+    return fmt::format("{} out of limits: {}{}", plural(measured.out, "measurement"),
+                       measured.first_out, measured.out > 1 ? " ..." : "");
+}
+
+std::string warning_of(const Measured &measured)
+{
+    std::string text;
+    if (measured.malformed > 0) {
+        text = fmt::format("{}: {}", plural(measured.malformed, "malformed #measure line"),
+                           measured.first_malformed);
+    }
+    if (measured.left_out > 0) {
+        text += fmt::format("{}{} after the first {} left out", text.empty() ? "" : "; ",
+                            plural(measured.left_out, "measurement"), Measured::kMost);
+    }
+    if (!measured.is_read) {
+        text += fmt::format("{}it printed too fast to be read for measurements",
+                            text.empty() ? "" : "; ");
+    }
+    return text;
+}
+
+bool is_measurement(std::string_view line)
+{
+    std::string why;
+    return is_about_one(line) && line.size() <= kLongestLine &&
+           measurement_of(words_after_mark(line), why);
+}
+
+namespace
+{
+
+void take_line(const std::string &line, Measured &measured)
+{
+    if (!is_about_one(line)) {
+        return;
+    }
+    if (measured.left_out + measured.malformed > kMostJudged) {
+        ++measured.left_out;
+        return;
+    }
+    std::string why;
+    auto one =
+        line.size() <= kLongestLine ? measurement_of(words_after_mark(line), why) : std::nullopt;
+    if (!one) {
+        if (++measured.malformed == 1) {
+            measured.first_malformed =
+                fmt::format("{}: {}", in_quotes(line, kShownColumns),
+                            why.empty() ? fmt::format("longer than {} bytes", kLongestLine) : why);
+        }
+        return;
+    }
+    if (is_out(*one) && ++measured.out == 1) {
+        measured.first_out = text_of(*one);
+    }
+    if (measured.kept.size() < Measured::kMost) {
+        measured.kept.push_back(std::move(*one));
+    } else {
+        ++measured.left_out;
+    }
+}
+
+// Where the next line may be about a measurement, or npos: not line by line, as a program
+// that prints without end has many.
+std::size_t next_mark(std::string_view text)
+{
+    for (std::size_t at = text.find(kMark.front()); at != text.npos;
+         at = text.find(kMark.front(), at + 1)) {
+        if ((at == 0 || text[at - 1] == '\n') && may_be_about_one(text.substr(at, kMark.size()))) {
+            return at;
+        }
+    }
+    return text.npos;
+}
+
+} // namespace
+
+void MeasureReader::read(std::string_view text, Measured &measured)
+{
+    while (!text.empty()) {
+        const std::size_t end = text.find('\n');
+        const std::string_view piece = text.substr(0, end);
+        if (!is_other_ && line_.size() <= kLongestLine) {
+            line_ += piece.substr(0, kLongestLine + 1 - line_.size());
+            is_other_ = !may_be_about_one(line_);
+        }
+        if (end == text.npos) {
+            return;
+        }
+        this->end(measured);
+        text.remove_prefix(end + 1);
+        const std::size_t next = next_mark(text);
+        if (next == text.npos && !text.empty()) {
+            is_other_ = !text.ends_with('\n');
+            return;
+        }
+        text.remove_prefix(std::min(next, text.size()));
+    }
+}
+
+void MeasureReader::end(Measured &measured)
+{
+    if (!is_other_) {
+        take_line(line_, measured);
+    }
+    line_.clear();
+    is_other_ = false;
+}
+
+} // namespace fptest

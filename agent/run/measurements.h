@@ -1,0 +1,70 @@
+// SPDX-FileCopyrightText: 2026 The Quillmark authors
+// SPDX-License-Identifier: Apache-2.0
+
+// What items measure, as lines of their output say:
+//   #measure NAME VALUE [UNIT [LOW HIGH]]
+#pragma once
+
+#include <cstddef>
+#include <optional>
+#include <string>
+#include <string_view>
+#include <vector>
+
+namespace fptest
+{
+
+struct Measurement {
+    std::string name;
+    double value = 0;
+    std::string unit = {}; // may be empty
+    std::optional<double> low = {};
+    std::optional<double> high = {};
+};
+
+// The measurement that the words after "#measure" say; nullopt, and why, if they say none.
+std::optional<Measurement> measurement_of(const std::vector<std::string> &words, std::string &why);
+
+// Whether it is out of its limits.
+bool is_out(const Measurement &one);
+
+// "1.2 V 1.1 1.3", as the line has it
+std::string words_of(const Measurement &one);
+// "vcore 1.4 V (1.1 to 1.3)"
+std::string text_of(const Measurement &one);
+
+// Those of one item. Values of the same name are all kept.
+struct Measured {
+    static constexpr std::size_t kMost = 256;
+
+    std::vector<Measurement> kept = {};
+    std::size_t left_out = 0; // beyond kMost
+    std::size_t out = 0;      // of their limits, also of those left out
+    std::string first_out = {};
+    std::size_t malformed = 0; // lines
+    std::string first_malformed = {};
+    bool is_read = true; // all of the output
+};
+
+// "2 measurements out of limits: vcore 1.4 V (1.1 to 1.3) ..."
+std::string what_is_out(const Measured &measured);
+// What is wrong with its lines; may be empty.
+std::string warning_of(const Measured &measured);
+
+// Whether a line of output, without its line feed, says a measurement.
+bool is_measurement(std::string_view line);
+
+// Reads an item's output as it comes.
+class MeasureReader
+{
+  public:
+    void read(std::string_view text, Measured &measured);
+    // The last line may have no line feed.
+    void end(Measured &measured);
+
+  private:
+    std::string line_;      // as far as it was read, unless
+    bool is_other_ = false; // it is not about a measurement
+};
+
+} // namespace fptest
