@@ -269,7 +269,8 @@ Exit run(RunOptions options)
         report_other_gatherer(round, plan, vendor, for_runner.ends_gatherer);
     }
     if (is_sent || is_placed) {
-        require_room(is_sent ? checked.stored.size() : checked.text.size());
+        const std::string &stored = is_sent ? checked.stored : checked.text;
+        refer_to_doctor([&stored] { require_room(stored.size()); });
     }
     if (is_placed && !options.quiet) {
         say("{}: its {} bytes are more than the {} that a command stores, so it is placed as the "

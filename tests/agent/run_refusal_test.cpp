@@ -411,7 +411,8 @@ TEST_F(RunOnFullDisk, StoresNoPlan)
     fill_disk();
     expect(3,
            "fptest: the disk of /data/vorlane is full: make room for " +
-               std::to_string(kTwoGroups.size()) + " bytes; the stored plan is as it was",
+               std::to_string(kTwoGroups.size()) +
+               " bytes; the stored plan is as it was; see fptest doctor",
            {"--plan", plan(kTwoGroups), "P/Bringup"});
     EXPECT_FALSE(fs::exists(kPlanFile));
 }
