@@ -10,8 +10,10 @@
 
 #include <algorithm>
 #include <fmt/core.h>
+#include <optional>
 #include <string>
 #include <string_view>
+#include <vector>
 
 namespace fptest
 {
@@ -37,18 +39,23 @@ class PlainView : public Reporter
 
     void started(const Run & /* run */, Place place) override
     {
-        place_ = place;
-        said_at_ = 0;
-        output_said_.clear();
-        runs_ = true;
+        running_.push_back(place);
     }
 
     void tick(const Run &run) override
     {
-        if (!runs_ || quiet_ || item_at(run, place_).running < said_at_ + kBetweenProgressLines) {
+        const auto running = std::ranges::find_if(
+            running_, [&run](const Place &place) { return !item_at(run, place).seconds; });
+        if (quiet_ || running == running_.end()) {
             return;
         }
-        const ItemRun &item = item_at(run, place_);
+        if (*running != place_) {
+            show_next(*running);
+        }
+        const ItemRun &item = item_at(run, *place_);
+        if (item.running < said_at_ + kBetweenProgressLines) {
+            return;
+        }
         said_at_ = item.running;
         print(fmt::format(
             "{}: {}{}, {}", one_line(title(run, item)), item.stopping ? "stopping" : "running",
@@ -60,7 +67,10 @@ class PlainView : public Reporter
 
     void ended(const Run &run, Place place) override
     {
-        runs_ = runs_ && place != place_;
+        std::erase(running_, place);
+        if (place_ == place) {
+            show_next({}); // it may run again
+        }
         const ItemRun &item = item_at(run, place);
         const bool passed = item.outcome == Outcome::passed;
         if (quiet_ && passed && item.left_running.empty()) {
@@ -113,6 +123,13 @@ class PlainView : public Reporter
     }
 
   private:
+    void show_next(std::optional<Place> place)
+    {
+        place_ = place;
+        said_at_ = 0;
+        output_said_.clear();
+    }
+
     // What is new since it was last shown. Once the start of the output has been
     // dropped nobody knows, and the last lines are shown again.
     std::string_view new_output(const std::string &output) const
@@ -137,8 +154,8 @@ class PlainView : public Reporter
 
     Writer writer_;
     bool quiet_;
-    Place place_;
-    bool runs_ = false;
+    std::vector<Place> running_;
+    std::optional<Place> place_; // of whose progress it tells
     double said_at_ = 0;
     std::string output_said_;
 };

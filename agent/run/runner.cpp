@@ -417,6 +417,8 @@ void Runner::finish(RunningItem &active, TimePoint end)
     if (active.gathers && running_.items.size() == 1 &&
         running_.next >= running_.job.targets.size()) {
         result.left_running = note_left_running(active.element);
+        const std::vector<Leftover> left = left_by_gatherer();
+        result.left_running.insert(result.left_running.end(), left.begin(), left.end());
     }
     if (active.gathers && !has_finished(result.report)) {
         gatherer_may_report_late_ = true;

@@ -101,6 +101,7 @@ class Runner
     std::vector<Leftover> processes_of(const RunningItem &active);
     bool note_gatherer();
     std::vector<Leftover> gatherer_processes();
+    std::vector<Leftover> left_by_gatherer();
     std::vector<Leftover> note_left_running(std::size_t element);
     void end_left_running();
     void end_gatherer();

@@ -251,6 +251,12 @@ std::vector<Leftover> Runner::gatherer_processes()
     return gatherers_;
 }
 
+// What is left of one that has ended, or has another name now.
+std::vector<Leftover> Runner::left_by_gatherer()
+{
+    return found_as_gatherer() ? std::vector<Leftover>() : gatherer_processes();
+}
+
 std::vector<Leftover> Runner::processes_of(const RunningItem &active)
 {
     return active.gathers ? gatherer_processes() : item_processes();
@@ -324,8 +330,7 @@ void Runner::make_way_for(const Job &job)
         });
         reader_.note_gathered(read_stored_plan().value_or(""), vendor_);
         // the library does not see one under another name, and would start another beside it
-        const std::vector<Leftover> running = gatherer_processes();
-        if (gatherer_may_report_late_ || (!running.empty() && !found_as_gatherer())) {
+        if (gatherer_may_report_late_ || !left_by_gatherer().empty()) {
             end_gatherer();
         }
         gatherer_runs_ = note_gatherer();
@@ -341,7 +346,8 @@ void Runner::end_round()
         end_left_running();
         require_plan();
     }
-    if (gatherer_may_report_late_) {
+    // what no trigger reaches would wait for the next one beside the gatherer that it starts
+    if (gatherer_may_report_late_ || (!gatherers_.empty() && !left_by_gatherer().empty())) {
         end_gatherer();
     }
     reader_.poll(ReportReader::When::at_once);
