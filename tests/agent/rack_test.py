@@ -68,6 +68,20 @@ def test_a_device_that_is_lost_is_named_and_the_others_go_on(tmp_path):
     assert of_all[DEVICES[1] + ": no report/device"] == ["error"]
 
 
+def test_ctrl_c_ends_the_runs_of_all(tmp_path):
+    status, out, err = on_rack("bash", "-c", """
+        timeout --preserve-status -s INT 2 "$@"; echo $?
+        for device in 127.0.0.1:5601 127.0.0.1:5602; do
+            until adb -s $device shell cat /data/local/tmp/fptest/r.jsonl | grep '"finish"'; do
+                sleep 0.05
+            done
+        done""", "bash", ADB_ALL, PLAN, "demo/Endurance", devices=2, cwd=tmp_path)
+
+    assert out.startswith("130\n")
+    assert out.count('"finished":false,"reason":"interrupted by SIGHUP"') == 2
+    assert (status, err) == (0, "")
+
+
 @pytest.mark.parametrize("words, complaint", [
     ((), "it takes a plan and paths, as plan.xml root/group"),
     (("nowhere.xml", "demo/Bringup"), "nowhere.xml: no such plan"),
