@@ -9,7 +9,7 @@ import pytest
 
 from support.adb import free_port
 from support.outside import (DEVICE_RUN, at_a_terminal, content, eventually, is_running,
-                             on_device, run, unique_length)
+                             on_device, run, started, unique_length)
 
 pytestmark = pytest.mark.usefixtures("device")
 
@@ -38,9 +38,12 @@ def test_a_port_that_is_taken_is_told(adb):
         f"device/run: --adb {port}: the port is taken; name another")
 
 
-def test_it_listens_on_the_loopback_alone(there):
+def test_it_listens_on_the_loopback_alone(adb, start):
+    port = free_port()
+    start(options=("--adb", str(port)))
+    adb.connect(port)
+
     listening = [line.split() for line in content("/proc/net/tcp").splitlines()[1:]]
-    port = int(there.device.partition(":")[2])
     assert [words[1] for words in listening if words[1].endswith(f":{port:04X}")
             and words[3] == "0A"] == [f"0100007F:{port:04X}"]
 
@@ -60,7 +63,7 @@ def test_it_is_a_second_way_into_a_device_that_runs_a_command(adb, start):
 
 
 def test_the_command_has_nothing_of_it():
-    look = "ls /proc/self/fd; env | grep ^QUILLMARK; ls -A /data/local/tmp"
+    look = "ls /proc/self/fd; env | grep -E '^QUILLMARK_(ADB|BEGIN)='; ls -A /data/local/tmp"
 
     assert on_device("sh", "-c", look, options=("--adb", str(free_port()))).out == (
         on_device("sh", "-c", look).out)
@@ -103,6 +106,30 @@ def test_results_of_a_session_go_where_it_says(adb, start, tmp_path):
 
     assert adb.connect(port).shell(f"echo text >{tmp_path}/out/file").status == 0
     assert content(tmp_path / "out/file") == "text\n"
+
+
+def test_a_lost_connection_hangs_up_every_session(adb):
+    mark = unique_length()
+    with adb.to_device() as there:
+        with started(*there.words("shell", f"sleep {mark}"), stdin=-1), \
+                started(*there.words("shell", f"sleep {mark} one"), stdin=-1):
+            assert eventually(lambda: is_running(mark))
+
+            adb.output_of("disconnect", there.device)
+
+            assert eventually(lambda: not is_running(mark))
+        adb.connect(there.device.partition(":")[2])
+        assert there.shell("echo on").out == "on\n"
+
+
+def test_sessions_are_hung_up_even_if_the_caller_ignores_that(adb):
+    port, mark = free_port(), unique_length()
+    with started("sh", "-c", 'trap "" HUP; exec "$0" "$@"', DEVICE_RUN, "--adb", str(port)):
+        there = adb.connect(port)
+        with started(*there.words("shell", f"sleep {mark}"), stdin=-1) as client:
+            assert eventually(lambda: is_running(mark))
+            client.kill()
+            assert eventually(lambda: not is_running(mark))
 
 
 # ---- what is not adb ---------------------------------------------------------------------

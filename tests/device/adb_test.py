@@ -163,20 +163,6 @@ def test_the_commands_session_is_hung_up_when_its_client_goes(there, option, doe
         assert eventually(lambda: not is_running(mark))
 
 
-def test_a_lost_connection_hangs_up_every_session(adb):
-    mark = unique_length()
-    with adb.to_device() as there:
-        with started(*there.words("shell", f"sleep {mark}"), stdin=-1), \
-                started(*there.words("shell", f"sleep {mark} one"), stdin=-1):
-            assert eventually(lambda: is_running(mark))
-
-            adb.output_of("disconnect", there.device)
-
-            assert eventually(lambda: not is_running(mark))
-        adb.connect(there.device.partition(":")[2])
-        assert there.shell("echo on").out == "on\n"
-
-
 def test_what_is_in_a_session_of_its_own_goes_on(there):
     mark = unique_length()
     with started(*there.words("shell", f"nohup setsid sleep {mark} >/dev/null 2>&1 & wait"),
@@ -226,27 +212,13 @@ def test_a_file_takes_the_place_of_one(there, tmp_path):
         assert there.output_of("exec-out", "cat /data/local/tmp/file") == text
 
 
-@pytest.mark.parametrize("place, why", [
-    ("/system/bin/item", "Read-only file system"),
-    ("/proc/x/y", "No such file or directory"),
-])
-def test_a_file_that_cannot_be_written_says_why(there, tmp_path, place, why):
+def test_a_file_that_cannot_be_written_says_why(there, tmp_path):
     (tmp_path / "item").write_bytes(bytes(2000000))
 
-    status, out, err = there.run("push", tmp_path / "item", place)
+    status, out, err = there.run("push", tmp_path / "item", "/proc/x/y")
 
     assert status == 1
-    assert f"couldn't create file: {why}" in out + err
-
-
-def test_a_full_disk_is_told(there, tmp_path):
-    (tmp_path / "item").write_bytes(bytes(20 << 20))
-
-    status, out, err = there.run("push", tmp_path / "item", "/data/vorlane/item")
-
-    assert status == 1
-    assert "No space left on device" in out + err
-    assert there.shell("ls -A /data/vorlane").out == ""
+    assert "couldn't create file: No such file or directory" in out + err
 
 
 def test_a_file_that_cannot_be_read_says_why(there, tmp_path):
