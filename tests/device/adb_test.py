@@ -155,6 +155,8 @@ def test_the_commands_session_is_hung_up_when_its_client_goes(there, option, doe
     there.shell("rm -f /data/local/tmp/*")
     script = HUNG_UP.format(f"sleep {mark} & echo >/data/local/tmp/on; {does}")
     with started(*there.words("shell", option, script), stdin=-1, stdout=-3) as client:
+        # a child of the shell is still its copy at first, with its trap
+        assert eventually(lambda: is_running(mark))
         assert eventually(lambda: there.shell("ls /data/local/tmp").out == "on\n")
 
         client.kill()
