@@ -24,6 +24,7 @@
 #include "util/write.h"
 
 #include <algorithm>
+#include <csignal>
 #include <cstdio>
 #include <iterator>
 #include <memory>
@@ -247,6 +248,9 @@ Exit run(RunOptions options)
     const std::vector<Path> paths = paths_of(options, checked);
     require_writable_results(options);
     choose_log(options.log);
+    if (options.hangup == "go-on") {
+        std::signal(SIGHUP, SIG_IGN);
+    }
     Signals signals;
     choose_ps_for(options);
     report_no_vendor(options);
@@ -368,6 +372,14 @@ void add_run(CLI::App &app, Action &chosen)
                      "run in spite of errors in the plan and of\n"
                      "missing programs");
     command.add_flag("--quiet", options->quiet, "print only what did not pass");
+    command.add_flag("--plain", options->plain, "print lines, as a log wants them");
+    command
+        .add_option("--hangup", options->hangup,
+                    "what the end of the terminal means: stop or\n"
+                    "go-on")
+        ->type_name("WORD")
+        ->capture_default_str()
+        ->check(one_of({"stop", "go-on"}, "is not stop or go-on"));
     add_log(command, options->log);
 }
 

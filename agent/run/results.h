@@ -194,6 +194,8 @@ class Reporter
     {
         return {};
     }
+
+    bool is_needed = true; // the run has failed where it does
 };
 
 } // namespace fptest

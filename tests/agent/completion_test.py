@@ -63,7 +63,7 @@ def test_every_option_is_offered_that_the_help_tells(offered, command):
     ("s", ["send", "show"]),
     ("x", []),
     # options
-    ("run --pl", ["--plan"]),
+    ("run --pl", ["--plain", "--plan"]),
     ("run --plan x demo/Bringup --j", ["--json", "--junit"]),
     ("send --p", []),
     # files
@@ -77,6 +77,7 @@ def test_every_option_is_offered_that_the_help_tells(offered, command):
     # codes that the library knows
     ("run --pass-code ''", ["-2", "0", "1"]),
     ("report G I --result -", ["-2"]),
+    ("run --hangup ''", ["go-on", "stop"]),
     # numbers, words
     *((words, []) for words in (
         "run --timeout ''", "run --for ''", "run --repeat ''", "report --progress ''",

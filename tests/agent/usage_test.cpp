@@ -61,6 +61,8 @@ TEST_F(Usage, IsExplainedInOneLine)
          "--description needs a value: --description TEXT; see fptest report --help"},
         {{"run", "--list="}, "--list takes no value; see fptest run --help"},
         {{"run", "--list=3"}, "--list takes no value; see fptest run --help"},
+        {{"run", "--hangup", "ignore", "P/G"},
+         "--hangup: 'ignore' is not stop or go-on; see fptest run --help"},
         {{"run", "P/G", "--quiet=no"}, "--quiet takes no value; see fptest run --help"},
         {{"run", "P/G", "--pla", "a"},
          "there is no option '--pla'; did you mean '--plan'? See fptest run --help"},
