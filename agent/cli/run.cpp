@@ -3,6 +3,7 @@
 
 #include "check/finding_printer.h"
 #include "cli/desk_paths.h"
+#include "cli/identity.h"
 #include "cli/log_option.h"
 #include "cli/options.h"
 #include "cli/outputs.h"
@@ -242,6 +243,7 @@ Exit run(RunOptions options)
         warn_of_lost_outputs(
             {{"--json", options.json}, {"--junit", options.junit}, {"--log", options.log}});
     }
+    Identity identity = identity_of(options.labels);
     const Descriptor lock = options.list ? Descriptor(-1) : ready_device();
     const CheckedPlan checked = open_plan(options);
     const Plan &plan = *checked.loaded.plan;
@@ -291,6 +293,9 @@ Exit run(RunOptions options)
         }
     };
     Run run = run_of(options, checked.name, vendor);
+    name_device(identity);
+    run.identity = std::move(identity);
+    run.identity.plan_digest = digest_of(plan);
     const auto owned = make_reporters(options);
     std::vector<Reporter *> reporters;
     for (const auto &reporter : owned) {
@@ -380,6 +385,7 @@ void add_run(CLI::App &app, Action &chosen)
         ->type_name("WORD")
         ->capture_default_str()
         ->check(one_of({"stop", "go-on"}, "is not stop or go-on"));
+    add_labels(command, options->labels);
     add_log(command, options->log);
 }
 

@@ -26,6 +26,9 @@ std::unique_ptr<Reporter> make_json_reporter(const std::string &path);
 // finished, what has not been run is an error, so that a killed run never looks green.
 std::unique_ptr<Reporter> make_junit_reporter(const std::string &path);
 
+// Whether fptest writes a property of that name of its own into a JUnit suite.
+bool is_property_of_junit(const std::string &name);
+
 // Why no result file could be begun there, in the words of Reporter::failure(); empty if
 // one could. Changes nothing.
 std::string json_obstacle(const std::string &path);
