@@ -8,6 +8,7 @@
 #include "cli/options.h"
 #include "cli/outputs.h"
 #include "cli/run_options.h"
+#include "module/device_lock.h"
 #include "module/library_process.h"
 #include "module/log_file.h"
 #include "module/own_ps.h"
@@ -17,6 +18,7 @@
 #include "module/vendor_file.h"
 #include "plan/plan.h"
 #include "plan/plan_text.h"
+#include "reporters/reporters.h"
 #include "run/planner.h"
 #include "run/rounds.h"
 #include "run/runner.h"
@@ -164,10 +166,17 @@ void refuse_list_with_results(const RunOptions &options)
 }
 
 // The lock keeps the device as it is found now.
-Descriptor ready_device()
+DeviceLock ready_device(const RunNote &note)
 {
     require_device();
-    return lock_device();
+    return DeviceLock(note);
+}
+
+RunNote note_for(const RunOptions &options)
+{
+    RunNote note;
+    note.plan = name_of_plan(options.plan);
+    return note;
 }
 
 Runner::Options runner_options(const RunOptions &options)
@@ -244,7 +253,8 @@ Exit run(RunOptions options)
             {{"--json", options.json}, {"--junit", options.junit}, {"--log", options.log}});
     }
     Identity identity = identity_of(options.labels);
-    const Descriptor lock = options.list ? Descriptor(-1) : ready_device();
+    const RunNote note = note_for(options);
+    const DeviceLock lock = options.list ? DeviceLock() : ready_device(note);
     const CheckedPlan checked = open_plan(options);
     const Plan &plan = *checked.loaded.plan;
     const std::vector<Path> paths = paths_of(options, checked);
@@ -253,7 +263,7 @@ Exit run(RunOptions options)
     if (options.hangup == "go-on") {
         std::signal(SIGHUP, SIG_IGN);
     }
-    Signals signals;
+    Signals signals([&lock] { return lock.is_asked_to_stop(); });
     choose_ps_for(options);
     report_no_vendor(options);
     std::optional<LibraryProcess> library(std::in_place);
@@ -296,7 +306,8 @@ Exit run(RunOptions options)
     name_device(identity);
     run.identity = std::move(identity);
     run.identity.plan_digest = digest_of(plan);
-    const auto owned = make_reporters(options);
+    auto owned = make_reporters(options);
+    owned.push_back(make_note_reporter(lock, note));
     std::vector<Reporter *> reporters;
     for (const auto &reporter : owned) {
         reporters.push_back(reporter.get());

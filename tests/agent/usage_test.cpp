@@ -78,6 +78,10 @@ TEST_F(Usage, IsExplainedInOneLine)
          "--label needs a value: --label KEY=VALUE; see fptest run --help"},
         {{"run", "--hangup", "ignore", "P/G"},
          "--hangup: 'ignore' is not stop or go-on; see fptest run --help"},
+        {{"stop", "--wait", "-1"},
+         "--wait: '-1' is not a number from 0 to 1000000; see fptest stop --help"},
+        {{"stop", "now"}, "'now' is one argument too many; see fptest stop --help"},
+        {{"status", "--json"}, "there is no option '--json'; see fptest status --help"},
         {{"run", "P/G", "--quiet=no"}, "--quiet takes no value; see fptest run --help"},
         {{"run", "P/G", "--pla", "a"},
          "there is no option '--pla'; did you mean '--plan'? See fptest run --help"},
@@ -113,10 +117,11 @@ TEST_F(Usage, IsExplainedInOneLine)
         {{"send"}, "give COMMANDs as arguments, or with -0 on standard input"},
         {{"send", "-0", "pingtest"}, "give COMMANDs as arguments, or with -0 on standard input"},
         {{"bogus"},
-         "there is no command 'bogus'; the commands are run, check, show, report, send and doctor"},
+         "there is no command 'bogus'; the commands are run, check, show, report, send, doctor, "
+         "status and stop"},
         {{"rum"},
          "there is no command 'rum'; did you mean 'run'? The commands are run, check, show, "
-         "report, send and doctor"},
+         "report, send, doctor, status and stop"},
         {{}, "no command is given; see fptest --help"}};
     for (const auto &[arguments, text] : wrong) {
         expect_wrong(arguments, text);
