@@ -74,6 +74,7 @@ std::string sha256(std::string_view bytes)
 {
     Digest state{0x6a09e667, 0xbb67ae85, 0x3c6ef372, 0xa54ff53a,
                  0x510e527f, 0x9b05688c, 0x1f83d9ab, 0x5be0cd19};
+    const std::uint64_t bits = std::uint64_t{bytes.size()} * 8;
     std::size_t at = 0;
     for (; bytes.size() - at >= kBlock; at += kBlock) {
         add_block(state, bytes.substr(at, kBlock));
@@ -83,7 +84,7 @@ std::string sha256(std::string_view bytes)
     rest += '\x80';
     rest.resize((rest.size() + 8 + kBlock - 1) / kBlock * kBlock - 8);
     for (int shift = 56; shift >= 0; shift -= 8) {
-        rest += static_cast<char>(std::uint64_t{bytes.size()} * 8 >> shift);
+        rest += static_cast<char>(bits >> shift);
     }
     for (at = 0; at < rest.size(); at += kBlock) {
         add_block(state, std::string_view(rest).substr(at, kBlock));
