@@ -34,7 +34,7 @@ constexpr char kExamples[] =
     "\n"
     "Exit status: 0 all passed; 1 some failed or did not report, or a checked plan\n"
     "has errors; 2 wrong usage or an error in the plan; 3 the device is not ready;\n"
-    "130 interrupted.";
+    "4 another fptest is running; 130 interrupted.";
 
 class CommandLine
 {
@@ -54,6 +54,8 @@ class CommandLine
         fptest::add_report(app_, chosen_);
         fptest::add_send(app_, chosen_);
         fptest::add_doctor(app_, chosen_);
+        fptest::add_status(app_, chosen_);
+        fptest::add_stop(app_, chosen_);
     }
 
     Exit run(int argc, char **argv)
@@ -104,6 +106,13 @@ class CommandLine
     fptest::Action chosen_;
 };
 
+Exit status_of(Cause cause)
+{
+    return cause == Cause::input  ? Exit::usage
+           : cause == Cause::busy ? Exit::busy
+                                  : Exit::environment;
+}
+
 Exit complain(Exit status, const std::string &text)
 {
     std::fflush(stdout);
@@ -123,8 +132,7 @@ int main(int argc, char **argv)
     try {
         status = CommandLine().run(argc, argv);
     } catch (const fptest::Failure &failure) {
-        status = complain(failure.cause() == Cause::input ? Exit::usage : Exit::environment,
-                          failure.what());
+        status = complain(status_of(failure.cause()), failure.what());
     } catch (const std::exception &error) {
         status = complain(Exit::environment, error.what());
     }

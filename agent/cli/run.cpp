@@ -3,10 +3,12 @@
 
 #include "check/finding_printer.h"
 #include "cli/desk_paths.h"
+#include "cli/identity.h"
 #include "cli/log_option.h"
 #include "cli/options.h"
 #include "cli/outputs.h"
 #include "cli/run_options.h"
+#include "module/device_lock.h"
 #include "module/library_process.h"
 #include "module/log_file.h"
 #include "module/own_ps.h"
@@ -16,6 +18,7 @@
 #include "module/vendor_file.h"
 #include "plan/plan.h"
 #include "plan/plan_text.h"
+#include "reporters/reporters.h"
 #include "run/planner.h"
 #include "run/rounds.h"
 #include "run/runner.h"
@@ -24,6 +27,7 @@
 #include "util/write.h"
 
 #include <algorithm>
+#include <csignal>
 #include <cstdio>
 #include <iterator>
 #include <memory>
@@ -162,10 +166,17 @@ void refuse_list_with_results(const RunOptions &options)
 }
 
 // The lock keeps the device as it is found now.
-Descriptor ready_device()
+DeviceLock ready_device(const RunNote &note)
 {
     require_device();
-    return lock_device();
+    return DeviceLock(note);
+}
+
+RunNote note_for(const RunOptions &options)
+{
+    RunNote note;
+    note.plan = name_of_plan(options.plan);
+    return note;
 }
 
 Runner::Options runner_options(const RunOptions &options)
@@ -241,13 +252,18 @@ Exit run(RunOptions options)
         warn_of_lost_outputs(
             {{"--json", options.json}, {"--junit", options.junit}, {"--log", options.log}});
     }
-    const Descriptor lock = options.list ? Descriptor(-1) : ready_device();
+    Identity identity = identity_of(options.labels);
+    const RunNote note = note_for(options);
+    const DeviceLock lock = options.list ? DeviceLock() : ready_device(note);
     const CheckedPlan checked = open_plan(options);
     const Plan &plan = *checked.loaded.plan;
     const std::vector<Path> paths = paths_of(options, checked);
     require_writable_results(options);
     choose_log(options.log);
-    Signals signals;
+    if (options.hangup == "go-on") {
+        std::signal(SIGHUP, SIG_IGN);
+    }
+    Signals signals([&lock] { return lock.is_asked_to_stop(); });
     choose_ps_for(options);
     report_no_vendor(options);
     std::optional<LibraryProcess> library(std::in_place);
@@ -288,7 +304,11 @@ Exit run(RunOptions options)
         }
     };
     Run run = run_of(options, checked.name, vendor);
-    const auto owned = make_reporters(options);
+    name_device(identity);
+    run.identity = std::move(identity);
+    run.identity.plan_digest = digest_of(plan);
+    auto owned = make_reporters(options);
+    owned.push_back(make_note_reporter(lock, note));
     std::vector<Reporter *> reporters;
     for (const auto &reporter : owned) {
         reporters.push_back(reporter.get());
@@ -369,6 +389,15 @@ void add_run(CLI::App &app, Action &chosen)
                      "run in spite of errors in the plan and of\n"
                      "missing programs");
     command.add_flag("--quiet", options->quiet, "print only what did not pass");
+    command.add_flag("--plain", options->plain, "print lines, as a log wants them");
+    command
+        .add_option("--hangup", options->hangup,
+                    "what the end of the terminal means: stop or\n"
+                    "go-on")
+        ->type_name("WORD")
+        ->capture_default_str()
+        ->check(one_of({"stop", "go-on"}, "is not stop or go-on"));
+    add_labels(command, options->labels);
     add_log(command, options->log);
 }
 

@@ -30,6 +30,9 @@ struct RunOptions {
     std::string junit; // files, "-" for standard output; empty for none
     std::string json;
     std::string log;
+    std::vector<std::string> labels; // KEY=VALUE
+    bool plain = false;              // lines, also on a terminal
+    std::string hangup = "stop";     // or "go-on"
 };
 
 } // namespace fptest

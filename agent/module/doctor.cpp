@@ -4,6 +4,7 @@
 #include "module/doctor.h"
 
 #include "module/item_shell.h"
+#include "module/library_file.h"
 #include "module/library_process.h"
 #include "module/own_ps.h"
 #include "module/preflight.h"
@@ -21,7 +22,6 @@
 #include <csignal>
 #include <cstdio>
 #include <cstring>
-#include <dlfcn.h>
 #include <fmt/core.h>
 #include <mxml.h>
 #include <optional>
@@ -304,20 +304,6 @@ DeviceAnswer about_descriptors()
 }
 
 // --- libraries ----------------------------------------------------------------
-
-std::string provider_at(const void *place)
-{
-    Dl_info found{};
-    return place != nullptr && dladdr(place, &found) != 0 && found.dli_fname != nullptr
-               ? found.dli_fname
-               : "";
-}
-
-// Which file has this name's function or variable; empty if none has.
-std::string provider_of(const char *name)
-{
-    return provider_at(dlsym(RTLD_DEFAULT, name));
-}
 
 std::string real_name(const std::string &file)
 {

@@ -111,12 +111,18 @@ class JsonReporter : public Reporter
         Json json = {{"event", "run"}, {"format", kFormat}};
         json["program"] = "fptest";
         json["version"] = FPTEST_VERSION;
+        json["library_version"] = words_or_null(run.identity.library);
         json["plan"] = sanitize_utf8(run.plan);
+        json["plan_digest"] = words_or_null(run.identity.plan_digest);
         json["vendor"] = run.vendor;
         json["rounds"] = run.rounds ? Json(*run.rounds) : Json();
         json["time_limit"] = seconds_or_null(run.time_limit);
         json["until_fail"] = run.until_fail;
         json["pass_code"] = run.pass_code;
+        json["labels"] = Json::object();
+        for (const auto &[key, value] : run.identity.labels) {
+            json["labels"][key] = sanitize_utf8(value);
+        }
         json["start"] = timestamp(run.start);
         json["items"] = std::move(items);
         write(json);

@@ -3,10 +3,13 @@
 
 #include "reporters/junit_document.h"
 
+#include "reporters/reporters.h"
 #include "reporters/wording.h"
 #include "util/text.h"
 #include "util/times.h"
 
+#include <algorithm>
+#include <array>
 #include <chrono>
 #include <cmath>
 #include <fmt/core.h>
@@ -59,6 +62,16 @@ std::string property(const std::string &indent, const char *name,
     return value ? fmt::format("{}<property{}{}/>\n", indent, attribute("name", name),
                                attribute("value", *value))
                  : "";
+}
+
+std::string hostname_attribute(const Run &run)
+{
+    for (const auto &[key, value] : run.identity.labels) {
+        if (key == "device") {
+            return attribute("hostname", value);
+        }
+    }
+    return {};
 }
 
 std::string properties(const std::string &indent, const std::string &inside)
@@ -208,6 +221,9 @@ std::string test_suite(const Run &run, std::size_t number, const std::vector<Lat
                          property(indent, "vendor", std::to_string(run.vendor)) +
                          property(indent, "pass_code", std::to_string(run.pass_code)) +
                          kStateGoesHere;
+    for (const auto &[name, value] : named_identity(run)) {
+        inside += property(indent, name.c_str(), value);
+    }
     for (const LateReport &one : late) {
         if (one.suite == number) {
             inside += property(indent, "late_report", one.text);
@@ -220,13 +236,21 @@ std::string test_suite(const Run &run, std::size_t number, const std::vector<Lat
     for (const ItemRun &item : suite.items) {
         cases += test_case(run, item);
     }
-    return fmt::format("  <testsuite{}{}{}{}>\n{}{}  </testsuite>\n",
+    return fmt::format("  <testsuite{}{}{}{}{}>\n{}{}  </testsuite>\n",
                        attribute("name", title(run, suite)), attributes(tests),
-                       time_attribute(seconds), timestamp_attribute(start),
+                       time_attribute(seconds), timestamp_attribute(start), hostname_attribute(run),
                        properties("    ", inside), cases);
 }
 
 } // namespace
+
+bool is_property_of_junit(const std::string &name)
+{
+    constexpr std::array kNames{"plan",        "vendor",         "pass_code",
+                                "plan_digest", "fptest_version", "library_version",
+                                "finished",    "reason",         "late_report"};
+    return std::ranges::find(kNames, name) != kNames.end();
+}
 
 TestCounts &TestCounts::operator+=(const TestCounts &more)
 {

@@ -146,6 +146,9 @@ class TapReporter : public Reporter
         if (has_fixed_rounds(run)) {
             write(plan_line(run.suites.size() * static_cast<std::size_t>(*run.rounds)));
         }
+        for (const auto &[name, value] : named_identity(run)) {
+            write(comment(fmt::format("{}: {}", name, one_line(value))));
+        }
     }
 
     void started(const Run &run, Place place) override

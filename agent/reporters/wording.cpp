@@ -64,6 +64,15 @@ std::string heading(const Run &run)
                        has_rounds(run) ? ", " + rounds(run) : "");
 }
 
+std::vector<std::pair<std::string, std::string>> named_identity(const Run &run)
+{
+    auto all = run.identity.labels;
+    all.emplace_back("fptest_version", FPTEST_VERSION);
+    all.emplace_back("library_version", run.identity.library);
+    all.emplace_back("plan_digest", run.identity.plan_digest);
+    return run.identity.labels.empty() ? run.identity.labels : all;
+}
+
 std::string total(const Run &run)
 {
     const auto [passed, failed] = tally(count(run));

@@ -12,6 +12,7 @@
 #include <cstddef>
 #include <optional>
 #include <string>
+#include <utility>
 #include <vector>
 
 namespace fptest
@@ -77,9 +78,17 @@ struct Summary {
     DurationStats times; // of each run of it
 };
 
+// Whose results these are.
+struct Identity {
+    std::vector<std::pair<std::string, std::string>> labels; // "device" is one
+    std::string library;                                     // its version
+    std::string plan_digest;                                 // whatever was reported into it
+};
+
 // Holds the current round only.
 struct Run {
     std::string plan; // the file that the plan came from
+    Identity identity;
     int round = 1;
     std::optional<int> rounds = 1;    // at most; nullopt for no limit
     std::optional<double> time_limit; // seconds after which no round begins
@@ -194,6 +203,8 @@ class Reporter
     {
         return {};
     }
+
+    bool is_needed = true; // the run has failed where it does
 };
 
 } // namespace fptest

@@ -108,7 +108,7 @@ std::string failures(const std::vector<Reporter *> &reporters)
 {
     std::vector<std::string> all;
     for (const Reporter *reporter : reporters) {
-        if (std::string failure = reporter->failure(); !failure.empty()) {
+        if (std::string failure = reporter->failure(); !failure.empty() && reporter->is_needed) {
             all.push_back(std::move(failure));
         }
     }
@@ -178,7 +178,7 @@ void begin(Run &run, const std::vector<Reporter *> &reporters, Signals &signals)
         reporter->begin(run);
         begun.push_back(reporter);
         const std::string failure = reporter->failure();
-        if (!failure.empty() && !is_interrupted(signals)) {
+        if (!failure.empty() && reporter->is_needed && !is_interrupted(signals)) {
             run_nothing(fmt::format("{}; nothing was run", failure), run, begun, signals);
         }
     }

@@ -50,7 +50,7 @@ void Runner::read_signals()
             suspend();
             continue;
         }
-        if (signal_ != 0 && signal == SIGHUP) {
+        if (signal_ != 0 && (signal == SIGHUP || signal == kStopRequest)) {
             continue; // a terminal that closes sends it once more, or after its Ctrl-C
         }
         // sent to all processes, and handed on by a script or by timeout; of two that are

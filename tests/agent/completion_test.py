@@ -47,7 +47,8 @@ def offered(tmp_path):
     return offered
 
 
-@pytest.mark.parametrize("command", ["", "run", "check", "show", "report", "send", "doctor"])
+@pytest.mark.parametrize("command", ["", "run", "check", "show", "report", "send", "doctor",
+                                     "status", "stop"])
 def test_every_option_is_offered_that_the_help_tells(offered, command):
     help_text = run(BUILD / "agent/fptest", *command.split(), "--help").out
     options = re.findall(r"^  (?:-\w,)?(-\S+)", help_text, re.MULTILINE)
@@ -58,12 +59,12 @@ def test_every_option_is_offered_that_the_help_tells(offered, command):
 
 @pytest.mark.parametrize("words, expected", [
     # sub-commands
-    ("''", ["check", "doctor", "report", "run", "send", "show"]),
+    ("''", ["check", "doctor", "report", "run", "send", "show", "status", "stop"]),
     ("re", ["report"]),
-    ("s", ["send", "show"]),
+    ("s", ["send", "show", "status", "stop"]),
     ("x", []),
     # options
-    ("run --pl", ["--plan"]),
+    ("run --pl", ["--plain", "--plan"]),
     ("run --plan x demo/Bringup --j", ["--json", "--junit"]),
     ("send --p", []),
     # files
@@ -77,9 +78,11 @@ def test_every_option_is_offered_that_the_help_tells(offered, command):
     # codes that the library knows
     ("run --pass-code ''", ["-2", "0", "1"]),
     ("report G I --result -", ["-2"]),
+    ("run --hangup ''", ["go-on", "stop"]),
     # numbers, words
     *((words, []) for words in (
         "run --timeout ''", "run --for ''", "run --repeat ''", "report --progress ''",
+        "run --label ''", "stop --wait ''", "status ''",
         "report --description ''", "send ''", "report Bringup SpiCheck ''")),
 ])
 def test_what_needs_no_plan_is_offered_without_one(offered, tmp_path, words, expected):
