@@ -16,6 +16,7 @@
 #include "module/vendor_file.h"
 #include "plan/plan.h"
 #include "plan/plan_text.h"
+#include "run/choice.h"
 #include "run/planner.h"
 #include "run/rounds.h"
 #include "run/runner.h"
@@ -40,12 +41,13 @@ namespace
 {
 
 constexpr char kRunExamples[] =
-    "A PATH is root/group or root/group/item; the root may be any word.\n"
+    "A PATH is root/group or root/group/item; the root may be any word, the others\n"
+    "patterns as of the shell. Without PATH, every group is run.\n"
     "\n"
     "Examples:\n"
     "  fptest run --plan plans/demo.xml demo/Bringup demo/Gather\n"
     "  fptest run --timeout 30 --junit results.xml demo/Bringup/SpiCheck\n"
-    "  fptest run --plan plans/demo.xml --list\n"
+    "  fptest run --plan plans/demo.xml --list '*/*/S*'\n"
     "  prove --exec 'fptest run --tap' demo/Bringup";
 
 // --- the plan -----------------------------------------------------------------
@@ -126,9 +128,9 @@ void report_other_gatherer(const RoundPlan &round, const Plan &plan, int vendor,
     }
 }
 
-void list_items(const std::vector<Path> &paths, const Plan &plan, const std::string &suffix)
+void list_items(const RoundPlan &round, const Plan &plan, const std::string &suffix)
 {
-    const auto items = commands_of(paths, plan, suffix);
+    const auto items = commands_of(round, plan, suffix);
     std::size_t width = 0;
     for (const auto &[path, command] : items) {
         width = std::max(width, display_width(one_line(path)));
@@ -195,19 +197,16 @@ Run run_of(const RunOptions &options, const std::string &plan, int vendor)
     return run;
 }
 
-std::vector<Path> paths_of(const RunOptions &options, const CheckedPlan &checked)
+RoundPlan chosen_round(const RunOptions &options, const CheckedPlan &checked)
 {
     const Plan &plan = *checked.loaded.plan;
-    std::vector<Path> paths;
-    for (const std::string &text : options.paths) {
-        paths.push_back(parse_path(text, plan, checked.name, options.force));
-    }
+    const std::vector<Path> paths =
+        choose({options.paths, options.skips, options.as_group, options.force}, plan, checked.name);
     if (paths.empty() && !options.list) {
-        throw Failure(Cause::input,
-                      "no PATH given: say what to run, as root/group or root/group/item{}",
+        throw Failure(Cause::input, "{} has nothing to run{}", one_line(checked.name),
                       known_groups(plan));
     }
-    return paths;
+    return plan_round(paths, plan, options.as_group);
 }
 
 // A list asks nothing of the device but its vendor.
@@ -244,7 +243,7 @@ Exit run(RunOptions options)
     const Descriptor lock = options.list ? Descriptor(-1) : ready_device();
     const CheckedPlan checked = open_plan(options);
     const Plan &plan = *checked.loaded.plan;
-    const std::vector<Path> paths = paths_of(options, checked);
+    const RoundPlan round = chosen_round(options, checked);
     require_writable_results(options);
     choose_log(options.log);
     Signals signals;
@@ -253,12 +252,10 @@ Exit run(RunOptions options)
     std::optional<LibraryProcess> library(std::in_place);
     const int vendor = refer_to_doctor([&] { return ask_vendor(*library); });
     if (options.list) {
-        list_items(paths.empty() ? all_paths(plan) : paths, plan,
-                   vendor_suffix(vendor).value_or(""));
+        list_items(round, plan, vendor_suffix(vendor).value_or(""));
         return Exit::success;
     }
 
-    const RoundPlan round = plan_round(paths, plan, options.as_group);
     require_programs(names_of(round), vendor, options.force);
     const bool is_sent = checked.storing != Storing::as_file;
     const bool is_placed = !is_sent && !options.plan.empty();
@@ -307,6 +304,10 @@ void add_run(CLI::App &app, Action &chosen)
     CLI::App &command = add_subcommand(app, "run", "Store a plan and run groups or items of it",
                                        kRunExamples, chosen, [options] { return run(*options); });
     command.add_option("PATH", options->paths, "what to run")->type_name("");
+    command.add_option("--skip", options->skips, "leave out what this pattern of paths matches")
+        ->type_name("PATTERN")
+        ->allow_extra_args(false)
+        ->check(not_empty());
     command
         .add_option("--plan", options->plan,
                     "store this plan first ('-': standard input);\n"
@@ -342,9 +343,7 @@ void add_run(CLI::App &app, Action &chosen)
     command.add_flag("--until-fail", options->until_fail,
                      "end with the first item that does not pass;\n"
                      "begin another round until then");
-    command.add_flag("--list", options->list,
-                     "print what would be run and start nothing;\n"
-                     "without PATH, all that can be run");
+    command.add_flag("--list", options->list, "print what would be run and start nothing");
     command
         .add_option("--junit", options->junit,
                     "write the results as JUnit XML ('-': standard\n"

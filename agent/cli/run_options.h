@@ -13,7 +13,8 @@ namespace fptest
 
 struct RunOptions {
     std::string plan; // a file, "-" for standard input; empty: the stored plan
-    std::vector<std::string> paths;
+    std::vector<std::string> paths; // also patterns; none for every group
+    std::vector<std::string> skips;
     bool as_sent = false; // store the plan by a command, which may cut it
     bool as_group = false;
     bool list = false;

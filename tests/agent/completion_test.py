@@ -93,6 +93,7 @@ def test_what_needs_no_plan_is_offered_without_one(offered, tmp_path, words, exp
                       "demo/Gather", "demo/Gather/SensorProbe"]),
     (DEMO, "run --tap demo/Bringup demo/G", ["demo/Gather", "demo/Gather/SensorProbe"]),
     (DEMO, "run demo/Bringup/S", ["demo/Bringup/SpiCheck"]),
+    (DEMO, "run demo/Bringup --skip demo/Bringup/S", ["demo/Bringup/SpiCheck"]),
     # the root is called as anyone likes
     (DEMO, "run other/Ga", ["other/Gather", "other/Gather/SensorProbe"]),
     # groups, then their items
