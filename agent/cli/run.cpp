@@ -176,6 +176,9 @@ Runner::Options runner_options(const RunOptions &options)
     if (options.timeout) {
         runner.timeout = std::chrono::duration<double>(*options.timeout);
     }
+    if (options.limit) {
+        runner.limit = std::chrono::duration<double>(*options.limit);
+    }
     runner.grace = std::chrono::duration<double>(options.grace);
     runner.fail_on_exit_status = options.fail_on_exit_status;
     runner.on_second_interrupt = exit_at_once;
@@ -192,6 +195,8 @@ Run run_of(const RunOptions &options, const std::string &plan, int vendor)
     }
     run.time_limit = options.time_limit;
     run.until_fail = options.until_fail;
+    run.stop_after = options.stop_after;
+    run.limit = options.limit;
     run.pass_code = options.pass_code;
     run.vendor = vendor;
     return run;
@@ -293,7 +298,7 @@ Exit run(RunOptions options)
         return Exit::interrupted;
     }
     const Counts counts = count(run);
-    return counts.passed == counts.all() ? Exit::success : Exit::items_failed;
+    return run.finished && counts.passed == counts.all() ? Exit::success : Exit::items_failed;
 }
 
 } // namespace
@@ -343,6 +348,12 @@ void add_run(CLI::App &app, Action &chosen)
     command.add_flag("--until-fail", options->until_fail,
                      "end with the first item that does not pass;\n"
                      "begin another round until then");
+    command.add_option("--stop-after", options->stop_after, "end after N items that did not pass")
+        ->type_name("N")
+        ->transform(range(1, 1000000));
+    command.add_option("--limit", options->limit, "stop the whole run when this time is over")
+        ->type_name("TIME")
+        ->transform(time_span());
     command.add_flag("--list", options->list, "print what would be run and start nothing");
     command
         .add_option("--junit", options->junit,

@@ -27,6 +27,8 @@ struct RunOptions {
     std::optional<int> repeat;
     std::optional<double> time_limit; // seconds after which no new round begins
     bool until_fail = false;
+    std::optional<int> stop_after; // items that did not pass
+    std::optional<double> limit;   // seconds for the whole run
     int pass_code = 0;
     std::string junit; // files, "-" for standard output; empty for none
     std::string json;

@@ -117,6 +117,12 @@ class JsonReporter : public Reporter
         json["time_limit"] = seconds_or_null(run.time_limit);
         json["until_fail"] = run.until_fail;
         json["pass_code"] = run.pass_code;
+        if (run.stop_after) {
+            json["stop_after"] = *run.stop_after;
+        }
+        if (run.limit) {
+            json["limit"] = seconds_or_null(run.limit);
+        }
         json["start"] = timestamp(run.start);
         json["items"] = std::move(items);
         write(json);

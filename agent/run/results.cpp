@@ -63,7 +63,8 @@ bool has_rounds(const Run &run)
 
 bool has_fixed_rounds(const Run &run)
 {
-    return run.rounds && !run.time_limit && !run.until_fail;
+    return run.rounds && !run.time_limit && !run.until_fail &&
+           (!run.stop_after || !has_rounds(run));
 }
 
 std::size_t rounds_to_come(const Run &run)

@@ -84,6 +84,8 @@ struct Run {
     std::optional<int> rounds = 1;    // at most; nullopt for no limit
     std::optional<double> time_limit; // seconds after which no round begins
     bool until_fail = false;          // end with the first item that does not pass
+    std::optional<int> stop_after;    // so many that did not pass
+    std::optional<double> limit;      // seconds after which the run is stopped
     int pass_code = 0;
     int vendor = 0;
     std::vector<Suite> suites;    // of the round

@@ -59,7 +59,7 @@ class Rounds
             if (!runner_.run(job)) {
                 return false;
             }
-            if (run_.until_fail && has_failed(job)) {
+            if ((run_.until_fail && has_failed(job)) || has_failed_enough()) {
                 break;
             }
         }
@@ -82,6 +82,17 @@ class Rounds
         }
         const ItemRun &item = item_at(run_, {job.suite, (*failed)->item});
         run_.why_ended = one_line(title(run_, item)) + " did not pass (--until-fail)";
+        return true;
+    }
+
+    bool has_failed_enough()
+    {
+        const std::size_t failed = run_.stop_after ? count(run_).failed : 0;
+        if (!run_.stop_after || failed < static_cast<std::size_t>(*run_.stop_after)) {
+            return false;
+        }
+        run_.why_ended = fmt::format("{} did not pass (--stop-after {})", plural(failed, "item"),
+                                     *run_.stop_after);
         return true;
     }
 

@@ -139,7 +139,7 @@ bool Runner::run(const Job &job)
 // A command that returns without reaching its items is no success, whatever the cause.
 void Runner::require_all_started()
 {
-    for (; running_.next < running_.job.targets.size() && signal_ == 0; ++running_.next) {
+    for (; running_.next < running_.job.targets.size() && !is_stopping(); ++running_.next) {
         if (!running_.job.targets[running_.next]) {
             continue;
         }
@@ -309,7 +309,7 @@ void Runner::start_next(const LibraryProcess::Event &event)
         active.reporting.expected = active.starts_gatherer;
     }
     active.start = on_run_clock(event.time);
-    if (signal_ != 0) {
+    if (is_stopping()) {
         active.stop = Outcome::stopped;
         active.stop_wanted_at = now();
     }
@@ -407,9 +407,10 @@ void Runner::finish(RunningItem &active, TimePoint end)
     if (!active.stop && options_.timeout && *result.seconds > options_.timeout->count()) {
         active.stop = Outcome::timed_out; // ended before the limit was checked
     }
-    const Verdict verdict = judge(active, result,
-                                  {run_.pass_code, vendor_, options_.timeout,
-                                   options_.fail_on_exit_status, signal_, library_gone_});
+    const Verdict verdict =
+        judge(active, result,
+              {run_.pass_code, vendor_, options_.timeout, options_.fail_on_exit_status, signal_,
+               library_gone_, over_limit_});
     result.outcome = verdict.outcome;
     result.reason = verdict.reason;
     result.overruled = verdict.overruled;
