@@ -30,6 +30,7 @@
 #include <memory>
 #include <optional>
 #include <poll.h>
+#include <random>
 #include <string>
 #include <unistd.h>
 #include <utility>
@@ -202,7 +203,22 @@ Run run_of(const RunOptions &options, const std::string &plan, int vendor)
     return run;
 }
 
-RoundPlan chosen_round(const RunOptions &options, const CheckedPlan &checked)
+// Chosen here unless the command line says it.
+std::optional<int> seed_of(const RunOptions &options)
+{
+    if (options.shuffle.empty()) {
+        return std::nullopt;
+    }
+    if (options.shuffle != "true") {
+        return std::stoi(options.shuffle);
+    }
+    const int seed = static_cast<int>(std::random_device()() % (kSeedLimit + 1));
+    say("shuffled with seed {0}: --shuffle={0} runs this order again", seed);
+    return seed;
+}
+
+RoundPlan chosen_round(const RunOptions &options, const CheckedPlan &checked,
+                       std::optional<int> seed)
 {
     const Plan &plan = *checked.loaded.plan;
     const std::vector<Path> paths =
@@ -211,7 +227,8 @@ RoundPlan chosen_round(const RunOptions &options, const CheckedPlan &checked)
         throw Failure(Cause::input, "{} has nothing to run{}", one_line(checked.name),
                       known_groups(plan));
     }
-    return plan_round(paths, plan, options.as_group);
+    const RoundPlan round = plan_round(paths, plan, options.as_group);
+    return seed ? shuffled(round, *seed) : round;
 }
 
 // A list asks nothing of the device but its vendor.
@@ -248,7 +265,8 @@ Exit run(RunOptions options)
     const Descriptor lock = options.list ? Descriptor(-1) : ready_device();
     const CheckedPlan checked = open_plan(options);
     const Plan &plan = *checked.loaded.plan;
-    const RoundPlan round = chosen_round(options, checked);
+    const std::optional<int> seed = seed_of(options);
+    const RoundPlan round = chosen_round(options, checked, seed);
     require_writable_results(options);
     choose_log(options.log);
     Signals signals;
@@ -289,6 +307,7 @@ Exit run(RunOptions options)
         }
     };
     Run run = run_of(options, checked.name, vendor);
+    run.seed = seed;
     const auto owned = make_reporters(options);
     std::vector<Reporter *> reporters;
     for (const auto &reporter : owned) {
@@ -354,6 +373,12 @@ void add_run(CLI::App &app, Action &chosen)
     command.add_option("--limit", options->limit, "stop the whole run when this time is over")
         ->type_name("TIME")
         ->transform(time_span());
+    command
+        .add_flag("--shuffle", options->shuffle,
+                  "in another order: by chance, or the one of\n"
+                  "this SEED: --shuffle=SEED")
+        ->disable_flag_override(false)
+        ->check(order_seed());
     command.add_flag("--list", options->list, "print what would be run and start nothing");
     command
         .add_option("--junit", options->junit,

@@ -12,9 +12,10 @@ namespace fptest
 {
 
 struct RunOptions {
-    std::string plan; // a file, "-" for standard input; empty: the stored plan
+    std::string plan;               // a file, "-" for standard input; empty: the stored plan
     std::vector<std::string> paths; // also patterns; none for every group
     std::vector<std::string> skips;
+    std::string shuffle;  // a seed, "true" for any; empty for the plan's order
     bool as_sent = false; // store the plan by a command, which may cut it
     bool as_group = false;
     bool list = false;

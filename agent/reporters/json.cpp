@@ -123,6 +123,9 @@ class JsonReporter : public Reporter
         if (run.limit) {
             json["limit"] = seconds_or_null(run.limit);
         }
+        if (run.seed) {
+            json["seed"] = *run.seed;
+        }
         json["start"] = timestamp(run.start);
         json["items"] = std::move(items);
         write(json);

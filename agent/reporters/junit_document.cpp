@@ -206,8 +206,11 @@ std::string test_suite(const Run &run, std::size_t number, const std::vector<Lat
     const std::string indent(6, ' ');
     std::string inside = property(indent, "plan", run.plan) +
                          property(indent, "vendor", std::to_string(run.vendor)) +
-                         property(indent, "pass_code", std::to_string(run.pass_code)) +
-                         kStateGoesHere;
+                         property(indent, "pass_code", std::to_string(run.pass_code));
+    if (run.seed) {
+        inside += property(indent, "seed", std::to_string(*run.seed));
+    }
+    inside += kStateGoesHere;
     for (const LateReport &one : late) {
         if (one.suite == number) {
             inside += property(indent, "late_report", one.text);

@@ -146,6 +146,9 @@ class TapReporter : public Reporter
         if (has_fixed_rounds(run)) {
             write(plan_line(run.suites.size() * static_cast<std::size_t>(*run.rounds)));
         }
+        if (run.seed) {
+            write(comment(by_seed(run)));
+        }
     }
 
     void started(const Run &run, Place place) override

@@ -60,8 +60,14 @@ std::string heading(const Run &run)
     for (const Suite &suite : run.suites) {
         items += suite.items.size();
     }
-    return fmt::format("{}: {}, vendor {}{}", one_line(run.plan), plural(items, "item"), run.vendor,
-                       has_rounds(run) ? ", " + rounds(run) : "");
+    return fmt::format("{}: {}, vendor {}{}{}", one_line(run.plan), plural(items, "item"),
+                       run.vendor, has_rounds(run) ? ", " + rounds(run) : "",
+                       run.seed ? ", " + by_seed(run) : "");
+}
+
+std::string by_seed(const Run &run)
+{
+    return fmt::format("shuffled with seed {}", run.seed.value_or(0));
 }
 
 std::string total(const Run &run)

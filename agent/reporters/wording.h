@@ -18,6 +18,9 @@ namespace fptest
 // "plans/demo.xml: 4 items, vendor 0, 3 rounds"
 std::string heading(const Run &run);
 
+// "shuffled with seed 42"
+std::string by_seed(const Run &run);
+
 // "3 passed, 1 failed, 2 to go, 12.0 s"
 std::string total(const Run &run);
 // Its parts: "3 passed" and "1 failed"; ", 2 to go, 12.0 s".

@@ -8,6 +8,8 @@
 
 #include <algorithm>
 #include <fnmatch.h>
+#include <random>
+#include <utility>
 
 namespace fptest
 {
@@ -169,6 +171,39 @@ bool PathPattern::matches_some_of(const Plan &plan) const
 std::vector<Path> choose(const Choice &choice, const Plan &plan, const std::string &plan_name)
 {
     return Chooser(choice, plan, plan_name).chosen();
+}
+
+RoundPlan shuffled(const RoundPlan &round, int seed)
+{
+    // std::shuffle differs from one C++ library to another
+    std::mt19937 random(static_cast<std::mt19937::result_type>(seed));
+    const auto shuffle = [&random](auto &list) {
+        for (std::size_t rest = list.size(); rest > 1; --rest) {
+            std::swap(list[rest - 1], list[random() % rest]);
+        }
+    };
+    std::vector<std::vector<Job>> jobs(round.suites.size());
+    for (const Job &job : round.jobs) {
+        jobs[job.suite].push_back(job);
+    }
+    std::ranges::for_each(jobs, shuffle);
+    shuffle(jobs);
+    RoundPlan all;
+    for (std::vector<Job> &of_suite : jobs) {
+        const Suite &from = round.suites[of_suite.front().suite];
+        Suite &to = all.suites.emplace_back(Suite{from.group, {}});
+        for (Job &job : of_suite) {
+            job.suite = all.suites.size() - 1;
+            for (auto &target : job.targets) {
+                if (target) {
+                    to.items.push_back(from.items[target->item]);
+                    target->item = to.items.size() - 1;
+                }
+            }
+            all.jobs.push_back(std::move(job));
+        }
+    }
+    return all;
 }
 
 } // namespace fptest

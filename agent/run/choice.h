@@ -42,4 +42,9 @@ class PathPattern
 // leads to nothing.
 std::vector<Path> choose(const Choice &choice, const Plan &plan, const std::string &plan_name);
 
+inline constexpr int kSeedLimit = 999999;
+
+// The suites in another order, and the jobs of each: the same for a seed on every device.
+RoundPlan shuffled(const RoundPlan &round, int seed);
+
 } // namespace fptest

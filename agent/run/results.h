@@ -86,6 +86,7 @@ struct Run {
     bool until_fail = false;          // end with the first item that does not pass
     std::optional<int> stop_after;    // so many that did not pass
     std::optional<double> limit;      // seconds after which the run is stopped
+    std::optional<int> seed;          // of the order
     int pass_code = 0;
     int vendor = 0;
     std::vector<Suite> suites;    // of the round
