@@ -197,6 +197,7 @@ Run run_of(const RunOptions &options, const std::string &plan, int vendor)
     run.time_limit = options.time_limit;
     run.until_fail = options.until_fail;
     run.stop_after = options.stop_after;
+    run.retries = options.retries;
     run.limit = options.limit;
     run.pass_code = options.pass_code;
     run.vendor = vendor;
@@ -217,6 +218,19 @@ std::optional<int> seed_of(const RunOptions &options)
     return seed;
 }
 
+// Only an item that has a command of its own can be run again.
+void require_single_items(const RoundPlan &round)
+{
+    for (const Job &job : round.jobs) {
+        if (job.targets.size() > 1) {
+            throw Failure(Cause::input,
+                          "--retry runs items by their own paths, and {} runs as one command: "
+                          "leave --as-group out, or see fptest check",
+                          in_quotes(job.path));
+        }
+    }
+}
+
 RoundPlan chosen_round(const RunOptions &options, const CheckedPlan &checked,
                        std::optional<int> seed)
 {
@@ -228,6 +242,9 @@ RoundPlan chosen_round(const RunOptions &options, const CheckedPlan &checked,
                       known_groups(plan));
     }
     const RoundPlan round = plan_round(paths, plan, options.as_group);
+    if (options.retries > 0) {
+        require_single_items(round);
+    }
     return seed ? shuffled(round, *seed) : round;
 }
 
@@ -317,7 +334,7 @@ Exit run(RunOptions options)
         return Exit::interrupted;
     }
     const Counts counts = count(run);
-    return run.finished && counts.passed == counts.all() ? Exit::success : Exit::items_failed;
+    return run.finished && !counts.has_failures() ? Exit::success : Exit::items_failed;
 }
 
 } // namespace
@@ -367,6 +384,12 @@ void add_run(CLI::App &app, Action &chosen)
     command.add_flag("--until-fail", options->until_fail,
                      "end with the first item that does not pass;\n"
                      "begin another round until then");
+    command
+        .add_option("--retry", options->retries,
+                    "try an item that does not pass again, up to\n"
+                    "N times")
+        ->type_name("N")
+        ->transform(range(1, 1000));
     command.add_option("--stop-after", options->stop_after, "end after N items that did not pass")
         ->type_name("N")
         ->transform(range(1, 1000000));

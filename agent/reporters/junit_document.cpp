@@ -75,6 +75,7 @@ void add(TestCounts &tests, const Run &run, const Suite &suite)
         ++tests.all;
         switch (item.outcome) {
         case Outcome::passed:
+        case Outcome::flaky:
             break;
         case Outcome::not_run:
             ++(run.finished ? tests.skipped : tests.errors);
@@ -137,19 +138,33 @@ std::string not_run(const Run &run, bool was_running)
                              attribute("type", was_running ? "running" : "not run"), message);
 }
 
-std::string verdict(const Run &run, const ItemRun &item)
+// The elements are those for a failed item and for any other.
+std::string failure(const ItemRun &item, const char *if_failed, const char *otherwise,
+                    const std::string &text)
 {
-    if (item.outcome == Outcome::passed) {
-        return "";
-    }
-    if (item.outcome == Outcome::not_run) {
-        return not_run(run, item.start.has_value());
-    }
     const bool has_failed = item.outcome == Outcome::failed;
-    return fmt::format("      <{0}{1}{2}>{3}</{0}>\n", has_failed ? "failure" : "error",
+    return fmt::format("      <{0}{1}{2}>{3}</{0}>\n", has_failed ? if_failed : otherwise,
                        attribute("type", has_failed ? "result" : word(item.outcome)),
                        attribute("message", item.reason.empty() ? word(item.outcome) : item.reason),
-                       xml_escaped(details(item)));
+                       xml_escaped(text));
+}
+
+// With the elements that Surefire has for attempts before the last one.
+std::string verdict(const Run &run, const ItemRun &item)
+{
+    std::string text;
+    if (item.outcome == Outcome::not_run) {
+        text = not_run(run, item.start.has_value());
+    } else if (!is_success(item.outcome)) {
+        text = failure(item, "failure", "error", details(item));
+    }
+    for (const ItemRun &one : item.earlier) {
+        const std::string output = one.output.empty() ? "" : "output:\n" + one.output;
+        text += item.outcome == Outcome::flaky
+                    ? failure(one, "flakyFailure", "flakyError", details(one) + output)
+                    : failure(one, "rerunFailure", "rerunError", details(one) + output);
+    }
+    return text;
 }
 
 std::string test_case(const Run &run, const ItemRun &item)
@@ -160,10 +175,16 @@ std::string test_case(const Run &run, const ItemRun &item)
     const Value result = report.result_without_value ? Value("") : report.result;
     const Value status = item.exit_status ? Value(std::to_string(*item.exit_status)) : Value();
     const Value signal = item.signal != 0 ? Value(name_of_signal(item.signal)) : Value();
+    const bool is_flaky = item.outcome == Outcome::flaky;
+    const Value outcome = is_flaky ? Value(word(item.outcome)) : Value();
+    const Value reason = is_flaky ? Value(item.reason) : Value();
+    const Value attempts =
+        run.retries > 0 ? Value(std::to_string(item.earlier.size() + 1)) : Value();
     const Value left = item.left_running.empty() ? Value() : Value(left_running(item));
     const std::string inside =
-        property(indent, "progress", report.progress) + property(indent, "result", result) +
-        property(indent, "description", report.description) +
+        property(indent, "outcome", outcome) + property(indent, "reason", reason) +
+        property(indent, "attempts", attempts) + property(indent, "progress", report.progress) +
+        property(indent, "result", result) + property(indent, "description", report.description) +
         property(indent, "exit_status", status) + property(indent, "signal", signal) +
         property(indent, "left_running", left);
     const std::string output =
@@ -209,6 +230,11 @@ std::string test_suite(const Run &run, std::size_t number, const std::vector<Lat
                          property(indent, "pass_code", std::to_string(run.pass_code));
     if (run.seed) {
         inside += property(indent, "seed", std::to_string(*run.seed));
+    }
+    if (run.retries > 0) {
+        const Counts counts = count(suite.items);
+        inside += property(indent, "flaky", std::to_string(counts.flaky)) +
+                  property(indent, "retries", std::to_string(counts.retries));
     }
     inside += kStateGoesHere;
     for (const LateReport &one : late) {

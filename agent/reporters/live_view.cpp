@@ -89,7 +89,11 @@ class LiveView : public Reporter
         std::erase(running_, place);
         const ItemRun &item = item_at(run, place);
         std::string said = how_it_ended(item);
-        const std::string more = remark(item);
+        std::string more = remark(item);
+        if (!is_success(item.outcome)) {
+            const std::string attempt = attempt_of(run, item);
+            more = attempt + (attempt.empty() || more.empty() ? "" : ": ") + more;
+        }
         said += (said.empty() || more.empty() ? "" : ": ") + more;
         Line line = item_line(item);
         const bool has_room = display_width(said) <= line.room();
@@ -101,12 +105,17 @@ class LiveView : public Reporter
         if (const std::string left = left_running_line(item); !left.empty()) {
             keep_text("      " + left, Colour::yellow);
         }
-        if (item.outcome != Outcome::passed) {
+        if (!is_success(item.outcome)) {
             for (const std::string &text : last_lines(item.output)) {
                 keep_text("    | " + text);
             }
         }
         draw(run);
+    }
+
+    void retried(const Run &run, Place place) override
+    {
+        ended(run, place);
     }
 
     void late(const Run &run, Place place, const ItemReport &report) override

@@ -60,28 +60,12 @@ class PlainView : public Reporter
 
     void ended(const Run &run, Place place) override
     {
-        runs_ = runs_ && place != place_;
-        const ItemRun &item = item_at(run, place);
-        const bool passed = item.outcome == Outcome::passed;
-        if (quiet_ && passed && item.left_running.empty()) {
-            return;
-        }
-        std::string text = fmt::format("{}: {}{}", one_line(title(run, item)), word(item.outcome),
-                                       reported_result(item.report));
-        if (const std::string how = how_it_ended(item); !how.empty()) {
-            text += ", " + how;
-        }
-        if (item.seconds) {
-            text += ", " + duration(*item.seconds);
-        }
-        const std::string said = remark(item);
-        print(text + (said.empty() ? "" : ": " + said));
-        if (const std::string left = left_running_line(item); !left.empty()) {
-            print("    " + left);
-        }
-        if (!passed) {
-            print_output(item.output);
-        }
+        show_end(run, place, "");
+    }
+
+    void retried(const Run &run, Place place) override
+    {
+        show_end(run, place, attempt_of(run, item_at(run, place)) + ": ");
     }
 
     void late(const Run &run, Place place, const ItemReport &report) override
@@ -113,6 +97,36 @@ class PlainView : public Reporter
     }
 
   private:
+    // How an attempt has ended that is not the last one is said before.
+    void show_end(const Run &run, Place place, const std::string &attempt)
+    {
+        runs_ = runs_ && place != place_;
+        const ItemRun &item = item_at(run, place);
+        const bool passed = item.outcome == Outcome::passed;
+        if (quiet_ && passed && item.left_running.empty()) {
+            return;
+        }
+        std::string text = fmt::format("{}: {}{}{}", one_line(title(run, item)), attempt,
+                                       word(item.outcome), reported_result(item.report));
+        if (const std::string how = how_it_ended(item); !how.empty()) {
+            text += ", " + how;
+        }
+        if (attempt.empty() && !item.earlier.empty()) {
+            text += ", " + attempt_of(run, item);
+        }
+        if (item.seconds) {
+            text += ", " + duration(*item.seconds);
+        }
+        const std::string said = remark(item);
+        print(text + (said.empty() ? "" : ": " + said));
+        if (const std::string left = left_running_line(item); !left.empty()) {
+            print("    " + left);
+        }
+        if (!is_success(item.outcome)) {
+            print_output(item.output);
+        }
+    }
+
     // What is new since it was last shown. Once the start of the output has been
     // dropped nobody knows, and the last lines are shown again.
     std::string_view new_output(const std::string &output) const

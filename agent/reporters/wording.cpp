@@ -89,7 +89,15 @@ std::string rest_of_total(const Run &run)
                              : has_ended(run)        ? ""
                              : has_fixed_rounds(run) ? fmt::format(", {} to go", counts.not_run)
                                                      : fmt::format(", round {}", run.round);
-    return fmt::format("{}, {}", rest, duration(run.seconds));
+    return fmt::format("{}{}, {}", tally_of_retries(run), rest, duration(run.seconds));
+}
+
+std::string tally_of_retries(const Run &run)
+{
+    const Counts counts = count(run);
+    return run.retries == 0 ? ""
+                            : fmt::format(", {} flaky, {} {}", counts.flaky, counts.retries,
+                                          counts.retries == 1 ? "retry" : "retries");
 }
 
 std::string not_finished(const Run &run)
@@ -136,10 +144,16 @@ std::string reported_result(const ItemReport &report)
     return has_result(report) ? fmt::format(", result {}", result_of(report)) : "";
 }
 
+std::string attempt_of(const Run &run, const ItemRun &item)
+{
+    return run.retries == 0
+               ? ""
+               : fmt::format("attempt {} of {}", item.earlier.size() + 1, run.retries + 1);
+}
+
 std::string remark(const ItemRun &item)
 {
-    const bool explained = item.outcome == Outcome::no_result ||
-                           item.outcome == Outcome::timed_out || item.outcome == Outcome::stopped;
+    const bool explained = item.outcome != Outcome::passed && item.outcome != Outcome::failed;
     std::string text = one_line(item.report.description.value_or(""));
     if (text.empty() && item.signal != 0 && !explained) {
         return {}; // how_it_ended() says it

@@ -26,6 +26,8 @@ std::string total(const Run &run);
 // Its parts: "3 passed" and "1 failed"; ", 2 to go, 12.0 s".
 std::pair<std::string, std::string> tally(const Counts &counts);
 std::string rest_of_total(const Run &run);
+// ", 1 flaky, 2 retries"; empty without retries.
+std::string tally_of_retries(const Run &run);
 
 // "not finished: interrupted", "ended: G/X did not pass"; empty if that is not so.
 std::string not_finished(const Run &run);
@@ -45,6 +47,9 @@ std::string result_of(const ItemReport &report);
 
 // ", result 0"; empty if none was reported.
 std::string reported_result(const ItemReport &report);
+
+// "attempt 2 of 3"; empty without retries.
+std::string attempt_of(const Run &run, const ItemRun &item);
 
 // The item's description, the reason for its outcome, or both.
 std::string remark(const ItemRun &item);

@@ -24,6 +24,7 @@ enum class Outcome {
     no_result, // it ended without reporting a result
     timed_out, // it took too long
     stopped,   // with the run
+    flaky,     // it passed when it was tried again
 };
 
 // One item of a run.
@@ -43,7 +44,15 @@ struct ItemRun {
     int signal = 0;
     bool overruled = false; // it failed whatever it reported; see the reason
     std::vector<Leftover> left_running = {};
+    std::vector<ItemRun> earlier = {}; // attempts, which did not pass
 };
+
+// Whether the run is as good for it: it passed, if not at once.
+bool is_success(Outcome outcome);
+// It is to be tried again: what it has been becomes an earlier attempt.
+void begin_attempt(ItemRun &item);
+// What it is again where the run has ended before that.
+void take_back_attempt(ItemRun &item);
 
 // Items of one group that run in a row.
 struct Suite {
@@ -55,16 +64,24 @@ struct Counts {
     std::size_t passed = 0;
     std::size_t failed = 0; // also no result, timed out and stopped
     std::size_t not_run = 0;
+    std::size_t flaky = 0;
+    std::size_t retries = 0; // attempts beside those
 
     std::size_t all() const
     {
-        return passed + failed + not_run;
+        return passed + failed + not_run + flaky;
+    }
+    bool has_failures() const
+    {
+        return failed + not_run > 0;
     }
     Counts &operator+=(const Counts &more)
     {
         passed += more.passed;
         failed += more.failed;
         not_run += more.not_run;
+        flaky += more.flaky;
+        retries += more.retries;
         return *this;
     }
 };
@@ -74,7 +91,7 @@ struct Summary {
     std::string group;
     std::string name;
     std::size_t passed = 0;
-    DurationStats times; // of each run of it
+    DurationStats times; // of each attempt
 };
 
 // Holds the current round only.
@@ -87,6 +104,7 @@ struct Run {
     std::optional<int> stop_after;    // so many that did not pass
     std::optional<double> limit;      // seconds after which the run is stopped
     std::optional<int> seed;          // of the order
+    int retries = 0;                  // of an item that does not pass
     int pass_code = 0;
     int vendor = 0;
     std::vector<Suite> suites;    // of the round
@@ -128,7 +146,7 @@ std::size_t rounds_to_come(const Run &run);
 // Adds the current round to the summary.
 void summarize(Run &run);
 
-// "passed", "failed", "no result", "timed out", "stopped", "not run"
+// "passed", "failed", "no result", "timed out", "stopped", "not run", "flaky"
 const char *word(Outcome outcome);
 
 // "SIGSEGV", "signal 40"
@@ -142,7 +160,8 @@ std::string title(const Run &run, const Suite &suite);
 // "Bringup/SpiCheck", or "Bringup/SpiCheck (round 2)"
 std::string title(const Run &run, const ItemRun &item);
 
-// Is called in this order: begin; for each item started, any number of progressed, ended;
+// Is called in this order: begin; for each item started, any number of progressed, ended, or
+// retried and all of that again;
 // round_over between two rounds; finish, even if items did not run. The run is up to date at
 // each call. No call may wait long for the reader of what the reporter writes.
 class Reporter
@@ -159,6 +178,11 @@ class Reporter
     virtual void finish(const Run &run) = 0;
 
     virtual void progressed(const Run & /* run */, Place /* place */)
+    {
+    }
+
+    // In the place of ended: the item will be started again.
+    virtual void retried(const Run & /* run */, Place /* place */)
     {
     }
 

@@ -21,6 +21,11 @@ namespace
 
 using Clock = std::chrono::steady_clock;
 
+bool is_between_attempts(const ItemRun &item)
+{
+    return item.outcome == Outcome::not_run && !item.earlier.empty();
+}
+
 class Rounds
 {
   public:
@@ -54,11 +59,13 @@ class Rounds
     bool run_one()
     {
         for (Job job : plan_.jobs) {
-            runner_.make_way_for(job);
-            job.mark = clear_reports(job.elements());
-            if (!runner_.run(job)) {
-                return false;
-            }
+            do {
+                runner_.make_way_for(job);
+                job.mark = clear_reports(job.elements());
+                if (!runner_.run(job)) {
+                    return false;
+                }
+            } while (is_tried_again(job));
             if ((run_.until_fail && has_failed(job)) || has_failed_enough()) {
                 break;
             }
@@ -75,7 +82,7 @@ class Rounds
     bool has_failed(const Job &job)
     {
         const auto failed = std::ranges::find_if(job.targets, [&](const auto &target) {
-            return target && item_at(run_, {job.suite, target->item}).outcome != Outcome::passed;
+            return target && !is_success(item_at(run_, {job.suite, target->item}).outcome);
         });
         if (failed == job.targets.end()) {
             return false;
@@ -83,6 +90,13 @@ class Rounds
         const ItemRun &item = item_at(run_, {job.suite, (*failed)->item});
         run_.why_ended = one_line(title(run_, item)) + " did not pass (--until-fail)";
         return true;
+    }
+
+    bool is_tried_again(const Job &job) const
+    {
+        return std::ranges::any_of(job.targets, [&](const auto &target) {
+            return target && is_between_attempts(item_at(run_, {job.suite, target->item}));
+        });
     }
 
     bool has_failed_enough()
@@ -159,6 +173,13 @@ bool flush(const std::vector<Reporter *> &reporters, Signals &signals, bool is_i
 
 void finish(Run &run, const std::vector<Reporter *> &reporters)
 {
+    for (Suite &suite : run.suites) {
+        for (ItemRun &item : suite.items) {
+            if (is_between_attempts(item)) {
+                take_back_attempt(item);
+            }
+        }
+    }
     summarize(run);
     for (Reporter *reporter : reporters) {
         reporter->finish(run);

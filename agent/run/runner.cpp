@@ -154,9 +154,7 @@ void Runner::require_all_started()
         result.reason = library_gone_.empty()
                             ? "the library never reached it; run with --log FILE to see why"
                             : fmt::format("the library never reached it: {}", library_gone_);
-        for (Reporter *reporter : reporters_) {
-            reporter->ended(run_, place);
-        }
+        notify_end_of(place);
     }
 }
 
@@ -433,9 +431,30 @@ void Runner::notify_ended()
     while (!running_.items.empty() && running_.items.front().done) {
         const Place place = running_.items.front().place;
         running_.items.pop_front();
-        for (Reporter *reporter : reporters_) {
-            reporter->ended(run_, place);
-        }
+        notify_end_of(place);
+    }
+}
+
+// An item that is tried again has not ended.
+void Runner::notify_end_of(Place place)
+{
+    ItemRun &item = item_at(run_, place);
+    if (item.outcome == Outcome::passed && !item.earlier.empty()) {
+        const ItemRun &before = item.earlier.back();
+        item.outcome = Outcome::flaky;
+        item.reason =
+            fmt::format("passed on attempt {}; before, it {} {}{}", item.earlier.size() + 1,
+                        before.outcome == Outcome::no_result ? "had" : "was", word(before.outcome),
+                        before.reason.empty() ? "" : ": " + before.reason);
+    }
+    const bool is_tried_again = !is_success(item.outcome) && item.outcome != Outcome::stopped &&
+                                run_.why_unfinished.empty() &&
+                                item.earlier.size() < static_cast<std::size_t>(run_.retries);
+    for (Reporter *reporter : reporters_) {
+        is_tried_again ? reporter->retried(run_, place) : reporter->ended(run_, place);
+    }
+    if (is_tried_again) {
+        begin_attempt(item);
     }
 }
 

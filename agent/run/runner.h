@@ -114,6 +114,7 @@ class Runner
     template <typename Find> void end_all(const Find &find);
     void finish(RunningItem &active, TimePoint end);
     void notify_ended();
+    void notify_end_of(Place place);
     void tick();
 
     LibraryProcess &library_;

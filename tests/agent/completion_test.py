@@ -79,7 +79,8 @@ def test_every_option_is_offered_that_the_help_tells(offered, command):
     ("report G I --result -", ["-2"]),
     # numbers, words
     *((words, []) for words in (
-        "run --timeout ''", "run --for ''", "run --limit ''", "run --stop-after ''", "run --repeat ''", "report --progress ''",
+        "run --timeout ''", "run --for ''", "run --limit ''", "run --stop-after ''",
+        "run --retry ''", "run --repeat ''", "report --progress ''",
         "report --description ''", "send ''", "report Bringup SpiCheck ''")),
 ])
 def test_what_needs_no_plan_is_offered_without_one(offered, tmp_path, words, expected):
