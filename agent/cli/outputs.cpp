@@ -38,6 +38,7 @@ std::vector<std::string> results_on_standard_output(const RunOptions &options)
 void resolve_output_conflicts(RunOptions &options)
 {
     require_different({{"--plan", options.plan == "-" ? kStandardInput : options.plan},
+                       {"--expect", options.expect == "-" ? kStandardInput : options.expect},
                        {"--json", options.json},
                        {"--junit", options.junit},
                        log_file(options.log)});

@@ -17,6 +17,7 @@
 #include "plan/plan.h"
 #include "plan/plan_text.h"
 #include "run/choice.h"
+#include "run/known_failures.h"
 #include "run/planner.h"
 #include "run/rounds.h"
 #include "run/runner.h"
@@ -198,6 +199,7 @@ Run run_of(const RunOptions &options, const std::string &plan, int vendor)
     run.until_fail = options.until_fail;
     run.stop_after = options.stop_after;
     run.retries = options.retries;
+    run.has_expectations = !options.expect.empty();
     run.limit = options.limit;
     run.pass_code = options.pass_code;
     run.vendor = vendor;
@@ -241,7 +243,10 @@ RoundPlan chosen_round(const RunOptions &options, const CheckedPlan &checked,
         throw Failure(Cause::input, "{} has nothing to run{}", one_line(checked.name),
                       known_groups(plan));
     }
-    const RoundPlan round = plan_round(paths, plan, options.as_group);
+    RoundPlan round = plan_round(paths, plan, options.as_group);
+    if (!options.expect.empty()) {
+        expect_failures(options.expect, plan, checked.name, round);
+    }
     if (options.retries > 0) {
         require_single_items(round);
     }
@@ -384,6 +389,13 @@ void add_run(CLI::App &app, Action &chosen)
     command.add_flag("--until-fail", options->until_fail,
                      "end with the first item that does not pass;\n"
                      "begin another round until then");
+    command
+        .add_option("--expect", options->expect,
+                    "what is known to fail: a path or pattern and\n"
+                    "the reason on each line")
+        ->type_name("FILE")
+        ->transform(desk_file())
+        ->check(not_empty());
     command
         .add_option("--retry", options->retries,
                     "try an item that does not pass again, up to\n"

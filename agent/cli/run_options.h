@@ -28,6 +28,7 @@ struct RunOptions {
     std::optional<int> repeat;
     std::optional<double> time_limit; // seconds after which no new round begins
     bool until_fail = false;
+    std::string expect;            // a file of known failures
     int retries = 0;               // of an item that does not pass
     std::optional<int> stop_after; // items that did not pass
     std::optional<double> limit;   // seconds for the whole run

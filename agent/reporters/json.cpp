@@ -198,6 +198,9 @@ class JsonReporter : public Reporter
             json["flaky"] = counts.flaky;
             json["retries"] = counts.retries;
         }
+        if (run.has_expectations) {
+            json["expected"] = counts.expected;
+        }
         json["seconds"] = seconds_or_null(run.seconds);
         json["summary"] = summary_of(run);
         write(json);
@@ -263,6 +266,9 @@ class JsonReporter : public Reporter
         add_end(json, item);
         json["output"] = sanitize_utf8(item.output);
         add_attempt(json, run, place);
+        if (!item.expected.empty()) {
+            json["expected"] = sanitize_utf8(item.expected);
+        }
         write(json);
     }
 

@@ -77,10 +77,14 @@ void add(TestCounts &tests, const Run &run, const Suite &suite)
         case Outcome::passed:
         case Outcome::flaky:
             break;
+        case Outcome::expected:
+            ++tests.skipped;
+            break;
         case Outcome::not_run:
             ++(run.finished ? tests.skipped : tests.errors);
             break;
         case Outcome::failed:
+        case Outcome::unexpected:
             ++tests.failures;
             break;
         case Outcome::no_result:
@@ -142,11 +146,12 @@ std::string not_run(const Run &run, bool was_running)
 std::string failure(const ItemRun &item, const char *if_failed, const char *otherwise,
                     const std::string &text)
 {
-    const bool has_failed = item.outcome == Outcome::failed;
-    return fmt::format("      <{0}{1}{2}>{3}</{0}>\n", has_failed ? if_failed : otherwise,
-                       attribute("type", has_failed ? "result" : word(item.outcome)),
-                       attribute("message", item.reason.empty() ? word(item.outcome) : item.reason),
-                       xml_escaped(text));
+    const bool has_failed = item.outcome == Outcome::failed || item.outcome == Outcome::unexpected;
+    return fmt::format(
+        "      <{0}{1}{2}>{3}</{0}>\n", has_failed ? if_failed : otherwise,
+        attribute("type", item.outcome == Outcome::failed ? "result" : word(item.outcome)),
+        attribute("message", item.reason.empty() ? word(item.outcome) : item.reason),
+        xml_escaped(text));
 }
 
 // With the elements that Surefire has for attempts before the last one.
@@ -155,6 +160,8 @@ std::string verdict(const Run &run, const ItemRun &item)
     std::string text;
     if (item.outcome == Outcome::not_run) {
         text = not_run(run, item.start.has_value());
+    } else if (item.outcome == Outcome::expected) {
+        text = failure(item, "", "skipped", details(item));
     } else if (!is_success(item.outcome)) {
         text = failure(item, "failure", "error", details(item));
     }
@@ -176,15 +183,17 @@ std::string test_case(const Run &run, const ItemRun &item)
     const Value status = item.exit_status ? Value(std::to_string(*item.exit_status)) : Value();
     const Value signal = item.signal != 0 ? Value(name_of_signal(item.signal)) : Value();
     const bool is_flaky = item.outcome == Outcome::flaky;
-    const Value outcome = is_flaky ? Value(word(item.outcome)) : Value();
+    const Value outcome = is_flaky || !item.expected.empty() ? Value(word(item.outcome)) : Value();
     const Value reason = is_flaky ? Value(item.reason) : Value();
+    const Value expected = item.expected.empty() ? Value() : Value(item.expected);
     const Value attempts =
         run.retries > 0 ? Value(std::to_string(item.earlier.size() + 1)) : Value();
     const Value left = item.left_running.empty() ? Value() : Value(left_running(item));
     const std::string inside =
         property(indent, "outcome", outcome) + property(indent, "reason", reason) +
-        property(indent, "attempts", attempts) + property(indent, "progress", report.progress) +
-        property(indent, "result", result) + property(indent, "description", report.description) +
+        property(indent, "expected", expected) + property(indent, "attempts", attempts) +
+        property(indent, "progress", report.progress) + property(indent, "result", result) +
+        property(indent, "description", report.description) +
         property(indent, "exit_status", status) + property(indent, "signal", signal) +
         property(indent, "left_running", left);
     const std::string output =
@@ -235,6 +244,9 @@ std::string test_suite(const Run &run, std::size_t number, const std::vector<Lat
         const Counts counts = count(suite.items);
         inside += property(indent, "flaky", std::to_string(counts.flaky)) +
                   property(indent, "retries", std::to_string(counts.retries));
+    }
+    if (run.has_expectations) {
+        inside += property(indent, "expected", std::to_string(count(suite.items).expected));
     }
     inside += kStateGoesHere;
     for (const LateReport &one : late) {

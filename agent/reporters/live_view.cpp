@@ -14,6 +14,7 @@
 #include <chrono>
 #include <fmt/core.h>
 #include <string>
+#include <string_view>
 #include <utility>
 #include <vector>
 
@@ -34,6 +35,7 @@ Colour colour_of(Outcome outcome)
         return Colour::green;
     case Outcome::failed:
     case Outcome::timed_out:
+    case Outcome::unexpected:
         return Colour::red;
     default:
         return Colour::yellow;
@@ -179,8 +181,9 @@ class LiveView : public Reporter
             "  {} ", pad_or_ellipsize(one_line(item.name), std::min(name_width_, width / 3))));
         add_progress(line, item.report, bar);
         line.add(right(duration(item.seconds.value_or(item.running)), 6) + "  ");
-        line.add(pad_or_ellipsize(
-                     runs ? (item.stopping ? "stopping" : "running") : word(item.outcome), 9),
+        const std::string_view state =
+            runs ? (item.stopping ? "stopping" : "running") : word(item.outcome);
+        line.add(pad_or_ellipsize(state, std::max<std::size_t>(9, state.size())),
                  runs ? Colour::cyan : colour_of(item.outcome));
         line.add(fmt::format(" {}  ", right(result_of(item.report), 2)));
         return line;

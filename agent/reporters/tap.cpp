@@ -112,14 +112,26 @@ std::string diagnosis(const Run &run, const ItemRun &item)
     return text + kIndent + "  ...\n";
 }
 
+std::string directive(const Run &run, const ItemRun &item)
+{
+    switch (item.outcome) {
+    case Outcome::not_run:
+        return skipped(run);
+    case Outcome::expected:
+        return " # TODO " + tap_escaped(item.expected);
+    case Outcome::flaky:
+    case Outcome::unexpected:
+        return fmt::format(" # {}", word(item.outcome));
+    default:
+        return "";
+    }
+}
+
 std::string item_point(const Run &run, const ItemRun &item, std::size_t number)
 {
     const bool ran = item.outcome != Outcome::not_run;
-    const std::string directive = !ran                             ? skipped(run)
-                                  : item.outcome == Outcome::flaky ? " # flaky"
-                                                                   : "";
-    return fmt::format("{}{}{}\n{}", kIndent,
-                       point(!ran || is_success(item.outcome), number, item.name), directive,
+    const bool ok = !ran || (is_success(item.outcome) && item.outcome != Outcome::expected);
+    return fmt::format("{}{}{}\n{}", kIndent, point(ok, number, item.name), directive(run, item),
                        ran ? diagnosis(run, item) : "");
 }
 
@@ -203,7 +215,7 @@ class TapReporter : public Reporter
             text += comment(line);
         }
         text += comment(fmt::format("{}, {}{}, {} not run in {}", passed, failed,
-                                    tally_of_retries(run), counts.not_run, duration(run.seconds)));
+                                    tally_of_others(run), counts.not_run, duration(run.seconds)));
         if (!run.finished) {
             text += fmt::format("Bail out!  {}\n", run.why_unfinished.empty()
                                                        ? "the run did not finish"

@@ -89,15 +89,21 @@ std::string rest_of_total(const Run &run)
                              : has_ended(run)        ? ""
                              : has_fixed_rounds(run) ? fmt::format(", {} to go", counts.not_run)
                                                      : fmt::format(", round {}", run.round);
-    return fmt::format("{}{}, {}", tally_of_retries(run), rest, duration(run.seconds));
+    return fmt::format("{}{}, {}", tally_of_others(run), rest, duration(run.seconds));
 }
 
-std::string tally_of_retries(const Run &run)
+std::string tally_of_others(const Run &run)
 {
     const Counts counts = count(run);
-    return run.retries == 0 ? ""
-                            : fmt::format(", {} flaky, {} {}", counts.flaky, counts.retries,
-                                          counts.retries == 1 ? "retry" : "retries");
+    std::string text;
+    if (run.retries > 0) {
+        text = fmt::format(", {} flaky, {} {}", counts.flaky, counts.retries,
+                           counts.retries == 1 ? "retry" : "retries");
+    }
+    if (run.has_expectations) {
+        text += fmt::format(", {} failed as expected", counts.expected);
+    }
+    return text;
 }
 
 std::string not_finished(const Run &run)

@@ -26,8 +26,8 @@ std::string total(const Run &run);
 // Its parts: "3 passed" and "1 failed"; ", 2 to go, 12.0 s".
 std::pair<std::string, std::string> tally(const Counts &counts);
 std::string rest_of_total(const Run &run);
-// ", 1 flaky, 2 retries"; empty without retries.
-std::string tally_of_retries(const Run &run);
+// ", 1 flaky, 2 retries, 1 failed as expected", as far as the run has such.
+std::string tally_of_others(const Run &run);
 
 // "not finished: interrupted", "ended: G/X did not pass"; empty if that is not so.
 std::string not_finished(const Run &run);

@@ -25,7 +25,7 @@ const ItemRun &item_at(const Run &run, Place place)
 
 bool is_success(Outcome outcome)
 {
-    return outcome == Outcome::passed || outcome == Outcome::flaky;
+    return outcome == Outcome::passed || outcome == Outcome::flaky || outcome == Outcome::expected;
 }
 
 void begin_attempt(ItemRun &item)
@@ -33,6 +33,7 @@ void begin_attempt(ItemRun &item)
     ItemRun next;
     next.group = item.group;
     next.name = item.name;
+    next.expected = item.expected;
     next.earlier = std::exchange(item.earlier, {});
     next.earlier.push_back(std::move(item));
     item = std::move(next);
@@ -50,10 +51,11 @@ Counts count(const std::vector<ItemRun> &items)
 {
     Counts counts;
     for (const ItemRun &item : items) {
-        ++(item.outcome == Outcome::not_run  ? counts.not_run
-           : item.outcome == Outcome::passed ? counts.passed
-           : item.outcome == Outcome::flaky  ? counts.flaky
-                                             : counts.failed);
+        ++(item.outcome == Outcome::not_run    ? counts.not_run
+           : item.outcome == Outcome::passed   ? counts.passed
+           : item.outcome == Outcome::flaky    ? counts.flaky
+           : item.outcome == Outcome::expected ? counts.expected
+                                               : counts.failed);
         counts.retries += item.earlier.size();
     }
     return counts;
@@ -108,7 +110,10 @@ void summarize(Run &run)
                 run.summary.push_back({item.group, item.name, 0, {}});
             }
             Summary &summary = run.summary[at++];
-            summary.passed += is_success(item.outcome) ? 1 : 0;
+            const bool has_passed = item.outcome == Outcome::passed ||
+                                    item.outcome == Outcome::flaky ||
+                                    item.outcome == Outcome::unexpected;
+            summary.passed += has_passed ? 1 : 0;
             for (const ItemRun &attempt : item.earlier) {
                 summary.times.add(attempt.seconds.value_or(0));
             }
@@ -121,8 +126,8 @@ void summarize(Run &run)
 
 const char *word(Outcome outcome)
 {
-    static constexpr std::array kWords{"not run",   "passed",  "failed", "no result",
-                                       "timed out", "stopped", "flaky"};
+    static constexpr std::array kWords{"not run", "passed", "failed",   "no result", "timed out",
+                                       "stopped", "flaky",  "expected", "unexpected"};
     return kWords.at(static_cast<std::size_t>(outcome));
 }
 

@@ -19,12 +19,14 @@ namespace fptest
 
 enum class Outcome {
     not_run,
-    passed,    // it reported the pass code
-    failed,    // it reported another code
-    no_result, // it ended without reporting a result
-    timed_out, // it took too long
-    stopped,   // with the run
-    flaky,     // it passed when it was tried again
+    passed,     // it reported the pass code
+    failed,     // it reported another code
+    no_result,  // it ended without reporting a result
+    timed_out,  // it took too long
+    stopped,    // with the run
+    flaky,      // it passed when it was tried again
+    expected,   // it did not pass, which was known before
+    unexpected, // it passed, though it was known to fail
 };
 
 // One item of a run.
@@ -44,10 +46,11 @@ struct ItemRun {
     int signal = 0;
     bool overruled = false; // it failed whatever it reported; see the reason
     std::vector<Leftover> left_running = {};
+    std::string expected = {};         // why it is known to fail; empty if it is not
     std::vector<ItemRun> earlier = {}; // attempts, which did not pass
 };
 
-// Whether the run is as good for it: it passed, if not at once.
+// Whether the run is none the worse for it: it passed, if not at once, or failed as expected.
 bool is_success(Outcome outcome);
 // It is to be tried again: what it has been becomes an earlier attempt.
 void begin_attempt(ItemRun &item);
@@ -62,14 +65,15 @@ struct Suite {
 
 struct Counts {
     std::size_t passed = 0;
-    std::size_t failed = 0; // also no result, timed out and stopped
+    std::size_t failed = 0; // also no result, timed out, stopped and unexpected
     std::size_t not_run = 0;
     std::size_t flaky = 0;
+    std::size_t expected = 0;
     std::size_t retries = 0; // attempts beside those
 
     std::size_t all() const
     {
-        return passed + failed + not_run + flaky;
+        return passed + failed + not_run + flaky + expected;
     }
     bool has_failures() const
     {
@@ -81,6 +85,7 @@ struct Counts {
         failed += more.failed;
         not_run += more.not_run;
         flaky += more.flaky;
+        expected += more.expected;
         retries += more.retries;
         return *this;
     }
@@ -105,6 +110,7 @@ struct Run {
     std::optional<double> limit;      // seconds after which the run is stopped
     std::optional<int> seed;          // of the order
     int retries = 0;                  // of an item that does not pass
+    bool has_expectations = false;    // of failures
     int pass_code = 0;
     int vendor = 0;
     std::vector<Suite> suites;    // of the round
@@ -146,7 +152,8 @@ std::size_t rounds_to_come(const Run &run);
 // Adds the current round to the summary.
 void summarize(Run &run);
 
-// "passed", "failed", "no result", "timed out", "stopped", "not run", "flaky"
+// "passed", "failed", "no result", "timed out", "stopped", "not run", "flaky",
+// "expected", "unexpected"
 const char *word(Outcome outcome);
 
 // "SIGSEGV", "signal 40"

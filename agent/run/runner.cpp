@@ -57,6 +57,27 @@ int signal_of(int status)
                : 0;
 }
 
+// What it comes to besides its report: it was tried before, or known to fail.
+void judge_by_the_run(ItemRun &item)
+{
+    const auto how = [](const ItemRun &one) {
+        return fmt::format("{} {}{}", one.outcome == Outcome::no_result ? "had" : "was",
+                           word(one.outcome), one.reason.empty() ? "" : ": " + one.reason);
+    };
+    const bool has_passed = item.outcome == Outcome::passed;
+    if (!item.expected.empty() && has_passed) {
+        item.outcome = Outcome::unexpected;
+        item.reason = "passed, but was expected to fail: " + one_line(item.expected);
+    } else if (!item.expected.empty() && item.outcome != Outcome::stopped) {
+        item.reason = fmt::format("{}; it {}", one_line(item.expected), how(item));
+        item.outcome = Outcome::expected;
+    } else if (!item.earlier.empty() && has_passed) {
+        item.outcome = Outcome::flaky;
+        item.reason = fmt::format("passed on attempt {}; before, it {}", item.earlier.size() + 1,
+                                  how(item.earlier.back()));
+    }
+}
+
 } // namespace
 
 Runner::Runner(LibraryProcess &library, Signals &signals, Run &run,
@@ -439,16 +460,9 @@ void Runner::notify_ended()
 void Runner::notify_end_of(Place place)
 {
     ItemRun &item = item_at(run_, place);
-    if (item.outcome == Outcome::passed && !item.earlier.empty()) {
-        const ItemRun &before = item.earlier.back();
-        item.outcome = Outcome::flaky;
-        item.reason =
-            fmt::format("passed on attempt {}; before, it {} {}{}", item.earlier.size() + 1,
-                        before.outcome == Outcome::no_result ? "had" : "was", word(before.outcome),
-                        before.reason.empty() ? "" : ": " + before.reason);
-    }
+    judge_by_the_run(item);
     const bool is_tried_again = !is_success(item.outcome) && item.outcome != Outcome::stopped &&
-                                run_.why_unfinished.empty() &&
+                                item.expected.empty() && run_.why_unfinished.empty() &&
                                 item.earlier.size() < static_cast<std::size_t>(run_.retries);
     for (Reporter *reporter : reporters_) {
         is_tried_again ? reporter->retried(run_, place) : reporter->ended(run_, place);
