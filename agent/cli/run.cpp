@@ -7,6 +7,7 @@
 #include "cli/options.h"
 #include "cli/outputs.h"
 #include "cli/run_options.h"
+#include "cli/selection.h"
 #include "module/library_process.h"
 #include "module/log_file.h"
 #include "module/own_ps.h"
@@ -16,8 +17,6 @@
 #include "module/vendor_file.h"
 #include "plan/plan.h"
 #include "plan/plan_text.h"
-#include "run/choice.h"
-#include "run/known_failures.h"
 #include "run/planner.h"
 #include "run/rounds.h"
 #include "run/runner.h"
@@ -31,7 +30,6 @@
 #include <memory>
 #include <optional>
 #include <poll.h>
-#include <random>
 #include <string>
 #include <unistd.h>
 #include <utility>
@@ -206,53 +204,6 @@ Run run_of(const RunOptions &options, const std::string &plan, int vendor)
     return run;
 }
 
-// Chosen here unless the command line says it.
-std::optional<int> seed_of(const RunOptions &options)
-{
-    if (options.shuffle.empty()) {
-        return std::nullopt;
-    }
-    if (options.shuffle != "true") {
-        return std::stoi(options.shuffle);
-    }
-    const int seed = static_cast<int>(std::random_device()() % (kSeedLimit + 1));
-    say("shuffled with seed {0}: --shuffle={0} runs this order again", seed);
-    return seed;
-}
-
-// Only an item that has a command of its own can be run again.
-void require_single_items(const RoundPlan &round)
-{
-    for (const Job &job : round.jobs) {
-        if (job.targets.size() > 1) {
-            throw Failure(Cause::input,
-                          "--retry runs items by their own paths, and {} runs as one command: "
-                          "leave --as-group out, or see fptest check",
-                          in_quotes(job.path));
-        }
-    }
-}
-
-RoundPlan chosen_round(const RunOptions &options, const CheckedPlan &checked,
-                       std::optional<int> seed)
-{
-    const Plan &plan = *checked.loaded.plan;
-    const std::vector<Path> paths =
-        choose({options.paths, options.skips, options.as_group, options.force}, plan, checked.name);
-    if (paths.empty() && !options.list) {
-        throw Failure(Cause::input, "{} has nothing to run{}", one_line(checked.name),
-                      known_groups(plan));
-    }
-    RoundPlan round = plan_round(paths, plan, options.as_group);
-    if (!options.expect.empty()) {
-        expect_failures(options.expect, plan, checked.name, round);
-    }
-    if (options.retries > 0) {
-        require_single_items(round);
-    }
-    return seed ? shuffled(round, *seed) : round;
-}
-
 // A list asks nothing of the device but its vendor.
 void choose_ps_for(const RunOptions &options)
 {
@@ -284,11 +235,15 @@ Exit run(RunOptions options)
         warn_of_lost_outputs(
             {{"--json", options.json}, {"--junit", options.junit}, {"--log", options.log}});
     }
+    const std::optional<EarlierRun> earlier = read_earlier_run(options);
+    if (earlier && leaves_nothing(options, *earlier)) {
+        return Exit::success;
+    }
     const Descriptor lock = options.list ? Descriptor(-1) : ready_device();
     const CheckedPlan checked = open_plan(options);
     const Plan &plan = *checked.loaded.plan;
     const std::optional<int> seed = seed_of(options);
-    const RoundPlan round = chosen_round(options, checked, seed);
+    const RoundPlan round = chosen_round(options, checked, earlier, seed);
     require_writable_results(options);
     choose_log(options.log);
     Signals signals;
@@ -349,11 +304,6 @@ void add_run(CLI::App &app, Action &chosen)
     const auto options = std::make_shared<RunOptions>();
     CLI::App &command = add_subcommand(app, "run", "Store a plan and run groups or items of it",
                                        kRunExamples, chosen, [options] { return run(*options); });
-    command.add_option("PATH", options->paths, "what to run")->type_name("");
-    command.add_option("--skip", options->skips, "leave out what this pattern of paths matches")
-        ->type_name("PATTERN")
-        ->allow_extra_args(false)
-        ->check(not_empty());
     command
         .add_option("--plan", options->plan,
                     "store this plan first ('-': standard input);\n"
@@ -367,6 +317,7 @@ void add_run(CLI::App &app, Action &chosen)
     command.add_flag("--as-group", options->as_group,
                      "one command for each group, not for each\n"
                      "item");
+    add_selection(command, *options);
     command.add_option("--timeout", options->timeout, "stop an item that takes longer")
         ->type_name("SECONDS")
         ->transform(range(0.001, 1000000.0));
@@ -377,43 +328,6 @@ void add_run(CLI::App &app, Action &chosen)
     command.add_flag("--exit-status", options->fail_on_exit_status,
                      "an item that ends with a status other than\n"
                      "0 has failed");
-    command.add_option("--repeat", options->repeat, "run everything N times")
-        ->type_name("N")
-        ->transform(range(1, 1000000));
-    command
-        .add_option("--for", options->time_limit,
-                    "begin further rounds until this time is\n"
-                    "over: 90, 90s, 10m, 2h, 1d")
-        ->type_name("TIME")
-        ->transform(time_span());
-    command.add_flag("--until-fail", options->until_fail,
-                     "end with the first item that does not pass;\n"
-                     "begin another round until then");
-    command
-        .add_option("--expect", options->expect,
-                    "what is known to fail: a path or pattern and\n"
-                    "the reason on each line")
-        ->type_name("FILE")
-        ->transform(desk_file())
-        ->check(not_empty());
-    command
-        .add_option("--retry", options->retries,
-                    "try an item that does not pass again, up to\n"
-                    "N times")
-        ->type_name("N")
-        ->transform(range(1, 1000));
-    command.add_option("--stop-after", options->stop_after, "end after N items that did not pass")
-        ->type_name("N")
-        ->transform(range(1, 1000000));
-    command.add_option("--limit", options->limit, "stop the whole run when this time is over")
-        ->type_name("TIME")
-        ->transform(time_span());
-    command
-        .add_flag("--shuffle", options->shuffle,
-                  "in another order: by chance, or the one of\n"
-                  "this SEED: --shuffle=SEED")
-        ->disable_flag_override(false)
-        ->check(order_seed());
     command.add_flag("--list", options->list, "print what would be run and start nothing");
     command
         .add_option("--junit", options->junit,

@@ -15,8 +15,9 @@ struct RunOptions {
     std::string plan;               // a file, "-" for standard input; empty: the stored plan
     std::vector<std::string> paths; // also patterns; none for every group
     std::vector<std::string> skips;
-    std::string shuffle;  // a seed, "true" for any; empty for the plan's order
-    bool as_sent = false; // store the plan by a command, which may cut it
+    std::string failed_of; // JSON lines of a run before
+    std::string shuffle;   // a seed, "true" for any; empty for the plan's order
+    bool as_sent = false;  // store the plan by a command, which may cut it
     bool as_group = false;
     bool list = false;
     bool force = false;

@@ -50,8 +50,11 @@ class Chooser
                 add_rest(path);
             }
         }
-        if (chosen_.empty() && !skips_.empty()) {
-            throw Failure(Cause::input, "nothing is left to run: --skip leaves out all of it");
+        if (chosen_.empty() && (!skips_.empty() || choice_.only)) {
+            throw Failure(Cause::input, "nothing is left to run: {} all of it",
+                          !choice_.only    ? "--skip leaves out"
+                          : skips_.empty() ? "--failed-of leaves out"
+                                           : "--skip and --failed-of leave out");
         }
         return chosen_;
     }
@@ -97,12 +100,19 @@ class Chooser
         }
     }
 
-    // What --skip leaves of it.
+    bool is_left_out(const std::string &group, const std::string &item) const
+    {
+        const auto is_skipped = [&](const PathPattern &skip) { return skip.matches(group, item); };
+        return std::ranges::any_of(skips_, is_skipped) ||
+               (choice_.only &&
+                !choice_.only->contains({sanitize_utf8(group), sanitize_utf8(item)}));
+    }
+
+    // What is not left out of it.
     void add_rest(const Path &path)
     {
         const auto is_skipped = [&](const std::string &item) {
-            return std::ranges::any_of(
-                skips_, [&](const PathPattern &skip) { return skip.matches(path.group, item); });
+            return is_left_out(path.group, item);
         };
         if (!path.item.empty()) {
             if (!is_skipped(path.item)) {

@@ -5,8 +5,11 @@
 #pragma once
 
 #include "plan/plan.h"
+#include "run/earlier_run.h"
 #include "run/planner.h"
 
+#include <optional>
+#include <set>
 #include <string>
 #include <vector>
 
@@ -18,6 +21,7 @@ struct Choice {
     std::vector<std::string> skips; // patterns
     bool as_group = false;
     bool force = false; // the items need not be there
+    std::optional<std::set<EarlierRun::Name>> only = std::nullopt;
 };
 
 // A path whose words may be patterns of the shell. Its root may be any word.
