@@ -40,6 +40,7 @@ void resolve_output_conflicts(RunOptions &options)
     require_different({{"--plan", options.plan == "-" ? kStandardInput : options.plan},
                        {"--expect", options.expect == "-" ? kStandardInput : options.expect},
                        {"--failed-of", options.failed_of},
+                       {"--resume", options.resume},
                        {"--json", options.json},
                        {"--junit", options.junit},
                        log_file(options.log)});

@@ -285,12 +285,13 @@ Exit run(RunOptions options)
     };
     Run run = run_of(options, checked.name, vendor);
     run.seed = seed;
+    const EarlierRun *const resumed = take_up(run, options, earlier);
     const auto owned = make_reporters(options);
     std::vector<Reporter *> reporters;
     for (const auto &reporter : owned) {
         reporters.push_back(reporter.get());
     }
-    if (!run_rounds(reporters, for_runner, *library, signals, run, round, store_plan)) {
+    if (!run_rounds(reporters, for_runner, *library, signals, run, round, store_plan, resumed)) {
         return Exit::interrupted;
     }
     const Counts counts = count(run);

@@ -16,6 +16,7 @@ struct RunOptions {
     std::vector<std::string> paths; // also patterns; none for every group
     std::vector<std::string> skips;
     std::string failed_of; // JSON lines of a run before
+    std::string resume;    // the same
     std::string shuffle;   // a seed, "true" for any; empty for the plan's order
     bool as_sent = false;  // store the plan by a command, which may cut it
     bool as_group = false;

@@ -18,12 +18,16 @@ namespace fptest
 
 void add_selection(CLI::App &command, RunOptions &options);
 
-// The run that --failed-of or --resume names; a resumed one goes on as it was begun. Says if
-// its file is cut.
+// The run that --failed-of or --resume names; a resumed one goes on as it was begun, which the
+// options are made to say. Says if its file is cut.
 std::optional<EarlierRun> read_earlier_run(RunOptions &options);
 
 // Says so.
 bool leaves_nothing(const RunOptions &options, const EarlierRun &earlier);
+
+// The run that this one goes on with, or null. Throws a Failure if it is of another device.
+const EarlierRun *take_up(Run &run, const RunOptions &options,
+                          const std::optional<EarlierRun> &given);
 
 // Says the seed that it chooses.
 std::optional<int> seed_of(const RunOptions &options);

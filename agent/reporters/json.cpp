@@ -129,6 +129,9 @@ class JsonReporter : public Reporter
         if (run.seed) {
             json["seed"] = *run.seed;
         }
+        if (!run.resumed.empty()) {
+            json["resumed"] = sanitize_utf8(run.resumed);
+        }
         json["start"] = timestamp(run.start);
         json["items"] = std::move(items);
         write(json);

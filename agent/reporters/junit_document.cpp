@@ -240,6 +240,9 @@ std::string test_suite(const Run &run, std::size_t number, const std::vector<Lat
     if (run.seed) {
         inside += property(indent, "seed", std::to_string(*run.seed));
     }
+    if (!run.resumed.empty()) {
+        inside += property(indent, "resumed", run.resumed);
+    }
     if (run.retries > 0) {
         const Counts counts = count(suite.items);
         inside += property(indent, "flaky", std::to_string(counts.flaky)) +

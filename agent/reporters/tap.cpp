@@ -167,6 +167,9 @@ class TapReporter : public Reporter
         if (run.seed) {
             write(comment(by_seed(run)));
         }
+        if (!run.resumed.empty()) {
+            write(comment("resumed from " + one_line(run.resumed)));
+        }
     }
 
     void started(const Run &run, Place place) override

@@ -60,9 +60,10 @@ std::string heading(const Run &run)
     for (const Suite &suite : run.suites) {
         items += suite.items.size();
     }
-    return fmt::format("{}: {}, vendor {}{}{}", one_line(run.plan), plural(items, "item"),
+    return fmt::format("{}: {}, vendor {}{}{}{}", one_line(run.plan), plural(items, "item"),
                        run.vendor, has_rounds(run) ? ", " + rounds(run) : "",
-                       run.seed ? ", " + by_seed(run) : "");
+                       run.seed ? ", " + by_seed(run) : "",
+                       run.resumed.empty() ? "" : ", resumed from " + one_line(run.resumed));
 }
 
 std::string by_seed(const Run &run)

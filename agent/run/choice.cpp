@@ -91,7 +91,7 @@ class Chooser
             for (const std::string &item : runnable_items(plan_, group.group)) {
                 if (fits(path.item, item)) {
                     is_found = true;
-                    add_rest(item_path(group, item));
+                    add_rest(item_path(plan_, group, item));
                 }
             }
         }
@@ -133,21 +133,10 @@ class Chooser
             }
             for (const std::string &item : items) {
                 if (!is_skipped(item)) {
-                    chosen_.push_back(item_path(path, item));
+                    chosen_.push_back(item_path(plan_, path, item));
                 }
             }
         }
-    }
-
-    Path item_path(const Path &group, const std::string &item) const
-    {
-        if (!has_path_of_its_own(plan_, group.group, item)) {
-            throw Failure(Cause::input,
-                          "item {} of group {} cannot be run by its name: run the whole group, or "
-                          "see fptest check",
-                          in_quotes(item), in_quotes(group.group));
-        }
-        return {group.root + "/" + group.group + "/" + item, group.root, group.group, item};
     }
 
     const Choice &choice_;
@@ -158,6 +147,17 @@ class Chooser
 };
 
 } // namespace
+
+Path item_path(const Plan &plan, const Path &group, const std::string &item)
+{
+    if (!has_path_of_its_own(plan, group.group, item)) {
+        throw Failure(Cause::input,
+                      "item {} of group {} cannot be run by its name: run the whole group, or see "
+                      "fptest check",
+                      in_quotes(item), in_quotes(group.group));
+    }
+    return {group.root + "/" + group.group + "/" + item, group.root, group.group, item};
+}
 
 bool PathPattern::matches_group(const std::string &group) const
 {

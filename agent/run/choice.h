@@ -42,6 +42,9 @@ class PathPattern
     Path path_;
 };
 
+// Of an item in a group. Throws a Failure if it has none of its own.
+Path item_path(const Plan &plan, const Path &group, const std::string &item);
+
 // In the order of the paths, and for each in the plan's. Throws a Failure if one is no path or
 // leads to nothing.
 std::vector<Path> choose(const Choice &choice, const Plan &plan, const std::string &plan_name);

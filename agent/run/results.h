@@ -111,6 +111,7 @@ struct Run {
     std::optional<int> seed;          // of the order
     int retries = 0;                  // of an item that does not pass
     bool has_expectations = false;    // of failures
+    std::string resumed;              // the results of the run that this one completes
     int pass_code = 0;
     int vendor = 0;
     std::vector<Suite> suites;    // of the round
@@ -118,6 +119,7 @@ struct Run {
     std::vector<Summary> summary; // of each item; empty until a round is over
     std::chrono::system_clock::time_point start;
     double seconds = 0;         // since the start, at the last tick
+    double seconds_before = 0;  // of the run that it completes
     bool finished = false;      // everything that was asked for ran
     std::string why_unfinished; // otherwise, once it has ended
     std::string why_ended;      // if it finished within a round

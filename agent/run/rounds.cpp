@@ -30,8 +30,8 @@ class Rounds
 {
   public:
     Rounds(Runner &runner, Run &run, const std::vector<Reporter *> &reporters,
-           const RoundPlan &plan)
-        : runner_(runner), run_(run), reporters_(reporters), plan_(plan)
+           const RoundPlan &plan, const EarlierRun *earlier)
+        : runner_(runner), run_(run), reporters_(reporters), plan_(plan), earlier_(earlier)
     {
     }
 
@@ -58,14 +58,17 @@ class Rounds
     // False if the run was cut short.
     bool run_one()
     {
-        for (Job job : plan_.jobs) {
-            do {
+        for (std::size_t at = 0; at < plan_.jobs.size(); ++at) {
+            Job job = plan_.jobs[at];
+            bool is_over = take_over(job, at);
+            while (!is_over) {
                 runner_.make_way_for(job);
                 job.mark = clear_reports(job.elements());
                 if (!runner_.run(job)) {
                     return false;
                 }
-            } while (is_tried_again(job));
+                is_over = !is_tried_again(job);
+            }
             if ((run_.until_fail && has_failed(job)) || has_failed_enough()) {
                 break;
             }
@@ -76,7 +79,14 @@ class Rounds
     bool is_last() const
     {
         return !run_.why_ended.empty() || run_.round == run_.rounds ||
-               (run_.time_limit && run_.seconds >= *run_.time_limit);
+               (run_.time_limit && run_.seconds >= *run_.time_limit && !has_more_to_take_over());
+    }
+
+    bool has_more_to_take_over() const
+    {
+        return earlier_ != nullptr && !earlier_->attempts.empty() &&
+               earlier_->attempts.rbegin()->first >=
+                   static_cast<std::size_t>(run_.round) * plan_.jobs.size();
     }
 
     bool has_failed(const Job &job)
@@ -90,6 +100,44 @@ class Rounds
         const ItemRun &item = item_at(run_, {job.suite, (*failed)->item});
         run_.why_ended = one_line(title(run_, item)) + " did not pass (--until-fail)";
         return true;
+    }
+
+    // What the earlier run came to. False if the item has not ended by that.
+    bool take_over(const Job &job, std::size_t at)
+    {
+        const std::size_t index =
+            (static_cast<std::size_t>(run_.round) - 1) * plan_.jobs.size() + at;
+        if (earlier_ == nullptr || !earlier_->attempts.contains(index)) {
+            return false;
+        }
+        const Place place{job.suite, job.targets.front()->item};
+        ItemRun last = earlier_->attempts.at(index);
+        std::vector<ItemRun> attempts = std::exchange(last.earlier, {});
+        const bool is_over = earlier_->ended.contains(index);
+        if (!is_over) {
+            attempts.push_back(last);
+        }
+        for (const ItemRun &attempt : attempts) {
+            tell_again(place, attempt, &Reporter::retried);
+            begin_attempt(item_at(run_, place));
+        }
+        if (is_over) {
+            tell_again(place, last, &Reporter::ended);
+        }
+        return is_over;
+    }
+
+    void tell_again(Place place, ItemRun attempt, void (Reporter::*how)(const Run &, Place))
+    {
+        ItemRun &item = item_at(run_, place);
+        attempt.group = item.group; // as the plan has them
+        attempt.name = item.name;
+        attempt.earlier = std::move(item.earlier);
+        item = std::move(attempt);
+        for (Reporter *reporter : reporters_) {
+            reporter->started(run_, place);
+            (reporter->*how)(run_, place);
+        }
     }
 
     bool is_tried_again(const Job &job) const
@@ -127,6 +175,7 @@ class Rounds
     Run &run_;
     const std::vector<Reporter *> &reporters_;
     const RoundPlan &plan_;
+    const EarlierRun *earlier_;
 };
 
 std::string failures(const std::vector<Reporter *> &reporters)
@@ -220,7 +269,7 @@ void begin(Run &run, const std::vector<Reporter *> &reporters, Signals &signals)
 
 bool run_rounds(const std::vector<Reporter *> &reporters, const Runner::Options &options,
                 LibraryProcess &library, Signals &signals, Run &run, const RoundPlan &plan,
-                const std::function<void()> &store)
+                const std::function<void()> &store, const EarlierRun *earlier)
 {
     run.suites = plan.suites;
     run.start = std::chrono::system_clock::now();
@@ -243,7 +292,7 @@ bool run_rounds(const std::vector<Reporter *> &reporters, const Runner::Options 
         }
         if (goes_on) {
             clear_reports(all);
-            run.finished = Rounds(runner, run, reporters, plan).run_all();
+            run.finished = Rounds(runner, run, reporters, plan, earlier).run_all();
         }
         if (!runner.broken()) {
             remove_marks();

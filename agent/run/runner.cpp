@@ -298,7 +298,7 @@ void Runner::poll_gatherer(RunningItem &active)
 
 void Runner::tick()
 {
-    run_.seconds = Seconds(now() - began_).count();
+    run_.seconds = run_.seconds_before + Seconds(now() - began_).count();
     const std::string output = library_.take_output();
     if (!running_.items.empty()) {
         append_output(item_at(run_, running_.items.back().place).output, output);

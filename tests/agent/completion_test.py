@@ -69,6 +69,7 @@ def test_every_option_is_offered_that_the_help_tells(offered, command):
     # files
     *((words, ["plans"]) for words in (
         "run --plan pl", "run --junit pl", "run --json pl", "run --log pl", "run --expect pl", "run --failed-of pl",
+        "run --resume pl",
         "run --plan = pl", "send --log pl", "report --log pl", "check pl", "check x pl",
         "show pl", "show --help pl")),
     ("show plans/", ["plans/demo.xml", "plans/other plan.xml"]),

@@ -164,7 +164,7 @@ TEST_F(RetriedRun, RefusesWhatRunsAsOneCommand)
         "leave --as-group out, or see fptest check",
         {"run", "--retry", "1", "--as-group", "--plan", plan(group_of(kOneOfEach)), "P/G"});
     expect_refusal(
-        2, "fptest: --retry: '0' is not a whole number from 1 to 1000; see fptest run --help",
+        2, "fptest: --retry: '0' is not a whole number from 1 to 100; see fptest run --help",
         {"run", "--retry", "0"});
 }
 
