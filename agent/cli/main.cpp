@@ -63,7 +63,7 @@ class CommandLine
         require_known_command(argc, argv);
         std::vector<std::string> words(argv + std::min(argc, 1), argv + argc);
         if (const CLI::App *command = words.empty() ? nullptr : find(words.front())) {
-            words = fptest::split_empty_values(*command, std::move(words));
+            words = fptest::split_empty_values(*command, fptest::join_seed(std::move(words)));
         }
         std::ranges::reverse(words); // as the parser wants them
         try {

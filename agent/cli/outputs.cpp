@@ -45,6 +45,9 @@ bool is_regular_file(int descriptor)
 void resolve_output_conflicts(RunOptions &options)
 {
     require_different({{"--plan", options.plan == "-" ? kStandardInput : options.plan},
+                       {"--expect", options.expect == "-" ? kStandardInput : options.expect},
+                       {"--failed-of", options.failed_of},
+                       {"--resume", options.resume},
                        {"--json", options.json},
                        {"--junit", options.junit},
                        log_file(options.log)});

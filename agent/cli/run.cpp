@@ -8,6 +8,7 @@
 #include "cli/options.h"
 #include "cli/outputs.h"
 #include "cli/run_options.h"
+#include "cli/selection.h"
 #include "module/device_lock.h"
 #include "module/library_process.h"
 #include "module/log_file.h"
@@ -44,12 +45,13 @@ namespace
 {
 
 constexpr char kRunExamples[] =
-    "A PATH is root/group or root/group/item; the root may be any word.\n"
+    "A PATH is root/group or root/group/item; the root may be any word, the others\n"
+    "patterns as of the shell. Without PATH, every group is run.\n"
     "\n"
     "Examples:\n"
     "  fptest run --plan plans/demo.xml demo/Bringup demo/Gather\n"
     "  fptest run --timeout 30 --junit results.xml demo/Bringup/SpiCheck\n"
-    "  fptest run --plan plans/demo.xml --list\n"
+    "  fptest run --plan plans/demo.xml --list '*/*/S*'\n"
     "  prove --exec 'fptest run --tap' demo/Bringup";
 
 // --- the plan -----------------------------------------------------------------
@@ -130,9 +132,9 @@ void report_other_gatherer(const RoundPlan &round, const Plan &plan, int vendor,
     }
 }
 
-void list_items(const std::vector<Path> &paths, const Plan &plan, const std::string &suffix)
+void list_items(const RoundPlan &round, const Plan &plan, const std::string &suffix)
 {
-    const auto items = commands_of(paths, plan, suffix);
+    const auto items = commands_of(round, plan, suffix);
     std::size_t width = 0;
     for (const auto &[path, command] : items) {
         width = std::max(width, display_width(one_line(path)));
@@ -185,6 +187,9 @@ Runner::Options runner_options(const RunOptions &options)
     if (options.timeout) {
         runner.timeout = std::chrono::duration<double>(*options.timeout);
     }
+    if (options.limit) {
+        runner.limit = std::chrono::duration<double>(*options.limit);
+    }
     runner.grace = std::chrono::duration<double>(options.grace);
     runner.fail_on_exit_status = options.fail_on_exit_status;
     runner.on_second_interrupt = exit_at_once;
@@ -201,24 +206,13 @@ Run run_of(const RunOptions &options, const std::string &plan, int vendor)
     }
     run.time_limit = options.time_limit;
     run.until_fail = options.until_fail;
+    run.stop_after = options.stop_after;
+    run.retries = options.retries;
+    run.has_expectations = !options.expect.empty();
+    run.limit = options.limit;
     run.pass_code = options.pass_code;
     run.vendor = vendor;
     return run;
-}
-
-std::vector<Path> paths_of(const RunOptions &options, const CheckedPlan &checked)
-{
-    const Plan &plan = *checked.loaded.plan;
-    std::vector<Path> paths;
-    for (const std::string &text : options.paths) {
-        paths.push_back(parse_path(text, plan, checked.name, options.force));
-    }
-    if (paths.empty() && !options.list) {
-        throw Failure(Cause::input,
-                      "no PATH given: say what to run, as root/group or root/group/item{}",
-                      known_groups(plan));
-    }
-    return paths;
 }
 
 // A list asks nothing of the device but its vendor.
@@ -252,12 +246,17 @@ Exit run(RunOptions options)
         warn_of_lost_outputs(
             {{"--json", options.json}, {"--junit", options.junit}, {"--log", options.log}});
     }
+    const std::optional<EarlierRun> earlier = read_earlier_run(options);
+    if (earlier && leaves_nothing(options, *earlier)) {
+        return Exit::success;
+    }
     Identity identity = identity_of(options.labels);
     const RunNote note = note_for(options);
     const DeviceLock lock = options.list ? DeviceLock() : ready_device(note);
     const CheckedPlan checked = open_plan(options);
     const Plan &plan = *checked.loaded.plan;
-    const std::vector<Path> paths = paths_of(options, checked);
+    const std::optional<int> seed = seed_of(options);
+    const RoundPlan round = chosen_round(options, checked, earlier, seed);
     require_writable_results(options);
     choose_log(options.log);
     if (options.hangup == "go-on") {
@@ -269,12 +268,10 @@ Exit run(RunOptions options)
     std::optional<LibraryProcess> library(std::in_place);
     const int vendor = refer_to_doctor([&] { return ask_vendor(*library); });
     if (options.list) {
-        list_items(paths.empty() ? all_paths(plan) : paths, plan,
-                   vendor_suffix(vendor).value_or(""));
+        list_items(round, plan, vendor_suffix(vendor).value_or(""));
         return Exit::success;
     }
 
-    const RoundPlan round = plan_round(paths, plan, options.as_group);
     require_programs(names_of(round), vendor, options.force);
     const bool is_sent = checked.storing != Storing::as_file;
     const bool is_placed = !is_sent && !options.plan.empty();
@@ -304,6 +301,8 @@ Exit run(RunOptions options)
         }
     };
     Run run = run_of(options, checked.name, vendor);
+    run.seed = seed;
+    const EarlierRun *const resumed = take_up(run, options, earlier);
     name_device(identity);
     run.identity = std::move(identity);
     run.identity.plan_digest = digest_of(plan);
@@ -313,11 +312,11 @@ Exit run(RunOptions options)
     for (const auto &reporter : owned) {
         reporters.push_back(reporter.get());
     }
-    if (!run_rounds(reporters, for_runner, *library, signals, run, round, store_plan)) {
+    if (!run_rounds(reporters, for_runner, *library, signals, run, round, store_plan, resumed)) {
         return Exit::interrupted;
     }
     const Counts counts = count(run);
-    return counts.passed == counts.all() ? Exit::success : Exit::items_failed;
+    return run.finished && !counts.has_failures() ? Exit::success : Exit::items_failed;
 }
 
 } // namespace
@@ -327,7 +326,6 @@ void add_run(CLI::App &app, Action &chosen)
     const auto options = std::make_shared<RunOptions>();
     CLI::App &command = add_subcommand(app, "run", "Store a plan and run groups or items of it",
                                        kRunExamples, chosen, [options] { return run(*options); });
-    command.add_option("PATH", options->paths, "what to run")->type_name("");
     command
         .add_option("--plan", options->plan,
                     "store this plan first ('-': standard input);\n"
@@ -341,6 +339,7 @@ void add_run(CLI::App &app, Action &chosen)
     command.add_flag("--as-group", options->as_group,
                      "one command for each group, not for each\n"
                      "item");
+    add_selection(command, *options);
     command.add_option("--timeout", options->timeout, "stop an item that takes longer")
         ->type_name("SECONDS")
         ->transform(range(0.001, 1000000.0));
@@ -351,21 +350,7 @@ void add_run(CLI::App &app, Action &chosen)
     command.add_flag("--exit-status", options->fail_on_exit_status,
                      "an item that ends with a status other than\n"
                      "0 has failed");
-    command.add_option("--repeat", options->repeat, "run everything N times")
-        ->type_name("N")
-        ->transform(range(1, 1000000));
-    command
-        .add_option("--for", options->time_limit,
-                    "begin further rounds until this time is\n"
-                    "over: 90, 90s, 10m, 2h, 1d")
-        ->type_name("TIME")
-        ->transform(time_span());
-    command.add_flag("--until-fail", options->until_fail,
-                     "end with the first item that does not pass;\n"
-                     "begin another round until then");
-    command.add_flag("--list", options->list,
-                     "print what would be run and start nothing;\n"
-                     "without PATH, all that can be run");
+    command.add_flag("--list", options->list, "print what would be run and start nothing");
     command
         .add_option("--junit", options->junit,
                     "write the results as JUnit XML ('-': standard\n"

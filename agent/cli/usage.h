@@ -21,6 +21,9 @@ std::string usage_line(const CLI::App *app, const CLI::Error &error);
 std::vector<std::string> split_empty_values(const CLI::App &command,
                                             std::vector<std::string> words);
 
+// "--shuffle 7" as "--shuffle=7": CLI11 would take a PATH for the seed as well.
+std::vector<std::string> join_seed(std::vector<std::string> words);
+
 // Says that the program has no such option, without "fptest: " and a line feed.
 std::string unknown_option(const std::string &word, const CLI::App &app);
 

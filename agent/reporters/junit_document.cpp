@@ -88,11 +88,16 @@ void add(TestCounts &tests, const Run &run, const Suite &suite)
         ++tests.all;
         switch (item.outcome) {
         case Outcome::passed:
+        case Outcome::flaky:
+            break;
+        case Outcome::expected:
+            ++tests.skipped;
             break;
         case Outcome::not_run:
             ++(run.finished ? tests.skipped : tests.errors);
             break;
         case Outcome::failed:
+        case Outcome::unexpected:
             ++tests.failures;
             break;
         case Outcome::no_result:
@@ -150,19 +155,36 @@ std::string not_run(const Run &run, bool was_running)
                              attribute("type", was_running ? "running" : "not run"), message);
 }
 
+// The elements are those for a failed item and for any other.
+std::string failure(const ItemRun &item, const char *if_failed, const char *otherwise,
+                    const std::string &text)
+{
+    const bool has_failed = item.outcome == Outcome::failed || item.outcome == Outcome::unexpected;
+    return fmt::format(
+        "      <{0}{1}{2}>{3}</{0}>\n", has_failed ? if_failed : otherwise,
+        attribute("type", item.outcome == Outcome::failed ? "result" : word(item.outcome)),
+        attribute("message", item.reason.empty() ? word(item.outcome) : item.reason),
+        xml_escaped(text));
+}
+
+// With the elements that Surefire has for attempts before the last one.
 std::string verdict(const Run &run, const ItemRun &item)
 {
-    if (item.outcome == Outcome::passed) {
-        return "";
-    }
+    std::string text;
     if (item.outcome == Outcome::not_run) {
-        return not_run(run, item.start.has_value());
+        text = not_run(run, item.start.has_value());
+    } else if (item.outcome == Outcome::expected) {
+        text = failure(item, "", "skipped", details(item));
+    } else if (!is_success(item.outcome)) {
+        text = failure(item, "failure", "error", details(item));
     }
-    const bool has_failed = item.outcome == Outcome::failed;
-    return fmt::format("      <{0}{1}{2}>{3}</{0}>\n", has_failed ? "failure" : "error",
-                       attribute("type", has_failed ? "result" : word(item.outcome)),
-                       attribute("message", item.reason.empty() ? word(item.outcome) : item.reason),
-                       xml_escaped(details(item)));
+    for (const ItemRun &one : item.earlier) {
+        const std::string output = one.output.empty() ? "" : "output:\n" + one.output;
+        text += item.outcome == Outcome::flaky
+                    ? failure(one, "flakyFailure", "flakyError", details(one) + output)
+                    : failure(one, "rerunFailure", "rerunError", details(one) + output);
+    }
+    return text;
 }
 
 std::string test_case(const Run &run, const ItemRun &item)
@@ -173,8 +195,16 @@ std::string test_case(const Run &run, const ItemRun &item)
     const Value result = report.result_without_value ? Value("") : report.result;
     const Value status = item.exit_status ? Value(std::to_string(*item.exit_status)) : Value();
     const Value signal = item.signal != 0 ? Value(name_of_signal(item.signal)) : Value();
+    const bool is_flaky = item.outcome == Outcome::flaky;
+    const Value outcome = is_flaky || !item.expected.empty() ? Value(word(item.outcome)) : Value();
+    const Value reason = is_flaky ? Value(item.reason) : Value();
+    const Value expected = item.expected.empty() ? Value() : Value(item.expected);
+    const Value attempts =
+        run.retries > 0 ? Value(std::to_string(item.earlier.size() + 1)) : Value();
     const Value left = item.left_running.empty() ? Value() : Value(left_running(item));
     const std::string inside =
+        property(indent, "outcome", outcome) + property(indent, "reason", reason) +
+        property(indent, "expected", expected) + property(indent, "attempts", attempts) +
         property(indent, "progress", report.progress) + property(indent, "result", result) +
         property(indent, "description", report.description) +
         property(indent, "exit_status", status) + property(indent, "signal", signal) +
@@ -219,8 +249,22 @@ std::string test_suite(const Run &run, std::size_t number, const std::vector<Lat
     const std::string indent(6, ' ');
     std::string inside = property(indent, "plan", run.plan) +
                          property(indent, "vendor", std::to_string(run.vendor)) +
-                         property(indent, "pass_code", std::to_string(run.pass_code)) +
-                         kStateGoesHere;
+                         property(indent, "pass_code", std::to_string(run.pass_code));
+    if (run.seed) {
+        inside += property(indent, "seed", std::to_string(*run.seed));
+    }
+    if (!run.resumed.empty()) {
+        inside += property(indent, "resumed", run.resumed);
+    }
+    if (run.retries > 0) {
+        const Counts counts = count(suite.items);
+        inside += property(indent, "flaky", std::to_string(counts.flaky)) +
+                  property(indent, "retries", std::to_string(counts.retries));
+    }
+    if (run.has_expectations) {
+        inside += property(indent, "expected", std::to_string(count(suite.items).expected));
+    }
+    inside += kStateGoesHere;
     for (const auto &[name, value] : named_identity(run)) {
         inside += property(indent, name.c_str(), value);
     }

@@ -67,31 +67,12 @@ class PlainView : public Reporter
 
     void ended(const Run &run, Place place) override
     {
-        std::erase(running_, place);
-        if (place_ == place) {
-            show_next({}); // it may run again
-        }
-        const ItemRun &item = item_at(run, place);
-        const bool passed = item.outcome == Outcome::passed;
-        if (quiet_ && passed && item.left_running.empty()) {
-            return;
-        }
-        std::string text = fmt::format("{}: {}{}", one_line(title(run, item)), word(item.outcome),
-                                       reported_result(item.report));
-        if (const std::string how = how_it_ended(item); !how.empty()) {
-            text += ", " + how;
-        }
-        if (item.seconds) {
-            text += ", " + duration(*item.seconds);
-        }
-        const std::string said = remark(item);
-        print(text + (said.empty() ? "" : ": " + said));
-        if (const std::string left = left_running_line(item); !left.empty()) {
-            print("    " + left);
-        }
-        if (!passed) {
-            print_output(item.output);
-        }
+        show_end(run, place, "");
+    }
+
+    void retried(const Run &run, Place place) override
+    {
+        show_end(run, place, attempt_of(run, item_at(run, place)) + ": ");
     }
 
     void late(const Run &run, Place place, const ItemReport &report) override
@@ -128,6 +109,39 @@ class PlainView : public Reporter
         place_ = place;
         said_at_ = 0;
         output_said_.clear();
+    }
+
+    // How an attempt has ended that is not the last one is said before.
+    void show_end(const Run &run, Place place, const std::string &attempt)
+    {
+        std::erase(running_, place);
+        if (place_ == place) {
+            show_next({}); // it may run again
+        }
+        const ItemRun &item = item_at(run, place);
+        const bool passed = item.outcome == Outcome::passed;
+        if (quiet_ && passed && item.left_running.empty()) {
+            return;
+        }
+        std::string text = fmt::format("{}: {}{}{}", one_line(title(run, item)), attempt,
+                                       word(item.outcome), reported_result(item.report));
+        if (const std::string how = how_it_ended(item); !how.empty()) {
+            text += ", " + how;
+        }
+        if (attempt.empty() && !item.earlier.empty()) {
+            text += ", " + attempt_of(run, item);
+        }
+        if (item.seconds) {
+            text += ", " + duration(*item.seconds);
+        }
+        const std::string said = remark(item);
+        print(text + (said.empty() ? "" : ": " + said));
+        if (const std::string left = left_running_line(item); !left.empty()) {
+            print("    " + left);
+        }
+        if (!is_success(item.outcome)) {
+            print_output(item.output);
+        }
     }
 
     // What is new since it was last shown. Once the start of the output has been

@@ -81,7 +81,7 @@ std::string entry(const char *name, const std::optional<std::string> &text)
 }
 
 // What is known of an item that has been run.
-std::string diagnosis(const ItemRun &item)
+std::string diagnosis(const Run &run, const ItemRun &item)
 {
     const ItemReport &report = item.report;
     const std::string left = left_running(item);
@@ -89,6 +89,9 @@ std::string diagnosis(const ItemRun &item)
     text += entry("outcome", yaml_quoted(word(item.outcome)));
     if (!item.reason.empty()) {
         text += entry("reason", yaml_quoted(item.reason));
+    }
+    if (run.retries > 0) {
+        text += entry("attempts", std::to_string(item.earlier.size() + 1));
     }
     text += entry("progress", report.progress);
     text += report.result_without_value ? entry("result", yaml_quoted(""))
@@ -109,12 +112,27 @@ std::string diagnosis(const ItemRun &item)
     return text + kIndent + "  ...\n";
 }
 
+std::string directive(const Run &run, const ItemRun &item)
+{
+    switch (item.outcome) {
+    case Outcome::not_run:
+        return skipped(run);
+    case Outcome::expected:
+        return " # TODO " + tap_escaped(item.expected);
+    case Outcome::flaky:
+    case Outcome::unexpected:
+        return fmt::format(" # {}", word(item.outcome));
+    default:
+        return "";
+    }
+}
+
 std::string item_point(const Run &run, const ItemRun &item, std::size_t number)
 {
     const bool ran = item.outcome != Outcome::not_run;
-    const bool ok = !ran || item.outcome == Outcome::passed;
-    return fmt::format("{}{}{}\n{}", kIndent, point(ok, number, item.name), ran ? "" : skipped(run),
-                       ran ? diagnosis(item) : "");
+    const bool ok = !ran || (is_success(item.outcome) && item.outcome != Outcome::expected);
+    return fmt::format("{}{}{}\n{}", kIndent, point(ok, number, item.name), directive(run, item),
+                       ran ? diagnosis(run, item) : "");
 }
 
 std::string suite_point(const Run &run, const Suite &suite, std::size_t number)
@@ -149,6 +167,12 @@ class TapReporter : public Reporter
         for (const auto &[name, value] : named_identity(run)) {
             write(comment(fmt::format("{}: {}", name, one_line(value))));
         }
+        if (run.seed) {
+            write(comment(by_seed(run)));
+        }
+        if (!run.resumed.empty()) {
+            write(comment("resumed from " + one_line(run.resumed)));
+        }
     }
 
     void started(const Run &run, Place place) override
@@ -162,6 +186,16 @@ class TapReporter : public Reporter
         begun_ = std::max(begun_, place.suite + 1);
         ended_[place.suite][place.item] = true;
         write(next_lines(run, false));
+    }
+
+    void retried(const Run &run, Place place) override
+    {
+        const ItemRun &item = item_at(run, place);
+        const std::string said = remark(item);
+        write((open_ ? kIndent : "") +
+              comment(fmt::format("{}: {}: {}{}{}", one_line(title(run, item)),
+                                  attempt_of(run, item), word(item.outcome),
+                                  reported_result(item.report), said.empty() ? "" : ": " + said)));
     }
 
     void late(const Run &run, Place place, const ItemReport &report) override
@@ -186,8 +220,8 @@ class TapReporter : public Reporter
         for (const std::string &line : summary_table(run)) {
             text += comment(line);
         }
-        text += comment(fmt::format("{}, {}, {} not run in {}", passed, failed, counts.not_run,
-                                    duration(run.seconds)));
+        text += comment(fmt::format("{}, {}{}, {} not run in {}", passed, failed,
+                                    tally_of_others(run), counts.not_run, duration(run.seconds)));
         if (!run.finished) {
             text += fmt::format("Bail out!  {}\n", run.why_unfinished.empty()
                                                        ? "the run did not finish"

@@ -27,8 +27,9 @@ class Runner
         std::optional<std::chrono::duration<double>> timeout; // then an item is stopped
         std::chrono::duration<double> grace{2};               // and after that it is killed
         bool fail_on_exit_status = false;
-        bool ends_gatherer = false;                // one that runs already
-        std::function<void()> on_second_interrupt; // does not return
+        std::optional<std::chrono::duration<double>> limit; // then the run is stopped
+        bool ends_gatherer = false;                         // one that runs already
+        std::function<void()> on_second_interrupt;          // does not return
     };
 
     // All of them outlive the runner.
@@ -88,6 +89,12 @@ class Runner
     void poll_gatherers();
     void poll_gatherer(RunningItem &active);
     void read_signals();
+    void look_at_limit();
+    void stop_items();
+    bool is_stopping() const
+    {
+        return signal_ != 0 || over_limit_;
+    }
     void suspend();
     void stop_what_is_due();
     void try_stop(RunningItem &active);
@@ -108,6 +115,7 @@ class Runner
     template <typename Find> void end_all(const Find &find);
     void finish(RunningItem &active, TimePoint end);
     void notify_ended();
+    void notify_end_of(Place place);
     void tick();
 
     LibraryProcess &library_;
@@ -128,6 +136,8 @@ class Runner
     int vendor_ = run_.vendor;       // which the library read for its last item
     int signal_ = 0;
     TimePoint signal_taken_at_;
+    bool over_limit_ = false;
+    TimePoint stopping_since_;              // a signal, or the limit
     bool stop_asked_ = false;               // and not yet answered
     bool gatherer_runs_ = false;            // before the job's next item
     bool gatherer_may_report_late_ = false; // it was triggered and has not reported

@@ -9,6 +9,7 @@
 #include "module/stored_plan.h"
 #include "run/trigger.h"
 #include "util/text.h"
+#include "util/times.h"
 
 #include <algorithm>
 #include <csignal>
@@ -65,11 +66,28 @@ void Runner::read_signals()
         signal_ = signal;
         signal_taken_at_ = now();
         give_up(fmt::format("interrupted by {}", name_for_people(signal)));
-        for (RunningItem &active : running_.items) {
-            if (!active.stop) {
-                active.stop = Outcome::stopped;
-                active.stop_wanted_at = now();
-            }
+        stop_items();
+    }
+    look_at_limit();
+}
+
+void Runner::look_at_limit()
+{
+    if (!is_stopping() && options_.limit && now() - began_ > *options_.limit) {
+        over_limit_ = true;
+        give_up(fmt::format("the limit of {} was over (--limit)",
+                            fine_duration(options_.limit->count())));
+        stop_items();
+    }
+}
+
+void Runner::stop_items()
+{
+    stopping_since_ = now();
+    for (RunningItem &active : running_.items) {
+        if (!active.stop) {
+            active.stop = Outcome::stopped;
+            active.stop_wanted_at = now();
         }
     }
 }
@@ -120,7 +138,7 @@ void Runner::stop_what_is_due()
 bool Runner::is_stuck() const
 {
     const auto silent = now() - heard_of_at_;
-    return (signal_ != 0 && now() - signal_taken_at_ > options_.grace + kBeforeGivingUp) ||
+    return (is_stopping() && now() - stopping_since_ > options_.grace + kBeforeGivingUp) ||
            (silent > kBeforeGivingUp && library_.is_suspended()) ||
            (options_.timeout && silent > *options_.timeout + kForALongPlan);
 }
@@ -174,7 +192,7 @@ void Runner::release_command()
 // prevents that.
 bool Runner::starts_no_more() const
 {
-    return signal_ != 0 && running_.next < running_.job.targets.size();
+    return is_stopping() && running_.next < running_.job.targets.size();
 }
 
 void Runner::stop_gatherer(RunningItem &active)

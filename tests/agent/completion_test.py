@@ -69,7 +69,8 @@ def test_every_option_is_offered_that_the_help_tells(offered, command):
     ("send --p", []),
     # files
     *((words, ["plans"]) for words in (
-        "run --plan pl", "run --junit pl", "run --json pl", "run --log pl",
+        "run --plan pl", "run --junit pl", "run --json pl", "run --log pl", "run --expect pl", "run --failed-of pl",
+        "run --resume pl",
         "run --plan = pl", "send --log pl", "report --log pl", "check pl", "check x pl",
         "show pl", "show --help pl")),
     ("show plans/", ["plans/demo.xml", "plans/other plan.xml"]),
@@ -81,8 +82,9 @@ def test_every_option_is_offered_that_the_help_tells(offered, command):
     ("run --hangup ''", ["go-on", "stop"]),
     # numbers, words
     *((words, []) for words in (
-        "run --timeout ''", "run --for ''", "run --repeat ''", "report --progress ''",
-        "run --label ''", "stop --wait ''", "status ''",
+        "run --timeout ''", "run --for ''", "run --limit ''", "run --stop-after ''",
+        "run --retry ''", "run --repeat ''", "report --progress ''", "run --label ''",
+        "stop --wait ''", "status ''",
         "report --description ''", "send ''", "report Bringup SpiCheck ''")),
 ])
 def test_what_needs_no_plan_is_offered_without_one(offered, tmp_path, words, expected):
@@ -96,6 +98,7 @@ def test_what_needs_no_plan_is_offered_without_one(offered, tmp_path, words, exp
                       "demo/Gather", "demo/Gather/SensorProbe"]),
     (DEMO, "run --tap demo/Bringup demo/G", ["demo/Gather", "demo/Gather/SensorProbe"]),
     (DEMO, "run demo/Bringup/S", ["demo/Bringup/SpiCheck"]),
+    (DEMO, "run demo/Bringup --skip demo/Bringup/S", ["demo/Bringup/SpiCheck"]),
     # the root is called as anyone likes
     (DEMO, "run other/Ga", ["other/Gather", "other/Gather/SensorProbe"]),
     # groups, then their items

@@ -86,10 +86,6 @@ TEST_F(Refusal, NamesWhatIsWrongWithAPath)
            "root/group/item",
            {"P/Bringup/Item/x"});
     expect(2,
-           "fptest: no PATH given: say what to run, as root/group or root/group/item; the groups "
-           "are Bringup and Endurance",
-           Lines{});
-    expect(2,
            "fptest: 'P/Bring:up' has a ':', a tab or a line feed, at which the library would cut "
            "it: name it without",
            {"P/Bring:up"});
