@@ -302,10 +302,10 @@ Exit run(RunOptions options)
     };
     Run run = run_of(options, checked.name, vendor);
     run.seed = seed;
-    const EarlierRun *const resumed = take_up(run, options, earlier);
     name_device(identity);
     run.identity = std::move(identity);
     run.identity.plan_digest = digest_of(plan);
+    const EarlierRun *const resumed = take_up(run, options, earlier);
     auto owned = make_reporters(options);
     owned.push_back(make_note_reporter(lock, note));
     std::vector<Reporter *> reporters;

@@ -144,6 +144,12 @@ const EarlierRun *take_up(Run &run, const RunOptions &options,
                       "{} is of vendor {}, and this device's is {}: their items are other programs",
                       earlier.file, earlier.run.vendor, run.vendor);
     }
+    const std::string &digest = earlier.run.identity.plan_digest;
+    if (!digest.empty() && digest != run.identity.plan_digest) {
+        throw Failure(Cause::input,
+                      "{} is of another plan: {} has other items, or other args; run it anew",
+                      earlier.file, one_line(run.plan));
+    }
     run.seed = earlier.run.seed;
     run.resumed = earlier.file;
     run.seconds_before = earlier.run.seconds;

@@ -166,6 +166,7 @@ class EarlierRunReader
         }
         Run &run = earlier_.run;
         run.plan = object.at("plan");
+        run.identity.plan_digest = value_or_none<std::string>(object, "plan_digest").value_or("");
         run.vendor = object.at("vendor");
         run.rounds = value_or_none<int>(object, "rounds");
         run.time_limit = value_or_none<double>(object, "time_limit");

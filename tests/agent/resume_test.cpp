@@ -159,6 +159,10 @@ TEST_F(ResumedRun, RefusesAnotherPlanOrDevice)
     expect_refused(before + " is of another plan: it has G/Other and G/Third, and "
                             "/tmp/scene/plan.xml has not",
                    {}, {{"Item", kPasses}, {"Fourth", kPasses}});
+    expect_refused(
+        before + " is of another plan: /tmp/scene/plan.xml has other items, or other "
+                 "args; run it anew",
+        {}, {{"Item", kPasses}, {"Other", kPasses}, {"Third", std::string(kPasses) + " say more"}});
     const std::string text = read_file(before);
     file("before", std::string(text).replace(text.find("\"vendor\":0"), 10, "\"vendor\":1"));
     expect_refused(before + " is of vendor 1, and this device's is 0: their items are other "

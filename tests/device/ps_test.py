@@ -64,7 +64,7 @@ def test_it_shows_the_program_without_its_arguments():
 
 def test_it_shows_the_kernels_name_of_a_zombie():
     # a program that never reaps takes the place of the shell that started a child
-    found = own_processes("(sleep 0 & exec sleep 9) & sleep 0.4; ps sleep")
+    found = own_processes("(sleep 0 & exec sleep 9) & sleep 1; ps sleep")
 
     assert [(each.state, each.name) for each in found].count(("Z", "sleep")) == 1
 
