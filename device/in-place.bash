@@ -65,7 +65,7 @@ put_back()
 	mapfile -t made 2>/dev/null <"$keep/made"
 	for path in "${made[@]}"; do
 		case $path in
-		/system/bin | /dev/shm/quillmark-* | /data/vorlane | /etc/vorlane) trees+=("$path") ;;
+		/system/bin | /dev/shm/quillmark-* | /data/vorlane | /data/local/tmp | /etc/vorlane) trees+=("$path") ;;
 		*) empty=("$path" "${empty[@]}") ;;
 		esac
 	done
@@ -124,7 +124,7 @@ point_shell_at_mksh()
 
 lay_out_container()
 {
-	local directories=(/system /data /etc/vorlane /etc/vorlane/sysparms)
+	local directories=(/system /data /data/local /data/local/tmp /etc/vorlane /etc/vorlane/sysparms)
 
 	[[ -n $data ]] || directories+=(/data/vorlane)
 	mkdir -- "$keep" && echo "$run_mark" >"$keep/run" &&

@@ -19,14 +19,20 @@
 // device. It is of the same process group, which a terminal and timeout(1) signal whole,
 // COMMAND with it; and COMMAND is not to get that twice, as a second SIGTERM may mean "at
 // once". What comes to the supervisor itself was sent to all.
+//
+// With QUILLMARK_ADB=PORT in the environment the device inherits a socket that listens
+// there, on the caller's loopback, and the variable is its descriptor; START has it too,
+// COMMAND has neither.
 
 #include "common/descriptor.h"
 
 #include <algorithm>
+#include <arpa/inet.h>
 #include <array>
 #include <cerrno>
 #include <chrono>
 #include <csignal>
+#include <cstdint>
 #include <cstdio>
 #include <cstdlib>
 #include <cstring>
@@ -35,6 +41,7 @@
 #include <fstream>
 #include <iterator>
 #include <map>
+#include <netinet/in.h>
 #include <optional>
 #include <poll.h>
 #include <set>
@@ -42,6 +49,7 @@
 #include <string>
 #include <string_view>
 #include <sys/prctl.h>
+#include <sys/socket.h>
 #include <sys/wait.h>
 #include <system_error>
 #include <unistd.h>
@@ -59,6 +67,7 @@ constexpr auto kOneRequest = 200ms;
 constexpr auto kPatience = 10s;
 // The descriptor that is closed when COMMAND is begun.
 constexpr char kBeginVariable[] = "QUILLMARK_BEGIN";
+constexpr char kAdbVariable[] = "QUILLMARK_ADB";
 
 std::vector<int> parse_signals(const char *text)
 {
@@ -94,12 +103,18 @@ int shell_status(int status)
 // How many words START is begun with, before COMMAND.
 constexpr int kStartWords = 4;
 
+// The descriptor that the variable names is not for the next program.
+void keep_to_oneself(const char *variable)
+{
+    if (const char *descriptor = std::getenv(variable)) {
+        fcntl(std::atoi(descriptor), F_SETFD, FD_CLOEXEC);
+        unsetenv(variable);
+    }
+}
+
 [[noreturn]] void become(const std::vector<int> &signals, char **words)
 {
-    if (const char *descriptor = std::getenv(kBeginVariable)) {
-        fcntl(std::atoi(descriptor), F_SETFD, FD_CLOEXEC);
-        unsetenv(kBeginVariable);
-    }
+    keep_to_oneself(kBeginVariable);
     const pid_t start = fork();
     if (start == 0) {
         for (const int number : signals) {
@@ -108,6 +123,7 @@ constexpr int kStartWords = 4;
         execv(words[0], words);
         fail(words[0]);
     }
+    keep_to_oneself(kAdbVariable);
     int status = -1;
     waitpid(start, &status, 0);
     const sigset_t unblocked = set_of(signals);
@@ -209,6 +225,32 @@ int stand_in_front(pid_t caller, pid_t supervisor, const sigset_t &awaited)
 
 // ---- the supervision ---------------------------------------------------------
 
+Descriptor listen_for_adb()
+{
+    const char *port = std::getenv(kAdbVariable);
+    if (port == nullptr) {
+        return Descriptor(-1);
+    }
+    Descriptor listening(socket(AF_INET, SOCK_STREAM, 0));
+    sockaddr_in address{};
+    address.sin_family = AF_INET;
+    address.sin_port = htons(static_cast<std::uint16_t>(std::atoi(port)));
+    address.sin_addr.s_addr = htonl(INADDR_LOOPBACK);
+    const int on = 1;
+    setsockopt(listening.get(), SOL_SOCKET, SO_REUSEADDR, &on, sizeof on);
+    if (bind(listening.get(), reinterpret_cast<sockaddr *>(&address), sizeof address) != 0 ||
+        listen(listening.get(), SOMAXCONN) != 0) {
+        const std::string what = "--adb " + std::string(port);
+        if (errno == EADDRINUSE) {
+            std::fprintf(stderr, "device/run: %s: the port is taken; name another\n", what.c_str());
+            std::exit(kFailed);
+        }
+        fail(what.c_str());
+    }
+    setenv(kAdbVariable, std::to_string(listening.get()).c_str(), 1);
+    return listening;
+}
+
 class Supervisor
 {
   public:
@@ -258,6 +300,7 @@ class Supervisor
 
     void start(char **program, const sigset_t &mask)
     {
+        const Descriptor adb = listen_for_adb();
         std::array<int, 2> ends{};
         if (pipe(ends.data()) != 0) {
             fail("pipe");

@@ -121,5 +121,5 @@ lay_out_system()
 		box+=(--symlink "${library[$name]}" "/system/$name")
 	done
 	[[ -z $apex ]] || box+=(--ro-bind "$apex" /apex)
-	box+=(--perms 1777 --tmpfs /data/local/tmp --setenv ANDROID_ROOT /system --setenv ANDROID_DATA /data)
+	box+=(--setenv ANDROID_ROOT /system --setenv ANDROID_DATA /data)
 }

@@ -185,17 +185,24 @@ void print(const Process &process, const char *path)
     putchar('\n');
 }
 
-void list_if_named(const char *pid, const char *wanted)
+bool list_if_named(const char *pid, const char *wanted)
 {
     static Process process;
     process.pid = pid;
     if (!read_arguments(process) || !may_be_named(process, wanted) || !read_stat(process)) {
-        return;
+        return false;
     }
     const char *path = path_of(process);
-    if (is_named(path, wanted) && read_user(process)) {
-        print(process, path);
+    if (!is_named(path, wanted) || !read_user(process)) {
+        return false;
     }
+    print(process, path);
+    return true;
+}
+
+bool is_number(const char *text)
+{
+    return *text >= '1' && *text <= '9' && text[strspn(text, "0123456789")] == '\0';
 }
 
 int list(const char *wanted)
@@ -213,10 +220,14 @@ int list(const char *wanted)
               stderr);
     }
     puts("USER     PID   PPID  VSIZE  RSS     WCHAN    PC         NAME");
+    bool found = false;
     while (const dirent *entry = readdir(proc)) {
-        if (entry->d_name[0] >= '1' && entry->d_name[0] <= '9') {
-            list_if_named(entry->d_name, wanted);
+        if (is_number(entry->d_name) && list_if_named(entry->d_name, wanted)) {
+            found = true;
         }
+    }
+    if (!found && is_number(wanted)) {
+        list_if_named(wanted, "");
     }
     closedir(proc);
     if (fflush(stdout) != 0) {

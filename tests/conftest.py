@@ -6,6 +6,7 @@ import os
 
 import pytest
 
+from support import adb as adb_support
 from support import outside
 
 
@@ -22,6 +23,20 @@ def namespaces(device):
     """For tests of the device that has namespaces of its own."""
     if outside.way() == "in-place":
         pytest.skip("namespaces are refused here, and the device is in place")
+
+
+@pytest.fixture(scope="session")
+def adb(device, tmp_path_factory):
+    """The adb of this process, which no other meets."""
+    with adb_support.server(tmp_path_factory.mktemp("adb")) as adb:
+        yield adb
+
+
+@pytest.fixture(scope="module")
+def there(adb):
+    """adb, to a device that is up as long as the file's tests run."""
+    with adb.to_device() as there:
+        yield there
 
 
 @pytest.fixture

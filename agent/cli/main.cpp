@@ -34,7 +34,7 @@ constexpr char kExamples[] =
     "\n"
     "Exit status: 0 all passed; 1 some failed or did not report, or a checked plan\n"
     "has errors; 2 wrong usage or an error in the plan; 3 the device is not ready;\n"
-    "130 interrupted.";
+    "4 another fptest is running; 130 interrupted.";
 
 class CommandLine
 {
@@ -55,6 +55,8 @@ class CommandLine
         fptest::add_measure(app_, chosen_);
         fptest::add_send(app_, chosen_);
         fptest::add_doctor(app_, chosen_);
+        fptest::add_status(app_, chosen_);
+        fptest::add_stop(app_, chosen_);
     }
 
     Exit run(int argc, char **argv)
@@ -62,7 +64,7 @@ class CommandLine
         require_known_command(argc, argv);
         std::vector<std::string> words(argv + std::min(argc, 1), argv + argc);
         if (const CLI::App *command = words.empty() ? nullptr : find(words.front())) {
-            words = fptest::split_empty_values(*command, std::move(words));
+            words = fptest::split_empty_values(*command, fptest::join_seed(std::move(words)));
             words = fptest::mark_numbers(*command, std::move(words));
         }
         std::ranges::reverse(words); // as the parser wants them
@@ -106,6 +108,13 @@ class CommandLine
     fptest::Action chosen_;
 };
 
+Exit status_of(Cause cause)
+{
+    return cause == Cause::input  ? Exit::usage
+           : cause == Cause::busy ? Exit::busy
+                                  : Exit::environment;
+}
+
 Exit complain(Exit status, const std::string &text)
 {
     std::fflush(stdout);
@@ -125,8 +134,7 @@ int main(int argc, char **argv)
     try {
         status = CommandLine().run(argc, argv);
     } catch (const fptest::Failure &failure) {
-        status = complain(failure.cause() == Cause::input ? Exit::usage : Exit::environment,
-                          failure.what());
+        status = complain(status_of(failure.cause()), failure.what());
     } catch (const std::exception &error) {
         status = complain(Exit::environment, error.what());
     }

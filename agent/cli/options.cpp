@@ -5,6 +5,7 @@
 
 #include "cli/desk_paths.h"
 #include "cli/usage.h"
+#include "run/choice.h"
 #include "util/numbers.h"
 #include "util/text.h"
 
@@ -110,6 +111,11 @@ CLI::Validator result_code()
 CLI::Validator not_empty()
 {
     return {[](std::string &text) { return text.empty() ? refused(text, "") : ""; }, ""};
+}
+
+CLI::Validator order_seed()
+{
+    return {[](std::string &text) { return text == "true" ? "" : range(0, kSeedLimit)(text); }, ""};
 }
 
 CLI::Validator desk_file()

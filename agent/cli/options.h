@@ -33,6 +33,9 @@ CLI::Validator result_code();
 
 CLI::Validator not_empty();
 
+// Of an option that is also a flag, without a value "true".
+CLI::Validator order_seed();
+
 // A plan, also one relative to the directory that device/run was called in.
 CLI::Validator desk_file();
 

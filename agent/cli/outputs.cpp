@@ -34,11 +34,21 @@ std::vector<std::string> results_on_standard_output(const RunOptions &options)
     return results;
 }
 
+bool is_regular_file(int descriptor)
+{
+    struct stat status {
+    };
+    return fstat(descriptor, &status) == 0 && S_ISREG(status.st_mode);
+}
+
 } // namespace
 
 void resolve_output_conflicts(RunOptions &options)
 {
     require_different({{"--plan", options.plan == "-" ? kStandardInput : options.plan},
+                       {"--expect", options.expect == "-" ? kStandardInput : options.expect},
+                       {"--failed-of", options.failed_of},
+                       {"--resume", options.resume},
                        {"--json", options.json},
                        {"--junit", options.junit},
                        {"--files", options.files},
@@ -93,7 +103,9 @@ std::vector<std::unique_ptr<Reporter>> make_reporters(const RunOptions &options)
     if (options.tap) {
         reporters.push_back(make_tap_reporter(stdout));
     } else if (results_on_standard_output(options).empty()) {
-        reporters.push_back(make_suitable_view(stdout, options.quiet));
+        reporters.push_back(options.plain ? make_plain_view(stdout, options.quiet)
+                                          : make_suitable_view(stdout, options.quiet));
+        reporters.back()->is_needed = options.hangup != "go-on" || is_regular_file(STDOUT_FILENO);
     }
     return reporters;
 }

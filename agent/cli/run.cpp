@@ -3,10 +3,13 @@
 
 #include "check/finding_printer.h"
 #include "cli/desk_paths.h"
+#include "cli/identity.h"
 #include "cli/log_option.h"
 #include "cli/options.h"
 #include "cli/outputs.h"
 #include "cli/run_options.h"
+#include "cli/selection.h"
+#include "module/device_lock.h"
 #include "module/library_process.h"
 #include "module/log_file.h"
 #include "module/own_ps.h"
@@ -16,6 +19,7 @@
 #include "module/vendor_file.h"
 #include "plan/plan.h"
 #include "plan/plan_text.h"
+#include "reporters/reporters.h"
 #include "run/planner.h"
 #include "run/rounds.h"
 #include "run/runner.h"
@@ -24,6 +28,7 @@
 #include "util/write.h"
 
 #include <algorithm>
+#include <csignal>
 #include <cstdio>
 #include <iterator>
 #include <memory>
@@ -40,12 +45,13 @@ namespace
 {
 
 constexpr char kRunExamples[] =
-    "A PATH is root/group or root/group/item; the root may be any word.\n"
+    "A PATH is root/group or root/group/item; the root may be any word, the others\n"
+    "patterns as of the shell. Without PATH, every group is run.\n"
     "\n"
     "Examples:\n"
     "  fptest run --plan plans/demo.xml demo/Bringup demo/Gather\n"
     "  fptest run --timeout 30 --junit results.xml demo/Bringup/SpiCheck\n"
-    "  fptest run --plan plans/demo.xml --list\n"
+    "  fptest run --plan plans/demo.xml --list '*/*/S*'\n"
     "  prove --exec 'fptest run --tap' demo/Bringup";
 
 // --- the plan -----------------------------------------------------------------
@@ -126,9 +132,9 @@ void report_other_gatherer(const RoundPlan &round, const Plan &plan, int vendor,
     }
 }
 
-void list_items(const std::vector<Path> &paths, const Plan &plan, const std::string &suffix)
+void list_items(const RoundPlan &round, const Plan &plan, const std::string &suffix)
 {
-    const auto items = commands_of(paths, plan, suffix);
+    const auto items = commands_of(round, plan, suffix);
     std::size_t width = 0;
     for (const auto &[path, command] : items) {
         width = std::max(width, display_width(one_line(path)));
@@ -163,10 +169,17 @@ void refuse_list_with_results(const RunOptions &options)
 }
 
 // The lock keeps the device as it is found now.
-Descriptor ready_device()
+DeviceLock ready_device(const RunNote &note)
 {
     require_device();
-    return lock_device();
+    return DeviceLock(note);
+}
+
+RunNote note_for(const RunOptions &options)
+{
+    RunNote note;
+    note.plan = name_of_plan(options.plan);
+    return note;
 }
 
 Runner::Options runner_options(const RunOptions &options)
@@ -174,6 +187,9 @@ Runner::Options runner_options(const RunOptions &options)
     Runner::Options runner;
     if (options.timeout) {
         runner.timeout = std::chrono::duration<double>(*options.timeout);
+    }
+    if (options.limit) {
+        runner.limit = std::chrono::duration<double>(*options.limit);
     }
     runner.grace = std::chrono::duration<double>(options.grace);
     runner.fail_on_exit_status = options.fail_on_exit_status;
@@ -193,24 +209,13 @@ Run run_of(const RunOptions &options, const std::string &plan, int vendor)
     }
     run.time_limit = options.time_limit;
     run.until_fail = options.until_fail;
+    run.stop_after = options.stop_after;
+    run.retries = options.retries;
+    run.has_expectations = !options.expect.empty();
+    run.limit = options.limit;
     run.pass_code = options.pass_code;
     run.vendor = vendor;
     return run;
-}
-
-std::vector<Path> paths_of(const RunOptions &options, const CheckedPlan &checked)
-{
-    const Plan &plan = *checked.loaded.plan;
-    std::vector<Path> paths;
-    for (const std::string &text : options.paths) {
-        paths.push_back(parse_path(text, plan, checked.name, options.force));
-    }
-    if (paths.empty() && !options.list) {
-        throw Failure(Cause::input,
-                      "no PATH given: say what to run, as root/group or root/group/item{}",
-                      known_groups(plan));
-    }
-    return paths;
 }
 
 // A list asks nothing of the device but its vendor.
@@ -246,24 +251,32 @@ Exit run(RunOptions options)
                               {"--files", options.files},
                               {"--log", options.log}});
     }
-    const Descriptor lock = options.list ? Descriptor(-1) : ready_device();
+    const std::optional<EarlierRun> earlier = read_earlier_run(options);
+    if (earlier && leaves_nothing(options, *earlier)) {
+        return Exit::success;
+    }
+    Identity identity = identity_of(options.labels);
+    const RunNote note = note_for(options);
+    const DeviceLock lock = options.list ? DeviceLock() : ready_device(note);
     const CheckedPlan checked = open_plan(options);
     const Plan &plan = *checked.loaded.plan;
-    const std::vector<Path> paths = paths_of(options, checked);
+    const std::optional<int> seed = seed_of(options);
+    const RoundPlan round = chosen_round(options, checked, earlier, seed);
     require_writable_results(options);
     choose_log(options.log);
-    Signals signals;
+    if (options.hangup == "go-on") {
+        std::signal(SIGHUP, SIG_IGN);
+    }
+    Signals signals([&lock] { return lock.is_asked_to_stop(); });
     choose_ps_for(options);
     report_no_vendor(options);
     std::optional<LibraryProcess> library(std::in_place);
     const int vendor = refer_to_doctor([&] { return ask_vendor(*library); });
     if (options.list) {
-        list_items(paths.empty() ? all_paths(plan) : paths, plan,
-                   vendor_suffix(vendor).value_or(""));
+        list_items(round, plan, vendor_suffix(vendor).value_or(""));
         return Exit::success;
     }
 
-    const RoundPlan round = plan_round(paths, plan, options.as_group);
     require_programs(names_of(round), vendor, options.force);
     const bool is_sent = checked.storing != Storing::as_file;
     const bool is_placed = !is_sent && !options.plan.empty();
@@ -274,7 +287,8 @@ Exit run(RunOptions options)
         report_other_gatherer(round, plan, vendor, for_runner.ends_gatherer);
     }
     if (is_sent || is_placed) {
-        require_room(is_sent ? checked.stored.size() : checked.text.size());
+        const std::string &stored = is_sent ? checked.stored : checked.text;
+        refer_to_doctor([&stored] { require_room(stored.size()); });
     }
     if (is_placed && !options.quiet) {
         say("{}: its {} bytes are more than the {} that a command stores, so it is placed as the "
@@ -292,16 +306,22 @@ Exit run(RunOptions options)
         }
     };
     Run run = run_of(options, checked.name, vendor);
-    const auto owned = make_reporters(options);
+    run.seed = seed;
+    name_device(identity);
+    run.identity = std::move(identity);
+    run.identity.plan_digest = digest_of(plan);
+    const EarlierRun *const resumed = take_up(run, options, earlier);
+    auto owned = make_reporters(options);
+    owned.push_back(make_note_reporter(lock, note));
     std::vector<Reporter *> reporters;
     for (const auto &reporter : owned) {
         reporters.push_back(reporter.get());
     }
-    if (!run_rounds(reporters, for_runner, *library, signals, run, round, store_plan)) {
+    if (!run_rounds(reporters, for_runner, *library, signals, run, round, store_plan, resumed)) {
         return Exit::interrupted;
     }
     const Counts counts = count(run);
-    return counts.passed == counts.all() ? Exit::success : Exit::items_failed;
+    return run.finished && !counts.has_failures() ? Exit::success : Exit::items_failed;
 }
 
 } // namespace
@@ -311,7 +331,6 @@ void add_run(CLI::App &app, Action &chosen)
     const auto options = std::make_shared<RunOptions>();
     CLI::App &command = add_subcommand(app, "run", "Store a plan and run groups or items of it",
                                        kRunExamples, chosen, [options] { return run(*options); });
-    command.add_option("PATH", options->paths, "what to run")->type_name("");
     command
         .add_option("--plan", options->plan,
                     "store this plan first ('-': standard input);\n"
@@ -325,6 +344,7 @@ void add_run(CLI::App &app, Action &chosen)
     command.add_flag("--as-group", options->as_group,
                      "one command for each group, not for each\n"
                      "item");
+    add_selection(command, *options);
     command.add_option("--timeout", options->timeout, "stop an item that takes longer")
         ->type_name("SECONDS")
         ->transform(range(0.001, 1000000.0));
@@ -338,21 +358,7 @@ void add_run(CLI::App &app, Action &chosen)
     command.add_flag("--judge-limits", options->judge_limits,
                      "an item that measures out of limits has\n"
                      "failed");
-    command.add_option("--repeat", options->repeat, "run everything N times")
-        ->type_name("N")
-        ->transform(range(1, 1000000));
-    command
-        .add_option("--for", options->time_limit,
-                    "begin further rounds until this time is\n"
-                    "over: 90, 90s, 10m, 2h, 1d")
-        ->type_name("TIME")
-        ->transform(time_span());
-    command.add_flag("--until-fail", options->until_fail,
-                     "end with the first item that does not pass;\n"
-                     "begin another round until then");
-    command.add_flag("--list", options->list,
-                     "print what would be run and start nothing;\n"
-                     "without PATH, all that can be run");
+    command.add_flag("--list", options->list, "print what would be run and start nothing");
     command
         .add_option("--junit", options->junit,
                     "write the results as JUnit XML ('-': standard\n"
@@ -382,6 +388,15 @@ void add_run(CLI::App &app, Action &chosen)
                      "run in spite of errors in the plan and of\n"
                      "missing programs");
     command.add_flag("--quiet", options->quiet, "print only what did not pass");
+    command.add_flag("--plain", options->plain, "print lines, as a log wants them");
+    command
+        .add_option("--hangup", options->hangup,
+                    "what the end of the terminal means: stop or\n"
+                    "go-on")
+        ->type_name("WORD")
+        ->capture_default_str()
+        ->check(one_of({"stop", "go-on"}, "is not stop or go-on"));
+    add_labels(command, options->labels);
     add_log(command, options->log);
 }
 

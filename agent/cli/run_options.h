@@ -12,9 +12,13 @@ namespace fptest
 {
 
 struct RunOptions {
-    std::string plan; // a file, "-" for standard input; empty: the stored plan
-    std::vector<std::string> paths;
-    bool as_sent = false; // store the plan by a command, which may cut it
+    std::string plan;               // a file, "-" for standard input; empty: the stored plan
+    std::vector<std::string> paths; // also patterns; none for every group
+    std::vector<std::string> skips;
+    std::string failed_of; // JSON lines of a run before
+    std::string resume;    // the same
+    std::string shuffle;   // a seed, "true" for any; empty for the plan's order
+    bool as_sent = false;  // store the plan by a command, which may cut it
     bool as_group = false;
     bool list = false;
     bool force = false;
@@ -27,11 +31,18 @@ struct RunOptions {
     std::optional<int> repeat;
     std::optional<double> time_limit; // seconds after which no new round begins
     bool until_fail = false;
+    std::string expect;            // a file of known failures
+    int retries = 0;               // of an item that does not pass
+    std::optional<int> stop_after; // items that did not pass
+    std::optional<double> limit;   // seconds for the whole run
     int pass_code = 0;
     std::string junit; // files, "-" for standard output; empty for none
     std::string json;
     std::string log;
     std::string files; // a directory for those of items; empty for none
+    std::vector<std::string> labels; // KEY=VALUE
+    bool plain = false;              // lines, also on a terminal
+    std::string hangup = "stop";     // or "go-on"
 };
 
 } // namespace fptest

@@ -3,6 +3,7 @@
 
 #include "cli/log_option.h"
 #include "cli/options.h"
+#include "module/device_lock.h"
 #include "module/library_process.h"
 #include "module/log_file.h"
 #include "module/own_ps.h"
@@ -102,6 +103,10 @@ std::vector<std::string> items_of(const std::string &command)
 class Sender
 {
   public:
+    explicit Sender(const DeviceLock &lock) : signals_([&lock] { return lock.is_asked_to_stop(); })
+    {
+    }
+
     // The reply; nullopt if the command was interrupted.
     std::optional<std::string> send(const std::string &command)
     {
@@ -156,16 +161,18 @@ Exit send(const SendOptions &options)
     const std::vector<std::string> commands =
         options.from_input ? read_commands() : options.commands;
     // lock the device as a run does, if a command stores a plan or runs items
-    Descriptor lock(-1);
+    DeviceLock lock;
     if (std::ranges::any_of(commands, [](const std::string &command) {
             return plan_of(command) || head_of(command).starts_with("XMLNodePath");
         })) {
-        lock = lock_device();
+        RunNote note;
+        note.plan = "commands";
+        lock = DeviceLock(note);
         if (const std::string said = choose_ps(); !said.empty()) {
             say("{}", said);
         }
     }
-    Sender sender;
+    Sender sender(lock);
     for (const std::string &command : commands) {
         const auto reply = sender.send(command);
         if (!reply) {

@@ -19,6 +19,7 @@ enum class Exit {
     items_failed = 1,  // or a checked plan has errors
     usage = 2,         // or an error in the plan
     environment = 3,   // the device is not ready
+    busy = 4,          // another fptest uses the device
     interrupted = 130, // by a signal
 };
 
@@ -33,5 +34,7 @@ void add_report(CLI::App &app, Action &chosen);
 void add_measure(CLI::App &app, Action &chosen);
 void add_send(CLI::App &app, Action &chosen);
 void add_doctor(CLI::App &app, Action &chosen);
+void add_status(CLI::App &app, Action &chosen);
+void add_stop(CLI::App &app, Action &chosen);
 
 } // namespace fptest

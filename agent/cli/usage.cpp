@@ -9,6 +9,7 @@
 
 #include <algorithm>
 #include <fmt/core.h>
+#include <utility>
 #include <vector>
 
 namespace fptest
@@ -102,6 +103,11 @@ std::vector<std::string> split_empty_values(const CLI::App &command, std::vector
         if (option == nullptr) {
             continue;
         }
+        if (option->get_expected_max() == 0 && !option->get_disable_flag_override()) {
+            throw Failure(
+                Cause::input, "{}",
+                with_help(option->get_name() + ": its value is empty", command.get_name()));
+        }
         if (option->get_expected_max() == 0) {
             throw Failure(Cause::input, "{}", with_help(no_value(*option), command.get_name()));
         }
@@ -109,6 +115,20 @@ std::vector<std::string> split_empty_values(const CLI::App &command, std::vector
         words.insert(words.begin() + static_cast<std::ptrdiff_t>(++at), "");
     }
     return words;
+}
+
+std::vector<std::string> join_seed(std::vector<std::string> words)
+{
+    std::vector<std::string> joined;
+    for (std::string &word : words) {
+        const bool is_number = word.find_first_not_of("0123456789") == std::string::npos;
+        if (is_number && !joined.empty() && joined.back() == "--shuffle") {
+            joined.back() += "=" + word;
+        } else {
+            joined.push_back(std::move(word));
+        }
+    }
+    return joined;
 }
 
 std::vector<std::string> mark_numbers(const CLI::App &command, std::vector<std::string> words)

@@ -21,6 +21,9 @@ std::string usage_line(const CLI::App *app, const CLI::Error &error);
 std::vector<std::string> split_empty_values(const CLI::App &command,
                                             std::vector<std::string> words);
 
+// "--shuffle 7" as "--shuffle=7": CLI11 would take a PATH for the seed as well.
+std::vector<std::string> join_seed(std::vector<std::string> words);
+
 // Puts a "--" before the words of fptest measure: the parser would take "-.5" for an option.
 std::vector<std::string> mark_numbers(const CLI::App &command, std::vector<std::string> words);
 

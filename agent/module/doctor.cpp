@@ -4,6 +4,7 @@
 #include "module/doctor.h"
 
 #include "module/item_shell.h"
+#include "module/library_file.h"
 #include "module/library_process.h"
 #include "module/own_ps.h"
 #include "module/preflight.h"
@@ -21,7 +22,6 @@
 #include <csignal>
 #include <cstdio>
 #include <cstring>
-#include <dlfcn.h>
 #include <fmt/core.h>
 #include <mxml.h>
 #include <optional>
@@ -94,14 +94,25 @@ DeviceAnswer about_ps()
     if (about_grep().verdict != Verdict::ok) {
         return warning("ps", "it cannot be asked for the gatherer without grep");
     }
-    const auto own = directory_of_own_ps();
-    const std::string advice =
-        own ? fmt::format("fptest uses {}/ps instead: put that directory first in the PATH of "
-                          "other agents",
-                          one_line(*own))
-            : "put quillmark-ps first in PATH";
-    const auto &tell = own ? warning : error;
     const PsAnswers answers = ask_ps();
+    if (!answers.was_asked) {
+        return warning("ps", answers.complaint);
+    }
+    const auto own = directory_of_own_ps();
+    bool is_helped = false;
+    if (own && !answers.is_enough()) {
+        put_first_in_path(*own);
+        is_helped = ask_ps().is_enough();
+    }
+    const std::string advice =
+        is_helped ? fmt::format("fptest uses {}/ps instead: put that directory first in the PATH "
+                                "of other agents",
+                                one_line(*own))
+        : own     ? fmt::format("{}/ps does not answer either: put a quillmark-ps that is built "
+                                    "for this device there",
+                                one_line(*own))
+                  : "put quillmark-ps first in PATH";
+    const auto &tell = is_helped ? warning : error;
     const std::string said = one_line(answers.complaint);
     if (answers.header.empty()) {
         return tell("ps", fmt::format("ps does not list processes{}; {}",
@@ -294,16 +305,6 @@ DeviceAnswer about_descriptors()
 
 // --- libraries ----------------------------------------------------------------
 
-// Which file has this name's function or variable; empty if none has.
-std::string provider_of(const char *name)
-{
-    const void *place = dlsym(RTLD_DEFAULT, name);
-    Dl_info found{};
-    return place != nullptr && dladdr(place, &found) != 0 && found.dli_fname != nullptr
-               ? found.dli_fname
-               : "";
-}
-
 std::string real_name(const std::string &file)
 {
     const std::string end = end_of_links(file);
@@ -313,7 +314,8 @@ std::string real_name(const std::string &file)
 DeviceAnswer about_mini_xml()
 {
     constexpr char kName[] = "mini-xml";
-    const std::string file = provider_of("mxmlLoadFd");
+    // it may be a part of this program
+    const std::string file = provider_at(reinterpret_cast<const void *>(&mxmlLoadFd));
 #ifdef MXML_MAJOR_VERSION
     const std::string built = fmt::format("{}.{}", MXML_MAJOR_VERSION, MXML_MINOR_VERSION);
 #else

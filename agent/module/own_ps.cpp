@@ -8,6 +8,7 @@
 #include <cstdlib>
 #include <filesystem>
 #include <fmt/core.h>
+#include <paths.h>
 #include <sstream>
 #include <system_error>
 #include <unistd.h>
@@ -48,6 +49,16 @@ std::optional<std::string> directory_of_own_ps()
     return std::nullopt;
 }
 
+void put_first_in_path(const std::string &directory)
+{
+    const char *path = std::getenv("PATH");
+    setenv("PATH",
+           fmt::format("{}:{}", directory,
+                       path != nullptr ? path : "/system/bin:/vendor/bin:" _PATH_DEFPATH)
+               .c_str(),
+           1);
+}
+
 std::string choose_ps()
 {
     const auto own = directory_of_own_ps();
@@ -59,12 +70,13 @@ std::string choose_ps()
         return "this device's ps does not answer the library, and there is no quillmark-ps beside "
                "fptest: fptest doctor says what that leads to";
     }
-    const char *path = std::getenv("PATH");
-    setenv("PATH",
-           fmt::format("{}{}{}", *own, path != nullptr ? ":" : "", path != nullptr ? path : "")
-               .c_str(),
-           1);
-    return fmt::format("this device's ps does not answer the library: {}/ps is used instead", *own);
+    put_first_in_path(*own);
+    return ask_ps().is_enough()
+               ? fmt::format("this device's ps does not answer the library: {}/ps is used instead",
+                             *own)
+               : fmt::format("neither this device's ps nor {}/ps answers the library: fptest "
+                             "doctor says what that leads to",
+                             *own);
 }
 
 } // namespace fptest

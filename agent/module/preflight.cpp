@@ -3,6 +3,7 @@
 
 #include "module/preflight.h"
 
+#include "common/descriptor.h"
 #include "module/item_shell.h"
 #include "module/processes.h"
 #include "module/stored_plan.h"
@@ -12,18 +13,13 @@
 
 #include <algorithm>
 #include <cerrno>
-#include <chrono>
 #include <cstdio>
 #include <cstring>
-#include <fcntl.h>
 #include <fmt/core.h>
 #include <iterator>
 #include <netinet/in.h>
 #include <sstream>
-#include <sys/file.h>
 #include <sys/socket.h>
-#include <sys/stat.h>
-#include <thread>
 #include <unistd.h>
 
 namespace fptest
@@ -87,22 +83,6 @@ void require_device()
         require_data();
     });
     require_regular_plan();
-}
-
-Descriptor lock_device()
-{
-    Descriptor directory(open(kDataDirectory, O_RDONLY | O_DIRECTORY | O_CLOEXEC));
-    // after an fptest that was killed, its items are still being ended
-    for (int tries = 0; directory.is_open() && flock(directory.get(), LOCK_EX | LOCK_NB) != 0 &&
-                        errno == EWOULDBLOCK;
-         ++tries) {
-        if (tries == 150) {
-            throw Failure(Cause::device, "another fptest is running a plan on this device: "
-                                         "wait for its end, or stop it");
-        }
-        std::this_thread::sleep_for(std::chrono::milliseconds(20));
-    }
-    return directory;
 }
 
 void require_trigger_port()

@@ -5,7 +5,6 @@
 // says what to do.
 #pragma once
 
-#include "common/descriptor.h"
 #include "util/failure.h"
 
 #include <string>
@@ -32,9 +31,6 @@ template <typename Question> auto refer_to_doctor(const Question &ask)
         throw Failure(lack.cause(), "{}; see fptest doctor", lack.what());
     }
 }
-
-// That nobody else runs a plan here while the descriptor is open.
-Descriptor lock_device();
 
 // That the library will be able to listen for the gatherer.
 void require_trigger_port();

@@ -159,7 +159,8 @@ Processes read_family(pid_t ancestor, int vendor)
         const std::string program = program_of(kGatherer, *vendor_suffix(one));
         for (auto &[pid, process] : processes) {
             const bool is_exact = process.program == program || process.script == program;
-            if ((is_exact && one == vendor) || ((is_exact || continues(process.program, program)) &&
+            if ((is_exact && one == vendor) || ((is_exact || continues(process.program, program) ||
+                                                 continues(process.script, program)) &&
                                                 !is_below(processes, pid, ancestor))) {
                 process.gathers = true;
             }

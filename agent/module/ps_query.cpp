@@ -67,7 +67,7 @@ class NamedProcess
             std::chrono::ceil<std::chrono::milliseconds>(end - std::chrono::steady_clock::now());
         pollfd waiting{news.get(), POLLIN, 0};
         char line_feed = 0;
-        has_name_ = poll(&waiting, 1, static_cast<int>(left.count())) > 0 &&
+        has_name_ = poll(&waiting, 1, std::max(0, static_cast<int>(left.count()))) > 0 &&
                     read(news.get(), &line_feed, 1) == 1;
     }
     ~NamedProcess()
@@ -198,7 +198,8 @@ PsAnswers ask_ps()
     PsQueries queries(process.pid(), end);
     PsAnswers &answers = queries.answers();
     if (!process.is_ready()) {
-        answers.complaint = "it could not be asked: /system/bin/sh does not run";
+        answers.was_asked = false;
+        answers.complaint = "it could not be asked: /system/bin/sh does not run under another name";
         return answers;
     }
     queries.ask_for_path(directory + name);

@@ -11,6 +11,7 @@ namespace fptest
 {
 
 struct PsAnswers {
+    bool was_asked = true;         // false if no process could be had to ask it about
     bool finds_path = false;       // "ps | grep PATH" has a line of the process
     bool finds_query = false;      // and one that is not its: the query's own grep, say
     bool finds_name = false;       // "ps NAME" lists it first: 28 characters, as a stop asks

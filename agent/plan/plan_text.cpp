@@ -3,7 +3,7 @@
 
 #include "plan/plan_text.h"
 
-#include "plan/plan.h"
+#include "util/sha256.h"
 #include "util/text.h"
 
 #include <algorithm>
@@ -108,6 +108,25 @@ bool is_same_plan(const std::string &one, const std::string &other)
     };
     return parsed && parsed_other &&
            std::ranges::equal(parsed->elements(), parsed_other->elements(), is_same_element);
+}
+
+std::string digest_of(const Plan &plan)
+{
+    std::string text; // a zero byte ends each part, as no name or value has one
+    for (mxml_node_t *node : plan.elements()) {
+        for (mxml_node_t *above = mxmlGetParent(node); above != nullptr;
+             above = mxmlGetParent(above)) {
+            text += '/';
+        }
+        text.append(mxmlGetElement(node)) += '\0';
+        for (const char *name : {"name", "args"}) {
+            if (const auto value = attribute(node, name)) {
+                text.append(name).append("=").append(*value);
+            }
+            text += '\0';
+        }
+    }
+    return sha256(text);
 }
 
 std::optional<std::string> without_marks(const std::string &text)

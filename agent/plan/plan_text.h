@@ -4,6 +4,8 @@
 // Edits a plan's text, and leaves everything else byte for byte as it is.
 #pragma once
 
+#include "plan/plan.h"
+
 #include <cstddef>
 #include <optional>
 #include <string>
@@ -32,6 +34,10 @@ bool has_marks(const std::string &text);
 
 // Whether both have the same elements with the same names and args, whatever was reported.
 bool is_same_plan(const std::string &one, const std::string &other);
+
+// The same 64 hexadecimal digits for the same plan in that sense, nested alike: a file's and
+// those of what is stored of it agree.
+std::string digest_of(const Plan &plan);
 
 // The text without any marks; nullopt if it is not whole.
 std::optional<std::string> without_marks(const std::string &text);

@@ -139,12 +139,33 @@ class JsonReporter : public Reporter
         Json json = {{"event", "run"}, {"format", kFormat}};
         json["program"] = "fptest";
         json["version"] = FPTEST_VERSION;
+        json["library_version"] = words_or_null(run.identity.library);
         json["plan"] = sanitize_utf8(run.plan);
+        json["plan_digest"] = words_or_null(run.identity.plan_digest);
         json["vendor"] = run.vendor;
         json["rounds"] = run.rounds ? Json(*run.rounds) : Json();
         json["time_limit"] = seconds_or_null(run.time_limit);
         json["until_fail"] = run.until_fail;
         json["pass_code"] = run.pass_code;
+        json["labels"] = Json::object();
+        for (const auto &[key, value] : run.identity.labels) {
+            json["labels"][key] = sanitize_utf8(value);
+        }
+        if (run.stop_after) {
+            json["stop_after"] = *run.stop_after;
+        }
+        if (run.limit) {
+            json["limit"] = seconds_or_null(run.limit);
+        }
+        if (run.retries > 0) {
+            json["retries"] = run.retries;
+        }
+        if (run.seed) {
+            json["seed"] = *run.seed;
+        }
+        if (!run.resumed.empty()) {
+            json["resumed"] = sanitize_utf8(run.resumed);
+        }
         json["start"] = timestamp(run.start);
         json["items"] = std::move(items);
         write(json);
@@ -154,6 +175,7 @@ class JsonReporter : public Reporter
     {
         Json json = event_of("start", run, place);
         json["start"] = start_of(item_at(run, place));
+        add_attempt(json, run, place);
         write(json);
     }
 
@@ -168,20 +190,12 @@ class JsonReporter : public Reporter
     void ended(const Run &run, Place place) override
     {
         ended_[first_of_[place.suite] + place.item] = true;
-        const ItemRun &item = item_at(run, place);
-        Json json = event_of("end", run, place);
-        json["outcome"] = word(item.outcome);
-        add_report(json, item.report);
-        json["reason"] =
-            words_or_null(item.outcome == Outcome::not_run ? why_not_all(run) : item.reason);
-        json["start"] = start_of(item);
-        json["seconds"] = seconds_or_null(item.seconds);
-        add_end(json, item);
-        add_measurements(json, item);
-        add_files(json, item);
-        json["warning"] = words_or_null(item.warning);
-        json["output"] = sanitize_utf8(item.output);
-        write(json);
+        write_end("end", run, place);
+    }
+
+    void retried(const Run &run, Place place) override
+    {
+        write_end("retry", run, place);
     }
 
     void late(const Run &run, Place place, const ItemReport &report) override
@@ -217,6 +231,13 @@ class JsonReporter : public Reporter
         json["passed"] = counts.passed;
         json["failed"] = counts.failed;
         json["not_run"] = counts.not_run;
+        if (run.retries > 0) {
+            json["flaky"] = counts.flaky;
+            json["retries"] = counts.retries;
+        }
+        if (run.has_expectations) {
+            json["expected"] = counts.expected;
+        }
         json["seconds"] = seconds_or_null(run.seconds);
         json["summary"] = summary_of(run);
         write(json);
@@ -233,6 +254,13 @@ class JsonReporter : public Reporter
     }
 
   private:
+    static void add_attempt(Json &json, const Run &run, Place place)
+    {
+        if (run.retries > 0) {
+            json["attempt"] = item_at(run, place).earlier.size() + 1;
+        }
+    }
+
     static std::string now()
     {
         return timestamp(std::chrono::system_clock::now());
@@ -260,6 +288,28 @@ class JsonReporter : public Reporter
                 }
             }
         }
+    }
+
+    void write_end(const char *name, const Run &run, Place place)
+    {
+        const ItemRun &item = item_at(run, place);
+        Json json = event_of(name, run, place);
+        json["outcome"] = word(item.outcome);
+        add_report(json, item.report);
+        json["reason"] =
+            words_or_null(item.outcome == Outcome::not_run ? why_not_all(run) : item.reason);
+        json["start"] = start_of(item);
+        json["seconds"] = seconds_or_null(item.seconds);
+        add_end(json, item);
+        add_measurements(json, item);
+        add_files(json, item);
+        json["warning"] = words_or_null(item.warning);
+        json["output"] = sanitize_utf8(item.output);
+        add_attempt(json, run, place);
+        if (!item.expected.empty()) {
+            json["expected"] = sanitize_utf8(item.expected);
+        }
+        write(json);
     }
 
     void write(const Json &json)

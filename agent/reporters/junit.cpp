@@ -161,6 +161,11 @@ class JunitReporter : public Reporter
         change(run);
     }
 
+    void retried(const Run &run, Place /* place */) override
+    {
+        change(run);
+    }
+
     void late(const Run &run, Place place, const ItemReport &report) override
     {
         late_.push_back({place.suite, late_report(run, place, report)});

@@ -3,10 +3,13 @@
 
 #include "reporters/junit_document.h"
 
+#include "reporters/reporters.h"
 #include "reporters/wording.h"
 #include "util/text.h"
 #include "util/times.h"
 
+#include <algorithm>
+#include <array>
 #include <chrono>
 #include <cmath>
 #include <fmt/core.h>
@@ -61,6 +64,16 @@ std::string property(const std::string &indent, const char *name,
                  : "";
 }
 
+std::string hostname_attribute(const Run &run)
+{
+    for (const auto &[key, value] : run.identity.labels) {
+        if (key == "device") {
+            return attribute("hostname", value);
+        }
+    }
+    return {};
+}
+
 std::string properties(const std::string &indent, const std::string &inside)
 {
     return inside.empty() ? ""
@@ -75,11 +88,16 @@ void add(TestCounts &tests, const Run &run, const Suite &suite)
         ++tests.all;
         switch (item.outcome) {
         case Outcome::passed:
+        case Outcome::flaky:
+            break;
+        case Outcome::expected:
+            ++tests.skipped;
             break;
         case Outcome::not_run:
             ++(run.finished ? tests.skipped : tests.errors);
             break;
         case Outcome::failed:
+        case Outcome::unexpected:
             ++tests.failures;
             break;
         case Outcome::no_result:
@@ -137,19 +155,36 @@ std::string not_run(const Run &run, bool was_running)
                              attribute("type", was_running ? "running" : "not run"), message);
 }
 
+// The elements are those for a failed item and for any other.
+std::string failure(const ItemRun &item, const char *if_failed, const char *otherwise,
+                    const std::string &text)
+{
+    const bool has_failed = item.outcome == Outcome::failed || item.outcome == Outcome::unexpected;
+    return fmt::format(
+        "      <{0}{1}{2}>{3}</{0}>\n", has_failed ? if_failed : otherwise,
+        attribute("type", item.outcome == Outcome::failed ? "result" : word(item.outcome)),
+        attribute("message", item.reason.empty() ? word(item.outcome) : item.reason),
+        xml_escaped(text));
+}
+
+// With the elements that Surefire has for attempts before the last one.
 std::string verdict(const Run &run, const ItemRun &item)
 {
-    if (item.outcome == Outcome::passed) {
-        return "";
-    }
+    std::string text;
     if (item.outcome == Outcome::not_run) {
-        return not_run(run, item.start.has_value());
+        text = not_run(run, item.start.has_value());
+    } else if (item.outcome == Outcome::expected) {
+        text = failure(item, "", "skipped", details(item));
+    } else if (!is_success(item.outcome)) {
+        text = failure(item, "failure", "error", details(item));
     }
-    const bool has_failed = item.outcome == Outcome::failed;
-    return fmt::format("      <{0}{1}{2}>{3}</{0}>\n", has_failed ? "failure" : "error",
-                       attribute("type", has_failed ? "result" : word(item.outcome)),
-                       attribute("message", item.reason.empty() ? word(item.outcome) : item.reason),
-                       xml_escaped(details(item)));
+    for (const ItemRun &one : item.earlier) {
+        const std::string output = one.output.empty() ? "" : "output:\n" + one.output;
+        text += item.outcome == Outcome::flaky
+                    ? failure(one, "flakyFailure", "flakyError", details(one) + output)
+                    : failure(one, "rerunFailure", "rerunError", details(one) + output);
+    }
+    return text;
 }
 
 std::optional<std::string> value_of(const std::string &text)
@@ -178,8 +213,16 @@ std::string test_case(const Run &run, const ItemRun &item)
     const Value result = report.result_without_value ? Value("") : report.result;
     const Value status = item.exit_status ? Value(std::to_string(*item.exit_status)) : Value();
     const Value signal = item.signal != 0 ? Value(name_of_signal(item.signal)) : Value();
+    const bool is_flaky = item.outcome == Outcome::flaky;
+    const Value outcome = is_flaky || !item.expected.empty() ? Value(word(item.outcome)) : Value();
+    const Value reason = is_flaky ? Value(item.reason) : Value();
+    const Value expected = item.expected.empty() ? Value() : Value(item.expected);
+    const Value attempts =
+        run.retries > 0 ? Value(std::to_string(item.earlier.size() + 1)) : Value();
     const Value left = item.left_running.empty() ? Value() : Value(left_running(item));
     std::string inside =
+        property(indent, "outcome", outcome) + property(indent, "reason", reason) +
+        property(indent, "expected", expected) + property(indent, "attempts", attempts) +
         property(indent, "progress", report.progress) + property(indent, "result", result) +
         property(indent, "description", report.description) +
         property(indent, "exit_status", status) + property(indent, "signal", signal) +
@@ -229,8 +272,25 @@ std::string test_suite(const Run &run, std::size_t number, const std::vector<Lat
     const std::string indent(6, ' ');
     std::string inside = property(indent, "plan", run.plan) +
                          property(indent, "vendor", std::to_string(run.vendor)) +
-                         property(indent, "pass_code", std::to_string(run.pass_code)) +
-                         kStateGoesHere;
+                         property(indent, "pass_code", std::to_string(run.pass_code));
+    if (run.seed) {
+        inside += property(indent, "seed", std::to_string(*run.seed));
+    }
+    if (!run.resumed.empty()) {
+        inside += property(indent, "resumed", run.resumed);
+    }
+    if (run.retries > 0) {
+        const Counts counts = count(suite.items);
+        inside += property(indent, "flaky", std::to_string(counts.flaky)) +
+                  property(indent, "retries", std::to_string(counts.retries));
+    }
+    if (run.has_expectations) {
+        inside += property(indent, "expected", std::to_string(count(suite.items).expected));
+    }
+    inside += kStateGoesHere;
+    for (const auto &[name, value] : named_identity(run)) {
+        inside += property(indent, name.c_str(), value);
+    }
     for (const LateReport &one : late) {
         if (one.suite == number) {
             inside += property(indent, "late_report", one.text);
@@ -243,13 +303,21 @@ std::string test_suite(const Run &run, std::size_t number, const std::vector<Lat
     for (const ItemRun &item : suite.items) {
         cases += test_case(run, item);
     }
-    return fmt::format("  <testsuite{}{}{}{}>\n{}{}  </testsuite>\n",
+    return fmt::format("  <testsuite{}{}{}{}{}>\n{}{}  </testsuite>\n",
                        attribute("name", title(run, suite)), attributes(tests),
-                       time_attribute(seconds), timestamp_attribute(start),
+                       time_attribute(seconds), timestamp_attribute(start), hostname_attribute(run),
                        properties("    ", inside), cases);
 }
 
 } // namespace
+
+bool is_property_of_junit(const std::string &name)
+{
+    constexpr std::array kNames{"plan",        "vendor",         "pass_code",
+                                "plan_digest", "fptest_version", "library_version",
+                                "finished",    "reason",         "late_report"};
+    return std::ranges::find(kNames, name) != kNames.end();
+}
 
 TestCounts &TestCounts::operator+=(const TestCounts &more)
 {

@@ -14,6 +14,7 @@
 #include <chrono>
 #include <fmt/core.h>
 #include <string>
+#include <string_view>
 #include <utility>
 #include <vector>
 
@@ -34,6 +35,7 @@ Colour colour_of(Outcome outcome)
         return Colour::green;
     case Outcome::failed:
     case Outcome::timed_out:
+    case Outcome::unexpected:
         return Colour::red;
     default:
         return Colour::yellow;
@@ -89,7 +91,11 @@ class LiveView : public Reporter
         std::erase(running_, place);
         const ItemRun &item = item_at(run, place);
         std::string said = how_it_ended(item);
-        const std::string more = remark(item);
+        std::string more = remark(item);
+        if (!is_success(item.outcome)) {
+            const std::string attempt = attempt_of(run, item);
+            more = attempt + (attempt.empty() || more.empty() ? "" : ": ") + more;
+        }
         said += (said.empty() || more.empty() ? "" : ": ") + more;
         Line line = item_line(item);
         const bool has_room = display_width(said) <= line.room();
@@ -101,12 +107,17 @@ class LiveView : public Reporter
         for (const Note &note : notes(item)) {
             keep_text("      " + note.text, note.is_bad ? Colour::yellow : Colour::none);
         }
-        if (item.outcome != Outcome::passed) {
+        if (!is_success(item.outcome)) {
             for (const std::string &text : last_lines(item)) {
                 keep_text("    | " + text);
             }
         }
         draw(run);
+    }
+
+    void retried(const Run &run, Place place) override
+    {
+        ended(run, place);
     }
 
     void late(const Run &run, Place place, const ItemReport &report) override
@@ -170,8 +181,9 @@ class LiveView : public Reporter
             "  {} ", pad_or_ellipsize(one_line(item.name), std::min(name_width_, width / 3))));
         add_progress(line, item.report, bar);
         line.add(right(duration(item.seconds.value_or(item.running)), 6) + "  ");
-        line.add(pad_or_ellipsize(
-                     runs ? (item.stopping ? "stopping" : "running") : word(item.outcome), 9),
+        const std::string_view state =
+            runs ? (item.stopping ? "stopping" : "running") : word(item.outcome);
+        line.add(pad_or_ellipsize(state, std::max<std::size_t>(9, state.size())),
                  runs ? Colour::cyan : colour_of(item.outcome));
         line.add(fmt::format(" {}  ", right(result_of(item.report), 2)));
         return line;

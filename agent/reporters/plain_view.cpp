@@ -10,6 +10,7 @@
 
 #include <algorithm>
 #include <fmt/core.h>
+#include <optional>
 #include <string>
 #include <string_view>
 #include <vector>
@@ -38,18 +39,23 @@ class PlainView : public Reporter
 
     void started(const Run & /* run */, Place place) override
     {
-        place_ = place;
-        said_at_ = 0;
-        output_said_.clear();
-        runs_ = true;
+        running_.push_back(place);
     }
 
     void tick(const Run &run) override
     {
-        if (!runs_ || quiet_ || item_at(run, place_).running < said_at_ + kBetweenProgressLines) {
+        const auto running = std::ranges::find_if(
+            running_, [&run](const Place &place) { return !item_at(run, place).seconds; });
+        if (quiet_ || running == running_.end()) {
             return;
         }
-        const ItemRun &item = item_at(run, place_);
+        if (*running != place_) {
+            show_next(*running);
+        }
+        const ItemRun &item = item_at(run, *place_);
+        if (item.running < said_at_ + kBetweenProgressLines) {
+            return;
+        }
         said_at_ = item.running;
         print(fmt::format(
             "{}: {}{}, {}", one_line(title(run, item)), item.stopping ? "stopping" : "running",
@@ -61,28 +67,12 @@ class PlainView : public Reporter
 
     void ended(const Run &run, Place place) override
     {
-        runs_ = runs_ && place != place_;
-        const ItemRun &item = item_at(run, place);
-        const bool passed = item.outcome == Outcome::passed;
-        if (quiet_ && passed && item.left_running.empty()) {
-            return;
-        }
-        std::string text = fmt::format("{}: {}{}", one_line(title(run, item)), word(item.outcome),
-                                       reported_result(item.report));
-        if (const std::string how = how_it_ended(item); !how.empty()) {
-            text += ", " + how;
-        }
-        if (item.seconds) {
-            text += ", " + duration(*item.seconds);
-        }
-        const std::string said = remark(item);
-        print(text + (said.empty() ? "" : ": " + said));
-        for (const Note &note : notes(item)) {
-            print("    " + note.text);
-        }
-        if (!passed) {
-            print_lines(last_lines(item));
-        }
+        show_end(run, place, "");
+    }
+
+    void retried(const Run &run, Place place) override
+    {
+        show_end(run, place, attempt_of(run, item_at(run, place)) + ": ");
     }
 
     void late(const Run &run, Place place, const ItemReport &report) override
@@ -114,6 +104,46 @@ class PlainView : public Reporter
     }
 
   private:
+    void show_next(std::optional<Place> place)
+    {
+        place_ = place;
+        said_at_ = 0;
+        output_said_.clear();
+    }
+
+    // How an attempt has ended that is not the last one is said before.
+    void show_end(const Run &run, Place place, const std::string &attempt)
+    {
+        std::erase(running_, place);
+        if (place_ == place) {
+            show_next({}); // it may run again
+        }
+        const ItemRun &item = item_at(run, place);
+        const bool passed = item.outcome == Outcome::passed;
+        if (quiet_ && passed && item.left_running.empty()) {
+            return;
+        }
+        std::string text = fmt::format("{}: {}{}{}", one_line(title(run, item)), attempt,
+                                       word(item.outcome), reported_result(item.report));
+        if (const std::string how = how_it_ended(item); !how.empty()) {
+            text += ", " + how;
+        }
+        if (attempt.empty() && !item.earlier.empty()) {
+            text += ", " + attempt_of(run, item);
+        }
+        if (item.seconds) {
+            text += ", " + duration(*item.seconds);
+        }
+        const std::string said = remark(item);
+        print(text + (said.empty() ? "" : ": " + said));
+        for (const Note &note : notes(item)) {
+            print("    " + note.text);
+        }
+        if (!is_success(item.outcome)) {
+            print_lines(last_lines(item));
+        }
+    }
+
     // What is new since it was last shown. Once the start of the output has been
     // dropped nobody knows, and the last lines are shown again.
     std::string_view new_output(const std::string &output) const
@@ -138,8 +168,8 @@ class PlainView : public Reporter
 
     Writer writer_;
     bool quiet_;
-    Place place_;
-    bool runs_ = false;
+    std::vector<Place> running_;
+    std::optional<Place> place_; // of whose progress it tells
     double said_at_ = 0;
     std::string output_said_;
 };

@@ -5,6 +5,7 @@
 // file holds what was known by then, and shows that the run did not finish.
 #pragma once
 
+#include "module/device_lock.h"
 #include "run/results.h"
 
 #include <cstdio>
@@ -25,6 +26,12 @@ std::unique_ptr<Reporter> make_json_reporter(const std::string &path);
 // written only at the end. Each suite has a property "finished". Until the run has
 // finished, what has not been run is an error, so that a killed run never looks green.
 std::unique_ptr<Reporter> make_junit_reporter(const std::string &path);
+
+// What other fptests see of the run: it goes into the lock's note. The lock outlives it.
+std::unique_ptr<Reporter> make_note_reporter(const DeviceLock &lock, RunNote note);
+
+// Whether fptest writes a property of that name of its own into a JUnit suite.
+bool is_property_of_junit(const std::string &name);
 
 // Why no result file could be begun there, in the words of Reporter::failure(); empty if
 // one could. Changes nothing.

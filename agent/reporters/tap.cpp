@@ -116,7 +116,7 @@ std::string notes_of(const ItemRun &item)
 }
 
 // What is known of an item that has been run.
-std::string diagnosis(const ItemRun &item)
+std::string diagnosis(const Run &run, const ItemRun &item)
 {
     const ItemReport &report = item.report;
     const std::string left = left_running(item);
@@ -124,6 +124,9 @@ std::string diagnosis(const ItemRun &item)
     text += entry("outcome", yaml_quoted(word(item.outcome)));
     if (!item.reason.empty()) {
         text += entry("reason", yaml_quoted(item.reason));
+    }
+    if (run.retries > 0) {
+        text += entry("attempts", std::to_string(item.earlier.size() + 1));
     }
     text += entry("progress", report.progress);
     text += report.result_without_value ? entry("result", yaml_quoted(""))
@@ -144,12 +147,27 @@ std::string diagnosis(const ItemRun &item)
     return text + notes_of(item) + kIndent + "  ...\n";
 }
 
+std::string directive(const Run &run, const ItemRun &item)
+{
+    switch (item.outcome) {
+    case Outcome::not_run:
+        return skipped(run);
+    case Outcome::expected:
+        return " # TODO " + tap_escaped(item.expected);
+    case Outcome::flaky:
+    case Outcome::unexpected:
+        return fmt::format(" # {}", word(item.outcome));
+    default:
+        return "";
+    }
+}
+
 std::string item_point(const Run &run, const ItemRun &item, std::size_t number)
 {
     const bool ran = item.outcome != Outcome::not_run;
-    const bool ok = !ran || item.outcome == Outcome::passed;
-    return fmt::format("{}{}{}\n{}", kIndent, point(ok, number, item.name), ran ? "" : skipped(run),
-                       ran ? diagnosis(item) : "");
+    const bool ok = !ran || (is_success(item.outcome) && item.outcome != Outcome::expected);
+    return fmt::format("{}{}{}\n{}", kIndent, point(ok, number, item.name), directive(run, item),
+                       ran ? diagnosis(run, item) : "");
 }
 
 std::string suite_point(const Run &run, const Suite &suite, std::size_t number)
@@ -181,6 +199,15 @@ class TapReporter : public Reporter
         if (has_fixed_rounds(run)) {
             write(plan_line(run.suites.size() * static_cast<std::size_t>(*run.rounds)));
         }
+        for (const auto &[name, value] : named_identity(run)) {
+            write(comment(fmt::format("{}: {}", name, one_line(value))));
+        }
+        if (run.seed) {
+            write(comment(by_seed(run)));
+        }
+        if (!run.resumed.empty()) {
+            write(comment("resumed from " + one_line(run.resumed)));
+        }
     }
 
     void started(const Run &run, Place place) override
@@ -194,6 +221,16 @@ class TapReporter : public Reporter
         begun_ = std::max(begun_, place.suite + 1);
         ended_[place.suite][place.item] = true;
         write(next_lines(run, false));
+    }
+
+    void retried(const Run &run, Place place) override
+    {
+        const ItemRun &item = item_at(run, place);
+        const std::string said = remark(item);
+        write((open_ ? kIndent : "") +
+              comment(fmt::format("{}: {}: {}{}{}", one_line(title(run, item)),
+                                  attempt_of(run, item), word(item.outcome),
+                                  reported_result(item.report), said.empty() ? "" : ": " + said)));
     }
 
     void late(const Run &run, Place place, const ItemReport &report) override
@@ -218,8 +255,8 @@ class TapReporter : public Reporter
         for (const std::string &line : summary_table(run)) {
             text += comment(line);
         }
-        text += comment(fmt::format("{}, {}, {} not run in {}", passed, failed, counts.not_run,
-                                    duration(run.seconds)));
+        text += comment(fmt::format("{}, {}{}, {} not run in {}", passed, failed,
+                                    tally_of_others(run), counts.not_run, duration(run.seconds)));
         if (!run.finished) {
             text += fmt::format("Bail out!  {}\n", run.why_unfinished.empty()
                                                        ? "the run did not finish"

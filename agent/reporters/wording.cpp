@@ -60,8 +60,24 @@ std::string heading(const Run &run)
     for (const Suite &suite : run.suites) {
         items += suite.items.size();
     }
-    return fmt::format("{}: {}, vendor {}{}", one_line(run.plan), plural(items, "item"), run.vendor,
-                       has_rounds(run) ? ", " + rounds(run) : "");
+    return fmt::format("{}: {}, vendor {}{}{}{}", one_line(run.plan), plural(items, "item"),
+                       run.vendor, has_rounds(run) ? ", " + rounds(run) : "",
+                       run.seed ? ", " + by_seed(run) : "",
+                       run.resumed.empty() ? "" : ", resumed from " + one_line(run.resumed));
+}
+
+std::string by_seed(const Run &run)
+{
+    return fmt::format("shuffled with seed {}", run.seed.value_or(0));
+}
+
+std::vector<std::pair<std::string, std::string>> named_identity(const Run &run)
+{
+    auto all = run.identity.labels;
+    all.emplace_back("fptest_version", FPTEST_VERSION);
+    all.emplace_back("library_version", run.identity.library);
+    all.emplace_back("plan_digest", run.identity.plan_digest);
+    return run.identity.labels.empty() ? run.identity.labels : all;
 }
 
 std::string total(const Run &run)
@@ -83,7 +99,21 @@ std::string rest_of_total(const Run &run)
                              : has_ended(run)        ? ""
                              : has_fixed_rounds(run) ? fmt::format(", {} to go", counts.not_run)
                                                      : fmt::format(", round {}", run.round);
-    return fmt::format("{}, {}", rest, duration(run.seconds));
+    return fmt::format("{}{}, {}", tally_of_others(run), rest, duration(run.seconds));
+}
+
+std::string tally_of_others(const Run &run)
+{
+    const Counts counts = count(run);
+    std::string text;
+    if (run.retries > 0) {
+        text = fmt::format(", {} flaky, {} {}", counts.flaky, counts.retries,
+                           counts.retries == 1 ? "retry" : "retries");
+    }
+    if (run.has_expectations) {
+        text += fmt::format(", {} failed as expected", counts.expected);
+    }
+    return text;
 }
 
 std::string not_finished(const Run &run)
@@ -158,10 +188,16 @@ std::string reported_result(const ItemReport &report)
     return has_result(report) ? fmt::format(", result {}", result_of(report)) : "";
 }
 
+std::string attempt_of(const Run &run, const ItemRun &item)
+{
+    return run.retries == 0
+               ? ""
+               : fmt::format("attempt {} of {}", item.earlier.size() + 1, run.retries + 1);
+}
+
 std::string remark(const ItemRun &item)
 {
-    const bool explained = item.outcome == Outcome::no_result ||
-                           item.outcome == Outcome::timed_out || item.outcome == Outcome::stopped;
+    const bool explained = item.outcome != Outcome::passed && item.outcome != Outcome::failed;
     std::string text = one_line(item.report.description.value_or(""));
     if (text.empty() && item.signal != 0 && !explained) {
         return {}; // how_it_ended() says it

@@ -18,11 +18,19 @@ namespace fptest
 // "plans/demo.xml: 4 items, vendor 0, 3 rounds"
 std::string heading(const Run &run);
 
+// The labels, and below them versions and the plan's digest; each with its name.
+std::vector<std::pair<std::string, std::string>> named_identity(const Run &run);
+
+// "shuffled with seed 42"
+std::string by_seed(const Run &run);
+
 // "3 passed, 1 failed, 2 to go, 12.0 s"
 std::string total(const Run &run);
 // Its parts: "3 passed" and "1 failed"; ", 2 to go, 12.0 s".
 std::pair<std::string, std::string> tally(const Counts &counts);
 std::string rest_of_total(const Run &run);
+// ", 1 flaky, 2 retries, 1 failed as expected", as far as the run has such.
+std::string tally_of_others(const Run &run);
 
 // "not finished: interrupted", "ended: G/X did not pass"; empty if that is not so.
 std::string not_finished(const Run &run);
@@ -47,6 +55,9 @@ std::string result_of(const ItemReport &report);
 
 // ", result 0"; empty if none was reported.
 std::string reported_result(const ItemReport &report);
+
+// "attempt 2 of 3"; empty without retries.
+std::string attempt_of(const Run &run, const ItemRun &item);
 
 // The item's description, the reason for its outcome, or both.
 std::string remark(const ItemRun &item);

@@ -18,7 +18,7 @@ namespace fptest
 namespace
 {
 
-constexpr std::string_view kMark = "#measure";
+constexpr std::string_view kMeasureMark = "#measure";
 constexpr std::size_t kLongestLine = 512;
 constexpr std::size_t kLongestName = 64;
 constexpr std::size_t kLongestUnit = 16;
@@ -33,20 +33,20 @@ bool is_blank(char c)
 // What has been read of a line may become "#measure", or "#measure" and a blank.
 bool may_be_about_one(std::string_view line)
 {
-    const std::size_t size = std::min(line.size(), kMark.size());
-    return line.substr(0, size) == kMark.substr(0, size) &&
-           (line.size() <= kMark.size() || is_blank(line[kMark.size()]) ||
-            line.substr(kMark.size()) == "\r");
+    const std::size_t size = std::min(line.size(), kMeasureMark.size());
+    return line.substr(0, size) == kMeasureMark.substr(0, size) &&
+           (line.size() <= kMeasureMark.size() || is_blank(line[kMeasureMark.size()]) ||
+            line.substr(kMeasureMark.size()) == "\r");
 }
 
 bool is_about_one(std::string_view line)
 {
-    return line.size() >= kMark.size() && may_be_about_one(line);
+    return line.size() >= kMeasureMark.size() && may_be_about_one(line);
 }
 
 std::vector<std::string> words_after_mark(std::string_view line)
 {
-    line.remove_prefix(kMark.size());
+    line.remove_prefix(kMeasureMark.size());
     if (line.ends_with('\r')) {
         line.remove_suffix(1);
     }
@@ -246,9 +246,10 @@ void take_line(const std::string &line, Measured &measured)
 // that prints without end has many.
 std::size_t next_mark(std::string_view text)
 {
-    for (std::size_t at = text.find(kMark.front()); at != text.npos;
-         at = text.find(kMark.front(), at + 1)) {
-        if ((at == 0 || text[at - 1] == '\n') && may_be_about_one(text.substr(at, kMark.size()))) {
+    for (std::size_t at = text.find(kMeasureMark.front()); at != text.npos;
+         at = text.find(kMeasureMark.front(), at + 1)) {
+        if ((at == 0 || text[at - 1] == '\n') &&
+            may_be_about_one(text.substr(at, kMeasureMark.size()))) {
             return at;
         }
     }

@@ -27,7 +27,9 @@ std::string instead(const std::string &name, const std::vector<std::string> &nam
     return known_names(name, names, fmt::format("the {} are", what));
 }
 
-Path parts_of(const std::string &text, const Plan &plan)
+} // namespace
+
+Path split_path(const std::string &text, const Plan &plan)
 {
     std::vector<std::string> parts;
     for (std::size_t at = 0; at < text.size();) {
@@ -61,6 +63,9 @@ Path parts_of(const std::string &text, const Plan &plan)
     }
     return {text, parts[0], parts[1], ""};
 }
+
+namespace
+{
 
 void require_known(const Path &path, const Plan &plan, const std::string &plan_name, bool force)
 {
@@ -170,7 +175,7 @@ class RoundPlanner
 
 Path parse_path(const std::string &text, const Plan &plan, const std::string &plan_name, bool force)
 {
-    Path path = parts_of(text, plan);
+    Path path = split_path(text, plan);
     require_known(path, plan, plan_name, force);
     return path;
 }
@@ -184,7 +189,8 @@ std::vector<Path> all_paths(const Plan &plan)
 {
     std::string root = "plan";
     if (mxml_node_t *const node = plan.root(); node != nullptr) {
-        root = attribute(node, "name").value_or(mxmlGetElement(node));
+        const std::string name = attribute(node, "name").value_or(mxmlGetElement(node));
+        root = is_addressable(name) ? name : root;
     }
     std::vector<Path> paths;
     for (const std::string &group : group_names(plan)) {
@@ -193,6 +199,25 @@ std::vector<Path> all_paths(const Plan &plan)
         }
     }
     return paths;
+}
+
+std::vector<std::string> runnable_items(const Plan &plan, const std::string &group)
+{
+    std::vector<std::string> names;
+    for (const auto &item : plan.resolve(group)) {
+        if (runs_something(item) && std::ranges::count(names, *item->name) == 0) {
+            names.push_back(*item->name);
+        }
+    }
+    return names;
+}
+
+bool has_path_of_its_own(const Plan &plan, const std::string &group, const std::string &item)
+{
+    const auto items = plan.resolve(group);
+    const auto first = std::ranges::find_if(
+        items, [&](const auto &one) { return runs_something(one) && *one->name == item; });
+    return first != items.end() && have_paths_of_their_own(plan, group, {*first});
 }
 
 RoundPlan plan_round(const std::vector<Path> &paths, const Plan &plan, bool as_group)
@@ -205,16 +230,21 @@ RoundPlan plan_round(const std::vector<Path> &paths, const Plan &plan, bool as_g
 }
 
 std::vector<std::pair<std::string, std::string>>
-commands_of(const std::vector<Path> &paths, const Plan &plan, const std::string &suffix)
+commands_of(const RoundPlan &round, const Plan &plan, const std::string &suffix)
 {
     std::vector<std::pair<std::string, std::string>> commands;
-    for (const Path &path : paths) {
-        for (const auto &item : resolve(path, plan)) {
-            if (runs_something(item)) {
-                commands.emplace_back(
-                    path.root + "/" + path.group + "/" + *item->name,
-                    command_line(*item->name, item->args, suffix).substr(0, kCommandLimit));
+    for (const Job &job : round.jobs) {
+        const std::size_t root = job.path.find_first_not_of('/');
+        for (const auto &target : job.targets) {
+            if (!target) {
+                continue;
             }
+            const ItemRun &item = round.suites[job.suite].items[target->item];
+            const auto args = attribute(plan.elements()[target->element], "args");
+            commands.emplace_back(
+                fmt::format("{}/{}/{}", job.path.substr(root, job.path.find('/', root) - root),
+                            item.group, item.name),
+                command_line(item.name, args, suffix).substr(0, kCommandLimit));
         }
     }
     return commands;

@@ -23,13 +23,40 @@ const ItemRun &item_at(const Run &run, Place place)
     return run.suites[place.suite].items[place.item];
 }
 
+bool is_success(Outcome outcome)
+{
+    return outcome == Outcome::passed || outcome == Outcome::flaky || outcome == Outcome::expected;
+}
+
+void begin_attempt(ItemRun &item)
+{
+    ItemRun next;
+    next.group = item.group;
+    next.name = item.name;
+    next.expected = item.expected;
+    next.earlier = std::exchange(item.earlier, {});
+    next.earlier.push_back(std::move(item));
+    item = std::move(next);
+}
+
+void take_back_attempt(ItemRun &item)
+{
+    std::vector<ItemRun> earlier = std::exchange(item.earlier, {});
+    item = std::move(earlier.back());
+    earlier.pop_back();
+    item.earlier = std::move(earlier);
+}
+
 Counts count(const std::vector<ItemRun> &items)
 {
     Counts counts;
     for (const ItemRun &item : items) {
-        ++(item.outcome == Outcome::not_run  ? counts.not_run
-           : item.outcome == Outcome::passed ? counts.passed
-                                             : counts.failed);
+        ++(item.outcome == Outcome::not_run    ? counts.not_run
+           : item.outcome == Outcome::passed   ? counts.passed
+           : item.outcome == Outcome::flaky    ? counts.flaky
+           : item.outcome == Outcome::expected ? counts.expected
+                                               : counts.failed);
+        counts.retries += item.earlier.size();
     }
     return counts;
 }
@@ -63,7 +90,8 @@ bool has_rounds(const Run &run)
 
 bool has_fixed_rounds(const Run &run)
 {
-    return run.rounds && !run.time_limit && !run.until_fail;
+    return run.rounds && !run.time_limit && !run.until_fail &&
+           (!run.stop_after || !has_rounds(run));
 }
 
 std::size_t rounds_to_come(const Run &run)
@@ -82,7 +110,13 @@ void summarize(Run &run)
                 run.summary.push_back({item.group, item.name, 0, {}});
             }
             Summary &summary = run.summary[at++];
-            summary.passed += item.outcome == Outcome::passed ? 1 : 0;
+            const bool has_passed = item.outcome == Outcome::passed ||
+                                    item.outcome == Outcome::flaky ||
+                                    item.outcome == Outcome::unexpected;
+            summary.passed += has_passed ? 1 : 0;
+            for (const ItemRun &attempt : item.earlier) {
+                summary.times.add(attempt.seconds.value_or(0));
+            }
             if (item.outcome != Outcome::not_run) {
                 summary.times.add(item.seconds.value_or(0));
             }
@@ -92,8 +126,8 @@ void summarize(Run &run)
 
 const char *word(Outcome outcome)
 {
-    static constexpr std::array kWords{"not run",   "passed",    "failed",
-                                       "no result", "timed out", "stopped"};
+    static constexpr std::array kWords{"not run", "passed", "failed",   "no result", "timed out",
+                                       "stopped", "flaky",  "expected", "unexpected"};
     return kWords.at(static_cast<std::size_t>(outcome));
 }
 

@@ -13,6 +13,7 @@
 #include <cstddef>
 #include <optional>
 #include <string>
+#include <utility>
 #include <vector>
 
 namespace fptest
@@ -20,11 +21,14 @@ namespace fptest
 
 enum class Outcome {
     not_run,
-    passed,    // it reported the pass code
-    failed,    // it reported another code
-    no_result, // it ended without reporting a result
-    timed_out, // it took too long
-    stopped,   // with the run
+    passed,     // it reported the pass code
+    failed,     // it reported another code
+    no_result,  // it ended without reporting a result
+    timed_out,  // it took too long
+    stopped,    // with the run
+    flaky,      // it passed when it was tried again
+    expected,   // it did not pass, which was known before
+    unexpected, // it passed, though it was known to fail
 };
 
 // One item of a run.
@@ -48,7 +52,16 @@ struct ItemRun {
     std::string directory = {};          // for its files; empty if there is none
     std::vector<std::string> files = {}; // that it has left there, by their paths below it
     std::string warning = {};            // about its measurements or files
+    std::string expected = {};         // why it is known to fail; empty if it is not
+    std::vector<ItemRun> earlier = {}; // attempts, which did not pass
 };
+
+// Whether the run is none the worse for it: it passed, if not at once, or failed as expected.
+bool is_success(Outcome outcome);
+// It is to be tried again: what it has been becomes an earlier attempt.
+void begin_attempt(ItemRun &item);
+// What it is again where the run has ended before that.
+void take_back_attempt(ItemRun &item);
 
 // Items of one group that run in a row.
 struct Suite {
@@ -58,18 +71,28 @@ struct Suite {
 
 struct Counts {
     std::size_t passed = 0;
-    std::size_t failed = 0; // also no result, timed out and stopped
+    std::size_t failed = 0; // also no result, timed out, stopped and unexpected
     std::size_t not_run = 0;
+    std::size_t flaky = 0;
+    std::size_t expected = 0;
+    std::size_t retries = 0; // attempts beside those
 
     std::size_t all() const
     {
-        return passed + failed + not_run;
+        return passed + failed + not_run + flaky + expected;
+    }
+    bool has_failures() const
+    {
+        return failed + not_run > 0;
     }
     Counts &operator+=(const Counts &more)
     {
         passed += more.passed;
         failed += more.failed;
         not_run += more.not_run;
+        flaky += more.flaky;
+        expected += more.expected;
+        retries += more.retries;
         return *this;
     }
 };
@@ -79,16 +102,30 @@ struct Summary {
     std::string group;
     std::string name;
     std::size_t passed = 0;
-    DurationStats times; // of each run of it
+    DurationStats times; // of each attempt
+};
+
+// Whose results these are.
+struct Identity {
+    std::vector<std::pair<std::string, std::string>> labels; // "device" is one
+    std::string library;                                     // its version
+    std::string plan_digest;                                 // whatever was reported into it
 };
 
 // Holds the current round only.
 struct Run {
     std::string plan; // the file that the plan came from
+    Identity identity;
     int round = 1;
     std::optional<int> rounds = 1;    // at most; nullopt for no limit
     std::optional<double> time_limit; // seconds after which no round begins
     bool until_fail = false;          // end with the first item that does not pass
+    std::optional<int> stop_after;    // so many that did not pass
+    std::optional<double> limit;      // seconds after which the run is stopped
+    std::optional<int> seed;          // of the order
+    int retries = 0;                  // of an item that does not pass
+    bool has_expectations = false;    // of failures
+    std::string resumed;              // the results of the run that this one completes
     int pass_code = 0;
     int vendor = 0;
     std::vector<Suite> suites;    // of the round
@@ -96,6 +133,7 @@ struct Run {
     std::vector<Summary> summary; // of each item; empty until a round is over
     std::chrono::system_clock::time_point start;
     double seconds = 0;         // since the start, at the last tick
+    double seconds_before = 0;  // of the run that it completes
     bool finished = false;      // everything that was asked for ran
     std::string why_unfinished; // otherwise, once it has ended
     std::string why_ended;      // if it finished within a round
@@ -130,7 +168,8 @@ std::size_t rounds_to_come(const Run &run);
 // Adds the current round to the summary.
 void summarize(Run &run);
 
-// "passed", "failed", "no result", "timed out", "stopped", "not run"
+// "passed", "failed", "no result", "timed out", "stopped", "not run", "flaky",
+// "expected", "unexpected"
 const char *word(Outcome outcome);
 
 // "SIGSEGV", "signal 40"
@@ -144,7 +183,8 @@ std::string title(const Run &run, const Suite &suite);
 // "Bringup/SpiCheck", or "Bringup/SpiCheck (round 2)"
 std::string title(const Run &run, const ItemRun &item);
 
-// Is called in this order: begin; for each item started, any number of progressed, ended;
+// Is called in this order: begin; for each item started, any number of progressed, ended, or
+// retried and all of that again;
 // round_over between two rounds; finish, even if items did not run. The run is up to date at
 // each call. No call may wait long for the reader of what the reporter writes.
 class Reporter
@@ -161,6 +201,11 @@ class Reporter
     virtual void finish(const Run &run) = 0;
 
     virtual void progressed(const Run & /* run */, Place /* place */)
+    {
+    }
+
+    // In the place of ended: the item will be started again.
+    virtual void retried(const Run & /* run */, Place /* place */)
     {
     }
 
@@ -199,6 +244,8 @@ class Reporter
     {
         return {};
     }
+
+    bool is_needed = true; // the run has failed where it does
 };
 
 } // namespace fptest

@@ -21,12 +21,17 @@ namespace
 
 using Clock = std::chrono::steady_clock;
 
+bool is_between_attempts(const ItemRun &item)
+{
+    return item.outcome == Outcome::not_run && !item.earlier.empty();
+}
+
 class Rounds
 {
   public:
     Rounds(Runner &runner, Run &run, const std::vector<Reporter *> &reporters,
-           const RoundPlan &plan)
-        : runner_(runner), run_(run), reporters_(reporters), plan_(plan)
+           const RoundPlan &plan, const EarlierRun *earlier)
+        : runner_(runner), run_(run), reporters_(reporters), plan_(plan), earlier_(earlier)
     {
     }
 
@@ -53,13 +58,18 @@ class Rounds
     // False if the run was cut short.
     bool run_one()
     {
-        for (Job job : plan_.jobs) {
-            runner_.make_way_for(job);
-            job.mark = clear_reports(job.elements());
-            if (!runner_.run(job)) {
-                return false;
+        for (std::size_t at = 0; at < plan_.jobs.size(); ++at) {
+            Job job = plan_.jobs[at];
+            bool is_over = take_over(job, at);
+            while (!is_over) {
+                runner_.make_way_for(job);
+                job.mark = clear_reports(job.elements());
+                if (!runner_.run(job)) {
+                    return false;
+                }
+                is_over = !is_tried_again(job);
             }
-            if (run_.until_fail && has_failed(job)) {
+            if ((run_.until_fail && has_failed(job)) || has_failed_enough()) {
                 break;
             }
         }
@@ -69,19 +79,82 @@ class Rounds
     bool is_last() const
     {
         return !run_.why_ended.empty() || run_.round == run_.rounds ||
-               (run_.time_limit && run_.seconds >= *run_.time_limit);
+               (run_.time_limit && run_.seconds >= *run_.time_limit && !has_more_to_take_over());
+    }
+
+    bool has_more_to_take_over() const
+    {
+        return earlier_ != nullptr && !earlier_->attempts.empty() &&
+               earlier_->attempts.rbegin()->first >=
+                   static_cast<std::size_t>(run_.round) * plan_.jobs.size();
     }
 
     bool has_failed(const Job &job)
     {
         const auto failed = std::ranges::find_if(job.targets, [&](const auto &target) {
-            return target && item_at(run_, {job.suite, target->item}).outcome != Outcome::passed;
+            return target && !is_success(item_at(run_, {job.suite, target->item}).outcome);
         });
         if (failed == job.targets.end()) {
             return false;
         }
         const ItemRun &item = item_at(run_, {job.suite, (*failed)->item});
         run_.why_ended = one_line(title(run_, item)) + " did not pass (--until-fail)";
+        return true;
+    }
+
+    // What the earlier run came to. False if the item has not ended by that.
+    bool take_over(const Job &job, std::size_t at)
+    {
+        const std::size_t index =
+            (static_cast<std::size_t>(run_.round) - 1) * plan_.jobs.size() + at;
+        if (earlier_ == nullptr || !earlier_->attempts.contains(index)) {
+            return false;
+        }
+        const Place place{job.suite, job.targets.front()->item};
+        ItemRun last = earlier_->attempts.at(index);
+        std::vector<ItemRun> attempts = std::exchange(last.earlier, {});
+        const bool is_over = earlier_->ended.contains(index);
+        if (!is_over) {
+            attempts.push_back(last);
+        }
+        for (const ItemRun &attempt : attempts) {
+            tell_again(place, attempt, &Reporter::retried);
+            begin_attempt(item_at(run_, place));
+        }
+        if (is_over) {
+            tell_again(place, last, &Reporter::ended);
+        }
+        return is_over;
+    }
+
+    void tell_again(Place place, ItemRun attempt, void (Reporter::*how)(const Run &, Place))
+    {
+        ItemRun &item = item_at(run_, place);
+        attempt.group = item.group; // as the plan has them
+        attempt.name = item.name;
+        attempt.earlier = std::move(item.earlier);
+        item = std::move(attempt);
+        for (Reporter *reporter : reporters_) {
+            reporter->started(run_, place);
+            (reporter->*how)(run_, place);
+        }
+    }
+
+    bool is_tried_again(const Job &job) const
+    {
+        return std::ranges::any_of(job.targets, [&](const auto &target) {
+            return target && is_between_attempts(item_at(run_, {job.suite, target->item}));
+        });
+    }
+
+    bool has_failed_enough()
+    {
+        const std::size_t failed = run_.stop_after ? count(run_).failed : 0;
+        if (!run_.stop_after || failed < static_cast<std::size_t>(*run_.stop_after)) {
+            return false;
+        }
+        run_.why_ended = fmt::format("{} did not pass (--stop-after {})", plural(failed, "item"),
+                                     *run_.stop_after);
         return true;
     }
 
@@ -102,13 +175,14 @@ class Rounds
     Run &run_;
     const std::vector<Reporter *> &reporters_;
     const RoundPlan &plan_;
+    const EarlierRun *earlier_;
 };
 
 std::string failures(const std::vector<Reporter *> &reporters)
 {
     std::vector<std::string> all;
     for (const Reporter *reporter : reporters) {
-        if (std::string failure = reporter->failure(); !failure.empty()) {
+        if (std::string failure = reporter->failure(); !failure.empty() && reporter->is_needed) {
             all.push_back(std::move(failure));
         }
     }
@@ -148,6 +222,13 @@ bool flush(const std::vector<Reporter *> &reporters, Signals &signals, bool is_i
 
 void finish(Run &run, const std::vector<Reporter *> &reporters)
 {
+    for (Suite &suite : run.suites) {
+        for (ItemRun &item : suite.items) {
+            if (is_between_attempts(item)) {
+                take_back_attempt(item);
+            }
+        }
+    }
     summarize(run);
     for (Reporter *reporter : reporters) {
         reporter->finish(run);
@@ -178,7 +259,7 @@ void begin(Run &run, const std::vector<Reporter *> &reporters, Signals &signals)
         reporter->begin(run);
         begun.push_back(reporter);
         const std::string failure = reporter->failure();
-        if (!failure.empty() && !is_interrupted(signals)) {
+        if (!failure.empty() && reporter->is_needed && !is_interrupted(signals)) {
             run_nothing(fmt::format("{}; nothing was run", failure), run, begun, signals);
         }
     }
@@ -188,7 +269,7 @@ void begin(Run &run, const std::vector<Reporter *> &reporters, Signals &signals)
 
 bool run_rounds(const std::vector<Reporter *> &reporters, const Runner::Options &options,
                 LibraryProcess &library, Signals &signals, Run &run, const RoundPlan &plan,
-                const std::function<void()> &store)
+                const std::function<void()> &store, const EarlierRun *earlier)
 {
     run.suites = plan.suites;
     run.start = std::chrono::system_clock::now();
@@ -211,7 +292,7 @@ bool run_rounds(const std::vector<Reporter *> &reporters, const Runner::Options 
         }
         if (goes_on) {
             clear_reports(all);
-            run.finished = Rounds(runner, run, reporters, plan).run_all();
+            run.finished = Rounds(runner, run, reporters, plan, earlier).run_all();
         }
         if (!runner.broken()) {
             remove_marks();

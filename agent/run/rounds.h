@@ -5,6 +5,7 @@
 #pragma once
 
 #include "module/library_process.h"
+#include "run/earlier_run.h"
 #include "run/planner.h"
 #include "run/runner.h"
 #include "util/failure.h"
@@ -16,9 +17,10 @@ namespace fptest
 {
 
 // Calls store() once every result file has begun. False if the run was interrupted. Throws a
-// Failure if it broke off, the plan was not stored, or a result file is incomplete.
+// Failure if it broke off, the plan was not stored, or a result file is incomplete. What an
+// earlier run came to is taken over; each job is of one item then.
 bool run_rounds(const std::vector<Reporter *> &reporters, const Runner::Options &options,
                 LibraryProcess &library, Signals &signals, Run &run, const RoundPlan &plan,
-                const std::function<void()> &store);
+                const std::function<void()> &store, const EarlierRun *earlier = nullptr);
 
 } // namespace fptest

@@ -59,6 +59,27 @@ int signal_of(int status)
                : 0;
 }
 
+// What it comes to besides its report: it was tried before, or known to fail.
+void judge_by_the_run(ItemRun &item)
+{
+    const auto how = [](const ItemRun &one) {
+        return fmt::format("{} {}{}", one.outcome == Outcome::no_result ? "had" : "was",
+                           word(one.outcome), one.reason.empty() ? "" : ": " + one.reason);
+    };
+    const bool has_passed = item.outcome == Outcome::passed;
+    if (!item.expected.empty() && has_passed) {
+        item.outcome = Outcome::unexpected;
+        item.reason = "passed, but was expected to fail: " + one_line(item.expected);
+    } else if (!item.expected.empty() && item.outcome != Outcome::stopped) {
+        item.reason = fmt::format("{}; it {}", one_line(item.expected), how(item));
+        item.outcome = Outcome::expected;
+    } else if (!item.earlier.empty() && has_passed) {
+        item.outcome = Outcome::flaky;
+        item.reason = fmt::format("passed on attempt {}; before, it {}", item.earlier.size() + 1,
+                                  how(item.earlier.back()));
+    }
+}
+
 } // namespace
 
 Runner::Runner(LibraryProcess &library, Signals &signals, Run &run,
@@ -175,7 +196,7 @@ void Runner::settle_directories()
 // A command that returns without reaching its items is no success, whatever the cause.
 void Runner::require_all_started()
 {
-    for (; running_.next < running_.job.targets.size() && signal_ == 0; ++running_.next) {
+    for (; running_.next < running_.job.targets.size() && !is_stopping(); ++running_.next) {
         if (!running_.job.targets[running_.next]) {
             continue;
         }
@@ -190,9 +211,7 @@ void Runner::require_all_started()
         result.reason = library_gone_.empty()
                             ? "the library never reached it; run with --log FILE to see why"
                             : fmt::format("the library never reached it: {}", library_gone_);
-        for (Reporter *reporter : reporters_) {
-            reporter->ended(run_, place);
-        }
+        notify_end_of(place);
     }
 }
 
@@ -338,7 +357,7 @@ void Runner::take_output()
 
 void Runner::tick()
 {
-    run_.seconds = Seconds(now() - began_).count();
+    run_.seconds = run_.seconds_before + Seconds(now() - began_).count();
     take_output();
     for (const RunningItem &active : running_.items) {
         item_at(run_, active.place).running = std::max(0.0, Seconds(now() - active.start).count());
@@ -365,7 +384,7 @@ void Runner::start_next(const LibraryProcess::Event &event)
         active.reporting.expected = active.starts_gatherer;
     }
     active.start = on_run_clock(event.time);
-    if (signal_ != 0) {
+    if (is_stopping()) {
         active.stop = Outcome::stopped;
         active.stop_wanted_at = now();
     }
@@ -472,7 +491,7 @@ void Runner::finish(RunningItem &active, TimePoint end)
     const Verdict verdict =
         judge(active, result,
               {run_.pass_code, vendor_, options_.timeout, options_.fail_on_exit_status,
-               options_.judge_limits, signal_, library_gone_});
+               options_.judge_limits, signal_, library_gone_, over_limit_});
     result.outcome = verdict.outcome;
     result.reason = verdict.reason;
     result.overruled = verdict.overruled;
@@ -480,6 +499,8 @@ void Runner::finish(RunningItem &active, TimePoint end)
     if (active.gathers && running_.items.size() == 1 &&
         running_.next >= running_.job.targets.size()) {
         result.left_running = note_left_running(active.element);
+        const std::vector<Leftover> left = left_by_gatherer();
+        result.left_running.insert(result.left_running.end(), left.begin(), left.end());
     }
     if (active.gathers && !has_finished(result.report)) {
         gatherer_may_report_late_ = true;
@@ -495,9 +516,23 @@ void Runner::notify_ended()
     while (!running_.items.empty() && running_.items.front().done) {
         const Place place = running_.items.front().place;
         running_.items.pop_front();
-        for (Reporter *reporter : reporters_) {
-            reporter->ended(run_, place);
-        }
+        notify_end_of(place);
+    }
+}
+
+// An item that is tried again has not ended.
+void Runner::notify_end_of(Place place)
+{
+    ItemRun &item = item_at(run_, place);
+    judge_by_the_run(item);
+    const bool is_tried_again = !is_success(item.outcome) && item.outcome != Outcome::stopped &&
+                                item.expected.empty() && run_.why_unfinished.empty() &&
+                                item.earlier.size() < static_cast<std::size_t>(run_.retries);
+    for (Reporter *reporter : reporters_) {
+        is_tried_again ? reporter->retried(run_, place) : reporter->ended(run_, place);
+    }
+    if (is_tried_again) {
+        begin_attempt(item);
     }
 }
 

@@ -29,10 +29,11 @@ class Runner
         std::optional<std::chrono::duration<double>> timeout; // then an item is stopped
         std::chrono::duration<double> grace{2};               // and after that it is killed
         bool fail_on_exit_status = false;
-        bool judge_limits = false;                 // of measurements
-        std::string files;                         // a directory; empty for none
-        bool ends_gatherer = false;                // one that runs already
-        std::function<void()> on_second_interrupt; // does not return
+        bool judge_limits = false;                          // of measurements
+        std::string files;                                  // a directory; empty for none
+        std::optional<std::chrono::duration<double>> limit; // then the run is stopped
+        bool ends_gatherer = false;                         // one that runs already
+        std::function<void()> on_second_interrupt;          // does not return
     };
 
     // All of them outlive the runner.
@@ -94,6 +95,12 @@ class Runner
     void poll_gatherers();
     void poll_gatherer(RunningItem &active);
     void read_signals();
+    void look_at_limit();
+    void stop_items();
+    bool is_stopping() const
+    {
+        return signal_ != 0 || over_limit_;
+    }
     void suspend();
     void stop_what_is_due();
     void try_stop(RunningItem &active);
@@ -107,6 +114,7 @@ class Runner
     std::vector<Leftover> processes_of(const RunningItem &active);
     bool note_gatherer();
     std::vector<Leftover> gatherer_processes();
+    std::vector<Leftover> left_by_gatherer();
     std::vector<Leftover> note_left_running(std::size_t element);
     void end_left_running();
     void end_gatherer();
@@ -115,6 +123,7 @@ class Runner
     void notify_ended();
     void take_output(off_t end);
     void take_output();
+    void notify_end_of(Place place);
     void tick();
 
     LibraryProcess &library_;
@@ -136,6 +145,8 @@ class Runner
     int vendor_ = run_.vendor;       // which the library read for its last item
     int signal_ = 0;
     TimePoint signal_taken_at_;
+    bool over_limit_ = false;
+    TimePoint stopping_since_;              // a signal, or the limit
     bool stop_asked_ = false;               // and not yet answered
     bool gatherer_runs_ = false;            // before the job's next item
     bool gatherer_may_report_late_ = false; // it was triggered and has not reported

@@ -9,6 +9,7 @@
 #include "module/stored_plan.h"
 #include "run/trigger.h"
 #include "util/text.h"
+#include "util/times.h"
 
 #include <algorithm>
 #include <csignal>
@@ -50,7 +51,7 @@ void Runner::read_signals()
             suspend();
             continue;
         }
-        if (signal_ != 0 && signal == SIGHUP) {
+        if (signal_ != 0 && (signal == SIGHUP || signal == kStopRequest)) {
             continue; // a terminal that closes sends it once more, or after its Ctrl-C
         }
         // sent to all processes, and handed on by a script or by timeout; of two that are
@@ -65,11 +66,28 @@ void Runner::read_signals()
         signal_ = signal;
         signal_taken_at_ = now();
         give_up(fmt::format("interrupted by {}", name_for_people(signal)));
-        for (RunningItem &active : running_.items) {
-            if (!active.stop) {
-                active.stop = Outcome::stopped;
-                active.stop_wanted_at = now();
-            }
+        stop_items();
+    }
+    look_at_limit();
+}
+
+void Runner::look_at_limit()
+{
+    if (!is_stopping() && options_.limit && now() - began_ > *options_.limit) {
+        over_limit_ = true;
+        give_up(fmt::format("the limit of {} was over (--limit)",
+                            fine_duration(options_.limit->count())));
+        stop_items();
+    }
+}
+
+void Runner::stop_items()
+{
+    stopping_since_ = now();
+    for (RunningItem &active : running_.items) {
+        if (!active.stop) {
+            active.stop = Outcome::stopped;
+            active.stop_wanted_at = now();
         }
     }
 }
@@ -120,7 +138,7 @@ void Runner::stop_what_is_due()
 bool Runner::is_stuck() const
 {
     const auto silent = now() - heard_of_at_;
-    return (signal_ != 0 && now() - signal_taken_at_ > options_.grace + kBeforeGivingUp) ||
+    return (is_stopping() && now() - stopping_since_ > options_.grace + kBeforeGivingUp) ||
            (silent > kBeforeGivingUp && library_.is_suspended()) ||
            (options_.timeout && silent > *options_.timeout + kForALongPlan);
 }
@@ -174,7 +192,7 @@ void Runner::release_command()
 // prevents that.
 bool Runner::starts_no_more() const
 {
-    return signal_ != 0 && running_.next < running_.job.targets.size();
+    return is_stopping() && running_.next < running_.job.targets.size();
 }
 
 void Runner::stop_gatherer(RunningItem &active)
@@ -251,6 +269,12 @@ std::vector<Leftover> Runner::gatherer_processes()
     return gatherers_;
 }
 
+// What is left of one that has ended, or has another name now.
+std::vector<Leftover> Runner::left_by_gatherer()
+{
+    return found_as_gatherer() ? std::vector<Leftover>() : gatherer_processes();
+}
+
 std::vector<Leftover> Runner::processes_of(const RunningItem &active)
 {
     return active.gathers ? gatherer_processes() : item_processes();
@@ -324,8 +348,7 @@ void Runner::make_way_for(const Job &job)
         });
         reader_.note_gathered(read_stored_plan().value_or(""), vendor_);
         // the library does not see one under another name, and would start another beside it
-        const std::vector<Leftover> running = gatherer_processes();
-        if (gatherer_may_report_late_ || (!running.empty() && !found_as_gatherer())) {
+        if (gatherer_may_report_late_ || !left_by_gatherer().empty()) {
             end_gatherer();
         }
         gatherer_runs_ = note_gatherer();
@@ -341,7 +364,8 @@ void Runner::end_round()
         end_left_running();
         require_plan();
     }
-    if (gatherer_may_report_late_) {
+    // what no trigger reaches would wait for the next one beside the gatherer that it starts
+    if (gatherer_may_report_late_ || (!gatherers_.empty() && !left_by_gatherer().empty())) {
         end_gatherer();
     }
     reader_.poll(ReportReader::When::at_once);

@@ -9,11 +9,13 @@
 #include <sys/signalfd.h>
 #include <system_error>
 #include <unistd.h>
+#include <utility>
 
 namespace fptest
 {
 
-Signals::Signals()
+Signals::Signals(std::function<bool()> is_stop_requested)
+    : is_stop_requested_(std::move(is_stop_requested))
 {
     sigprocmask(SIG_BLOCK, nullptr, &before_);
     sigemptyset(&set_);
@@ -56,7 +58,14 @@ int Signals::take()
 {
     signalfd_siginfo info{};
     const ssize_t got = read(descriptor_.get(), &info, sizeof info);
-    return got == static_cast<ssize_t>(sizeof info) ? static_cast<int>(info.ssi_signo) : 0;
+    if (got == static_cast<ssize_t>(sizeof info)) {
+        return static_cast<int>(info.ssi_signo);
+    }
+    if (is_stop_requested_ && is_stop_requested_()) {
+        is_stop_requested_ = {};
+        return kStopRequest;
+    }
+    return 0;
 }
 
 void Signals::take_suspensions()
@@ -77,7 +86,9 @@ void Signals::suspend()
 
 std::string name_for_people(int signal)
 {
-    return signal == SIGINT ? "Ctrl-C" : name_of_signal(signal);
+    return signal == SIGINT         ? "Ctrl-C"
+           : signal == kStopRequest ? "fptest stop"
+                                    : name_of_signal(signal);
 }
 
 } // namespace fptest

@@ -118,6 +118,11 @@ class Judge
         return {Outcome::passed};
     }
 
+    std::string stopped_by() const
+    {
+        return context_.over_limit ? "--limit" : name_for_people(context_.signal);
+    }
+
     std::string why_stopped() const
     {
         const auto limit = [this] { return fine_duration(context_.timeout->count()); };
@@ -134,13 +139,12 @@ class Judge
         const bool is_interrupted = active_.stop == Outcome::stopped;
         if (active_.killed) {
             return fmt::format("killed after {}, as it did not end when it was asked to{}{}",
-                               is_interrupted ? "the run was interrupted by " +
-                                                    name_for_people(context_.signal)
+                               is_interrupted ? "the run was interrupted by " + stopped_by()
                                               : duration(seconds),
                                active_.goes_on ? ", and goes on running" : "", if_written_over());
         }
         return is_interrupted
-                   ? fmt::format("stopped by {}", name_for_people(context_.signal))
+                   ? fmt::format("stopped by {}", stopped_by())
                    : fmt::format("stopped after {}{}", duration(seconds), if_written_over());
     }
 

@@ -32,6 +32,7 @@ struct JudgeContext {
     bool judge_limits = false; // of measurements
     int signal = 0;            // that interrupted the run
     std::string library_gone;  // why, if the library's process ended
+    bool over_limit = false;   // the whole run was, and stopped therefore
 };
 
 Verdict judge(const RunningItem &active, const ItemRun &item, const JudgeContext &context);

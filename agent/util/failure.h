@@ -14,6 +14,7 @@ namespace fptest
 enum class Cause {
     input,  // the command line, or an error in the plan
     device, // which is not ready
+    busy,   // another fptest uses it
 };
 
 // A message of one line: what is wrong, where, and what to do.

@@ -48,7 +48,7 @@ def offered(tmp_path):
 
 
 @pytest.mark.parametrize("command", ["", "run", "check", "show", "report", "measure", "send",
-                                     "doctor"])
+                                     "doctor", "status", "stop"])
 def test_every_option_is_offered_that_the_help_tells(offered, command):
     help_text = run(BUILD / "agent/fptest", *command.split(), "--help").out
     options = re.findall(r"^  (?:-\w,)?(-\S+)", help_text, re.MULTILINE)
@@ -59,17 +59,18 @@ def test_every_option_is_offered_that_the_help_tells(offered, command):
 
 @pytest.mark.parametrize("words, expected", [
     # sub-commands
-    ("''", ["check", "doctor", "measure", "report", "run", "send", "show"]),
+    ("''", ["check", "doctor", "measure", "report", "run", "send", "show", "status", "stop"]),
     ("re", ["report"]),
-    ("s", ["send", "show"]),
+    ("s", ["send", "show", "status", "stop"]),
     ("x", []),
     # options
-    ("run --pl", ["--plan"]),
+    ("run --pl", ["--plain", "--plan"]),
     ("run --plan x demo/Bringup --j", ["--json", "--judge-limits", "--junit"]),
     ("send --p", []),
     # files
     *((words, ["plans"]) for words in (
-        "run --plan pl", "run --junit pl", "run --json pl", "run --log pl",
+        "run --plan pl", "run --junit pl", "run --json pl", "run --log pl", "run --expect pl", "run --failed-of pl",
+        "run --resume pl",
         "run --plan = pl", "send --log pl", "report --log pl", "check pl", "check x pl",
         "show pl", "show --help pl")),
     ("show plans/", ["plans/demo.xml", "plans/other plan.xml"]),
@@ -81,9 +82,12 @@ def test_every_option_is_offered_that_the_help_tells(offered, command):
     # codes that the library knows
     ("run --pass-code ''", ["-2", "0", "1"]),
     ("report G I --result -", ["-2"]),
+    ("run --hangup ''", ["go-on", "stop"]),
     # numbers, words
     *((words, []) for words in (
-        "run --timeout ''", "run --for ''", "run --repeat ''", "report --progress ''",
+        "run --timeout ''", "run --for ''", "run --limit ''", "run --stop-after ''",
+        "run --retry ''", "run --repeat ''", "report --progress ''", "run --label ''",
+        "stop --wait ''", "status ''",
         "report --description ''", "send ''", "report Bringup SpiCheck ''")),
 ])
 def test_what_needs_no_plan_is_offered_without_one(offered, tmp_path, words, expected):
@@ -97,6 +101,7 @@ def test_what_needs_no_plan_is_offered_without_one(offered, tmp_path, words, exp
                       "demo/Gather", "demo/Gather/SensorProbe"]),
     (DEMO, "run --tap demo/Bringup demo/G", ["demo/Gather", "demo/Gather/SensorProbe"]),
     (DEMO, "run demo/Bringup/S", ["demo/Bringup/SpiCheck"]),
+    (DEMO, "run demo/Bringup --skip demo/Bringup/S", ["demo/Bringup/SpiCheck"]),
     # the root is called as anyone likes
     (DEMO, "run other/Ga", ["other/Gather", "other/Gather/SensorProbe"]),
     # groups, then their items

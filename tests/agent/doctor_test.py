@@ -168,6 +168,24 @@ def test_a_ps_that_hangs_is_ended(tmp_path):
     assert outcome.out == f"{PS_HEADER}\n" * 2
 
 
+def test_a_ps_of_ones_own_that_does_not_run(tmp_path):
+    shutil.copy(FPTEST, tmp_path / "fptest")
+    (tmp_path / "quillmark/bin").mkdir(parents=True)
+    make_program(tmp_path / "quillmark/bin/ps", "#!/nowhere\n")
+    (tmp_path / "plan.xml").write_text('<?xml version="1.0"?><P><CmdGroup name="G">'
+                                       '<Cmd name="true" args=""/></CmdGroup></P>')
+
+    outcome = on_device("sh", "-c", "./fptest doctor; ./fptest run --plan plan.xml P/G",
+                        options=("--out", tmp_path, "--android", "14"))
+
+    own = tmp_path / "quillmark/bin/ps"
+    assert (f"; {own} does not answer either: put a quillmark-ps that is built for this device "
+            "there\n") in outcome.out
+    assert outcome.out.count("!!  ps") == 1
+    assert outcome.err == (f"fptest: neither this device's ps nor {own} answers the library: fptest "
+                           "doctor says what that leads to\n")
+
+
 def test_no_ps_and_no_grep():
     outcome = shell("PATH=/nowhere /system/bin/fptest doctor")
     lines = lines_of(outcome)
@@ -203,8 +221,8 @@ def test_no_shell():
     lines = lines_of(on_bare_machine(f"{FPTEST} doctor", "/nowhere"))
 
     assert lines["shell"] == ("!!", NO_DEVICE)
-    assert lines["ps"] == ("! ", "ps does not list processes: it could not be asked: "
-                           "/system/bin/sh does not run" + PS_ADVICE)
+    assert lines["ps"] == (
+        "! ", "it could not be asked: /system/bin/sh does not run under another name")
     assert lines["kill"][0] == "!!"
 
 

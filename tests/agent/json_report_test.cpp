@@ -23,13 +23,15 @@ TEST_F(JsonReporter, BeginsWithWhatIsPlanned)
                              suite("Gather", {passed("SensorProbe")})});
     run.pass_code = -2;
     run.rounds = 2;
+    run.identity = {{{"device", "A\u20227"}, {"job", "1 2"}}, "1.2", "9f86"};
     Json line = events_of(json_of(run)).at(0);
     EXPECT_THAT(line.at("version").get<std::string>(), ::testing::ContainsRegex("^[0-9]+[.][0-9]"));
     line.erase("version");
     EXPECT_EQ(line, Json::parse(R"({
         "event": "run", "format": 2, "program": "fptest",
-        "plan": "plans/demo.xml", "vendor": 1, "rounds": 2, "time_limit": null,
-        "until_fail": false, "pass_code": -2, "start": "2024-05-06T07:08:09.123Z",
+        "library_version": "1.2", "plan": "plans/demo.xml", "plan_digest": "9f86",
+        "vendor": 1, "rounds": 2, "time_limit": null, "until_fail": false, "pass_code": -2,
+        "labels": {"device": "A\u20227", "job": "1 2"}, "start": "2024-05-06T07:08:09.123Z",
         "items": [{"group": "Bringup", "item": "SpiCheck"},
                   {"group": "Bringup", "item": "DeadPixel"},
                   {"group": "Gather", "item": "SensorProbe"}]})"));

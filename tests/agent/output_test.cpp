@@ -421,6 +421,22 @@ TEST_F(Output, ReportThatHasBegunSaysThatNothingWasRun)
     EXPECT_EQ(suite.properties()["reason"], why);
 }
 
+// --- lines on a terminal --------------------------------------------------------------
+
+TEST_F(Output, PlainLinesAreForTerminalsToo)
+{
+    TerminalSession session(
+        {FPTEST_PROGRAM, "run", "--plain", "--plan",
+         plan(group_of({{"Item", "report G 100 0 fine"}, {"Other", "report G 100 1 bad"}})), "P/G"},
+        80, 24);
+    EXPECT_EQ(session.wait_for_end(), 1);
+    EXPECT_THAT(session.written(), Not(HasSubstr("\x1b")));
+    EXPECT_THAT(without_times(session.all_lines()),
+                ElementsAre("/tmp/scene/plan.xml: 2 items, vendor 0",
+                            "G/Item: passed, result 0, T s: fine",
+                            "G/Other: failed, result 1, T s: bad", "1 passed, 1 failed, T s"));
+}
+
 // --- while an item runs ---------------------------------------------------------------
 
 TEST_F(Output, ShowsWhatAnItemSaysWhileItRuns)

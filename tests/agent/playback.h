@@ -132,6 +132,11 @@ class Playback
     {
         reporter_.tick(now_);
     }
+    // It has ended, but one that started before it has not, which is told first.
+    void end_unseen(Place place)
+    {
+        now(place).seconds = end(place).seconds;
+    }
     // After that many seconds of it, with what it has printed until then.
     void tick(Place place, double seconds, const std::string &output)
     {

@@ -16,7 +16,7 @@ namespace fs = std::filesystem;
 namespace
 {
 
-const std::string kPlan =
+const std::string kReportedPlan =
     plan_of({{"Bringup", {{"SpiCheck", "a"}, {"DeadPixel", ""}}}, {"Endurance", {{"BurnIn", ""}}}});
 
 class ReportCommand : public FptestTest
@@ -25,7 +25,7 @@ class ReportCommand : public FptestTest
     void SetUp() override
     {
         FptestTest::SetUp();
-        write_file(kPlanFile, kPlan);
+        write_file(kPlanFile, kReportedPlan);
     }
 
     static Ended report(std::vector<std::string> arguments)
@@ -52,7 +52,7 @@ class ReportCommand : public FptestTest
         std::vector<std::string> all = {"report"};
         all.insert(all.end(), arguments.begin(), arguments.end());
         fptest_runner::expect_refusal(status, line, all);
-        EXPECT_EQ(read_file(kPlanFile), kPlan);
+        EXPECT_EQ(read_file(kPlanFile), kReportedPlan);
     }
 };
 
@@ -212,7 +212,7 @@ TEST_F(ReportCommand, WaitsForAPlanThatIsJustBeingSaved)
     write_file(kPlanFile, "");
     const std::jthread saves([] {
         std::this_thread::sleep_for(std::chrono::milliseconds(200));
-        write_file(kPlanFile, kPlan);
+        write_file(kPlanFile, kReportedPlan);
     });
     const Ended ended = report({"Bringup", "SpiCheck", "--progress", "1", "--result", "0"});
     EXPECT_EQ(ended.status, 0) << ended.err;
@@ -229,7 +229,7 @@ TEST_F(ReportCommand, SaysThatThePlanIsNotWritable)
     EXPECT_EQ(ended.status, 3);
     EXPECT_EQ(ended.err, "fptest: the report is not in /data/vorlane/src1.xml: is it writable? "
                          "--log FILE says why\n");
-    EXPECT_EQ(read_file(kPlanFile), kPlan);
+    EXPECT_EQ(read_file(kPlanFile), kReportedPlan);
 }
 
 TEST_F(ReportCommand, SaysThatTheDiskIsFull)
@@ -246,7 +246,7 @@ TEST_F(ReportCommand, SaysThatTheDiskIsFull)
         ended.err, std::regex("fptest: the disk of /data/vorlane is full: make room for \\d+ "
                               "bytes; the stored plan is as it was\n")))
         << ended.err;
-    EXPECT_EQ(read_file(kPlanFile), kPlan);
+    EXPECT_EQ(read_file(kPlanFile), kReportedPlan);
     // it has room where the old text was, for no more than it takes
     EXPECT_EQ(report({"Bringup", "SpiCheck", "--progress", "1", "--result", "0", "--description",
                       std::string(2000, 'd')})

@@ -460,6 +460,24 @@ TEST_F(RoundReports, SayEveryTenSecondsWhatAnItemHasSaid)
               "G/b: running, 10.0 s\n");
 }
 
+TEST_F(RoundReports, TellOfTheItemThatRunsAndNotOfALaterOneThatHasEnded)
+{
+    const How play_a_gatherer = [](Playback &playback) {
+        playback.begin();
+        playback.start({0, 0});
+        playback.start({0, 1});
+        playback.end_unseen({0, 1});
+        playback.tick({0, 0}, 10, "");
+        playback.end_item({0, 0});
+        playback.end_item({0, 1});
+    };
+    EXPECT_EQ(plain_of(run_of({suite("G", {passed("a"), passed("b")})}), play_a_gatherer),
+              "plans/demo.xml: 2 items, vendor 1\n"
+              "G/a: running, 10.0 s\n"
+              "G/a: passed, result 0, 0.3 s: chip answers\n"
+              "G/b: passed, result 0, 0.3 s: chip answers\n");
+}
+
 TEST_F(RoundReports, CutALineOfOutputThatIsTooLong)
 {
     ItemRun loud = failed("a");

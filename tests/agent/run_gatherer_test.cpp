@@ -74,6 +74,20 @@ TEST_F(RunGatherer, InterruptedInAGroupsCommandIsFollowedByNoOtherItem)
     EXPECT_FALSE(is_there("order"));
 }
 
+// The next trigger would start another one beside them.
+TEST_F(RunGatherer, WhatIsLeftOfOneThatHasEndedIsNamedAndEndedWithTheRun)
+{
+    for (const std::string rest :
+         {"sleep 61 &amp; /system/bin/Item gather report-here G SensorProbe 100 0 fine",
+          "exec -a sleep /system/bin/Item gather report-here G SensorProbe 100 0 fine "
+          "gather sleep 61"}) {
+        const Ended ended = run_group({{"SensorProbe", "--help; " + rest}});
+        EXPECT_EQ(ended.status, 0) << ended.err;
+        EXPECT_EQ(end_of(0).at("left_running").at(0).at("name"), "sleep") << rest;
+        EXPECT_THAT(processes_named("sleep"), IsEmpty()) << rest;
+    }
+}
+
 TEST_F(RunGatherer, DoesNotCountTheNextItemOfItsGroupAsLeftRunning)
 {
     EXPECT_EQ(
@@ -452,15 +466,15 @@ TEST_F(RunGatherer, IsKilledInAGroupsCommandWhereItIgnoresTheStop)
     EXPECT_THAT(processes_named("/system/bin/Stubborn"), IsEmpty());
 }
 
-TEST_F(RunGatherer, IsStartedOnceForAllRoundsWhereItHasAnotherName)
+TEST_F(RunGatherer, IsStartedForEachRoundWhereItHasAnotherName)
 {
-    // the library does not find it by its name
+    // the library does not find it by its name, and one that is left would answer for it
     run_group({{"SensorProbe", "--help >/dev/null; exec /system/bin/Item gather report-here G "
                                "SensorProbe 100 0 fine sleep 30"}},
               {"--repeat", "3"});
     EXPECT_THAT(outcomes(),
                 ElementsAre("SensorProbe: passed", "SensorProbe: passed", "SensorProbe: passed"));
-    EXPECT_EQ(processes_named("/system/bin/Item").size(), 1U);
+    EXPECT_THAT(processes_named("/system/bin/Item"), IsEmpty());
 }
 
 TEST_F(RunGatherer, HasRoomForWhatItPrintsAfterTheRun)

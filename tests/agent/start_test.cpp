@@ -14,6 +14,7 @@
 #include <string>
 #include <sys/file.h>
 #include <unistd.h>
+#include <utmp.h>
 
 namespace
 {
@@ -89,6 +90,79 @@ TEST_F(Started, TerminalThatClosesIsAnInterruption)
     const Ended ended = fptest.wait();
     EXPECT_EQ(ended.status, 130) << ended.err;
     expect_whole_reports("interrupted by SIGHUP");
+}
+
+// The terminal is its own, and closes while its item runs.
+TEST_F(Started, HangupStopsTheRunOrLetsItGoOn)
+{
+    const std::string path =
+        plan(group_of({{"Item", "note /tmp/scene/begun await /tmp/scene/go report G 100 0 fine"}}));
+    for (const std::string meaning : {"stop", "go-on"}) {
+        unlink(work("begun").c_str());
+        int master = -1;
+        int terminal = -1;
+        ASSERT_EQ(openpty(&master, &terminal, nullptr, nullptr, nullptr), 0);
+        fcntl(master, F_SETFD, FD_CLOEXEC);
+        Start start = start_of_run(path);
+        start.arguments.insert(start.arguments.end(), {"--hangup", meaning});
+        start.environment["TERM"] = "xterm";
+        start.shares_streams = true;
+        start.prepare = [terminal] { login_tty(terminal); };
+        FptestProcess fptest(start);
+        close(terminal);
+        ASSERT_TRUE(wait_for_file("begun"));
+        close(master);
+        if (meaning == "go-on") {
+            usleep(200'000);
+            file("go", "");
+        }
+        EXPECT_EQ(fptest.wait().status, meaning == "go-on" ? 0 : 130);
+        EXPECT_THAT(outcomes(read_file(work("json"))),
+                    ElementsAre(meaning == "go-on" ? "Item: passed" : "Item: stopped"));
+    }
+}
+
+TEST_F(Started, ViewInAFileIsNotLostWithATerminal)
+{
+    if (is_in_place()) {
+        GTEST_SKIP() << "in place, the disk is the container's own and is not to be filled";
+    }
+    device::write_file(kPlanFile, group_of({{"Item", "report G 100 0 fine"}}));
+    fill_disk();
+    const Ended ended = run_fptest(
+        {.arguments = {"run", "--hangup", "go-on", "P/G"}, .output = "/data/vorlane/view"});
+    EXPECT_EQ(ended.status, 3);
+    EXPECT_THAT(ended.err, HasSubstr("standard output: No space left on device"));
+}
+
+// Its terminal's end comes right after the Ctrl-C, while the item still ends.
+TEST_F(Started, SessionLeaderThatDiesOnCtrlCLeavesWholeReports)
+{
+    int master = -1;
+    int terminal = -1;
+    ASSERT_EQ(openpty(&master, &terminal, nullptr, nullptr, nullptr), 0);
+    fcntl(master, F_SETFD, FD_CLOEXEC);
+    Start start =
+        start_of_run(plan(group_of({{"Stubborn", "note /tmp/scene/begun ignore-stop sleep 60"}})));
+    start.arguments.insert(start.arguments.end(), {"--grace", "0.5"});
+    start.shares_streams = true;
+    start.prepare = [terminal] {
+        login_tty(terminal);
+        if (fork() != 0) {
+            std::signal(SIGINT, SIG_DFL);
+            for (;;) {
+                pause();
+            }
+        }
+    };
+    FptestProcess leader(start);
+    close(terminal);
+    ASSERT_TRUE(wait_for_file("begun"));
+    ASSERT_EQ(write(master, "\x03", 1), 1);
+    EXPECT_EQ(leader.wait().status, -SIGINT);
+    EXPECT_TRUE(eventually([] { return processes_named(FPTEST_PROGRAM).empty(); }, 20));
+    expect_whole_reports("interrupted by Ctrl-C");
+    close(master);
 }
 
 TEST_F(Started, SignalsThatAreIgnoredStayIgnored)

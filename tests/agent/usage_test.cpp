@@ -14,7 +14,7 @@ using device::Lines;
 namespace
 {
 
-const std::string kPlan = group_of({{"Item", ""}});
+const std::string kStoredBefore = group_of({{"Item", ""}});
 
 class Usage : public FptestTest
 {
@@ -28,13 +28,13 @@ class Usage : public FptestTest
     void SetUp() override
     {
         FptestTest::SetUp();
-        write_file(device::kPlanFile, kPlan);
+        write_file(device::kPlanFile, kStoredBefore);
     }
 
     static void expect_wrong(const Lines &arguments, const std::string &text)
     {
         expect_refusal(2, "fptest: " + text, arguments);
-        EXPECT_EQ(read_file(device::kPlanFile), kPlan);
+        EXPECT_EQ(read_file(device::kPlanFile), kStoredBefore);
     }
 };
 
@@ -61,6 +61,27 @@ TEST_F(Usage, IsExplainedInOneLine)
          "--description needs a value: --description TEXT; see fptest report --help"},
         {{"run", "--list="}, "--list takes no value; see fptest run --help"},
         {{"run", "--list=3"}, "--list takes no value; see fptest run --help"},
+        {{"run", "P/G", "--label", "device"},
+         "--label: 'device' has no '=': write KEY=VALUE; see fptest run --help"},
+        {{"run", "P/G", "--label", "=A7"},
+         "--label: '' is no key: use letters, digits, '.', '_' and '-'; see fptest run --help"},
+        {{"run", "--label", "rack row=3", "P/G"},
+         "--label: 'rack row' is no key: use letters, digits, '.', '_' and '-'; see fptest run "
+         "--help"},
+        {{"run", "--label", "job=", "P/G"}, "--label: 'job' has no value; see fptest run --help"},
+        {{"run", "--label=", "P/G"}, "--label: its value is empty; see fptest run --help"},
+        {{"run", "--label", "plan=x", "P/G"},
+         "--label: 'plan' is written by fptest itself: choose another key; see fptest run --help"},
+        {{"run", "--label", "job=1", "--label", "job=2", "P/G"},
+         "--label job is given twice: give it once"},
+        {{"run", "P/G", "--label"},
+         "--label needs a value: --label KEY=VALUE; see fptest run --help"},
+        {{"run", "--hangup", "ignore", "P/G"},
+         "--hangup: 'ignore' is not stop or go-on; see fptest run --help"},
+        {{"stop", "--wait", "-1"},
+         "--wait: '-1' is not a number from 0 to 1000000; see fptest stop --help"},
+        {{"stop", "now"}, "'now' is one argument too many; see fptest stop --help"},
+        {{"status", "--json"}, "there is no option '--json'; see fptest status --help"},
         {{"run", "P/G", "--quiet=no"}, "--quiet takes no value; see fptest run --help"},
         {{"run", "P/G", "--pla", "a"},
          "there is no option '--pla'; did you mean '--plan'? See fptest run --help"},
@@ -96,11 +117,11 @@ TEST_F(Usage, IsExplainedInOneLine)
         {{"send"}, "give COMMANDs as arguments, or with -0 on standard input"},
         {{"send", "-0", "pingtest"}, "give COMMANDs as arguments, or with -0 on standard input"},
         {{"bogus"},
-         "there is no command 'bogus'; the commands are run, check, show, report, measure, send "
-         "and doctor"},
+         "there is no command 'bogus'; the commands are run, check, show, report, measure, send, "
+         "doctor, status and stop"},
         {{"rum"},
          "there is no command 'rum'; did you mean 'run'? The commands are run, check, show, "
-         "report, measure, send and doctor"},
+         "report, measure, send, doctor, status and stop"},
         {{}, "no command is given; see fptest --help"}};
     for (const auto &[arguments, text] : wrong) {
         expect_wrong(arguments, text);
@@ -109,7 +130,7 @@ TEST_F(Usage, IsExplainedInOneLine)
 
 TEST_F(Usage, SaysWhatIsWrongWithAValue)
 {
-    const std::string path = plan(kPlan);
+    const std::string path = plan(kStoredBefore);
     const struct {
         Lines before; // the value
         Lines values;

@@ -117,10 +117,9 @@ build_cxx()
 # The copy of a /system that ABI $1 can run on.
 system_for()
 {
-	local loader processor path systems
+	local loader processor path
 
 	read -r _ _ _ loader processor <<<"${about[$1]}"
-	IFS=: read -r -a systems <<<"$ANDROID_SYSTEM"
 	for system in "${systems[@]}"; do
 		for path in "$system/bin/$loader" "$system/../apex/com.android.runtime/bin/$loader"; do
 			readelf --file-header "$path" 2>/dev/null | grep -q "Machine:.* $processor\$" && return

@@ -39,7 +39,8 @@ def test_a_bad_command_line_gets_one_line_and_status_125(line, complaint):
     assert_refused(shlex.split(line), complaint, cwd=TREE)
 
 
-@pytest.mark.parametrize("option", ["--data", "--out", "--bin", "--build", "--vendor", "--android"])
+@pytest.mark.parametrize("option", ["--data", "--out", "--bin", "--build", "--vendor", "--android",
+                                    "--adb"])
 def test_every_option_wants_an_argument(option):
     assert_refused([option], f"{option} needs an argument; see device/run --help")
 
@@ -78,7 +79,7 @@ def test_help_fits_a_terminal_and_names_every_option():
     assert (status, err) == (0, "")
     assert max(map(len, out.splitlines())) <= 80
     for text in ("--data DIR", "--out DIR", "--bin DIR", "--vendor N", "--android N",
-                 "--build DIR", "--in-place", "--help", "125", "127"):
+                 "--adb PORT", "--build DIR", "--in-place", "--help", "125", "127"):
         assert text in out
 
 

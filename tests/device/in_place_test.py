@@ -70,6 +70,8 @@ def test_a_refusal_names_the_switch_that_explains_it(machine, wanted):
     ("", without("bwrap"), "bwrap is missing; apt-get install bubblewrap"),
     ("", without("mksh"), "mksh is missing; apt-get install mksh"),
     ("", without("toybox"), "toybox is missing; apt-get install toybox"),
+    ("--adb 5600", without("python3"),
+     "/usr/bin/python3 is missing, for --adb; apt-get install python3"),
 ])
 def test_a_refusal_names_what_is_wanted(option, machine, complaint):
     assert on_machine(f'"$1" {option} -- true', **machine) == refusal(complaint)
@@ -275,6 +277,15 @@ IN_PLACE = {
     "it has the ps of the release that is named": (
         """ "$1" --android 7 -- ps BurnIn; readlink /bin/sh """,
         "bad pid 'BurnIn'\n/usr/bin/dash\n"),
+    "adb reaches it": (f"""
+        export HOME=/tmp; "$1" --adb 5600 &
+        {until("adb connect 127.0.0.1:5600 | grep -q '^connected'")}
+        adb push "$1" /data/local/tmp | grep -c pushed
+        adb shell 'echo $QUILLMARK_DEVICE; cd /data/local/tmp; ls; exit 3'; echo $?
+        adb shell 'touch /tmp/on; exec sleep 79' & {ON}
+        kill %1; wait %1; echo $?; wait; readlink /bin/sh; ls -d /data
+        adb kill-server""",
+        "1\nin-place\nrun\n3\n143\n/usr/bin/dash\n"),
     "it starts COMMAND in the directory whose files stay": ("""
         cd /tmp; "$1" --out out -- sh -c 'pwd; echo x >file'; cat out/file""",
         "/tmp/out\nx\n"),

@@ -137,3 +137,17 @@ def test_who_names_files_in_tmp_is_told_that_they_are_hidden(in_tmp):
             "from its directory, or keep it elsewhere\n")
     for word, directory in ((plan, own), ("./plan.xml", own), ("/tmp/no-such-file", TREE)):
         assert on_device("true", word, cwd=directory).err == ""
+
+
+# ---- its disks, over adb -----------------------------------------------------------------
+
+@pytest.mark.parametrize("place, why", [("/system/bin/item", "Read-only file system"),
+                                        ("/data/vorlane/item", "No space left on device")])
+def test_a_file_that_does_not_fit_is_not_pushed(there, tmp_path, place, why):
+    (tmp_path / "item").write_bytes(bytes(20 << 20))
+
+    status, out, err = there.run("push", tmp_path / "item", place)
+
+    assert status == 1
+    assert f"couldn't create file: {why}" in out + err
+    assert there.shell(f"ls {place}").status == 1

@@ -112,3 +112,14 @@ def test_one_beside_fptest_is_found(tmp_path):
     assert said == ["fptest: this device's ps does not answer the library: "
                     f"{tmp_path}/quillmark/bin/ps is used instead"]
     assert ends[1][1] < 2.9
+
+
+def test_without_a_path_the_other_programs_are_found_too(tmp_path):
+    (tmp_path / "plan.xml").write_text(PLAN)
+
+    outcome = on_device("sh", "-c", "unset PATH; /system/bin/fptest run --repeat 2 --log log "
+                        "--plan plan.xml P/G/SensorProbe",
+                        options=("--out", tmp_path, "--android", "14"))
+
+    assert outcome.status == 0, outcome.err
+    assert re.findall("row=(.)", (tmp_path / "log").read_text()) == ["0", "1"]

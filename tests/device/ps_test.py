@@ -48,6 +48,14 @@ def test_with_an_empty_name_it_lists_every_process():
     assert names(own_processes("ps ''; :")) == ["sh", "ps"]
 
 
+def test_a_number_that_is_no_name_is_a_processs_id():
+    of_shell, = own_processes("ps $$; :")
+    of_program, = own_processes("(exec -a $$ /usr/bin/sleep 9) & sleep 0.3; ps $$; :")
+
+    assert of_shell.name == "sh"
+    assert of_program.name == of_program.parent
+
+
 def test_it_shows_the_program_without_its_arguments():
     found = own_processes("sh -c 'sleep 9; : /system/bin/SensorProbe' & sleep 0.3; ps; :")
 
@@ -56,7 +64,7 @@ def test_it_shows_the_program_without_its_arguments():
 
 def test_it_shows_the_kernels_name_of_a_zombie():
     # a program that never reaps takes the place of the shell that started a child
-    found = own_processes("(sleep 0 & exec sleep 9) & sleep 0.4; ps sleep")
+    found = own_processes("(sleep 0 & exec sleep 9) & sleep 1; ps sleep")
 
     assert [(each.state, each.name) for each in found].count(("Z", "sleep")) == 1
 

@@ -2,43 +2,14 @@
 # SPDX-License-Identifier: Apache-2.0
 """A device's own userland: --system. Programs of this machine stand in for a device's, as
 its loader runs them as well: no file of Android is at hand here."""
-import platform
 import shutil
-import struct
 
 import pytest
 
-from support.outside import make_program, on_device, output_of
+from support.device_copy import SHELL, elf_head, system, with_system
+from support.outside import make_program
 
 pytestmark = pytest.mark.usefixtures("namespaces")
-
-BITS64 = {"x86_64": 62, "aarch64": 183}
-SHELL = shutil.which("mksh")
-
-
-def elf_head(machine, is_64=True):
-    return struct.pack("<4sBBB9xHH", b"\x7fELF", 2 if is_64 else 1, 1, 1, 3, machine)
-
-
-@pytest.fixture
-def system(tmp_path):
-    """A copy of a device's /system, in which nothing lacks."""
-    made = tmp_path / "pulled/system"
-    for directory in ("bin", "lib64", "etc"):
-        (made / directory).mkdir(parents=True)
-    shutil.copy(SHELL, made / "bin/mksh")
-    (made / "bin/sh").symlink_to("mksh")
-    (made / "bin/linker64").write_bytes(elf_head(BITS64[platform.machine()]))
-    (made / "lib64/libc.so").write_bytes(elf_head(BITS64[platform.machine()]))
-    (made / "etc/hosts").write_text("the device's hosts\n")
-    shutil.copy(shutil.which("toybox"), made / "bin/toybox")
-    (made / "bin/grep").symlink_to("toybox")
-    make_program(made / "bin/ps", "#!/system/bin/sh\necho the ps of the device\n")
-    return made
-
-
-def with_system(system, *command, options=(), **others):
-    return on_device(*command, options=("--system", system, *options), **others)
 
 
 def test_the_devices_own_programs_and_files_are_there(system):
@@ -116,26 +87,3 @@ def test_a_directory_that_is_no_copy_is_refused(system, tmp_path):
 def test_it_is_not_to_be_had_in_place(system):
     assert with_system(system, "true", options=("--in-place",)) == (
         125, "", "device/run: --system needs namespaces: not with --in-place\n")
-
-
-# Ends with 7.
-ARM_PROGRAM = {
-    "aarch64": (".globl _start\n_start: mov x0, #7\nmov x8, #93\nsvc #0\n", "linker64", 183),
-    "arm": (".globl _start\n_start: mov r0, #7\nmov r7, #1\nsvc #0\n", "linker", 40),
-}
-
-
-@pytest.mark.skipif(platform.machine() != "x86_64" or not shutil.which("qemu-arm"),
-                    reason="no qemu for ARM here")
-@pytest.mark.parametrize("processor", ARM_PROGRAM)
-def test_programs_for_arm_are_run_by_qemu(system, tmp_path, processor):
-    text, linker, machine = ARM_PROGRAM[processor]
-    library = "lib64" if linker == "linker64" else "lib"
-    (tmp_path / "shell.s").write_text(text)
-    (system / "bin/sh").unlink()
-    output_of("clang", f"--target={processor}-linux-gnu", "-nostdlib", "-static", "-fuse-ld=lld",
-              "-o", system / "bin/sh", tmp_path / "shell.s")
-    (system / library).mkdir(exist_ok=True)
-    (system / library / "libc.so").touch()
-    (system / "bin" / linker).touch()
-    assert with_system(system, "sh") == (7, "", "")

@@ -1,0 +1,41 @@
+// SPDX-FileCopyrightText: 2026 The Quillmark authors
+// SPDX-License-Identifier: Apache-2.0
+
+// A run that has left its results as JSON lines, also one that was cut off.
+#pragma once
+
+#include "plan/plan.h"
+#include "run/results.h"
+
+#include <cstddef>
+#include <map>
+#include <set>
+#include <string>
+#include <utility>
+#include <vector>
+
+namespace fptest
+{
+
+struct EarlierRun {
+    using Name = std::pair<std::string, std::string>; // a group's and an item's, as sanitized
+
+    std::string file;
+    bool is_cut = false;     // its last line, of which nothing is used
+    Run run;                 // as it was begun, and how it ended; without items
+    std::vector<Name> items; // of each round
+
+    // By their indices over all rounds; those before the last one as its earlier ones.
+    std::map<std::size_t, ItemRun> attempts;
+    std::set<std::size_t> ended; // and with an outcome of their own
+    std::set<Name> failed;       // in any round, or begun and not ended
+};
+
+// Throws a Failure if the file is none of these, or has a line that fptest did not write.
+EarlierRun read_earlier_run(const std::string &file);
+
+// Throws a Failure that names those of these items that the plan has not.
+void require_items(const EarlierRun &earlier, const std::set<EarlierRun::Name> &items,
+                   const Plan &plan, const std::string &plan_name);
+
+} // namespace fptest

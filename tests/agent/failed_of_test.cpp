@@ -1,0 +1,154 @@
+// SPDX-FileCopyrightText: 2026 The Quillmark authors
+// SPDX-License-Identifier: Apache-2.0
+
+// fptest run --failed-of: an earlier run's JSON lines, as far as they go.
+#include "run_test.h"
+
+#include <csignal>
+#include <filesystem>
+
+namespace
+{
+
+const Items kFour = {{"Item", kPasses},
+                     {"Other", "report G 100 1 bad"},
+                     {"Third", ""},
+                     {"Fourth", "report G 100 0 fine"}};
+
+class FailedOf : public RunCommand
+{
+  protected:
+    // The JSON lines of a run of these, with these options.
+    static std::string left_by(const Items &items, const Lines &options = {})
+    {
+        run_group(items, options);
+        std::filesystem::rename(work("json"), work("before"));
+        std::filesystem::remove(device::kLogFile);
+        return work("before");
+    }
+    static std::string changed(const std::string &from, const std::string &to)
+    {
+        std::string text = read_file(work("before"));
+        const std::size_t at = text.find(from);
+        EXPECT_NE(at, std::string::npos) << from << "\n" << text;
+        return file("before", text.replace(std::min(at, text.size()), from.size(), to));
+    }
+    static void expect_refused(const std::string &line, const std::string &before)
+    {
+        expect_refusal(2, "fptest: " + line,
+                       {"run", "--failed-of", before, "--plan", plan(group_of(kFour))});
+    }
+};
+
+TEST_F(FailedOf, RunsWhatDidNotPass)
+{
+    const std::string before = left_by(kFour);
+    const Ended ended = run_group(kFour, {"--failed-of", before});
+    EXPECT_EQ(ended.status, 1);
+    EXPECT_EQ(ended.err, "");
+    EXPECT_THAT(outcomes(), ElementsAre("Other: failed", "Third: no result"));
+    EXPECT_THAT(paths_run(), ElementsAre("P/G/Other", "P/G/Third"));
+    const auto listed = [&](Lines options) {
+        options.insert(options.begin(),
+                       {"run", "--list", "--failed-of", before, "--plan", plan(group_of(kFour))});
+        return run_fptest(options).out;
+    };
+    EXPECT_EQ(listed({"P/*/[FT]*"}), "P/G/Third  /system/bin/Third \n");
+    EXPECT_EQ(listed({"--skip", "P/G/Third"}), "P/G/Other  /system/bin/Other report G 100 1 bad\n");
+}
+
+TEST_F(FailedOf, CountsByTheOutcome)
+{
+    const std::string expect = file("known", "P/G/Other QM-7\nP/G/Fourth QM-8\n");
+    const std::string before = left_by(kFour, {"--expect", expect});
+    run_group(kFour, {"--failed-of", before});
+    EXPECT_THAT(outcomes(), ElementsAre("Third: no result", "Fourth: passed"));
+}
+
+TEST_F(FailedOf, HasNothingToDoWhereAllPassed)
+{
+    const std::string before = left_by({{"Item", kPasses}});
+    const Ended ended = run_group(kFour, {"--failed-of", before});
+    EXPECT_EQ(ended.status, 0);
+    EXPECT_EQ(ended.err, "fptest: " + before + ": no item of that run failed: nothing to do\n");
+    EXPECT_EQ(ended.out, "");
+    EXPECT_THAT(paths_run(), IsEmpty());
+}
+
+// The item that ran when the device went down has not passed either.
+TEST_F(FailedOf, UsesARunThatWasKilledAsFarAsItGoes)
+{
+    FptestProcess fptest(with_group({{"Item", "report G 100 1 bad"}, {"Other", kSleeps}}));
+    ASSERT_TRUE(wait_for_events("start", 2));
+    fptest.signal(SIGKILL);
+    fptest.wait();
+    expect_items_to_end();
+    const std::string text = read_file(work("json"));
+    const std::string whole = text.substr(0, text.rfind('\n') + 1);
+    const std::string before = file("before", whole + "{\"event\":\"progr");
+    const Ended ended = run_group(kFour, {"--failed-of", before});
+    EXPECT_EQ(ended.err, "fptest: " + before + ": its last line is cut, and left out\n");
+    EXPECT_THAT(outcomes(), ElementsAre("Item: passed", "Other: failed"));
+}
+
+TEST_F(FailedOf, RefusesAnotherPlan)
+{
+    const std::string before =
+        left_by({{"Item", ""}, {"Script", ""}, {"Stubborn", ""}, {"Scrip", ""}, {"Other_ca", ""}});
+    expect_refused(before + " is of another plan: it has G/Other_ca, G/Scrip, G/Script and 1 more, "
+                            "and /tmp/scene/plan.xml has not",
+                   before);
+    const std::string once = left_by({{"Item", ""}});
+    expect_refusal(2, "fptest: nothing is left to run: --failed-of leaves out all of it",
+                   {"run", "--failed-of", once, "--plan", plan(group_of(kFour)), "P/G/Other"});
+}
+
+TEST_F(FailedOf, RefusesWhatIsNoReport)
+{
+    const std::string before = left_by({{"Item", ""}});
+    const std::string whole = read_file(before);
+    const std::string not_written = before + " is not what fptest run --json writes";
+    expect_refused(work("none") + ": No such file or directory", work("none"));
+    expect_refused("/tmp/scene: Is a directory", "/tmp/scene");
+    expect_refused(before + " is empty: nothing is known of that run", file("before", ""));
+    for (const std::string text : {"<xml/>\n", "{\"event\":\"run\"", "{\"event\":\"run\"}\n", "7\n",
+                                   "[]\n", "\n\n", "{\"event\":\"start\"}\n"}) {
+        expect_refused(not_written, file("before", text));
+    }
+    file("before", whole);
+    expect_refused(before + " has the format 3, and this fptest reads 2",
+                   changed("\"format\":2", "\"format\":3"));
+    const std::string wrong = ": this is not what fptest run --json writes: ";
+    const auto expect_wrong = [&](const std::string &from, const std::string &to,
+                                  const std::string &why) {
+        file("before", whole);
+        const std::string changed_file = changed(from, to);
+        const Ended ended =
+            run_fptest({"run", "--failed-of", changed_file, "--plan", plan(group_of(kFour))});
+        EXPECT_EQ(ended.status, 2);
+        EXPECT_THAT(ended.err, StartsWith("fptest: " + before + ":"));
+        EXPECT_THAT(ended.err, HasSubstr(wrong + why));
+        EXPECT_EQ(lines_of(ended.err).size(), 1U);
+    };
+    expect_wrong("\"index\":0,", "\"index\":-1,", "its index is no number");
+    expect_wrong("\"outcome\":\"no result\"", "\"outcome\":\"grand\"",
+                 "there is no outcome 'grand'");
+    expect_wrong("\"event\":\"end\",\"index\":0,\"group\":\"G\",\"item\":\"Item\"",
+                 "\"event\":\"end\",\"index\":0,\"group\":\"G\",\"item\":\"Else\"",
+                 "its item is not the one that the index says");
+    expect_wrong("\"reason\":", "\"reason\":7,\"raison\":", "");
+    // what is cut is the last line only
+    expect_wrong("{\"event\":\"start\"", "{\"event\":\"sta", "it is no JSON object");
+}
+
+TEST_F(FailedOf, IsNotOverwritten)
+{
+    const std::string before = left_by(kFour);
+    const Ended ended = run_fptest(
+        {"run", "--failed-of", before, "--json", before, "--plan", plan(group_of(kFour))});
+    EXPECT_EQ(ended.status, 2);
+    EXPECT_THAT(ended.err, HasSubstr("--failed-of and --json both want the file "));
+    EXPECT_FALSE(events_of(read_file(before)).empty());
+}
+
+} // namespace

@@ -1,0 +1,196 @@
+// SPDX-FileCopyrightText: 2026 The Quillmark authors
+// SPDX-License-Identifier: Apache-2.0
+
+// fptest run --resume: one whole report of a run that was cut off and went on.
+#include "run_test.h"
+
+#include <csignal>
+#include <filesystem>
+
+namespace
+{
+
+// Sleeps at its first attempt, until the run is ended there, and passes at the next one.
+const std::string kSleepsOnce = "report G 100 0 ok once /tmp/scene/slept sleep 60";
+
+const Items kThreeOfWhichOneSleeps = {
+    {"Item", "say first report G 100 1 bad"}, {"Other", kSleepsOnce}, {"Third", kPasses}};
+
+class ResumedRun : public RunCommand
+{
+  protected:
+    // The JSON lines of a run that is ended by a signal where it sleeps.
+    static std::string cut_off(const Items &items, int signal, const Lines &options = {})
+    {
+        FptestProcess fptest(with_group(items, options));
+        EXPECT_TRUE(wait_for_file("slept"));
+        fptest.signal(signal);
+        fptest.wait();
+        expect_items_to_end();
+        std::filesystem::rename(work("json"), work("before"));
+        std::filesystem::remove(device::kLogFile);
+        return work("before");
+    }
+    static Ended resume(const Items &items, Lines options = {})
+    {
+        options.insert(options.begin(),
+                       {"--resume", work("before"), "--plan", plan(group_of(items))});
+        return run(std::move(options));
+    }
+    static void expect_refused(const std::string &line, Lines options = {},
+                               const Items &items = kThreeOfWhichOneSleeps)
+    {
+        SCOPED_TRACE(PrintToString(options));
+        options.insert(options.begin(),
+                       {"run", "--resume", work("before"), "--plan", plan(group_of(items))});
+        expect_refusal(2, "fptest: " + line, options);
+    }
+};
+
+TEST_F(ResumedRun, HasOneWholeReportAfterAnInterruption)
+{
+    const std::string before = cut_off(kThreeOfWhichOneSleeps, SIGINT);
+    const Json first = support::events_of(read_file(before), "end").at(0);
+    const Ended ended = resume(kThreeOfWhichOneSleeps, {"--junit", work("junit")});
+    EXPECT_EQ(ended.status, 1) << "as one has failed";
+    EXPECT_EQ(ended.err, "");
+    EXPECT_EQ(without_times(ended.out),
+              "/tmp/scene/plan.xml: 3 items, vendor 0, resumed from /tmp/scene/before\n"
+              "G/Item: failed, result 1, T s: bad\n"
+              "    | first\n"
+              "G/Other: passed, result 0, T s: ok\n"
+              "G/Third: passed, result 0, T s: fine\n"
+              "2 passed, 1 failed, T s\n");
+    EXPECT_THAT(paths_run(), ElementsAre("P/G/Other", "P/G/Third"));
+    EXPECT_THAT(outcomes(), ElementsAre("Item: failed", "Other: passed", "Third: passed"));
+    EXPECT_EQ(end_of(0), first);
+    EXPECT_EQ(events("run").at(0).at("resumed"), before);
+    const Json finish = events("finish").at(0);
+    EXPECT_EQ(finish.at("finished"), true);
+    EXPECT_EQ(finish.at("passed"), 2);
+    const Element suite = parse_xml(junit()).all("testsuite").at(0);
+    EXPECT_EQ(suite.attributes.at("tests"), "3");
+    EXPECT_EQ(suite.attributes.at("failures"), "1");
+    EXPECT_EQ(suite.properties().at("resumed"), before);
+    // what has been completed is complete
+    std::filesystem::rename(work("json"), work("before"));
+    const Ended again = resume(kThreeOfWhichOneSleeps);
+    EXPECT_EQ(again.status, 0);
+    EXPECT_EQ(again.err, "fptest: " + before + ": that run has finished: nothing to do\n");
+    EXPECT_EQ(again.out, "");
+    EXPECT_FALSE(is_there("json"));
+}
+
+TEST_F(ResumedRun, GoesOnAfterTheDeviceHasGoneDown)
+{
+    const std::string before = cut_off(kThreeOfWhichOneSleeps, SIGKILL);
+    std::ofstream(before, std::ios::app) << "{\"event\":\"end\",\"index\":1,\"gro";
+    const Ended ended = resume(kThreeOfWhichOneSleeps, {"--tap"});
+    EXPECT_EQ(ended.status, 1);
+    EXPECT_EQ(ended.err, "fptest: " + before + ": its last line is cut, and left out\n");
+    EXPECT_THAT(outcomes(), ElementsAre("Item: failed", "Other: passed", "Third: passed"));
+    EXPECT_THAT(paths_run(), ElementsAre("P/G/Other", "P/G/Third"));
+    const Tap tap = parse_tap(ended.out);
+    EXPECT_EQ(tap.points.at(0).inside.size(), 3U);
+    EXPECT_THAT(tap.comments, ::testing::Contains("resumed from " + before));
+}
+
+TEST_F(ResumedRun, GoesOnInTheRoundThatWasCutOff)
+{
+    const Items items = {{"Item", kPasses}, {"Other", "report G 100 0 ok await /tmp/scene/go"}};
+    file("go", "");
+    FptestProcess fptest(with_group(items, {"--repeat", "3", "--stop-after", "9"}));
+    ASSERT_TRUE(wait_for_events("end", 1));
+    std::filesystem::remove(work("go"));
+    const auto waits = [&] { return events("start").size() > events("end").size(); };
+    ASSERT_TRUE(eventually(waits, 10));
+    std::this_thread::sleep_for(std::chrono::milliseconds(200));
+    fptest.signal(SIGKILL);
+    fptest.wait();
+    file("go", "");
+    expect_items_to_end();
+    std::filesystem::rename(work("json"), work("before"));
+    std::filesystem::remove(device::kLogFile);
+    const std::size_t ended = support::events_of(read_file(work("before")), "end").size();
+    EXPECT_EQ(resume(items).status, 0);
+    EXPECT_EQ(events("end").size(), 6U);
+    EXPECT_EQ(paths_run().size(), 6 - ended);
+    EXPECT_EQ(events("run").at(0).at("rounds"), 3);
+    EXPECT_EQ(events("run").at(0).at("stop_after"), 9);
+    EXPECT_EQ(events("finish").at(0).at("passed"), 6);
+    EXPECT_EQ(events("finish").at(0).at("summary").at(0).at("run"), 3);
+}
+
+TEST_F(ResumedRun, KeepsAttemptsAndWhatWasExpected)
+{
+    const Items items = {{"Item", "report G 100 1 bad"},
+                         {"Third", "report G 100 1 worse"},
+                         {"Fourth", "report G 100 0 ok once /tmp/scene/once report G 100 1 loose"},
+                         {"Other", "report G 100 0 ok once /tmp/scene/slept sleep 60"}};
+    const std::string expect = file("known", "P/G/Item QM-7\n");
+    cut_off(items, SIGINT, {"--retry", "1", "--expect", expect});
+    const Ended ended = resume(items);
+    EXPECT_EQ(ended.status, 1);
+    EXPECT_THAT(outcomes(),
+                ElementsAre("Item: expected", "Third: failed", "Fourth: flaky", "Other: passed"));
+    EXPECT_EQ(events("retry").size(), 2U);
+    const Json finish = events("finish").at(0);
+    EXPECT_EQ(finish.at("retries"), 2);
+    EXPECT_EQ(finish.at("expected"), 1);
+    EXPECT_THAT(paths_run(), ElementsAre("P/G/Other"));
+}
+
+TEST_F(ResumedRun, HasTheOrderOfTheRunAndListsWhatIsLeft)
+{
+    cut_off(kThreeOfWhichOneSleeps, SIGKILL, {"--shuffle=3"});
+    const auto items = support::events_of(read_file(work("before")), "run").at(0).at("items");
+    const std::size_t done = support::events_of(read_file(work("before")), "end").size();
+    const Ended list = run_fptest({"run", "--list", "--resume", work("before"), "--plan",
+                                   plan(group_of(kThreeOfWhichOneSleeps))});
+    EXPECT_EQ(lines_of(list.out).size(), 3 - done);
+    resume(kThreeOfWhichOneSleeps);
+    EXPECT_EQ(events("run").at(0).at("items"), items);
+    EXPECT_EQ(events("run").at(0).at("seed"), 3);
+}
+
+TEST_F(ResumedRun, RefusesAnotherPlanOrDevice)
+{
+    const std::string before = cut_off(kThreeOfWhichOneSleeps, SIGKILL);
+    expect_refused(before + " is of another plan: it has G/Other and G/Third, and "
+                            "/tmp/scene/plan.xml has not",
+                   {}, {{"Item", kPasses}, {"Fourth", kPasses}});
+    expect_refused(
+        before + " is of another plan: /tmp/scene/plan.xml has other items, or other "
+                 "args; run it anew",
+        {}, {{"Item", kPasses}, {"Other", kPasses}, {"Third", std::string(kPasses) + " say more"}});
+    const std::string text = read_file(before);
+    file("before", std::string(text).replace(text.find("\"vendor\":0"), 10, "\"vendor\":1"));
+    expect_refused(before + " is of vendor 1, and this device's is 0: their items are other "
+                            "programs");
+    EXPECT_THAT(paths_run(), IsEmpty());
+}
+
+TEST_F(ResumedRun, RefusesWhatTheRunBeganWith)
+{
+    cut_off(kThreeOfWhichOneSleeps, SIGKILL);
+    const std::pair<std::string, Lines> given[] = {{"PATH", {"P/G"}},
+                                                   {"--skip", {"--skip", "P/G"}},
+                                                   {"--failed-of", {"--failed-of", "x"}},
+                                                   {"--shuffle", {"--shuffle"}},
+                                                   {"--as-group", {"--as-group"}},
+                                                   {"--repeat", {"--repeat", "2"}},
+                                                   {"--for", {"--for", "1h"}},
+                                                   {"--until-fail", {"--until-fail"}},
+                                                   {"--stop-after", {"--stop-after", "1"}},
+                                                   {"--retry", {"--retry", "1"}},
+                                                   {"--pass-code", {"--pass-code", "1"}}};
+    for (const auto &[name, options] : given) {
+        expect_refused("--resume goes on with a run as it was begun: leave " + name + " out",
+                       options);
+    }
+    const Ended same = run_fptest({"run", "--resume", work("before"), "--json", work("before")});
+    EXPECT_EQ(same.status, 2);
+    EXPECT_FALSE(read_file(work("before")).empty());
+}
+
+} // namespace
