@@ -11,9 +11,11 @@
 #include <cstdlib>
 #include <cstring>
 #include <fcntl.h>
+#include <filesystem>
 #include <fmt/core.h>
 #include <string_view>
 #include <sys/stat.h>
+#include <system_error>
 #include <unistd.h>
 
 namespace fptest
@@ -23,7 +25,7 @@ namespace
 
 constexpr char kLogVariable[] = "VR_LOG_FILE";
 
-// The library's process has descriptors of its own.
+// The library's process has descriptors of its own, and items have directories of their own.
 std::string for_all_processes(const std::string &file)
 {
     static constexpr std::pair<std::string_view, std::string_view> kOwn[] = {
@@ -33,7 +35,9 @@ std::string for_all_processes(const std::string &file)
             return fmt::format("/proc/{}/fd/{}{}", getpid(), number, file.substr(name.size()));
         }
     }
-    return file;
+    std::error_code unknown;
+    const std::string whole = std::filesystem::absolute(file, unknown);
+    return unknown ? file : whole;
 }
 
 // Kept open, or a FIFO's reader would see its end before the library writes.

@@ -353,6 +353,16 @@ TEST_F(Output, LogIsNotStandardOutput)
 }
 
 // In the library's process it would be where items print.
+TEST_F(Output, LogIsTheSameFileForItemsInOtherDirectories)
+{
+    plan(group_of({{"Item", "say x >/dev/null; cd /; /system/bin/Item report G 100 0 fine"}}));
+    const Ended ended = run_program(
+        {"/system/bin/sh", "-c",
+         "cd " + work("") + "; exec '" FPTEST_PROGRAM "' run --log log --plan plan.xml P/G"});
+    EXPECT_EQ(ended.status, 0) << ended.out;
+    EXPECT_THAT(read_file(work("log")), HasSubstr("FPTEST_SetTransation"));
+}
+
 TEST_F(Output, LogThatIsCutIsIncomplete)
 {
     Start start;
