@@ -295,7 +295,7 @@ std::vector<Leftover> Runner::processes_of(const RunningItem &active)
 
 std::vector<Leftover> Runner::note_left_running(std::size_t element)
 {
-    const std::vector<Leftover> found = still_found([this] { return item_processes(); });
+    std::vector<Leftover> found = still_found([this] { return item_processes(); });
     if (!found.empty()) {
         left_.insert(left_.end(), found.begin(), found.end());
         left_elements_.push_back(element);
