@@ -191,6 +191,9 @@ void ReportReader::begin_gathering()
         return;
     }
     RunningItem &active = running_.items.back();
+    if (!active.gatherer_end.empty() || active.stop) {
+        return; // the command was released in its place
+    }
     active.reporting.expected = true;
     active.reporting.gathering = true;
     const auto plan = whole_stored_plan().annotated;

@@ -127,6 +127,23 @@ bool Runner::run(const Job &job)
         return false;
     }
     library_gone_.clear();
+    run_command(job);
+    if (missed_gatherer_ && !broken_ && goes_on()) {
+        gatherer_runs_ = note_gatherer();
+        run_command(job);
+    }
+    missed_gatherer_ = false;
+    settle_directories();
+    if (!broken_) {
+        require_all_started();
+        require_plan();
+    }
+    notify_ended();
+    return run_.why_unfinished.empty();
+}
+
+void Runner::run_command(const Job &job)
+{
     std::vector<std::string> names;
     for (const auto &target : job.targets) {
         if (target) {
@@ -152,13 +169,6 @@ bool Runner::run(const Job &job)
         }
         watch();
     }
-    settle_directories();
-    if (!broken_) {
-        require_all_started();
-        require_plan();
-    }
-    notify_ended();
-    return run_.why_unfinished.empty();
 }
 
 // One for each target.
@@ -389,12 +399,14 @@ void Runner::start_next(const LibraryProcess::Event &event)
         active.stop_wanted_at = now();
     }
     running_.items.push_back(active);
-    item_at(run_, active.place).start =
-        std::chrono::system_clock::now() -
-        std::chrono::duration_cast<std::chrono::system_clock::duration>(SteadyClock::now() -
-                                                                        event.time);
-    for (Reporter *reporter : reporters_) {
-        reporter->started(run_, active.place);
+    if (!missed_gatherer_) {
+        item_at(run_, active.place).start =
+            std::chrono::system_clock::now() -
+            std::chrono::duration_cast<std::chrono::system_clock::duration>(SteadyClock::now() -
+                                                                            event.time);
+        for (Reporter *reporter : reporters_) {
+            reporter->started(run_, active.place);
+        }
     }
     if (vendor_ != run_.vendor) {
         append_output(item_at(run_, active.place).output,
@@ -463,6 +475,14 @@ void Runner::move_on(const LibraryProcess::Event &event)
     reader_.read(event.kind == LibraryProcess::Event::Kind::returned
                      ? Plan::parse_annotated(library_.read_back())
                      : whole_stored_plan().annotated);
+    // One that gathers once was still ending when the library took it for the gatherer, and
+    // started none. With other items in its command, these would run twice.
+    if (active.gathers && !active.gatherer_end.empty() && !active.starts_gatherer && !active.stop &&
+        running_.job.targets.size() == 1 && !missed_gatherer_) {
+        missed_gatherer_ = true;
+        running_.items.pop_back();
+        return;
+    }
     if (!active.gathers || !active.gatherer_end.empty()) {
         finish(active, active.moved_on_at);
         notify_ended();
@@ -499,8 +519,12 @@ void Runner::finish(RunningItem &active, TimePoint end)
     if (active.gathers && running_.items.size() == 1 &&
         running_.next >= running_.job.targets.size()) {
         result.left_running = note_left_running(active.element);
-        const std::vector<Leftover> left = left_by_gatherer();
-        result.left_running.insert(result.left_running.end(), left.begin(), left.end());
+        for (const Leftover &one : left_by_gatherer()) {
+            if (std::ranges::find(result.left_running, one.process, &Leftover::process) ==
+                result.left_running.end()) {
+                result.left_running.push_back(one);
+            }
+        }
     }
     if (active.gathers && !has_finished(result.report)) {
         gatherer_may_report_late_ = true;

@@ -88,6 +88,7 @@ class Runner
     void move_on(const LibraryProcess::Event &event);
     void drain_events();
     void lose_library(const LibraryProcess::Event &event);
+    void run_command(const Job &job);
     std::vector<std::string> make_directories(const Job &job);
     void settle_directories();
     void require_all_started();
@@ -151,6 +152,7 @@ class Runner
     bool gatherer_runs_ = false;            // before the job's next item
     bool gatherer_may_report_late_ = false; // it was triggered and has not reported
     std::string library_gone_;              // why, if its process ended in this job
+    bool missed_gatherer_ = false;          // the command is run once more to start one
     bool broken_ = false;
 };
 

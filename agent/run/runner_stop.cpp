@@ -42,6 +42,18 @@ std::string described(const std::vector<Leftover> &processes)
     return join_and(all);
 }
 
+// Those that do not end at once.
+template <typename Find> std::vector<Leftover> still_found(const Find &find)
+{
+    std::vector<Leftover> found = find();
+    for (const auto begin = std::chrono::steady_clock::now();
+         !found.empty() && std::chrono::steady_clock::now() - begin < kEnding;) {
+        std::this_thread::sleep_for(10ms);
+        found = find();
+    }
+    return found;
+}
+
 } // namespace
 
 void Runner::read_signals()
@@ -272,7 +284,8 @@ std::vector<Leftover> Runner::gatherer_processes()
 // What is left of one that has ended, or has another name now.
 std::vector<Leftover> Runner::left_by_gatherer()
 {
-    return found_as_gatherer() ? std::vector<Leftover>() : gatherer_processes();
+    return still_found(
+        [this] { return found_as_gatherer() ? std::vector<Leftover>() : gatherer_processes(); });
 }
 
 std::vector<Leftover> Runner::processes_of(const RunningItem &active)
@@ -282,12 +295,7 @@ std::vector<Leftover> Runner::processes_of(const RunningItem &active)
 
 std::vector<Leftover> Runner::note_left_running(std::size_t element)
 {
-    std::vector<Leftover> found = item_processes();
-    for (const auto begin = SteadyClock::now();
-         !found.empty() && SteadyClock::now() - begin < kEnding;) {
-        std::this_thread::sleep_for(kTurn);
-        found = item_processes();
-    }
+    std::vector<Leftover> found = still_found([this] { return item_processes(); });
     if (!found.empty()) {
         left_.insert(left_.end(), found.begin(), found.end());
         left_elements_.push_back(element);

@@ -56,6 +56,9 @@ class Judge
         if (!has_reported || reporting_.lost) {
             return {Outcome::no_result, why_silent()};
         }
+        if (active_.gathers && !active_.gatherer_end.empty() && !reporting_.gathering) {
+            return {Outcome::failed, active_.gatherer_end + though_reported(), true};
+        }
         if (active_.gathers && report_.progress != "100") {
             const bool has_ended = !active_.gatherer_end.empty();
             return {Outcome::failed,

@@ -4,7 +4,6 @@
 #include "util/sha256.h"
 
 #include <array>
-#include <bit>
 #include <cstddef>
 #include <cstdint>
 #include <fmt/core.h>
@@ -31,9 +30,15 @@ constexpr std::array<Word, 64> kRoots{
 
 using Digest = std::array<Word, 8>;
 
-Word spread(Word word, int one, int two, int three)
+// C++ libraries do not agree on the type of std::rotr()'s count.
+Word rotated(Word word, unsigned count)
 {
-    return std::rotr(word, one) ^ std::rotr(word, two) ^ std::rotr(word, three);
+    return word >> count | word << (32U - count);
+}
+
+Word spread(Word word, unsigned one, unsigned two, unsigned three)
+{
+    return rotated(word, one) ^ rotated(word, two) ^ rotated(word, three);
 }
 
 void add_block(Digest &state, std::string_view block)
@@ -46,8 +51,8 @@ void add_block(Digest &state, std::string_view block)
         const Word early = words[at - 15];
         const Word late = words[at - 2];
         words[at] = words[at - 16] + words[at - 7] +
-                    (std::rotr(early, 7) ^ std::rotr(early, 18) ^ early >> 3U) +
-                    (std::rotr(late, 17) ^ std::rotr(late, 19) ^ late >> 10U);
+                    (rotated(early, 7) ^ rotated(early, 18) ^ early >> 3U) +
+                    (rotated(late, 17) ^ rotated(late, 19) ^ late >> 10U);
     }
     auto [a, b, c, d, e, f, g, h] = state;
     for (std::size_t at = 0; at < words.size(); ++at) {

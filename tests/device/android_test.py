@@ -102,8 +102,8 @@ def test_a_process_has_its_name_with_or_without_a_path(items, release, program, 
 
 @pytest.mark.parametrize("release", RELEASES)
 def test_a_zombie_has_the_kernels_name(release):
-    _, out, _ = answer(release, "(sleep 0 & echo $!; exec sleep 1) | { read -r pid; "
-                       "sleep 1; ps $pid; }")
+    _, out, _ = answer(release, "(sleep 0 & echo $!; exec sleep 2) | { read -r pid; "
+                       "sleep 0.8; ps $pid; }")
 
     assert names(out) == ["sleep" if release in TOOLBOX else "[sleep]"]
 
