@@ -173,6 +173,9 @@ std::vector<Process> processes()
         process.pid = std::stoi(number);
         process.state = stat[close + 2];
         process.parent = std::stoi(stat.substr(close + 4));
+        if (process.state == 'Z' && process.parent == 1) {
+            continue; // it has ended; init collects it when it gets to it
+        }
         process.name = read_file(entry.path() / "cmdline").c_str();
         if (process.name.empty()) {
             process.name = stat.substr(open + 1, close - open - 1);
