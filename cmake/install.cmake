@@ -106,6 +106,8 @@ else()
   if(QUILLMARK_BUILD_TOOLS)
     install(FILES ${PROJECT_SOURCE_DIR}/docs/fptest.1
       DESTINATION ${CMAKE_INSTALL_MANDIR}/man1 COMPONENT fptest)
+    install(FILES ${PROJECT_SOURCE_DIR}/docs/fptest-results.5
+      DESTINATION ${CMAKE_INSTALL_MANDIR}/man5 COMPONENT fptest)
   endif()
   install(FILES ${PROJECT_SOURCE_DIR}/docs/quillmark-plan.5
     DESTINATION ${CMAKE_INSTALL_MANDIR}/man5 COMPONENT fptest)

@@ -40,7 +40,7 @@ foreach(package runtime:libquillmark1 development:libquillmark-dev fptest:fptest
   quillmark_install_compressed(
     ${packaging}/changelog ${documents} changelog.Debian ${component})
 endforeach()
-foreach(page fptest.1 quillmark-plan.5)
+foreach(page fptest.1 fptest-results.5 quillmark-plan.5)
   string(REGEX MATCH "[0-9]$" section ${page})
   quillmark_install_compressed(
     ${PROJECT_SOURCE_DIR}/docs/${page} ${CMAKE_INSTALL_MANDIR}/man${section} ${page} fptest)

@@ -16,8 +16,8 @@ namespace fptest
 {
 
 // One JSON object per line and event, flushed; the path "-" is standard output. The
-// events and their keys are in fptest(1). A run without "finish" was cut off; one that
-// ended early has it, with "finished":false, and an "end" for each item of the round
+// events and their keys are in fptest-results(5). A run without "finish" was cut off; one
+// that ended early has it, with "finished":false, and an "end" for each item of the round
 // that was not run.
 std::unique_ptr<Reporter> make_json_reporter(const std::string &path);
 

@@ -35,6 +35,7 @@ libexec/quillmark/bin/ps
 share/bash-completion/completions/fptest
 share/doc/quillmark/LICENSE
 share/man/man1/fptest.1
+share/man/man5/fptest-results.5
 share/man/man5/quillmark-plan.5
 """
 os.environ.pop("LD_LIBRARY_PATH", None)
