@@ -39,7 +39,7 @@ struct RunOptions {
     std::string junit; // files, "-" for standard output; empty for none
     std::string json;
     std::string log;
-    std::string files; // a directory for those of items; empty for none
+    std::string files;               // a directory for those of items; empty for none
     std::vector<std::string> labels; // KEY=VALUE
     bool plain = false;              // lines, also on a terminal
     std::string hangup = "stop";     // or "go-on"

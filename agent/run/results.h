@@ -52,8 +52,8 @@ struct ItemRun {
     std::string directory = {};          // for its files; empty if there is none
     std::vector<std::string> files = {}; // that it has left there, by their paths below it
     std::string warning = {};            // about its measurements or files
-    std::string expected = {};         // why it is known to fail; empty if it is not
-    std::vector<ItemRun> earlier = {}; // attempts, which did not pass
+    std::string expected = {};           // why it is known to fail; empty if it is not
+    std::vector<ItemRun> earlier = {};   // attempts, which did not pass
 };
 
 // Whether the run is none the worse for it: it passed, if not at once, or failed as expected.

@@ -391,9 +391,8 @@ TEST_F(Fptest, HasAManualPageOfItsResults)
     expect_no_complaints("fptest-results.5");
     const std::string text = manual("fptest-results.5");
     EXPECT_THAT(text, StartsWith("FPTEST-RESULTS(5)"));
-    for (const std::string word :
-         {"timed out", "not run", "unexpected", "left_running", "flakyFailure", "ATTACHMENT",
-          "# TODO", "UTF-8", "fptest(1)"}) {
+    for (const std::string word : {"timed out", "not run", "unexpected", "left_running",
+                                   "flakyFailure", "ATTACHMENT", "# TODO", "UTF-8", "fptest(1)"}) {
         EXPECT_THAT(text, HasSubstr(word)) << word;
     }
 }
