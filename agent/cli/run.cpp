@@ -23,6 +23,7 @@
 #include "run/planner.h"
 #include "run/rounds.h"
 #include "run/runner.h"
+#include "util/file_lock.h"
 #include "util/files.h"
 #include "util/text.h"
 #include "util/write.h"
@@ -223,6 +224,14 @@ Run run_of(const RunOptions &options, const std::string &plan, int vendor)
     return run;
 }
 
+void choose_log_of_run(const std::string &option)
+{
+    choose_log(option);
+    if (!lock_log()) {
+        throw Failure(Cause::input, "{}", locked_text(label(log_file(option))));
+    }
+}
+
 // A list asks nothing of the device but its vendor.
 void choose_ps_for(const RunOptions &options)
 {
@@ -268,7 +277,7 @@ Exit run(RunOptions options)
     const std::optional<int> seed = seed_of(options);
     const RoundPlan round = chosen_round(options, checked, earlier, seed);
     require_writable_results(options);
-    choose_log(options.log);
+    choose_log_of_run(options.log);
     if (options.hangup == "go-on") {
         std::signal(SIGHUP, SIG_IGN);
     }
