@@ -4,6 +4,7 @@
 #include "check/wellformed.h"
 
 #include "plan/markup.h"
+#include "util/text.h"
 
 #include <algorithm>
 #include <cctype>
@@ -26,13 +27,17 @@ void XMLCALL stop_at_entity(void *parser, const XML_Char *, int, const XML_Char 
     XML_StopParser(static_cast<XML_Parser>(parser), XML_FALSE);
 }
 
-// What to parse it as, whatever it declares; null for what it declares. Into a plan that was
-// declared to be in ASCII the library saves reports in UTF-8.
+// What to parse it as, whatever it declares; null for what it declares. The library reads
+// UTF-8, and saves reports so.
 const char *imposed_encoding(std::string_view text)
 {
-    const std::string_view ascii = "us-ascii";
-    const auto is_same = [](char one, char other) { return std::tolower(one) == other; };
-    return std::ranges::equal(declared_encoding(text), ascii, is_same) ? "UTF-8" : nullptr;
+    const auto declares = [declared = declared_encoding(text)](std::string_view name) {
+        const auto is_same = [](char one, char other) { return std::tolower(one) == other; };
+        return std::ranges::equal(declared, name, is_same);
+    };
+    const bool is_read_as_declared =
+        !declares("us-ascii") && (!declares("iso-8859-1") || first_not_utf8(text) != text.npos);
+    return is_read_as_declared ? nullptr : "UTF-8";
 }
 
 } // namespace

@@ -8,6 +8,7 @@
 #include "reporters/reporters.h"
 #include "run/item_files.h"
 #include "util/failure.h"
+#include "util/file_lock.h"
 #include "util/files.h"
 #include "util/text.h"
 
@@ -32,13 +33,6 @@ std::vector<std::string> results_on_standard_output(const RunOptions &options)
         }
     }
     return results;
-}
-
-bool is_regular_file(int descriptor)
-{
-    struct stat status {
-    };
-    return fstat(descriptor, &status) == 0 && S_ISREG(status.st_mode);
 }
 
 } // namespace
@@ -81,6 +75,11 @@ void resolve_output_conflicts(RunOptions &options)
 
 void require_writable_results(const RunOptions &options)
 {
+    for (const std::string &file : {options.json, options.junit}) {
+        if (!file.empty() && file != "-" && is_locked(file)) {
+            throw Failure(Cause::input, "{}", locked_text(one_line(file)));
+        }
+    }
     for (const std::string &obstacle :
          {options.json.empty() ? "" : json_obstacle(options.json),
           options.junit.empty() ? "" : junit_obstacle(options.junit),

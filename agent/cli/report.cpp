@@ -82,11 +82,25 @@ std::size_t find_item(const Plan &plan, const ReportOptions &options)
     return item->number;
 }
 
+// An item cannot help its run's log, and the report is worth more.
+void choose_log_of_report(const std::string &option)
+{
+    try {
+        choose_log(option, !option.empty());
+    } catch (const Failure &failure) {
+        if (!option.empty()) {
+            throw;
+        }
+        say("{}; this report has no log", failure.what());
+        choose_log("/dev/null");
+    }
+}
+
 Exit report(const ReportOptions &options)
 {
     require_log_of_its_own(options.log, StdoutUse::nothing);
-    choose_log(options.log, !options.log.empty()); // an item cannot help its run's log
-    mend_stored_plan();                            // an earlier report may have spoiled it
+    choose_log_of_report(options.log);
+    mend_stored_plan(); // an earlier report may have spoiled it
     const Descriptor lock = lock_stored_plan();
     std::string text =
         require_stored_plan(", so nothing can be reported: store one with fptest run --plan FILE");

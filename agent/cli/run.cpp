@@ -23,6 +23,7 @@
 #include "run/planner.h"
 #include "run/rounds.h"
 #include "run/runner.h"
+#include "util/file_lock.h"
 #include "util/files.h"
 #include "util/text.h"
 #include "util/write.h"
@@ -100,21 +101,26 @@ std::vector<std::string> names_of(const RoundPlan &round)
     return names;
 }
 
-// Whether a gatherer runs that may save another plan than this with its next report, or may
-// still work for a run that was killed.
-bool has_gatherer_of_another_plan(const std::string &text, int vendor)
+// Why a gatherer that runs is ended before this plan is stored; empty if it may go on. It may
+// save an earlier plan with its next report, or still work for a run that was killed.
+std::string why_gatherer_is_ended(const std::string &text, int vendor)
 {
+    if (ChildProcesses(getpid(), getpid(), vendor).of_gatherer().empty()) {
+        return {};
+    }
     const std::string earlier = read_stored_plan().value_or("");
-    return !earlier.empty() && !ChildProcesses(getpid(), getpid(), vendor).of_gatherer().empty() &&
-           (has_marks(earlier) || !is_same_plan(earlier, text));
+    if (!earlier.empty() && (has_marks(earlier) || !is_same_plan(earlier, text))) {
+        return "it may have kept an earlier plan, and would write it back";
+    }
+    return is_gatherer_outdated() ? "its program has been replaced since it started" : "";
 }
 
 // The library starts no gatherer beside one that runs, whatever the plan says.
-void report_other_gatherer(const RoundPlan &round, const Plan &plan, int vendor, bool is_ended)
+void report_other_gatherer(const RoundPlan &round, const Plan &plan, int vendor,
+                           const std::string &why_ended)
 {
-    if (is_ended) {
-        say("the running gatherer is ended first: it may have kept an earlier plan, and would "
-            "write it back");
+    if (!why_ended.empty()) {
+        say("the running gatherer is ended first: {}", why_ended);
         return;
     }
     std::vector<std::string> args;
@@ -218,6 +224,14 @@ Run run_of(const RunOptions &options, const std::string &plan, int vendor)
     return run;
 }
 
+void choose_log_of_run(const std::string &option)
+{
+    choose_log(option);
+    if (!lock_log()) {
+        throw Failure(Cause::input, "{}", locked_text(label(log_file(option))));
+    }
+}
+
 // A list asks nothing of the device but its vendor.
 void choose_ps_for(const RunOptions &options)
 {
@@ -263,7 +277,7 @@ Exit run(RunOptions options)
     const std::optional<int> seed = seed_of(options);
     const RoundPlan round = chosen_round(options, checked, earlier, seed);
     require_writable_results(options);
-    choose_log(options.log);
+    choose_log_of_run(options.log);
     if (options.hangup == "go-on") {
         std::signal(SIGHUP, SIG_IGN);
     }
@@ -281,10 +295,11 @@ Exit run(RunOptions options)
     const bool is_sent = checked.storing != Storing::as_file;
     const bool is_placed = !is_sent && !options.plan.empty();
     Runner::Options for_runner = runner_options(options);
-    for_runner.ends_gatherer =
-        has_gatherer_of_another_plan(is_sent ? checked.stored : checked.text, vendor);
+    const std::string why_ended =
+        why_gatherer_is_ended(is_sent ? checked.stored : checked.text, vendor);
+    for_runner.ends_gatherer = !why_ended.empty();
     if (!options.quiet) {
-        report_other_gatherer(round, plan, vendor, for_runner.ends_gatherer);
+        report_other_gatherer(round, plan, vendor, why_ended);
     }
     if (is_sent || is_placed) {
         const std::string &stored = is_sent ? checked.stored : checked.text;

@@ -6,6 +6,7 @@
 #include "module/preflight.h"
 #include "plan/library_rules.h"
 #include "util/failure.h"
+#include "util/file_lock.h"
 #include "util/text.h"
 #include "util/times.h"
 #include "util/write.h"
@@ -71,8 +72,7 @@ std::string read_start(const Descriptor &file)
     return buffer.data();
 }
 
-// The process that holds the note; 0 if none does. Unlike flock(), such a lock is not passed
-// on by fork() to the library's process, which outlives a run that is killed.
+// The process that holds the note; 0 if none does.
 pid_t holder_of(const Descriptor &note)
 {
     struct flock asked {
@@ -130,12 +130,8 @@ DeviceLock::DeviceLock(const RunNote &note) : directory_(open_data())
     }
     unlink(kNote); // of one that was killed
     note_ = Descriptor(open(kNote, O_RDWR | O_CREAT | O_EXCL | O_CLOEXEC, 0666));
-    struct flock held {
-    };
-    held.l_type = F_WRLCK;
-    held.l_whence = SEEK_SET;
     if (note_.is_open()) {
-        fcntl(note_.get(), F_SETLK, &held);
+        lock_file(note_.get());
         tell(note);
     }
 }

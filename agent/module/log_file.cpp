@@ -5,6 +5,7 @@
 
 #include "common/descriptor.h"
 #include "util/failure.h"
+#include "util/file_lock.h"
 #include "util/text.h"
 
 #include <cerrno>
@@ -94,6 +95,15 @@ void choose_log(const std::string &option, bool reports_loss)
     }
     opened() = {std::move(log), reports_loss ? label(file) : ""};
     setenv(kLogVariable, path.c_str(), 1);
+}
+
+bool lock_log()
+{
+    if (lock_file(opened().descriptor.get())) {
+        return true;
+    }
+    opened() = {}; // its loss is the other's
+    return false;
 }
 
 std::string log_loss()

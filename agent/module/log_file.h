@@ -22,6 +22,9 @@ NamedFile log_file(const std::string &option);
 // nothing if that is not wanted.
 void choose_log(const std::string &option, bool reports_loss = true);
 
+// Locks the log's file, for no other fptest to write it. False if one does.
+bool lock_log();
+
 // Why the log's file is incomplete, which the library does not report; empty if it is complete.
 std::string log_loss();
 

@@ -259,6 +259,20 @@ std::optional<std::pair<std::string, pid_t>> found_as_gatherer()
     return std::nullopt;
 }
 
+// What runs under another name, as a script's shell does, cannot be compared.
+bool is_gatherer_outdated()
+{
+    const auto found = found_as_gatherer();
+    const std::string file = found ? fmt::format("/proc/{}/exe", found->second) : "";
+    std::error_code unknown;
+    return found &&
+           std::filesystem::read_symlink(file, unknown)
+               .filename()
+               .string()
+               .starts_with(kGatherer) &&
+           !std::filesystem::equivalent(found->first, file, unknown) && !unknown;
+}
+
 std::vector<Leftover> ChildProcesses::of_items(const std::vector<Leftover> &left_out) const
 {
     const Processes processes = read_family(ancestor_, vendor_);

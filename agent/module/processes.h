@@ -20,6 +20,8 @@ namespace fptest
 bool is_found_as_gatherer(pid_t process);
 // Any such process, started by its whole path.
 std::optional<std::pair<std::string, pid_t>> found_as_gatherer();
+// Whether such a process still runs a program in whose place another file is now.
+bool is_gatherer_outdated();
 
 // Whether a stop would find a process by one of these names, of which it gives ps the first
 // characters.

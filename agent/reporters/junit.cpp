@@ -7,6 +7,7 @@
 #include "reporters/junit_document.h"
 #include "reporters/wording.h"
 #include "reporters/writer.h"
+#include "util/file_lock.h"
 #include "util/files.h"
 #include "util/write.h"
 
@@ -131,10 +132,15 @@ class JunitReporter : public Reporter
 
     void begin(const Run &run) override
     {
+        bool is_new = false;
         if (path_ == "-") {
             direct_.emplace("standard output", STDOUT_FILENO);
         } else if (is_replaceable(path_)) {
             target_ = end_of_links(path_);
+            is_new = access(target_.c_str(), F_OK) != 0;
+            if (!take_target()) {
+                return;
+            }
         } else {
             direct_.emplace(path_, O_WRONLY | O_APPEND, 0);
         }
@@ -143,6 +149,9 @@ class JunitReporter : public Reporter
         }
         if (!direct_) {
             replace(run);
+        }
+        if (is_new && !failure_.empty()) {
+            unlink(target_.c_str());
         }
     }
 
@@ -248,6 +257,28 @@ class JunitReporter : public Reporter
         tick(run);
     }
 
+    // Locked before anything of it is replaced, and whenever it is.
+    bool take_target()
+    {
+        struct stat taken {
+        };
+        struct stat named {
+        };
+        do { // another fptest may just have replaced it
+            lock_ = Descriptor(open(target_.c_str(), O_WRONLY | O_CREAT | O_CLOEXEC, 0666));
+            if (!lock_.is_open()) {
+                fail();
+                return false;
+            }
+            if (!lock_file(lock_.get())) {
+                failure_ = locked_text(path_);
+                return false;
+            }
+        } while (fstat(lock_.get(), &taken) == 0 && stat(target_.c_str(), &named) == 0 &&
+                 taken.st_ino != named.st_ino);
+        return true;
+    }
+
     // The more there is to write, the less often, so as not to hold up a long run.
     void replace(const Run &run)
     {
@@ -263,14 +294,15 @@ class JunitReporter : public Reporter
         next_ = end + std::max<Clock::duration>(std::chrono::seconds(1), 20 * (end - start));
     }
 
-    bool replace_file(const Run &run) const
+    bool replace_file(const Run &run)
     {
         const std::string aside = aside_of(target_);
         const int flags = O_WRONLY | O_CREAT | O_TRUNC | O_NOFOLLOW | O_CLOEXEC;
-        const Descriptor file(open(aside.c_str(), flags, 0666));
+        Descriptor file(open(aside.c_str(), flags, 0666));
         if (!file.is_open()) {
             return false;
         }
+        lock_file(file.get());
         struct stat old {
         };
         if (stat(target_.c_str(), &old) == 0) {
@@ -280,6 +312,7 @@ class JunitReporter : public Reporter
             return write_text(file.get(), text) == text.size();
         });
         if (is_written && std::rename(aside.c_str(), target_.c_str()) == 0) {
+            lock_ = std::move(file);
             return true;
         }
         const int error = errno;
@@ -313,6 +346,7 @@ class JunitReporter : public Reporter
 
     std::string path_;
     std::string target_;
+    Descriptor lock_{-1};          // of the target, as long as it is open
     std::optional<Writer> direct_; // in place of a target
     Spool spool_;
     std::optional<off_t> rest_;    // where the rest of the document begins in the spool

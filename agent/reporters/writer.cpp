@@ -4,6 +4,8 @@
 #include "reporters/writer.h"
 
 #include "common/descriptor.h"
+#include "util/file_lock.h"
+#include "util/files.h"
 #include "util/write.h"
 
 #include <chrono>
@@ -24,13 +26,6 @@ namespace
 
 // A reader that takes longer is no longer waited for.
 constexpr std::chrono::milliseconds kPrompt(100);
-
-bool is_regular(int descriptor)
-{
-    struct stat status {
-    };
-    return fstat(descriptor, &status) == 0 && S_ISREG(status.st_mode);
-}
 
 // Whether opening it may wait for a reader.
 bool may_block(const std::string &path)
@@ -60,13 +55,17 @@ struct Writer::State {
 
     void open()
     {
-        file = Descriptor(::open(name.c_str(), flags, mode));
+        const bool is_emptied = (flags & O_TRUNC) != 0;
+        file = Descriptor(::open(name.c_str(), flags & ~O_TRUNC, mode));
         descriptor = file.get();
-        if (!file.is_open()) {
-            const int error = errno;
-            const std::lock_guard lock(mutex);
-            failure = failure_of(name, error);
+        std::string why = file.is_open() ? "" : failure_of(name, errno);
+        if ((flags & O_CREAT) != 0 && !lock_file(descriptor)) {
+            why = locked_text(name);
+        } else if (is_emptied && is_regular_file(descriptor) && ftruncate(descriptor, 0) != 0) {
+            why = failure_of(name, errno);
         }
+        const std::lock_guard lock(mutex);
+        failure = std::move(why);
     }
 
     void run()
@@ -101,7 +100,7 @@ Writer::Writer(std::string name, int descriptor) : state_(std::make_shared<State
 {
     state_->name = std::move(name);
     state_->descriptor = descriptor;
-    if (!is_regular(descriptor)) {
+    if (!is_regular_file(descriptor)) {
         start();
     }
 }

@@ -20,8 +20,8 @@ class Writer
   public:
     // To a descriptor that stays the caller's; failures call it by the name.
     Writer(std::string name, int descriptor);
-    // To a file, opened with these flags, O_APPEND among them. With O_CREAT, a text that
-    // does not fit into a regular file is taken back.
+    // To a file, opened with these flags, O_APPEND among them. With O_CREAT, a regular file is
+    // locked, and a text that does not fit into it is taken back.
     Writer(const std::string &path, int flags, mode_t mode);
     Writer(const Writer &) = delete;
     Writer &operator=(const Writer &) = delete;

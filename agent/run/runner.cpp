@@ -515,10 +515,13 @@ void Runner::finish(RunningItem &active, TimePoint end)
     result.outcome = verdict.outcome;
     result.reason = verdict.reason;
     result.overruled = verdict.overruled;
-    // the library may be at the command's next item already, which is not left running
-    if (active.gathers && running_.items.size() == 1 &&
-        running_.next >= running_.job.targets.size()) {
+    // the library may be at the command's next item already, which is not left running; what
+    // the gatherer leaves is named with the last one then
+    const bool is_last = running_.items.size() == 1 && running_.next >= running_.job.targets.size();
+    if (active.gathers && is_last) {
         result.left_running = note_left_running(active.element);
+    }
+    if (is_last && (active.gathers || (running_.job.targets.size() > 1 && !gatherers_.empty()))) {
         for (const Leftover &one : left_by_gatherer()) {
             if (std::ranges::find(result.left_running, one.process, &Leftover::process) ==
                 result.left_running.end()) {

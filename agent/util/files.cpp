@@ -11,6 +11,7 @@
 #include <cstring>
 #include <fcntl.h>
 #include <filesystem>
+#include <sys/stat.h>
 #include <unistd.h>
 
 namespace fptest
@@ -67,6 +68,13 @@ std::optional<std::string> read_file(const std::string &path, int flags)
             return std::nullopt;
         }
     }
+}
+
+bool is_regular_file(int descriptor)
+{
+    struct stat status {
+    };
+    return fstat(descriptor, &status) == 0 && S_ISREG(status.st_mode);
 }
 
 std::string why_unread()

@@ -33,6 +33,8 @@ inline Descriptor memory_file(const char *name, unsigned flags = 0)
     return Descriptor(static_cast<int>(syscall(SYS_memfd_create, name, MFD_CLOEXEC | flags)));
 }
 
+bool is_regular_file(int descriptor);
+
 // Why read_file() has just failed, for a message.
 std::string why_unread();
 

@@ -5,6 +5,9 @@
 #include "gatherer.h"
 
 #include <csignal>
+#include <filesystem>
+
+namespace fs = std::filesystem;
 
 namespace
 {
@@ -72,6 +75,31 @@ TEST_F(EarlierGatherer, IsEndedAsItMayStillWorkForARunThatWasKilled)
     EXPECT_THAT(ended.out, HasSubstr("gathering 1, 64 samples\n"));
     EXPECT_THAT(outcomes(), ElementsAre("SensorProbe: passed"));
     EXPECT_THAT(events("late"), IsEmpty());
+}
+
+TEST_F(EarlierGatherer, IsEndedWhereItsProgramIsAnotherFileNow)
+{
+    const Lines group = with_group({{"SensorProbe", "--group G --seconds 0"}});
+    EXPECT_EQ(run_fptest(group).status, 0);
+    const Ended same = run_fptest(group);
+    EXPECT_EQ(same.err, "");
+    EXPECT_THAT(same.out, HasSubstr("gathering 2, 64 samples\n"));
+
+    ASSERT_TRUE(fs::copy_file(kProbe, work("SensorProbe")));
+    ASSERT_EQ(kill(processes_named(kProbe).at(0).pid, SIGKILL), 0);
+    ASSERT_TRUE(eventually([] { return processes_named(kProbe).empty(); }));
+    const support::Process gatherer(
+        {.arguments = {"sh", "-c",
+                       "exec -a " + std::string(kProbe) + " " + work("SensorProbe") +
+                           " --group G --seconds 0"}});
+    ASSERT_TRUE(eventually([] { return !processes_named(kProbe).empty(); }));
+    fs::remove(work("SensorProbe"));
+    const Ended ended = run_fptest(group);
+    EXPECT_EQ(ended.status, 0);
+    EXPECT_EQ(ended.err, "fptest: the running gatherer is ended first: its program has been "
+                         "replaced since it started\n");
+    EXPECT_THAT(ended.out, HasSubstr("gathering 1, 64 samples\n"));
+    EXPECT_EQ(run_fptest(group).err, "");
 }
 
 TEST_F(EarlierGatherer, MayKeepItsCopyWhileThePlanIsStoredAnew)

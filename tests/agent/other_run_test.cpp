@@ -6,6 +6,7 @@
 #include "run_test.h"
 
 #include <csignal>
+#include <fcntl.h>
 #include <filesystem>
 #include <string>
 #include <sys/stat.h>
@@ -18,6 +19,36 @@ namespace
 
 constexpr char kNote[] = "/data/vorlane/fptest.run";
 constexpr int kBusy = 4;
+
+// Of this process.
+class FileLock
+{
+  public:
+    explicit FileLock(const std::string &path) : file_(open(path.c_str(), O_RDWR | O_CLOEXEC))
+    {
+        struct flock lock = whole();
+        EXPECT_EQ(fcntl(file_.get(), F_SETLK, &lock), 0);
+    }
+    // The process that holds one; 0 for none.
+    static pid_t holder(const std::string &path)
+    {
+        const Descriptor file(open(path.c_str(), O_RDWR | O_CLOEXEC));
+        struct flock lock = whole();
+        EXPECT_EQ(fcntl(file.get(), F_GETLK, &lock), 0);
+        return lock.l_type == F_UNLCK ? 0 : lock.l_pid;
+    }
+
+  private:
+    static struct flock whole()
+    {
+        struct flock lock {
+        };
+        lock.l_type = F_WRLCK;
+        lock.l_whence = SEEK_SET;
+        return lock;
+    }
+    Descriptor file_;
+};
 
 class OtherRun : public RunCommand
 {
@@ -268,6 +299,41 @@ TEST_F(OtherRun, OfAnotherUserIsSeenAndNotStopped)
     EXPECT_FALSE(fptest.has_ended());
     fptest.signal(SIGINT);
     fptest.wait();
+}
+
+// --- another one, on a device that shares a directory ----------------------------
+
+TEST_F(OtherRun, ResultFilesOfOneThatRunsAreRefused)
+{
+    const Lines names = {"--json", "--junit", "--log"};
+    for (const std::string &name : names) {
+        SCOPED_TRACE(name);
+        const std::string path = file("taken", "its");
+        const FileLock others(path);
+        expect_refusal(2,
+                       "fptest: " + (name == "--log" ? "--log " + path : path) +
+                           ": another fptest is writing it; name another file",
+                       {"run", name, path, "--plan", plan(kOnePasses), "P/G"});
+        EXPECT_EQ(read_file(path), "its");
+        EXPECT_EQ(fs::exists(device::kPlanFile), false);
+    }
+}
+
+TEST_F(OtherRun, ResultFilesAreLockedAsLongAsItRuns)
+{
+    const Lines names = {"json", "junit", "log"};
+    FptestProcess fptest(of_a_run({"--junit", work("junit"), "--log", work("log")}));
+    ASSERT_TRUE(wait_for_file("begun"));
+    const auto first = fs::last_write_time(work("junit"));
+    for (const std::string &name : names) {
+        EXPECT_EQ(FileLock::holder(work(name)), fptest.pid()) << name;
+    }
+    EXPECT_TRUE(eventually([&] { return fs::last_write_time(work("junit")) != first; }));
+    EXPECT_EQ(FileLock::holder(work("junit")), fptest.pid());
+    kill_run(fptest);
+    for (const std::string &name : names) {
+        EXPECT_EQ(FileLock::holder(work(name)), 0) << name;
+    }
 }
 
 } // namespace

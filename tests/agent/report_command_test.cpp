@@ -270,6 +270,23 @@ TEST_F(ReportCommand, WritesTheLibrarysLogWhereItIsTold)
     EXPECT_EQ(read_file(device::kLogFile), "");
 }
 
+TEST_F(ReportCommand, IsStoredWhereTheLogOfItsRunCannotBeWritten)
+{
+    Start start{.arguments = {"report", "Bringup", "SpiCheck", "--progress", "1", "--result", "0"}};
+    start.environment["VR_LOG_FILE"] = "/nowhere/log";
+    const Ended ended = run_fptest(start);
+    EXPECT_EQ(ended.status, 0);
+    EXPECT_EQ(ended.err, "fptest: VR_LOG_FILE=/nowhere/log cannot be written: No such file or "
+                         "directory; name another file; this report has no log\n");
+    EXPECT_EQ(row("SpiCheck"), "Bringup SpiCheck 1 0");
+    fptest_runner::expect_refusal(3,
+                                  "fptest: --log /nowhere/log cannot be written: No such file or "
+                                  "directory; name another file",
+                                  {"report", "Bringup", "SpiCheck", "--progress", "2", "--result",
+                                   "0", "--log", "/nowhere/log"});
+    EXPECT_EQ(row("SpiCheck"), "Bringup SpiCheck 1 0");
+}
+
 TEST_F(ReportCommand, LosesNothingOfManyAtTheSameTime)
 {
     std::string plan = "<P><CmdGroup name=\"G\">";

@@ -114,6 +114,10 @@ TEST_F(RunGatherer, WhatIsLeftOfOneThatHasEndedIsNamedAndEndedWithTheRun)
         EXPECT_EQ(ended.status, 0) << ended.err;
         EXPECT_THAT(end_of(0).at("left_running").dump(), HasSubstr("\"sleep\"")) << rest;
         EXPECT_THAT(processes_named("sleep"), IsEmpty()) << rest;
+        run_group({{"SensorProbe", "--help; " + rest}, {"Item", "sleep 0.3 report G 100 0 fine"}},
+                  {"--as-group"});
+        EXPECT_THAT(outcomes(), ElementsAre("SensorProbe: passed", "Item: passed"));
+        EXPECT_THAT(end_of(1).at("left_running").dump(), HasSubstr("\"sleep\"")) << rest;
     }
 }
 
