@@ -78,6 +78,18 @@ TEST_F(OtherRun, StatusNamesProcessItemTimesAndLabels)
     EXPECT_FALSE(fs::exists(kNote));
 }
 
+TEST_F(OtherRun, StatusSaysWhatIsTriedAgain)
+{
+    FptestProcess fptest(with_group(
+        {{"Other", "note /tmp/scene/begun $(test ! -e /tmp/scene/begun || echo sleep 60)"}},
+        {"--retry", "2"}));
+    ASSERT_TRUE(wait_for_events("start", 2));
+    ASSERT_TRUE(wait_for_item("G/Other (attempt 2 of 3)"));
+    EXPECT_THAT(status().out, HasSubstr(" s; 0 passed, 0 failed, 0 flaky, 1 retry; device="));
+    fptest.signal(SIGINT);
+    fptest.wait();
+}
+
 TEST_F(OtherRun, SecondRunIsRefusedAndNamesTheFirst)
 {
     FptestProcess fptest(of_a_run());
