@@ -33,8 +33,8 @@ class NoteReporter : public Reporter
     {
         const ItemRun &item = item_at(run, place);
         note_.item_begun = std::chrono::steady_clock::now();
-        tell(run, title(run, item) +
-                      (item.earlier.empty() ? "" : " (" + attempt_of(run, item) + ")"));
+        tell(run,
+             title(run, item) + (item.earlier.empty() ? "" : " (" + attempt_of(run, item) + ")"));
     }
 
     void ended(const Run &run, Place /* place */) override

@@ -4,13 +4,11 @@
 #include "run/earlier_run.h"
 
 #include "util/failure.h"
+#include "util/input_file.h"
 #include "util/text.h"
 
-#include <cerrno>
 #include <csignal>
-#include <cstring>
 #include <ctime>
-#include <fstream>
 #include <nlohmann/json.hpp>
 #include <optional>
 #include <stdexcept>
@@ -23,12 +21,27 @@ namespace
 using Object = nlohmann::json;
 
 constexpr int kFormatRead = 2;
+constexpr int kMostRounds = 1'000'000;
+constexpr int kMostRetries = 100;
 
 template <typename Value> std::optional<Value> value_or_none(const Object &object, const char *key)
 {
     const auto found = object.find(key);
     return found == object.end() || found->is_null() ? std::nullopt
                                                      : std::optional(found->get<Value>());
+}
+
+// A whole number that fptest takes for the option, or none.
+std::optional<int> number_or_none(const Object &object, const char *key, int low, int high)
+{
+    const auto found = object.find(key);
+    if (found == object.end() || found->is_null()) {
+        return std::nullopt;
+    }
+    if (!found->is_number_integer() || *found < low || *found > high) {
+        throw std::runtime_error(fmt::format("{} is {}", in_quotes(key), found->dump()));
+    }
+    return found->get<int>();
 }
 
 std::string text_of(const Object &object, const char *key)
@@ -117,13 +130,16 @@ class EarlierRunReader
         earlier_.file = one_line(file);
     }
 
-    EarlierRun read(std::istream &lines)
+    EarlierRun read(LineReader lines)
     {
         std::string line;
-        bool is_more = static_cast<bool>(std::getline(lines, line));
+        bool is_more = lines.next(line);
+        if (!is_more) {
+            throw Failure(Cause::input, "{} is empty: nothing is known of that run", earlier_.file);
+        }
         for (number_ = 1; is_more; ++number_) {
             Object object = Object::parse(line, nullptr, false);
-            is_more = static_cast<bool>(std::getline(lines, line));
+            is_more = lines.next(line);
             earlier_.is_cut = object.is_discarded() && !is_more;
             if (earlier_.is_cut) {
                 break;
@@ -153,6 +169,8 @@ class EarlierRunReader
                 begin(object, event);
             } else if (!object.is_object()) {
                 throw std::runtime_error("it is no JSON object");
+            } else if (event == "run") {
+                throw std::runtime_error("another run begins here");
             } else if (event == "start") {
                 running_.insert(index_of(object));
             } else if (event == "retry") {
@@ -184,12 +202,12 @@ class EarlierRunReader
         run.plan = object.at("plan");
         run.identity.plan_digest = value_or_none<std::string>(object, "plan_digest").value_or("");
         run.vendor = object.at("vendor");
-        run.rounds = value_or_none<int>(object, "rounds");
+        run.rounds = number_or_none(object, "rounds", 1, kMostRounds);
         run.time_limit = value_or_none<double>(object, "time_limit");
         run.until_fail = object.at("until_fail");
-        run.pass_code = object.at("pass_code");
-        run.stop_after = value_or_none<int>(object, "stop_after");
-        run.retries = value_or_none<int>(object, "retries").value_or(0);
+        run.pass_code = number_or_none(object, "pass_code", -2, 1).value_or(0);
+        run.stop_after = number_or_none(object, "stop_after", 1, kMostRounds);
+        run.retries = number_or_none(object, "retries", 0, kMostRetries).value_or(0);
         run.seed = value_or_none<int>(object, "seed");
         for (const Object &item : object.at("items")) {
             earlier_.items.emplace_back(item.at("group"), item.at("item"));
@@ -270,15 +288,7 @@ class EarlierRunReader
 
 EarlierRun read_earlier_run(const std::string &file)
 {
-    std::ifstream lines(file);
-    if (!lines || lines.peek() == std::ifstream::traits_type::eof()) {
-        const int error = errno;
-        if (!lines.is_open() || lines.bad()) {
-            throw Failure(Cause::input, "{}: {}", one_line(file), std::strerror(error));
-        }
-        throw Failure(Cause::input, "{} is empty: nothing is known of that run", one_line(file));
-    }
-    return EarlierRunReader(file).read(lines);
+    return EarlierRunReader(file).read(LineReader(file));
 }
 
 void require_items(const EarlierRun &earlier, const std::set<EarlierRun::Name> &items,
