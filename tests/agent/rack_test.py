@@ -6,7 +6,7 @@ import xml.etree.ElementTree
 
 import pytest
 
-from support.outside import TREE, content, run
+from support.outside import TREE, content, output_of, run
 
 pytestmark = pytest.mark.usefixtures("namespaces")
 
@@ -186,6 +186,21 @@ def test_without_a_device_it_says_so(tmp_path):
 
     assert outcome.status == 3
     assert outcome.err.endswith("lab/adb-all: adb lists no device\n")
+
+
+def test_what_devices_cost_is_measured():
+    table = output_of(TREE / "bench/rack", "1", "2")
+
+    rows = {line[:36].strip(): [float(word) for word in line[36:].split()]
+            for line in table.splitlines()[2:]}
+    assert rows.pop("devices") == [1, 2]
+    headings = [name for name, values in rows.items() if not values]
+    assert headings == ["processor time for a device, s", "memory for a device in a run, MiB"]
+    assert all(len(rows[name]) == 2 and min(rows[name]) > 0 for name in rows
+               if name not in headings), table
+    assert max(map(len, table.splitlines()[2:])) <= 80
+    # each of the items takes 0.3 s
+    assert all(1.2 < seconds < 60 for seconds in rows["a run of four items (1.2 s), s"])
 
 
 @pytest.mark.parametrize("words", [(), ("3",), ("0", "true"), ("x", "true")])
