@@ -6,7 +6,7 @@ import xml.etree.ElementTree
 
 import pytest
 
-from support.outside import TREE, content, output_of, run
+from support.outside import TREE, content, make_program, output_of, run
 
 pytestmark = pytest.mark.usefixtures("namespaces")
 
@@ -46,7 +46,6 @@ def test_three_devices_run_a_group_and_their_reports_are_joined(tmp_path):
 
 
 @pytest.mark.parametrize("labels, devices", [
-    ((), DEVICES[:2]),
     (("--label", "job=device=7"), DEVICES[:2]),
     (("--label", "device=A7"), ["A7", "A7"]),
     (("--label=device=A7",), ["A7", "A7"]),
@@ -111,6 +110,32 @@ def test_a_device_that_no_longer_answers_is_lost(tmp_path):
     assert lines[1].startswith(DEVICES[1] + ": lost, it does not answer; last heard: Bringup/")
     assert status == 3
     assert cases(tmp_path / "results/all.xml")[DEVICES[1] + ": no report/device"] == ["error"]
+
+
+def test_a_device_whose_report_is_cut_on_its_way_is_lost(tmp_path):
+    make_program(tmp_path / "adb", """#!/bin/sh
+        case $* in *pull*/r.xml*) echo '<?xml' >"$5"; exit 1;; esac
+        exec /usr/bin/adb "$@" """)
+
+    status, out, _ = on_rack("sh", "-c", 'PATH=$PWD:$PATH; exec "$@"', "sh", ADB_ALL, PLAN,
+                             "demo/Bringup/SpiCheck", devices=1, cwd=tmp_path)
+
+    assert status == 3
+    assert out.startswith(DEVICES[0] + ": lost with its report; last heard: status 0 ")
+    assert list(cases(tmp_path / "results/all.xml").values()) == [["error"]]
+
+
+def test_a_device_with_nothing_to_do_is_not_lost(tmp_path):
+    twice = """
+        "$@" demo/Bringup/SpiCheck >&2
+        adb shell mv /data/local/tmp/fptest/r.jsonl /data/local/tmp/fptest/before.jsonl
+        exec "$@" --resume before.jsonl"""
+
+    status, out, _ = on_rack("bash", "-c", twice, "bash", ADB_ALL, PLAN, devices=1, cwd=tmp_path)
+
+    assert (status, out) == (
+        0, DEVICES[0] + ": fptest: before.jsonl: that run has finished: nothing to do\n")
+    assert not cases(tmp_path / "results/all.xml")
 
 
 def test_a_device_that_takes_no_plan_in_time_is_lost(tmp_path):
@@ -180,6 +205,13 @@ def test_wrong_usage_gets_one_line(words, patience, complaint):
         2, "", f"lab/adb-all: {complaint}\n")
 
 
+@pytest.mark.parametrize("directory", ["/proc", "/proc/cpuinfo"])
+def test_reports_that_cannot_be_written_are_no_success(directory):
+    assert run(ADB_ALL, PLAN, env={"RESULTS": directory}) == (
+        3, "", f"lab/adb-all: {directory}: no reports can be written there; name another "
+        "directory by RESULTS\n")
+
+
 def test_without_a_device_it_says_so(tmp_path):
     outcome = on_rack("sh", "-c", 'adb disconnect >&2; exec "$@"', "sh", ADB_ALL, PLAN,
                       "demo/Bringup", devices=1, cwd=tmp_path)
@@ -189,14 +221,14 @@ def test_without_a_device_it_says_so(tmp_path):
 
 
 def test_what_devices_cost_is_measured():
-    table = output_of(TREE / "bench/rack", "1", "2")
+    table = output_of(TREE / "bench/rack", "2")
 
     rows = {line[:36].strip(): [float(word) for word in line[36:].split()]
             for line in table.splitlines()[2:]}
-    assert rows.pop("devices") == [1, 2]
+    assert rows.pop("devices") == [2]
     headings = [name for name, values in rows.items() if not values]
     assert headings == ["processor time for a device, s", "memory for a device in a run, MiB"]
-    assert all(len(rows[name]) == 2 and min(rows[name]) > 0 for name in rows
+    assert all(len(rows[name]) == 1 and min(rows[name]) > 0 for name in rows
                if name not in headings), table
     assert max(map(len, table.splitlines()[2:])) <= 80
     # each of the items takes 0.3 s
