@@ -104,8 +104,7 @@ TEST_F(ExpectedFailures, AreRefusedWithoutAReasonOrAPath)
                        "groups are G",
                    {"run", "--expect", file, "--plan", path});
     expect_refusal(2,
-                   "fptest: " + known(std::string(100'000, 'x')) + ":1: '" +
-                       std::string(97, 'x') +
+                   "fptest: " + known(std::string(100'000, 'x')) + ":1: '" + std::string(97, 'x') +
                        "...' has no reason: write behind it why it fails",
                    {"run", "--expect", file, "--plan", path});
     expect_refusal(2, "fptest: /tmp/scene/none: No such file or directory",

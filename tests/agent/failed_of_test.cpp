@@ -146,20 +146,20 @@ TEST_F(FailedOf, HasNoPartInWhatCannotBe)
     const std::string before = left_by({{"Item", ""}});
     const std::string whole = read_file(before);
     const std::string wrong = ":1: this is not what fptest run --json writes: ";
-    for (const auto &[key, value] : std::vector<std::pair<std::string, std::string>>{
-             {"\"rounds\":1,", "0"},
-             {"\"rounds\":1,", "99999999999"},
-             {"\"rounds\":1,", "18446744073709551615"},
-             {"\"rounds\":1,", "1.5"},
-             {"\"rounds\":1,", "\"1\""},
-             {"\"pass_code\":0,", "77"}}) {
+    for (const auto &[key, value] :
+         std::vector<std::pair<std::string, std::string>>{{"\"rounds\":1,", "0"},
+                                                          {"\"rounds\":1,", "99999999999"},
+                                                          {"\"rounds\":1,", "18446744073709551615"},
+                                                          {"\"rounds\":1,", "1.5"},
+                                                          {"\"rounds\":1,", "\"1\""},
+                                                          {"\"pass_code\":0,", "77"}}) {
         file("before", whole);
         const std::string name = key.substr(1, key.rfind('"') - 1);
         expect_refused(before + wrong + "'" + name + "' is " + value,
                        changed(key, "\"" + name + "\":" + value + ","));
     }
-    expect_refused(before + ":" + std::to_string(lines_of(whole).size() + 1) +
-                       wrong.substr(2) + "another run begins here",
+    expect_refused(before + ":" + std::to_string(lines_of(whole).size() + 1) + wrong.substr(2) +
+                       "another run begins here",
                    file("before", whole + whole));
 }
 
@@ -176,8 +176,8 @@ TEST_F(FailedOf, MayComeThroughAPipe)
 {
     const std::string before = left_by({{"Item", ""}});
     ASSERT_EQ(mkfifo(work("pipe").c_str(), 0600), 0);
-    const support::Process writer(
-        {.arguments = {"sh", "-c", "exec >\"$1\"; sleep 6; cat \"$2\"", "sh", work("pipe"), before}});
+    const support::Process writer({.arguments = {"sh", "-c", "exec >\"$1\"; sleep 6; cat \"$2\"",
+                                                 "sh", work("pipe"), before}});
     EXPECT_EQ(run_group({{"Item", kPasses}}, {"--failed-of", work("pipe")}).status, 0);
     EXPECT_THAT(outcomes(), ElementsAre("Item: passed"));
 }
