@@ -110,7 +110,7 @@ TEST_F(OtherRun, SecondRunIsRefusedAndNamesTheFirst)
 TEST_F(OtherRun, StopIsAnInterruptionThatIsWaitedFor)
 {
     FptestProcess fptest(of_a_run({"--junit", work("junit")}));
-    ASSERT_TRUE(wait_for_item("G/Other"));
+    ASSERT_TRUE(wait_for_events("progress", 2));
     const Ended ended = stop();
     EXPECT_EQ(ended.status, 0);
     EXPECT_EQ(ended.err, "");
@@ -131,7 +131,7 @@ TEST_F(OtherRun, StopAndCtrlCAreOneInterruption)
     for (const bool is_stop_first : {true, false}) {
         fs::remove(work("begun"));
         FptestProcess fptest(with_group(
-            {{"Stubborn", "note /tmp/scene/begun ignore-stop sleep 60"}}, {"--grace", "0.6"}));
+            {{"Stubborn", "ignore-stop note /tmp/scene/begun sleep 60"}}, {"--grace", "0.6"}));
         ASSERT_TRUE(wait_for_file("begun"));
         if (!is_stop_first) {
             fptest.signal(SIGINT);
@@ -172,8 +172,8 @@ TEST_F(OtherRun, StopOfNothingSucceeds)
 TEST_F(OtherRun, StopGivesUpAtItsLimitAndSaysWhatToDo)
 {
     FptestProcess fptest(
-        with_group({{"Stubborn", "note /tmp/scene/begun ignore-stop sleep 60"}}, {"--grace", "3"}));
-    ASSERT_TRUE(wait_for_item("G/Stubborn"));
+        with_group({{"Stubborn", "ignore-stop note /tmp/scene/begun sleep 60"}}, {"--grace", "3"}));
+    ASSERT_TRUE(wait_for_file("begun"));
     const std::string pid = std::to_string(fptest.pid());
     const Ended ended = stop({"--wait", "0.1"});
     EXPECT_EQ(ended.status, kBusy);
@@ -213,8 +213,8 @@ TEST_F(OtherRun, OneThatWasKilledIsNoRun)
 
 TEST_F(OtherRun, ItemsOfOneThatWasKilledAreWaitedFor)
 {
-    FptestProcess fptest(with_group({{"Stubborn", "note /tmp/scene/begun ignore-stop sleep 60"}}));
-    ASSERT_TRUE(wait_for_item("G/Stubborn"));
+    FptestProcess fptest(with_group({{"Stubborn", "ignore-stop note /tmp/scene/begun sleep 60"}}));
+    ASSERT_TRUE(wait_for_file("begun"));
     kill_run(fptest);
     const Ended seen = status();
     EXPECT_EQ(seen.status, kBusy);
