@@ -71,8 +71,8 @@ bool has_passed(const std::vector<RackEntry> &rounds)
 std::string html_link(const std::string &anchor, const HtmlLook &look, std::string_view escaped,
                       std::string_view title)
 {
-    return fmt::format("<a class=\"o {}\" href=\"#{}\" title=\"{}\">{}</a>", look.style, anchor,
-                       title, escaped);
+    return fmt::format(R"(<a class="o {}" href="#{}" title="{}">{}</a>)", look.style, anchor, title,
+                       escaped);
 }
 
 std::string html_state(const RackRow &row)
@@ -166,7 +166,7 @@ std::string html_matrix(const RackTable &table)
         }
         heads +=
             fmt::format("<th scope=\"col\"><span>{}</span></th>", html_name(table.items[item]));
-        feet += fmt::format("<td>{}/{}</td>", passed, asked);
+        feet += fmt::format("<td><span>{}/{}</span></td>", passed, asked);
     }
     std::string rows;
     for (const RackRow &row : table.rows) {

@@ -161,9 +161,10 @@ class Drawing
         const double size = std::clamp(pitch_ / 2, 1.0, 3.0);
         const std::string shape =
             is_out(*of.one)
-                ? fmt::format("<path class=\"out\" d=\"M{:.1f} {:.1f}l{} {}m0 -{}l-{} {}\"/>",
-                              x - size, y - size, 2 * size, 2 * size, 2 * size, 2 * size, 2 * size)
-                : fmt::format("<circle cx=\"{:.1f}\" cy=\"{:.1f}\" r=\"{}\"/>", x, y, size);
+                ? fmt::format(R"(<path class="out" d="M{0:.1f} {1:.1f}L{2:.1f} {3:.1f})"
+                              R"(M{0:.1f} {3:.1f}L{2:.1f} {1:.1f}"/>)",
+                              x - size, y - size, x + size, y + size)
+                : fmt::format(R"(<circle cx="{:.1f}" cy="{:.1f}" r="{:.1f}"/>)", x, y, size);
         return fmt::format("<a href=\"#{}\"><title>{}: {}</title>{}</a>\n", of.anchor, of.whose,
                            html_line(text_of(*of.one)), shape);
     }

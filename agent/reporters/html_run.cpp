@@ -54,7 +54,7 @@ std::string html_output(const ItemRun &item)
         return "";
     }
     const auto lines = static_cast<std::size_t>(std::ranges::count(item.output, '\n')) +
-                       !item.output.ends_with('\n');
+                       (item.output.ends_with('\n') ? 0 : 1);
     // a parser drops the first line feed
     return fmt::format("<details{}><summary>Output, {}</summary><pre>\n{}</pre></details>\n",
                        is_success(item.outcome) ? "" : " open=\"\"", plural(lines, "line"),
@@ -101,19 +101,38 @@ std::string html_attempts(const ItemRun &item)
     return text;
 }
 
+// What it reported after its end.
+std::string html_late(const RackRow &row, const RackEntry &entry)
+{
+    std::string text;
+    const auto [first, last] = row.run->late.equal_range(entry.index);
+    for (auto one = first; one != last; ++one) {
+        const ItemReport &report = one->second;
+        text += fmt::format("<p>Late report{}, which changed nothing: {}</p>\n",
+                            html_line(reported_result(report)),
+                            xml_escaped(report.description.value_or("")));
+    }
+    return text;
+}
+
+std::string html_told(const RackRow &row, const RackEntry &entry)
+{
+    return html_attempts(*entry.item) + html_late(row, entry);
+}
+
 std::string html_item(const RackTable &table, const RackRow &row, std::size_t item)
 {
     const std::vector<RackEntry> &rounds = row.cells[item];
     const HtmlLook look = look_of(rounds);
     const bool has_one = rounds.size() == 1;
-    std::string inside = has_one ? html_attempts(*rounds.front().item) : "";
+    std::string inside = has_one ? html_told(row, rounds.front()) : "";
     for (const RackEntry &entry : has_one ? std::vector<RackEntry>() : rounds) {
         const HtmlLook of_round = look_of(*entry.item);
         inside += fmt::format("<section class=\"round\" id=\"{}\">\n<h5>Round {} {} {}</h5>\n"
                               "{}</section>\n",
                               html_anchor(row, item, entry), entry.round,
                               html_badge(of_round, of_round.word), html_time(*entry.item),
-                              html_attempts(*entry.item));
+                              html_told(row, entry));
     }
     return fmt::format(
         "<article id=\"{}\">\n<h4>{} {} <small>{} <a href=\"#r{}\">{}</a></small></h4>\n"

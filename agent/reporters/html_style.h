@@ -42,13 +42,13 @@ tbody tr { border-top: 1px solid var(--line); }
 .items tbody th { width: 100%; }
 .items th p { margin: 0; color: var(--soft); font-size: .85rem; }
 .items td, .items thead th { white-space: nowrap; }
-.items .rounds { display: flex; flex-wrap: wrap; gap: 2px; }
+.items .rounds { display: flex; flex-wrap: wrap; gap: 2px; max-height: 12rem; overflow-y: auto; }
 .matrix td { padding: 1px; text-align: center; font-size: .85rem; white-space: nowrap; }
 .matrix td .o { display: block; min-width: 1.5rem; }
 .matrix .o small { color: #fff; font-size: .7rem; }
 .matrix th[scope=row], .matrix th:first-child { position: sticky; left: 0; min-width: 6rem; max-width: 14rem; background: var(--bg); }
 .matrix thead th { vertical-align: bottom; padding: 1px; }
-.matrix thead span { writing-mode: vertical-rl; transform: rotate(180deg); max-height: 14rem; font-size: .85rem; }
+.matrix thead span, .matrix tfoot span { writing-mode: vertical-rl; transform: rotate(180deg); max-height: 14rem; font-size: .85rem; }
 .plots { display: grid; grid-template-columns: repeat(auto-fill, minmax(min(100%, 18rem), 1fr)); gap: .75rem; margin: 1rem 0; }
 .plots figure { margin: 0; }
 .plots svg { display: block; width: 100%; height: auto; border: 1px solid var(--line); }
@@ -57,6 +57,7 @@ tbody tr { border-top: 1px solid var(--line); }
 .plots .limit { stroke: var(--soft); stroke-dasharray: 4 3; }
 .plots text { fill: var(--soft); font-size: 10px; }
 article { padding: .5rem 0; border-top: 1px solid var(--line); }
+article, .round { content-visibility: auto; contain-intrinsic-size: auto 8rem; }
 article:target, .round:target { outline: 2px solid var(--fg); outline-offset: .25rem; }
 .round, .attempt { margin: .5rem 0 .5rem .75rem; }
 .said { white-space: pre-wrap; }

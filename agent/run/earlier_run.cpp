@@ -24,7 +24,7 @@ namespace
 using Object = nlohmann::json;
 
 constexpr int kFormatRead = 2;
-constexpr std::string_view kBegin = "{\"event\":\"run\""; // of the first line
+constexpr std::string_view kBegin = R"({"event":"run")"; // of the first line
 
 template <typename Value> std::optional<Value> value_or_none(const Object &object, const char *key)
 {
@@ -173,6 +173,8 @@ class EarlierRunReader
                 start(object);
             } else if (event == "progress") {
                 unended(object).report = report_of(object);
+            } else if (event == "late") {
+                earlier_.late.emplace(index_of(object), report_of(object));
             } else if (event == "retry") {
                 add_attempt(object);
             } else if (event == "end") {

@@ -36,6 +36,8 @@ struct EarlierRun {
     // What has no outcome of its own: stopped, not run, or, with a start, running to the last
     // line. The attempts are among its earlier ones.
     std::map<std::size_t, ItemRun> unended;
+
+    std::multimap<std::size_t, ItemReport> late; // reports after the end
 };
 
 // The file ends before it says what was to be run.

@@ -49,12 +49,13 @@ std::vector<std::vector<RackEntry>> entries_of(const EarlierRun &run)
         }
     }
     for (const std::size_t index : indices) {
-        entries[index % count].push_back({index / count + 1, item_told(run, index)});
+        entries[index % count].push_back({index, index / count + 1, item_told(run, index)});
     }
     const std::size_t last = indices.empty() ? 1 : *indices.rbegin() / count + 1;
-    for (std::vector<RackEntry> &rounds : entries) {
+    for (std::size_t item = 0; item < count; ++item) {
+        std::vector<RackEntry> &rounds = entries[item];
         if (rounds.empty() || rounds.back().round < last) {
-            rounds.push_back({last, &not_told});
+            rounds.push_back({(last - 1) * count + item, last, &not_told});
         }
     }
     return entries;

@@ -16,6 +16,7 @@ namespace fptest
 
 // An item in one round. The run must outlive it.
 struct RackEntry {
+    std::size_t index = 0; // in the run
     std::size_t round = 1;
     const ItemRun *item = nullptr;
 };

@@ -149,6 +149,17 @@ def test_each_round_of_a_run_has_a_cell(page):
             assert text(there.find("p")) == f"number {2 * number + item}"
 
 
+def test_a_report_after_the_end_is_told(page):
+    run = Lines(["G/A", "G/B"], rounds=2)
+    for index in range(4):
+        run.end(index)
+    run.of_item("late", 2, progress="100", result="1", description="too <late>")
+    shown = page(run.finish())
+    late = "Late report, result 1, which changed nothing: too <late>"
+    assert [text(one) for one in shown.of["r1i1n2"].findall("p")] == ["fine", late]
+    assert shown.text.count("Late report") == 1
+
+
 # ---- a rack ----------------------------------------------------------------------------
 
 def test_thirty_devices_by_five_items(page):
@@ -263,7 +274,7 @@ def test_a_measurement_is_plotted_over_devices(page):
     heights = coordinates(vcore)
     assert len(heights) == 3 and top < heights[1] < heights[0] == heights[2] < bottom
     out, = [one for one in vcore.iter("path") if one.get("class") == "out"]
-    assert float(out.get("d").split()[1].partition("l")[0]) < top
+    assert float(out.get("d").split()[1].partition("L")[0]) < top
     assert [(one.get("href"), text(one.find("title"))) for one in vcore.iter("a")] == [
         (f"#r{at + 1}i1", f"d{at}: vcore {value} V (1.15 to 1.25)")
         for at, value in enumerate(values)]

@@ -17,10 +17,13 @@ LOOK = """<!DOCTYPE html><meta charset="utf-8"><meta name="color-scheme" content
 function look(frame) {
   const page = frame.contentDocument, root = page.documentElement, all = [...page.querySelectorAll('*')];
   const links = [...page.querySelectorAll('[href]')].map(one => one.getAttribute('href'));
-  const reached = links.slice(0, 1).map(link => {
+  const reached = [links[0], links[links.length >> 1], links.at(-1)].map(link => {
     frame.contentWindow.location.hash = link;
     return page.querySelector(':target')?.getBoundingClientRect().top; });
-  return {title: page.title, width: root.scrollWidth, text: page.body.innerText,
+  // what is not in sight would not be measured
+  page.head.append(Object.assign(page.createElement('style'),
+    {textContent: '* { content-visibility: visible !important; }'}));
+  return {title: page.title, width: root.scrollWidth, text: page.body.textContent,
     loaded: frame.contentWindow.performance.getEntriesByType('resource').map(one => one.name),
     tags: [...new Set(all.map(one => one.localName))],
     acting: all.flatMap(one => one.getAttributeNames()).filter(name => /^on|^src$/.test(name)),

@@ -7,7 +7,7 @@ PASS = 'fptest report "$1" "${0##*/}" --progress 100 --result'
 ITEMS = {
     "SpiCheck": f'{PASS} 0 --description "chip 0x1a2b answers at 8 MHz"',
     "Supply": f"""
-        fptest measure vcore 1.$((187 + QM * 31 % 53)) V 1.15 1.25
+        fptest measure vcore 1.$((200 + QM * 41 % 59)) V 1.15 1.25
         fptest measure ripple $((4 + QM * 5 % 9)) mV - 12
         {PASS} 0""",
     "DeadPixel": f"""
