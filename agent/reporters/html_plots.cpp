@@ -217,7 +217,7 @@ std::string html_plot(const RackTable &table, const PlotKey &key, const Plot &pl
     const std::string said =
         fmt::format("{}{}{}{}, {}", least, least < greatest ? fmt::format(" to {}", greatest) : "",
                     unit.empty() ? "" : " ", html_line(unit), plural(places, what));
-    const std::string out = plot.out == 0 ? "" : fmt::format("{} out of limits", plot.out);
+    const std::string out = plot.out == 0 ? "" : plural(plot.out, "value") + " out of limits";
     return fmt::format("<figure><figcaption>{} {}{}</figcaption>\n{}</figure>\n",
                        "<b>" + title + "</b>", said,
                        out.empty() ? "" : ", <strong>" + out + "</strong>",

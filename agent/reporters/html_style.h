@@ -50,7 +50,7 @@ tbody tr { border-top: 1px solid var(--line); }
 .matrix thead th { vertical-align: bottom; padding: 1px; }
 .matrix thead span, .matrix tfoot span { writing-mode: vertical-rl; transform: rotate(180deg); max-height: 14rem; font-size: .85rem; }
 .plots { display: grid; grid-template-columns: repeat(auto-fill, minmax(min(100%, 18rem), 1fr)); gap: .75rem; margin: 1rem 0; }
-.plots figure { margin: 0; }
+.plots figure { margin: 0; display: flex; flex-direction: column; justify-content: flex-end; }
 .plots svg { display: block; width: 100%; height: auto; border: 1px solid var(--line); }
 .plots circle, .plots .span { fill: var(--good); stroke: var(--good); }
 .plots .out { fill: none; stroke: var(--bad); stroke-width: 2; }

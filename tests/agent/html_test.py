@@ -266,7 +266,7 @@ def test_a_measurement_is_plotted_over_devices(page):
 
     other, vcore = shown.all("figure")
     assert text(vcore.find("figcaption")) == (
-        "G/A vcore 1.2 to 1.31 V, 4 devices, 1 out of limits")
+        "G/A vcore 1.2 to 1.31 V, 4 devices, 1 value out of limits")
     assert text(other.find("figcaption")) == "G/A other 0 to 3, 4 devices"
     assert limits(vcore) == ["1.15", "1.25"] and limits(other) == []
     low, high = [one for one in vcore.iter("path") if one.get("class") == "limit"]
@@ -293,7 +293,7 @@ def test_of_one_run_it_is_plotted_over_rounds_or_values(page):
 
     figure, = page(Lines().end(measurements=[measured("a", at, "mV", None, 5) for at in range(7)])
                    .finish()).all("figure")
-    assert text(figure.find("figcaption")) == "G/A a 0 to 6 mV, 7 values, 1 out of limits"
+    assert text(figure.find("figcaption")) == "G/A a 0 to 6 mV, 7 values, 1 value out of limits"
     assert len(coordinates(figure)) == 6 and limits(figure) == ["5"]
 
 
