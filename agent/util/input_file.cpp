@@ -64,10 +64,11 @@ ssize_t InputFile::read(char *buffer, std::size_t size)
     }
 }
 
-LineReader::LineReader(const std::string &path) : path_(path), file_(path)
+LineReader::LineReader(const std::string &path, std::string name)
+    : name_(std::move(name)), file_(path)
 {
     if (!file_.is_open()) {
-        throw Failure(Cause::input, "{}: {}", one_line(path_), why_unread());
+        throw Failure(Cause::input, "{}: {}", one_line(name_), why_unread());
     }
 }
 
@@ -85,12 +86,12 @@ bool LineReader::next(std::string &line)
         if (seen > kMostOfALine) {
             throw Failure(Cause::input,
                           "{}:{}: this line is longer than the {} MiB that fptest reads",
-                          one_line(path_), number_, kMostOfALine >> 20U);
+                          one_line(name_), number_, kMostOfALine >> 20U);
         }
         unread_.resize(seen + kReadAtOnce);
         const ssize_t got = file_.read(&unread_[seen], kReadAtOnce);
         if (got < 0) {
-            throw Failure(Cause::input, "{}: {}", one_line(path_), why_unread());
+            throw Failure(Cause::input, "{}: {}", one_line(name_), why_unread());
         }
         unread_.resize(seen + static_cast<std::size_t>(got));
         if (got == 0) {

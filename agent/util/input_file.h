@@ -39,13 +39,14 @@ class InputFile
 class LineReader
 {
   public:
-    explicit LineReader(const std::string &path);
+    // The name is for messages.
+    LineReader(const std::string &path, std::string name);
 
     // False at the end.
     bool next(std::string &line);
 
   private:
-    std::string path_;
+    std::string name_;
     InputFile file_;
     std::string unread_;
     std::size_t number_ = 0;

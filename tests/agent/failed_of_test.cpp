@@ -111,8 +111,10 @@ TEST_F(FailedOf, RefusesWhatIsNoReport)
     expect_refused(work("none") + ": No such file or directory", work("none"));
     expect_refused("/tmp/scene: Is a directory", "/tmp/scene");
     expect_refused(before + " is empty: nothing is known of that run", file("before", ""));
-    for (const std::string text : {"<xml/>\n", "{\"event\":\"run\"", "{\"event\":\"run\"}\n", "7\n",
-                                   "[]\n", "\n\n", "{\"event\":\"start\"}\n"}) {
+    expect_refused(before + " is cut in its first line: nothing is known of that run",
+                   file("before", "{\"event\":\"run\""));
+    for (const std::string text :
+         {"<xml/>\n", "{\"event\":\"run\"}\n", "7\n", "[]\n", "\n\n", "{\"event\":\"start\"}\n"}) {
         expect_refused(not_written, file("before", text));
     }
     file("before", whole);
