@@ -51,6 +51,7 @@ class CommandLine
         fptest::add_run(app_, chosen_);
         fptest::add_check(app_, chosen_);
         fptest::add_show(app_, chosen_);
+        fptest::add_html(app_, chosen_);
         fptest::add_report(app_, chosen_);
         fptest::add_measure(app_, chosen_);
         fptest::add_send(app_, chosen_);

@@ -105,8 +105,8 @@ std::optional<EarlierRun> read_earlier_run(RunOptions &options)
         return std::nullopt;
     }
     refuse_what_the_run_began_with(options);
-    EarlierRun earlier =
-        read_earlier_run(options.resume.empty() ? options.failed_of : options.resume);
+    const std::string &file = options.resume.empty() ? options.failed_of : options.resume;
+    EarlierRun earlier = read_earlier_run(file, file);
     if (earlier.is_cut) {
         say("{}: its last line is cut, and left out", earlier.file);
     }

@@ -30,6 +30,7 @@ using Action = std::function<Exit()>;
 void add_run(CLI::App &app, Action &chosen);
 void add_check(CLI::App &app, Action &chosen);
 void add_show(CLI::App &app, Action &chosen);
+void add_html(CLI::App &app, Action &chosen);
 void add_report(CLI::App &app, Action &chosen);
 void add_measure(CLI::App &app, Action &chosen);
 void add_send(CLI::App &app, Action &chosen);

@@ -24,14 +24,6 @@ namespace
 
 // --- XML ---------------------------------------------------------------------
 
-std::string xml_escaped(std::string_view text)
-{
-    static constexpr Replacement kEscapes[] = {
-        {"&", "&amp;"}, {"<", "&lt;"}, {">", "&gt;"}, {"\"", "&quot;"}, {"\r", "&#13;"},
-    };
-    return replaced(sanitize_xml(text), kEscapes);
-}
-
 // Readers turn tabs and line feeds in attributes into blanks.
 std::string attribute(const char *name, std::string_view value)
 {

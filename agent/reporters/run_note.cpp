@@ -31,13 +31,20 @@ class NoteReporter : public Reporter
 
     void started(const Run &run, Place place) override
     {
+        const ItemRun &item = item_at(run, place);
         note_.item_begun = std::chrono::steady_clock::now();
-        tell(run, title(run, item_at(run, place)));
+        tell(run,
+             title(run, item) + (item.earlier.empty() ? "" : " (" + attempt_of(run, item) + ")"));
     }
 
     void ended(const Run &run, Place /* place */) override
     {
         tell(run, "");
+    }
+
+    void retried(const Run &run, Place place) override
+    {
+        ended(run, place);
     }
 
     void finish(const Run &run) override
@@ -49,7 +56,7 @@ class NoteReporter : public Reporter
     void tell(const Run &run, const std::string &item)
     {
         const auto [passed, failed] = tally(count(run));
-        note_.tally = passed + ", " + failed;
+        note_.tally = passed + ", " + failed + tally_of_others(run);
         note_.item = item;
         lock_.tell(note_);
     }

@@ -4,16 +4,15 @@
 #include "run/earlier_run.h"
 
 #include "util/failure.h"
+#include "util/input_file.h"
 #include "util/text.h"
 
-#include <cerrno>
 #include <csignal>
-#include <cstring>
 #include <ctime>
-#include <fstream>
 #include <nlohmann/json.hpp>
 #include <optional>
 #include <stdexcept>
+#include <string_view>
 
 namespace fptest
 {
@@ -23,12 +22,28 @@ namespace
 using Object = nlohmann::json;
 
 constexpr int kFormatRead = 2;
+constexpr int kMostRounds = 1'000'000;
+constexpr int kMostRetries = 100;
+constexpr std::string_view kBegin = R"({"event":"run")"; // of the first line
 
 template <typename Value> std::optional<Value> value_or_none(const Object &object, const char *key)
 {
     const auto found = object.find(key);
     return found == object.end() || found->is_null() ? std::nullopt
                                                      : std::optional(found->get<Value>());
+}
+
+// A whole number that fptest takes for the option, or none.
+std::optional<int> number_or_none(const Object &object, const char *key, int low, int high)
+{
+    const auto found = object.find(key);
+    if (found == object.end() || found->is_null()) {
+        return std::nullopt;
+    }
+    if (!found->is_number_integer() || *found < low || *found > high) {
+        throw std::runtime_error(fmt::format("{} is {}", in_quotes(key), found->dump()));
+    }
+    return found->get<int>();
 }
 
 std::string text_of(const Object &object, const char *key)
@@ -67,6 +82,19 @@ std::optional<std::chrono::system_clock::time_point> time_of(const std::string &
            std::chrono::milliseconds(std::strtol(rest + 1, nullptr, 10));
 }
 
+ItemReport report_of(const Object &object)
+{
+    ItemReport report;
+    report.progress = value_or_none<std::string>(object, "progress");
+    report.result = value_or_none<std::string>(object, "result");
+    report.result_without_value = report.result == "";
+    if (report.result_without_value) {
+        report.result.reset();
+    }
+    report.description = value_or_none<std::string>(object, "description");
+    return report;
+}
+
 // A run before this one may have none.
 void add_what_it_left(ItemRun &item, const Object &end)
 {
@@ -88,13 +116,7 @@ ItemRun item_of(const Object &end)
     item.group = end.at("group");
     item.name = end.at("item");
     item.outcome = outcome_of(end.at("outcome"));
-    item.report.progress = value_or_none<std::string>(end, "progress");
-    item.report.result = value_or_none<std::string>(end, "result");
-    item.report.result_without_value = item.report.result == "";
-    if (item.report.result_without_value) {
-        item.report.result.reset();
-    }
-    item.report.description = value_or_none<std::string>(end, "description");
+    item.report = report_of(end);
     item.reason = text_of(end, "reason");
     item.start = time_of(text_of(end, "start"));
     item.seconds = value_or_none<double>(end, "seconds");
@@ -117,15 +139,25 @@ class EarlierRunReader
         earlier_.file = one_line(file);
     }
 
-    EarlierRun read(std::istream &lines)
+    EarlierRun read(LineReader lines)
     {
         std::string line;
-        bool is_more = static_cast<bool>(std::getline(lines, line));
+        bool is_more = lines.next(line);
+        if (!is_more) {
+            throw NothingKnown(Cause::input, "{} is empty: nothing is known of that run",
+                               earlier_.file);
+        }
         for (number_ = 1; is_more; ++number_) {
             Object object = Object::parse(line, nullptr, false);
-            is_more = static_cast<bool>(std::getline(lines, line));
+            const bool may_begin = line.starts_with(kBegin) || kBegin.starts_with(line);
+            is_more = lines.next(line);
             earlier_.is_cut = object.is_discarded() && !is_more;
             if (earlier_.is_cut) {
+                if (!has_begun_ && may_begin) {
+                    throw NothingKnown(Cause::input,
+                                       "{} is cut in its first line: nothing is known of that run",
+                                       earlier_.file);
+                }
                 break;
             }
             take(object);
@@ -136,6 +168,7 @@ class EarlierRunReader
         for (const std::size_t index : running_) {
             earlier_.failed.insert(name_at(index));
         }
+        add_attempts_to_unended();
         return std::move(earlier_);
     }
 
@@ -153,8 +186,14 @@ class EarlierRunReader
                 begin(object, event);
             } else if (!object.is_object()) {
                 throw std::runtime_error("it is no JSON object");
+            } else if (event == "run") {
+                throw std::runtime_error("another run begins here");
             } else if (event == "start") {
-                running_.insert(index_of(object));
+                start(object);
+            } else if (event == "progress") {
+                unended(object).report = report_of(object);
+            } else if (event == "late") {
+                earlier_.late.emplace(index_of(object), report_of(object));
             } else if (event == "retry") {
                 add_attempt(object);
             } else if (event == "end") {
@@ -181,15 +220,23 @@ class EarlierRunReader
                           earlier_.file, one_line(object.at("format").dump()), kFormatRead);
         }
         Run &run = earlier_.run;
+        earlier_.version = text_of(object, "version");
+        run.identity.library = text_of(object, "library_version");
+        const Object labels = object.value("labels", Object::object());
+        for (const auto &[key, value] : labels.items()) {
+            run.identity.labels.emplace_back(key, value);
+        }
+        run.start = time_of(text_of(object, "start")).value_or(run.start);
+        run.resumed = text_of(object, "resumed");
         run.plan = object.at("plan");
         run.identity.plan_digest = value_or_none<std::string>(object, "plan_digest").value_or("");
         run.vendor = object.at("vendor");
-        run.rounds = value_or_none<int>(object, "rounds");
+        run.rounds = number_or_none(object, "rounds", 1, kMostRounds);
         run.time_limit = value_or_none<double>(object, "time_limit");
         run.until_fail = object.at("until_fail");
-        run.pass_code = object.at("pass_code");
-        run.stop_after = value_or_none<int>(object, "stop_after");
-        run.retries = value_or_none<int>(object, "retries").value_or(0);
+        run.pass_code = number_or_none(object, "pass_code", -2, 1).value_or(0);
+        run.stop_after = number_or_none(object, "stop_after", 1, kMostRounds);
+        run.retries = number_or_none(object, "retries", 0, kMostRetries).value_or(0);
         run.seed = value_or_none<int>(object, "seed");
         for (const Object &item : object.at("items")) {
             earlier_.items.emplace_back(item.at("group"), item.at("item"));
@@ -216,6 +263,33 @@ class EarlierRunReader
         return earlier_.items[index % earlier_.items.size()];
     }
 
+    ItemRun &unended(const Object &object)
+    {
+        ItemRun &item = earlier_.unended[index_of(object)];
+        item.group = object.at("group");
+        item.name = object.at("item");
+        return item;
+    }
+
+    void start(const Object &object)
+    {
+        running_.insert(index_of(object));
+        ItemRun &item = unended(object);
+        item.start = time_of(text_of(object, "start"));
+    }
+
+    void add_attempts_to_unended()
+    {
+        for (auto &[index, item] : earlier_.unended) {
+            const auto before = earlier_.attempts.find(index);
+            if (before != earlier_.attempts.end()) {
+                item.earlier = before->second.earlier;
+                item.earlier.push_back(before->second);
+                item.earlier.back().earlier.clear();
+            }
+        }
+    }
+
     ItemRun &add_attempt(const Object &object)
     {
         const std::size_t index = index_of(object);
@@ -231,6 +305,7 @@ class EarlierRunReader
         }
         last = std::move(item);
         running_.erase(index);
+        earlier_.unended.erase(index);
         return last;
     }
 
@@ -238,11 +313,11 @@ class EarlierRunReader
     {
         const std::size_t index = index_of(object);
         const Outcome outcome = outcome_of(object.at("outcome"));
-        if (outcome == Outcome::not_run) {
-            return;
-        }
         if (outcome == Outcome::stopped) {
             running_.insert(index); // it has to begin again
+        }
+        if (outcome == Outcome::stopped || outcome == Outcome::not_run) {
+            unended(object) = item_of(object);
             return;
         }
         add_attempt(object);
@@ -258,6 +333,8 @@ class EarlierRunReader
     {
         earlier_.run.finished = object.at("finished");
         earlier_.run.seconds = value_or_none<double>(object, "seconds").value_or(0);
+        (earlier_.run.finished ? earlier_.run.why_ended : earlier_.run.why_unfinished) =
+            text_of(object, "reason");
     }
 
     EarlierRun earlier_;
@@ -268,17 +345,9 @@ class EarlierRunReader
 
 } // namespace
 
-EarlierRun read_earlier_run(const std::string &file)
+EarlierRun read_earlier_run(const std::string &file, const std::string &name)
 {
-    std::ifstream lines(file);
-    if (!lines || lines.peek() == std::ifstream::traits_type::eof()) {
-        const int error = errno;
-        if (!lines.is_open() || lines.bad()) {
-            throw Failure(Cause::input, "{}: {}", one_line(file), std::strerror(error));
-        }
-        throw Failure(Cause::input, "{} is empty: nothing is known of that run", one_line(file));
-    }
-    return EarlierRunReader(file).read(lines);
+    return EarlierRunReader(name).read(LineReader(file, name));
 }
 
 void require_items(const EarlierRun &earlier, const std::set<EarlierRun::Name> &items,

@@ -17,6 +17,7 @@ namespace fptest
 namespace
 {
 
+constexpr std::size_t kColumnsOfPath = 100; // of a path in a message
 constexpr char kAroundWords[] = " \t\r";
 
 std::string without_blanks(const std::string &text)
@@ -55,7 +56,7 @@ void expect_failures(const std::string &file, const Plan &plan, const std::strin
         const std::string reason = without_blanks(line.substr(path.size()));
         if (reason.empty()) {
             throw Failure(Cause::input, "{}: {} has no reason: write behind it why it fails", place,
-                          in_quotes(path));
+                          in_quotes(ellipsize(path, kColumnsOfPath)));
         }
         try {
             const PathPattern pattern(path, plan);

@@ -4,6 +4,7 @@
 #include "util/files.h"
 
 #include "util/failure.h"
+#include "util/input_file.h"
 #include "util/text.h"
 
 #include <array>
@@ -44,18 +45,14 @@ void require_standard_output(const std::string &who)
 
 std::optional<std::string> read_file(const std::string &path, int flags)
 {
-    const Descriptor file(path == "-" ? dup(STDIN_FILENO)
-                                      : open(path.c_str(), O_RDONLY | O_CLOEXEC | flags));
+    InputFile file(path, flags);
     if (!file.is_open()) {
         return std::nullopt;
     }
     std::string text;
     std::array<char, 16384> buffer;
     for (;;) {
-        const ssize_t got = read(file.get(), buffer.data(), buffer.size());
-        if (got < 0 && errno == EINTR) {
-            continue;
-        }
+        const ssize_t got = file.read(buffer.data(), buffer.size());
         if (got < 0) {
             return std::nullopt;
         }
@@ -79,9 +76,10 @@ bool is_regular_file(int descriptor)
 
 std::string why_unread()
 {
-    return errno != EFBIG
-               ? std::strerror(errno)
-               : fmt::format("longer than the {} MiB that fptest reads", kFileLimit >> 20U);
+    return errno == EFBIG
+               ? fmt::format("longer than the {} MiB that fptest reads", kFileLimit >> 20U)
+           : errno == EPIPE ? fmt::format("nobody writes to this pipe within {} s", kPipeSeconds)
+                            : std::strerror(errno);
 }
 
 std::string require_file(const std::string &path)

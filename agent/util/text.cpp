@@ -134,6 +134,14 @@ std::string sanitize_xml(std::string_view bytes)
     });
 }
 
+std::string xml_escaped(std::string_view text)
+{
+    static constexpr Replacement kEscapes[] = {
+        {"&", "&amp;"}, {"<", "&lt;"}, {">", "&gt;"}, {"\"", "&quot;"}, {"\r", "&#13;"},
+    };
+    return replaced(sanitize_xml(text), kEscapes);
+}
+
 std::string one_line(std::string_view bytes)
 {
     return cleaned(bytes, visible_on_line);

@@ -22,6 +22,9 @@ std::string sanitize_utf8(std::string_view bytes);
 // and U+FFFF.
 std::string sanitize_xml(std::string_view bytes);
 
+// As sanitize_xml(), and as text of XML or HTML, also between double quotes.
+std::string xml_escaped(std::string_view text);
+
 // As sanitize_utf8(), and on one line: replaces tabs and line ends by pictures as well, and
 // what changes the direction of text (overrides, embeddings, isolates) by U+FFFD.
 std::string one_line(std::string_view bytes);

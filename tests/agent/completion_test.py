@@ -47,8 +47,8 @@ def offered(tmp_path):
     return offered
 
 
-@pytest.mark.parametrize("command", ["", "run", "check", "show", "report", "measure", "send",
-                                     "doctor", "status", "stop"])
+@pytest.mark.parametrize("command", ["", "run", "check", "show", "html", "report", "measure",
+                                     "send", "doctor", "status", "stop"])
 def test_every_option_is_offered_that_the_help_tells(offered, command):
     help_text = run(BUILD / "agent/fptest", *command.split(), "--help").out
     options = re.findall(r"^  (?:-\w,)?(-\S+)", help_text, re.MULTILINE)
@@ -59,7 +59,7 @@ def test_every_option_is_offered_that_the_help_tells(offered, command):
 
 @pytest.mark.parametrize("words, expected", [
     # sub-commands
-    ("''", ["check", "doctor", "measure", "report", "run", "send", "show", "status", "stop"]),
+    ("''", ["check", "doctor", "html", "measure", "report", "run", "send", "show", "status", "stop"]),
     ("re", ["report"]),
     ("s", ["send", "show", "status", "stop"]),
     ("x", []),
@@ -72,7 +72,7 @@ def test_every_option_is_offered_that_the_help_tells(offered, command):
         "run --plan pl", "run --junit pl", "run --json pl", "run --log pl", "run --expect pl", "run --failed-of pl",
         "run --resume pl",
         "run --plan = pl", "send --log pl", "report --log pl", "check pl", "check x pl",
-        "show pl", "show --help pl")),
+        "html pl", "html x pl", "show pl", "show --help pl")),
     ("show plans/", ["plans/demo.xml", "plans/other plan.xml"]),
     # directories
     ("run --files pl", ["plans"]),

@@ -103,8 +103,17 @@ TEST_F(ExpectedFailures, AreRefusedWithoutAReasonOrAPath)
                        ":1: 'Other' names no group: a path is root/group or root/group/item; the "
                        "groups are G",
                    {"run", "--expect", file, "--plan", path});
+    expect_refusal(2,
+                   "fptest: " + known(std::string(100'000, 'x')) + ":1: '" + std::string(97, 'x') +
+                       "...' has no reason: write behind it why it fails",
+                   {"run", "--expect", file, "--plan", path});
     expect_refusal(2, "fptest: /tmp/scene/none: No such file or directory",
                    {"run", "--expect", work("none"), "--plan", path});
+    expect_refusal(2, "fptest: /dev/zero: longer than the 16 MiB that fptest reads",
+                   {"run", "--expect", "/dev/zero", "--plan", path});
+    ASSERT_EQ(mkfifo(work("pipe").c_str(), 0600), 0);
+    expect_refusal(2, "fptest: /tmp/scene/pipe: nobody writes to this pipe within 5 s",
+                   {"run", "--expect", work("pipe"), "--plan", path});
 }
 
 } // namespace

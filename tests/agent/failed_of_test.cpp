@@ -111,8 +111,10 @@ TEST_F(FailedOf, RefusesWhatIsNoReport)
     expect_refused(work("none") + ": No such file or directory", work("none"));
     expect_refused("/tmp/scene: Is a directory", "/tmp/scene");
     expect_refused(before + " is empty: nothing is known of that run", file("before", ""));
-    for (const std::string text : {"<xml/>\n", "{\"event\":\"run\"", "{\"event\":\"run\"}\n", "7\n",
-                                   "[]\n", "\n\n", "{\"event\":\"start\"}\n"}) {
+    expect_refused(before + " is cut in its first line: nothing is known of that run",
+                   file("before", "{\"event\":\"run\""));
+    for (const std::string text :
+         {"<xml/>\n", "{\"event\":\"run\"}\n", "7\n", "[]\n", "\n\n", "{\"event\":\"start\"}\n"}) {
         expect_refused(not_written, file("before", text));
     }
     file("before", whole);
@@ -139,6 +141,47 @@ TEST_F(FailedOf, RefusesWhatIsNoReport)
     expect_wrong("\"reason\":", "\"reason\":7,\"raison\":", "");
     // what is cut is the last line only
     expect_wrong("{\"event\":\"start\"", "{\"event\":\"sta", "it is no JSON object");
+}
+
+TEST_F(FailedOf, HasNoPartInWhatCannotBe)
+{
+    const std::string before = left_by({{"Item", ""}});
+    const std::string whole = read_file(before);
+    const std::string wrong = ":1: this is not what fptest run --json writes: ";
+    for (const auto &[key, value] :
+         std::vector<std::pair<std::string, std::string>>{{"\"rounds\":1,", "0"},
+                                                          {"\"rounds\":1,", "99999999999"},
+                                                          {"\"rounds\":1,", "18446744073709551615"},
+                                                          {"\"rounds\":1,", "1.5"},
+                                                          {"\"rounds\":1,", "\"1\""},
+                                                          {"\"pass_code\":0,", "77"}}) {
+        file("before", whole);
+        const std::string name = key.substr(1, key.rfind('"') - 1);
+        expect_refused(before + wrong + "'" + name + "' is " + value,
+                       changed(key, "\"" + name + "\":" + value + ","));
+    }
+    expect_refused(before + ":" + std::to_string(lines_of(whole).size() + 1) + wrong.substr(2) +
+                       "another run begins here",
+                   file("before", whole + whole));
+}
+
+TEST_F(FailedOf, IsNoPlaceToWaitOrReadWithoutEnd)
+{
+    expect_refused("/dev/zero:1: this line is longer than the 64 MiB that fptest reads",
+                   "/dev/zero");
+    ASSERT_EQ(mkfifo(work("pipe").c_str(), 0600), 0);
+    expect_refused(work("pipe") + ": nobody writes to this pipe within 5 s", work("pipe"));
+}
+
+// As from <(zcat earlier.jsonl.gz), also where that takes long.
+TEST_F(FailedOf, MayComeThroughAPipe)
+{
+    const std::string before = left_by({{"Item", ""}});
+    ASSERT_EQ(mkfifo(work("pipe").c_str(), 0600), 0);
+    const support::Process writer({.arguments = {"sh", "-c", "exec >\"$1\"; sleep 6; cat \"$2\"",
+                                                 "sh", work("pipe"), before}});
+    EXPECT_EQ(run_group({{"Item", kPasses}}, {"--failed-of", work("pipe")}).status, 0);
+    EXPECT_THAT(outcomes(), ElementsAre("Item: passed"));
 }
 
 TEST_F(FailedOf, IsNotOverwritten)

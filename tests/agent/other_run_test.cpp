@@ -109,6 +109,18 @@ TEST_F(OtherRun, StatusNamesProcessItemTimesAndLabels)
     EXPECT_FALSE(fs::exists(kNote));
 }
 
+TEST_F(OtherRun, StatusSaysWhatIsTriedAgain)
+{
+    FptestProcess fptest(with_group(
+        {{"Other", "note /tmp/scene/begun $(test ! -e /tmp/scene/begun || echo sleep 60)"}},
+        {"--retry", "2"}));
+    ASSERT_TRUE(wait_for_events("start", 2));
+    ASSERT_TRUE(wait_for_item("G/Other (attempt 2 of 3)"));
+    EXPECT_THAT(status().out, HasSubstr(" s; 0 passed, 0 failed, 0 flaky, 1 retry; device="));
+    fptest.signal(SIGINT);
+    fptest.wait();
+}
+
 TEST_F(OtherRun, SecondRunIsRefusedAndNamesTheFirst)
 {
     FptestProcess fptest(of_a_run());
@@ -129,7 +141,7 @@ TEST_F(OtherRun, SecondRunIsRefusedAndNamesTheFirst)
 TEST_F(OtherRun, StopIsAnInterruptionThatIsWaitedFor)
 {
     FptestProcess fptest(of_a_run({"--junit", work("junit")}));
-    ASSERT_TRUE(wait_for_item("G/Other"));
+    ASSERT_TRUE(wait_for_events("progress", 2));
     const Ended ended = stop();
     EXPECT_EQ(ended.status, 0);
     EXPECT_EQ(ended.err, "");
@@ -150,7 +162,7 @@ TEST_F(OtherRun, StopAndCtrlCAreOneInterruption)
     for (const bool is_stop_first : {true, false}) {
         fs::remove(work("begun"));
         FptestProcess fptest(with_group(
-            {{"Stubborn", "note /tmp/scene/begun ignore-stop sleep 60"}}, {"--grace", "0.6"}));
+            {{"Stubborn", "ignore-stop note /tmp/scene/begun sleep 60"}}, {"--grace", "0.6"}));
         ASSERT_TRUE(wait_for_file("begun"));
         if (!is_stop_first) {
             fptest.signal(SIGINT);
@@ -191,8 +203,8 @@ TEST_F(OtherRun, StopOfNothingSucceeds)
 TEST_F(OtherRun, StopGivesUpAtItsLimitAndSaysWhatToDo)
 {
     FptestProcess fptest(
-        with_group({{"Stubborn", "note /tmp/scene/begun ignore-stop sleep 60"}}, {"--grace", "3"}));
-    ASSERT_TRUE(wait_for_item("G/Stubborn"));
+        with_group({{"Stubborn", "ignore-stop note /tmp/scene/begun sleep 60"}}, {"--grace", "3"}));
+    ASSERT_TRUE(wait_for_file("begun"));
     const std::string pid = std::to_string(fptest.pid());
     const Ended ended = stop({"--wait", "0.1"});
     EXPECT_EQ(ended.status, kBusy);
@@ -232,8 +244,8 @@ TEST_F(OtherRun, OneThatWasKilledIsNoRun)
 
 TEST_F(OtherRun, ItemsOfOneThatWasKilledAreWaitedFor)
 {
-    FptestProcess fptest(with_group({{"Stubborn", "note /tmp/scene/begun ignore-stop sleep 60"}}));
-    ASSERT_TRUE(wait_for_item("G/Stubborn"));
+    FptestProcess fptest(with_group({{"Stubborn", "ignore-stop note /tmp/scene/begun sleep 60"}}));
+    ASSERT_TRUE(wait_for_file("begun"));
     kill_run(fptest);
     const Ended seen = status();
     EXPECT_EQ(seen.status, kBusy);

@@ -1,11 +1,12 @@
 # SPDX-FileCopyrightText: 2026 The Quillmark authors
 # SPDX-License-Identifier: Apache-2.0
 """lab/: several devices at once, driven by what exists."""
+import json
 import xml.etree.ElementTree
 
 import pytest
 
-from support.outside import TREE, content, run
+from support.outside import TREE, content, make_program, output_of, run
 
 pytestmark = pytest.mark.usefixtures("namespaces")
 
@@ -18,11 +19,15 @@ def on_rack(*command, devices=3, **others):
     return run(TREE / "lab/virtual-rack", str(devices), *command, **others)
 
 
+def suites(path):
+    return xml.etree.ElementTree.parse(path).getroot().iter("testsuite")
+
+
 def cases(path):
     """SUITE/ITEM -> what it became."""
     return {f"{suite.get('name')}/{case.get('name')}": [
         child.tag for child in case if child.tag in ("failure", "error")]
-        for suite in xml.etree.ElementTree.parse(path).getroot() for case in suite.iter("testcase")}
+        for suite in suites(path) for case in suite.iter("testcase")}
 
 
 def test_three_devices_run_a_group_and_their_reports_are_joined(tmp_path):
@@ -38,6 +43,29 @@ def test_three_devices_run_a_group_and_their_reports_are_joined(tmp_path):
         f"{device}: Bringup/{name}": what for device in DEVICES for name, what in one.items()}
     for device in DEVICES:
         assert '"event":"finish"' in content(tmp_path / f"results/{device}.jsonl")
+
+
+@pytest.mark.parametrize("labels, devices", [
+    (("--label", "job=device=7"), DEVICES[:2]),
+    (("--label", "device=A7"), ["A7", "A7"]),
+    (("--label=device=A7",), ["A7", "A7"]),
+])
+def test_results_say_whose_they_are(tmp_path, labels, devices):
+    assert on_rack(ADB_ALL, PLAN, *labels, "demo/Bringup/SpiCheck", devices=2,
+                   cwd=tmp_path).status == 0
+
+    assert [suite.get("hostname") for suite in suites(tmp_path / "results/all.xml")] == devices
+    for device, label in zip(DEVICES, devices):
+        first = json.loads(content(tmp_path / f"results/{device}.jsonl").partition("\n")[0])
+        assert first["labels"]["device"] == label
+
+
+def test_without_a_path_every_group_is_run(tmp_path):
+    on_rack(ADB_ALL, PLAN, "--skip", "demo/Endurance", "--skip", "demo/B*/[!S]*", devices=1,
+            cwd=tmp_path)
+
+    assert set(cases(tmp_path / "results/all.xml")) == {
+        DEVICES[0] + ": Bringup/SpiCheck", DEVICES[0] + ": Gather/SensorProbe"}
 
 
 def test_the_status_is_the_worst(tmp_path):
@@ -68,6 +96,90 @@ def test_a_device_that_is_lost_is_named_and_the_others_go_on(tmp_path):
     assert of_all[DEVICES[1] + ": no report/device"] == ["error"]
 
 
+def test_a_device_that_no_longer_answers_is_lost(tmp_path):
+    freeze = """
+        "$@" & until grep SpiCheck results/127.0.0.1:5602.log; do sleep 0.05; done >&2
+        adb -s 127.0.0.1:5602 shell 'kill -STOP $(pgrep -f device/adbd)' &
+        wait %1"""
+
+    status, out, _ = on_rack("bash", "-c", freeze, "bash", ADB_ALL, PLAN, "demo/Bringup",
+                             devices=2, cwd=tmp_path, env={"PATIENCE": "4"})
+
+    lines = sorted(out.splitlines())
+    assert lines[0].startswith(DEVICES[0] + ": 1 passed, 3 failed, ")
+    assert lines[1].startswith(DEVICES[1] + ": lost, it does not answer; last heard: Bringup/")
+    assert status == 3
+    assert cases(tmp_path / "results/all.xml")[DEVICES[1] + ": no report/device"] == ["error"]
+
+
+def test_a_device_whose_report_is_cut_on_its_way_is_lost(tmp_path):
+    make_program(tmp_path / "adb", """#!/bin/sh
+        case $* in *pull*/r.xml*) echo '<?xml' >"$5"; exit 1;; esac
+        exec /usr/bin/adb "$@" """)
+
+    status, out, _ = on_rack("sh", "-c", 'PATH=$PWD:$PATH; exec "$@"', "sh", ADB_ALL, PLAN,
+                             "demo/Bringup/SpiCheck", devices=1, cwd=tmp_path)
+
+    assert status == 3
+    assert out.startswith(DEVICES[0] + ": lost with its report; last heard: status 0 ")
+    assert list(cases(tmp_path / "results/all.xml").values()) == [["error"]]
+
+
+def test_a_device_with_nothing_to_do_is_not_lost(tmp_path):
+    twice = """
+        "$@" demo/Bringup/SpiCheck >&2
+        adb shell mv /data/local/tmp/fptest/r.jsonl /data/local/tmp/fptest/before.jsonl
+        exec "$@" --resume before.jsonl"""
+
+    status, out, _ = on_rack("bash", "-c", twice, "bash", ADB_ALL, PLAN, devices=1, cwd=tmp_path)
+
+    assert (status, out) == (
+        0, DEVICES[0] + ": fptest: before.jsonl: that run has finished: nothing to do\n")
+    assert not cases(tmp_path / "results/all.xml")
+
+
+def test_a_device_that_takes_no_plan_in_time_is_lost(tmp_path):
+    freeze = """
+        adb -s 127.0.0.1:5601 shell 'kill -STOP $(pgrep -f device/adbd)' & sleep 0.5
+        exec "$@" """
+
+    status, out, _ = on_rack("bash", "-c", freeze, "bash", ADB_ALL, PLAN, "demo/Bringup",
+                             devices=1, cwd=tmp_path, env={"PATIENCE": "1"})
+
+    assert (status, out) == (3, f"{DEVICES[0]}: lost; last heard: no answer within 1 s\n")
+
+
+# It wants a key that it never takes.
+ASKS_FOR_A_KEY = """
+import socket, struct
+with socket.create_server(("127.0.0.1", 5700)) as listening:
+    client, _ = listening.accept()
+    number = int.from_bytes(b"AUTH", "little")
+    while struct.pack("<2I", number, 3) not in client.recv(65536):
+        client.sendall(struct.pack("<6I", number, 1, 0, 20, 0, number ^ 0xffffffff) + bytes(20))
+    while client.recv(65536):
+        pass
+"""
+
+
+def test_a_device_that_is_not_ready_is_named_and_lost(tmp_path):
+    connect = """
+        python3 -c "$0" &
+        until adb connect 127.0.0.1:5700 | grep authenticate; do sleep 0.05; done >&2
+        until adb devices | grep unauthorized; do sleep 0.05; done >&2
+        exec "$@" """
+
+    status, out, _ = on_rack("bash", "-c", connect, ASKS_FOR_A_KEY, ADB_ALL, PLAN,
+                             "demo/Bringup/SpiCheck", devices=1, cwd=tmp_path)
+
+    lines = sorted(out.splitlines())
+    assert lines[0].startswith(DEVICES[0] + ": 1 passed, 0 failed, ")
+    assert lines[1] == "127.0.0.1:5700: lost; last heard: adb lists it as unauthorized"
+    assert status == 3
+    assert cases(tmp_path / "results/all.xml") == {
+        DEVICES[0] + ": Bringup/SpiCheck": [], "127.0.0.1:5700: no report/device": ["error"]}
+
+
 def test_ctrl_c_ends_the_runs_of_all(tmp_path):
     status, out, err = on_rack("bash", "-c", """
         timeout --preserve-status -s INT 2 "$@"; echo $?
@@ -82,12 +194,22 @@ def test_ctrl_c_ends_the_runs_of_all(tmp_path):
     assert (status, err) == (0, "")
 
 
-@pytest.mark.parametrize("words, complaint", [
-    ((), "it takes a plan and paths, as plan.xml root/group"),
-    (("nowhere.xml", "demo/Bringup"), "nowhere.xml: no such plan"),
+@pytest.mark.parametrize("words, patience, complaint", [
+    ((), None, "it takes a plan, then paths and options of fptest run"),
+    (("nowhere.xml", "demo/Bringup"), None, "nowhere.xml: no such plan"),
+    ((TREE, "demo/Bringup"), None, f"{TREE}: no such plan"),
+    ((PLAN, "demo/Bringup"), "1m", "PATIENCE is '1m': give a number of seconds"),
 ])
-def test_wrong_usage_gets_one_line(words, complaint):
-    assert run(ADB_ALL, *words) == (2, "", f"lab/adb-all: {complaint}\n")
+def test_wrong_usage_gets_one_line(words, patience, complaint):
+    assert run(ADB_ALL, *words, env={"PATIENCE": patience}) == (
+        2, "", f"lab/adb-all: {complaint}\n")
+
+
+@pytest.mark.parametrize("directory", ["/proc", "/proc/cpuinfo"])
+def test_reports_that_cannot_be_written_are_no_success(directory):
+    assert run(ADB_ALL, PLAN, env={"RESULTS": directory}) == (
+        3, "", f"lab/adb-all: {directory}: no reports can be written there; name another "
+        "directory by RESULTS\n")
 
 
 def test_without_a_device_it_says_so(tmp_path):
@@ -96,6 +218,21 @@ def test_without_a_device_it_says_so(tmp_path):
 
     assert outcome.status == 3
     assert outcome.err.endswith("lab/adb-all: adb lists no device\n")
+
+
+def test_what_devices_cost_is_measured():
+    table = output_of(TREE / "bench/rack", "2")
+
+    rows = {line[:36].strip(): [float(word) for word in line[36:].split()]
+            for line in table.splitlines()[2:]}
+    assert rows.pop("devices") == [2]
+    headings = [name for name, values in rows.items() if not values]
+    assert headings == ["processor time for a device, s", "memory for a device in a run, MiB"]
+    assert all(len(rows[name]) == 1 and min(rows[name]) > 0 for name in rows
+               if name not in headings), table
+    assert max(map(len, table.splitlines()[2:])) <= 80
+    # each of the items takes 0.3 s
+    assert all(1.2 < seconds < 60 for seconds in rows["a run of four items (1.2 s), s"])
 
 
 @pytest.mark.parametrize("words", [(), ("3",), ("0", "true"), ("x", "true")])

@@ -103,6 +103,7 @@ TEST_F(Usage, IsExplainedInOneLine)
         {{"report", "G", "I", "a\nb", "--progress", "1", "--result", "0"},
          "'a\u240Ab' is one argument too many; see fptest report --help"},
         {{"check"}, "FILE is required; see fptest check --help"},
+        {{"html"}, "FILE is required; see fptest html --help"},
         {{"check", "--for", "file"}, "FILE is required; see fptest check --help"},
         {{"report", "--progress", "1", "--result", "0"},
          "GROUP is required; see fptest report --help"},
@@ -117,11 +118,11 @@ TEST_F(Usage, IsExplainedInOneLine)
         {{"send"}, "give COMMANDs as arguments, or with -0 on standard input"},
         {{"send", "-0", "pingtest"}, "give COMMANDs as arguments, or with -0 on standard input"},
         {{"bogus"},
-         "there is no command 'bogus'; the commands are run, check, show, report, measure, send, "
-         "doctor, status and stop"},
+         "there is no command 'bogus'; the commands are run, check, show, html, report, measure, "
+         "send, doctor, status and stop"},
         {{"rum"},
          "there is no command 'rum'; did you mean 'run'? The commands are run, check, show, "
-         "report, measure, send, doctor, status and stop"},
+         "html, report, measure, send, doctor, status and stop"},
         {{}, "no command is given; see fptest --help"}};
     for (const auto &[arguments, text] : wrong) {
         expect_wrong(arguments, text);

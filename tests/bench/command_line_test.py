@@ -15,6 +15,11 @@ from support.outside import TREE, run
     ("--json /proc/figures", "--json /proc/figures: this cannot be written"),
     ("--json /nowhere/figures.json",
      "--json /nowhere/figures.json: there is no such directory"),
+    ("--rack", "--rack wants numbers of devices, as 1,3,10,30, not ''"),
+    ("--rack 3,", "--rack wants numbers of devices, as 1,3,10,30, not '3,'"),
+    ("--rack 0", "--rack wants numbers of devices, as 1,3,10,30, not '0'"),
+    ("--rack 1000", "--rack wants numbers of devices, as 1,3,10,30, not '1000'"),
+    ("--rack 3 --quick", "--rack measures something else: leave out all but --write"),
     ("--write --filter ping",
      "--write keeps all figures: leave out the options that skip some"),
 ])
