@@ -71,17 +71,28 @@ std::string device_of(const EarlierRun &run)
     return run.file;
 }
 
+std::string name_of(const EarlierRun &run, int detail)
+{
+    const std::string file = run.file.substr(detail > 1 ? 0 : run.file.rfind('/') + 1);
+    return device_of(run) + (detail > 0 ? " (" + file + ")" : "");
+}
+
+// By their devices; those of one device by their files too, by whole paths if need be.
 void name_rows(RackTable &table)
 {
-    std::map<std::string, std::size_t> times;
     for (RackRow &row : table.rows) {
-        row.name = device_of(*row.run);
-        ++times[row.name];
+        row.name = name_of(*row.run, 0);
     }
-    for (RackRow &row : table.rows) {
-        if (times[row.name] > 1) {
-            row.name += " (" + row.run->file + ")";
-            table.is_of_devices = false;
+    for (const int detail : {1, 2}) {
+        std::map<std::string, std::size_t> times;
+        for (const RackRow &row : table.rows) {
+            ++times[row.name];
+        }
+        for (RackRow &row : table.rows) {
+            if (times[row.name] > 1) {
+                row.name = name_of(*row.run, detail);
+                table.is_of_devices = false;
+            }
         }
     }
 }

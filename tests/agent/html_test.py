@@ -230,11 +230,18 @@ def test_runs_of_different_plans_have_a_table_each(page):
     assert [text(row[0]) for row in shown.rows()] == ["one", "three", "not run", "not run"]
 
 
-def test_runs_of_one_device_are_told_apart_by_their_files(page, tmp_path):
-    shown = page(Lines().finish(), Lines().finish())
-    assert [text(row[0]) for row in shown.rows()] == [
-        f"one ({tmp_path}/{at}.jsonl)" for at in range(2)]
-    assert text(shown.all("h2")[0]) == "plan.xml: 2 runs"
+def test_runs_of_one_device_are_told_apart_by_their_files(page):
+    shown = page(Lines().finish(), Lines().finish(), Lines(device="two").finish())
+    assert [text(row[0]) for row in shown.rows()] == ["one (0.jsonl)", "one (1.jsonl)", "two"]
+    assert text(shown.all("h2")[0]) == "plan.xml: 3 runs"
+
+
+def test_files_of_one_name_are_told_apart_by_their_paths(tmp_path):
+    for name in ("a", "b"):
+        (tmp_path / name).mkdir()
+        Lines().finish().write(tmp_path / name / "r.jsonl")
+    shown = Page(run(FPTEST, "html", "a/r.jsonl", "b/r.jsonl", cwd=tmp_path))
+    assert [text(row[0]) for row in shown.rows()] == ["one (a/r.jsonl)", "one (b/r.jsonl)"]
 
 
 def test_a_run_without_labels_is_named_by_its_file(page, tmp_path):

@@ -16,10 +16,10 @@ TAGS = set("html head meta title style body h1 h2 h3 h4 h5 h6 p section article 
            "table thead tbody tfoot tr th td dl dt dd ul li b strong details summary pre figure "
            "figcaption svg path circle text".split())
 # What must be noticed, lest nothing is.
-BAD = """<!DOCTYPE html><title>good</title><body><a href="#nowhere">x</a><a href="javascript:1">y</a>
+BAD = """<!DOCTYPE html><title>good</title><body>
+<a href="#nowhere">x</a><a href="javascript:1">y</a>
 <img src="http://127.0.0.1:9/none" onerror="document.title='x'"><div style="width: 999px">wide</div>
 <script>document.title = 'x'</script>"""
-
 
 
 @pytest.fixture(scope="module")

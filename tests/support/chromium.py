@@ -15,7 +15,8 @@ WORDS = ["chromium", "--headless", "--no-sandbox", "--disable-gpu", "--disable-d
 LOOK = """<!DOCTYPE html><meta charset="utf-8"><meta name="color-scheme" content="light dark">
 <body><script>
 function look(frame) {
-  const page = frame.contentDocument, root = page.documentElement, all = [...page.querySelectorAll('*')];
+  const page = frame.contentDocument, root = page.documentElement;
+  const all = [...page.querySelectorAll('*')];
   const links = [...page.querySelectorAll('[href]')].map(one => one.getAttribute('href'));
   const reached = [links[0], links[links.length >> 1], links.at(-1)].map(link => {
     frame.contentWindow.location.hash = link;
@@ -27,7 +28,8 @@ function look(frame) {
     loaded: frame.contentWindow.performance.getEntriesByType('resource').map(one => one.name),
     tags: [...new Set(all.map(one => one.localName))],
     acting: all.flatMap(one => one.getAttributeNames()).filter(name => /^on|^src$/.test(name)),
-    links, dead: links.filter(link => link[0] != '#' || !page.getElementById(link.slice(1))), reached,
+    links, reached,
+    dead: links.filter(link => link[0] != '#' || !page.getElementById(link.slice(1))),
     background: getComputedStyle(page.body).backgroundColor};
 }
 onload = () => {

@@ -55,7 +55,8 @@ class Lines:
 
 # What would be more than text in a page that took it as it is.
 HOSTILE = ["</pre></script></style></title><script>document.title='x'</script>",
-           "<img src=http://127.0.0.1:9/x onerror=\"document.title='x'\">", "<svg onload=document.title='x'>",
+           "<img src=http://127.0.0.1:9/x onerror=\"document.title='x'\">",
+           "<svg onload=document.title='x'>",
            "\" autofocus onfocus=\"document.title='x'\" x=\"", "' onclick='document.title=1",
            "javascript:document.title='x'", "&lt;b&gt; &amp; &#60; &quot;", "]]><!--",
            "{{constructor}} {} {0} %s", "a\u202eb\u2066c", "wide" * 500]

@@ -37,9 +37,9 @@ def runs_of(directory, devices, *options):
         make_program(programs / name, f"#!/system/bin/sh\n{script}\n")
     (out / "line-3.xml").write_text(PLAN)
     for device in range(1, devices + 1):
-        ended = on_device("fptest", "run", "--plan", "line-3.xml", "--timeout", "0.5", "--retry", "1",
-                          "--label", f"device=qm-{device:02}", "--json", f"{device:02}.jsonl",
-                          *options, options=("--bin", programs, "--out", out),
-                          cwd=out, env={"QM": str(device)})
+        ended = on_device(
+            "fptest", "run", "--plan", "line-3.xml", "--timeout", "1", "--retry", "1",
+            "--judge-limits", "--label", f"device=qm-{device:02}", "--json", f"{device:02}.jsonl",
+            *options, options=("--bin", programs, "--out", out), cwd=out, env={"QM": str(device)})
         assert ended.status in (0, 1), ended
     return sorted(out.glob("*.jsonl"))
