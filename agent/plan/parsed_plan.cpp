@@ -12,23 +12,6 @@
 
 namespace fptest
 {
-namespace
-{
-
-// Whether Mini-XML has read the same attributes, each once.
-bool has_attributes_of(mxml_node_t *node, const Tag &tag)
-{
-    if (mxmlElementGetAttrCount(node) != static_cast<int>(tag.attributes.size())) {
-        return false;
-    }
-    int index = 0;
-    return std::ranges::all_of(tag.attributes, [&](const Attribute &place) {
-        const char *name = nullptr;
-        return mxmlElementGetAttrByIndex(node, index++, &name) != nullptr && place.name == name;
-    });
-}
-
-} // namespace
 
 ParsedPlan::ParsedPlan(std::string text) : text_(std::move(text))
 {
@@ -75,7 +58,7 @@ bool ParsedPlan::read_change(const std::string &text)
     const std::size_t begin = begins_[number];
     const std::size_t size =
         scan(std::string_view(text_).substr(begin, end_of_piece(number) - begin)).front().end;
-    return before > begin && text_.size() - after < begin + size &&
+    return text_.size() - after < begin + size &&
            put(number, size, text.substr(begin, size + text.size() - text_.size()));
 }
 
@@ -126,9 +109,7 @@ bool ParsedPlan::put(std::size_t number, std::size_t size, const std::string &ta
     const auto tags = scan(tag);
     const ParsedPlan alone(tag);
     if (!is_empty_tag(old_tags, size) || !is_empty_tag(tags, tag.size()) || !alone.is_sound_ ||
-        alone.plan_->elements().size() != 1 ||
-        !has_attributes_of(alone.plan_->top(), tags.front()) ||
-        tags.front().name != mxmlGetElement(node) ||
+        alone.plan_->elements().size() != 1 || tags.front().name != mxmlGetElement(node) ||
         attribute(alone.plan_->top(), "name") != attribute(node, "name")) {
         return false;
     }
@@ -136,9 +117,9 @@ bool ParsedPlan::put(std::size_t number, std::size_t size, const std::string &ta
     while (mxmlElementGetAttrByIndex(node, 0, &name) != nullptr) {
         mxmlElementDeleteAttr(node, std::string(name).c_str());
     }
-    for (const Attribute &one : tags.front().attributes) {
-        mxmlElementSetAttr(node, one.name.c_str(),
-                           mxmlElementGetAttr(alone.plan_->top(), one.name.c_str()));
+    for (int index = 0; index < mxmlElementGetAttrCount(alone.plan_->top()); ++index) {
+        const char *value = mxmlElementGetAttrByIndex(alone.plan_->top(), index, &name);
+        mxmlElementSetAttr(node, name, value);
     }
     text_.replace(begins_[number], size, tag);
     for (std::size_t later = number + 1; later < begins_.size(); ++later) {

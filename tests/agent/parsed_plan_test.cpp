@@ -44,6 +44,9 @@ const std::vector<std::string> kTexts{
     in_plan("<Cmd name=\"x\" args=\"-a\"/>\n<Cmd name=\"y\" args=\"\" /><Cmd name=\"z\" />"),
     in_plan("<Cmd name=\"x\" args=\"-a\"/>\n<Cmd name=\"y\" args=\"\" ></Cmd>"),
     in_plan("<Cmd name=\"x\" args=\"-a\"/>\n<Cmd name=\"y\" args=\"\" result=\"0\"></Cmd>"),
+    in_plan("<Cmd name=\"x\" args=\"-a\"/>\n<Cmd name=\"y\" args=\"\" /></Cmd>"),
+    in_plan("<Cmd name=\"x\" args=\"-a\"/>\n<Cmd name=\"y\" args=\"\" >"),
+    in_plan("<Cmd name=\"x\" args=\"-a\"/>\n<Cmd name=\"y\" args=\"\"/>b\" />"),
     in_plan("<Cmd name=\"x\" args=\"-a\"/>\n<Cmd name=\"y2\" args=\"\" />"),
     in_plan("<Cmd name=\"x\" args=\"-a\"/>\n<Note name=\"y\" args=\"\" />"),
     in_plan("<Cmd name=\"x\" args=\"-b\"/>\n<Cmd name=\"y\" args=\"b\" />"),
@@ -75,6 +78,10 @@ std::string seen_in(const ParsedPlan &parsed)
         }
         seen += '>';
     }
+    for (const char *item : {"x", "y", "y2"}) {
+        const auto found = plan ? plan->resolve("A", item) : std::nullopt;
+        seen += found ? std::string(item) + " is " + std::to_string(found->number) : "";
+    }
     return parsed.text() + "\n" + seen + (plan ? "" : "not whole");
 }
 
@@ -104,6 +111,14 @@ TEST(ParsedPlan, ClearedSaysWhatTheClearedTextSays)
             EXPECT_EQ(seen_in(plan), seen_in(ParsedPlan(kTexts[1]))) << "after\n" << text;
         }
     }
+}
+
+TEST(ParsedPlan, IsSoundIfNothingIsToBeMended)
+{
+    for (const std::string &text : kTexts) {
+        EXPECT_FALSE(ParsedPlan(text).is_sound() && made_loadable(text)) << text;
+    }
+    EXPECT_TRUE(ParsedPlan(kTexts[1]).is_sound());
 }
 
 TEST(ParsedPlan, ParsesNothingButTheTagThatHasChanged)
