@@ -201,8 +201,8 @@ TEST_F(OtherRun, OneThatWasKilledIsNoRun)
 
 TEST_F(OtherRun, ItemsOfOneThatWasKilledAreWaitedFor)
 {
-    FptestProcess fptest(with_group({{"Stubborn", "note /tmp/scene/begun ignore-stop sleep 60"}}));
-    ASSERT_TRUE(wait_for_item("G/Stubborn"));
+    FptestProcess fptest(with_group({{"Stubborn", "ignore-stop note /tmp/scene/begun sleep 60"}}));
+    ASSERT_TRUE(wait_for_file("begun"));
     kill_run(fptest);
     const Ended seen = status();
     EXPECT_EQ(seen.status, kBusy);
