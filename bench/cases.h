@@ -35,6 +35,11 @@ Comparison ps_of_all();
 Comparison ps_of_one();
 Comparison ps_beside_toybox();
 
+// fptest run of so many items beside fptest send of the same commands; the figures are for
+// one item.
+Comparison agent_run_of_silent(int items);
+Comparison agent_run_of_reporting(int items);
+
 // For the growth: the library's two lookups, and the search by Mini-XML that they
 // are made of. No baselines.
 Comparison lookup_by_name(int items);

@@ -78,6 +78,10 @@ std::vector<Factory> all_comparisons(const Pace &pace)
     for (Comparison (*make)() : {trigger, ps_of_all, ps_beside_toybox, ps_of_one}) {
         all.emplace_back(make);
     }
+    for (Comparison (*make)(int) : {agent_run_of_silent, agent_run_of_reporting}) {
+        all.emplace_back(
+            [make, items = pace.most_items < 1000 ? 40 : 1000] { return make(items); });
+    }
     return all;
 }
 

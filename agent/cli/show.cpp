@@ -57,13 +57,13 @@ void print(const std::vector<Row> &rows)
     }
 }
 
-std::optional<Plan> read_shown(const std::string &file)
+std::shared_ptr<const Plan> read_shown(const std::string &file)
 {
     if (file.empty()) {
         require_stored_plan(": run one with fptest run --plan FILE, or name a file to show");
         return whole_stored_plan().annotated;
     }
-    return Plan::parse_annotated(require_file(file));
+    return ParsedPlan(require_file(file)).annotated();
 }
 
 Exit show(const std::string &file)

@@ -32,6 +32,15 @@ std::string new_mark()
     return fmt::format("{:x}-{:x}", now, ++count);
 }
 
+// Parses only what differs from the last text, byte for byte: two saves may leave a file of the
+// same time and size.
+ParsedPlan &parsed(const std::string &text)
+{
+    static ParsedPlan last{""};
+    last.read(text);
+    return last;
+}
+
 // Leaves the plan as it is if the disk is full.
 template <typename Make> void replace_if_possible(const Make &make)
 {
@@ -104,11 +113,16 @@ void require_room(std::size_t bytes)
     }
 }
 
+const ParsedPlan &parse_stored_plan()
+{
+    return parsed(read_stored_plan().value_or(""));
+}
+
 StoredPlan whole_stored_plan(std::chrono::milliseconds patience)
 {
     StoredPlan read;
     const auto make = [&read](const std::string &text) {
-        read.annotated = Plan::parse_annotated(text);
+        read.annotated = parsed(text).annotated();
         return read.annotated || Plan::load_as_library(text);
     };
     read.is_usable = made_of_stored_plan(read.text, make, patience);
@@ -117,7 +131,8 @@ StoredPlan whole_stored_plan(std::chrono::milliseconds patience)
 
 void mend_stored_plan()
 {
-    if (!made_loadable(read_stored_plan().value_or(""))) {
+    if (const ParsedPlan &plan = parse_stored_plan();
+        plan.is_sound() || !made_loadable(plan.text())) {
         return;
     }
     const Descriptor lock = lock_stored_plan();
@@ -190,7 +205,7 @@ std::string clear_reports(const std::vector<std::size_t> &elements)
     const Descriptor lock = lock_stored_plan();
     std::string text;
     const auto cleared = made_of_stored_plan(
-        text, [&](const std::string &plan) { return without_reports(plan, elements, mark); });
+        text, [&](const std::string &plan) { return parsed(plan).clear(elements, mark); });
     if (!cleared && Plan::load_as_library(text)) {
         return {}; // run with --force: nothing has reported into it
     }

@@ -5,9 +5,11 @@
 #pragma once
 
 #include "common/descriptor.h"
+#include "plan/parsed_plan.h"
 #include "plan/plan.h"
 
 #include <chrono>
+#include <memory>
 #include <optional>
 #include <string>
 #include <sys/stat.h>
@@ -57,10 +59,14 @@ auto made_of_stored_plan(std::string &text, const Make &make,
     }
 }
 
+// Its text as it is now, empty if it cannot be read; parsed if it is another one than the last
+// time. Good until the next call of a function of this file.
+const ParsedPlan &parse_stored_plan();
+
 struct StoredPlan {
     std::string text;
-    std::optional<Plan> annotated; // nullopt if it is not whole
-    bool is_usable = false;        // it is whole, or loads
+    std::shared_ptr<const Plan> annotated; // null if it is not whole
+    bool is_usable = false;                // it is whole, or loads
 };
 
 // Reads it again if it is not usable.

@@ -245,21 +245,28 @@ std::string as_loaded(const std::string &value)
     return plan ? attribute(plan->top(), "name").value_or("") : value;
 }
 
-std::optional<Plan> Plan::parse_annotated(std::string_view text)
+std::optional<Plan> Plan::parse_annotated(std::string_view text, std::vector<Tag> *places)
 {
     const std::string cleaned = sanitize_utf8(text);
-    const std::vector<Tag> tags = scan(cleaned);
+    std::vector<Tag> tags = scan(cleaned);
     if (!is_whole(tags)) {
         return std::nullopt;
     }
-    std::optional<Plan> plan = load_as_library(with_empty_values(cleaned, tags));
+    const std::string loaded = with_empty_values(cleaned, tags);
+    std::optional<Plan> plan = load_as_library(loaded);
     if (!plan) {
         return std::nullopt;
     }
+    tags = element_tags(*plan, std::move(tags));
+    if (loaded == text) {
+        if (places != nullptr) {
+            *places = std::move(tags);
+        }
+        return plan;
+    }
     // the library leaves these two without a value in its tree
-    const std::vector<Tag> places = element_tags(*plan, tags);
-    for (std::size_t number = 0; number < places.size(); ++number) {
-        for (const Attribute &place : places[number].attributes) {
+    for (std::size_t number = 0; number < tags.size(); ++number) {
+        for (const Attribute &place : tags[number].attributes) {
             if (!place.has_value && (place.name == "result" || place.name == "description")) {
                 mxmlElementSetAttr(plan->elements_[number], place.name.c_str(), nullptr);
             }

@@ -38,8 +38,9 @@ class Plan
 
     // For reading results: accepts attributes without a value, and makes control characters
     // and invalid UTF-8 visible first. nullopt if the text is not whole, as while it is being
-    // written.
-    static std::optional<Plan> parse_annotated(std::string_view text);
+    // written. The elements' tags are given of a text that was loaded as it is.
+    static std::optional<Plan> parse_annotated(std::string_view text,
+                                               std::vector<Tag> *places = nullptr);
 
     struct Group {
         std::string name;

@@ -53,17 +53,12 @@ std::optional<std::vector<Tag>> whole_tags(const std::string &text)
 
 } // namespace
 
-std::optional<std::string> without_reports(const std::string &text,
-                                           const std::vector<std::size_t> &numbers,
-                                           const std::string &mark)
+std::string without_reports_in(const std::string &text, const std::vector<Tag> &tags,
+                               const std::vector<std::size_t> &numbers, const std::string &mark)
 {
-    const auto tags = whole_tags(text);
-    if (!tags) {
-        return std::nullopt;
-    }
     AttributeEditor editor(text);
-    for (std::size_t number = 0; number < tags->size(); ++number) {
-        const Tag &tag = (*tags)[number];
+    for (std::size_t number = 0; number < tags.size(); ++number) {
+        const Tag &tag = tags[number];
         if (tag.kind > Tag::Kind::empty || std::ranges::find(numbers, number) == numbers.end()) {
             continue;
         }
@@ -79,13 +74,23 @@ std::optional<std::string> without_reports(const std::string &text,
     return editor.rest();
 }
 
+std::optional<std::string> without_reports(const std::string &text,
+                                           const std::vector<std::size_t> &numbers,
+                                           const std::string &mark)
+{
+    const auto tags = whole_tags(text);
+    return tags ? std::optional(without_reports_in(text, *tags, numbers, mark)) : std::nullopt;
+}
+
+bool is_xml(const std::string &text)
+{
+    return first_not_utf8(text) == text.npos && text.find("\xEF\xBF\xBE") == text.npos &&
+           text.find("\xEF\xBF\xBF") == text.npos;
+}
+
 std::optional<std::string> made_loadable(const std::string &text)
 {
-    // not all that sanitize_xml() replaces: control characters from U+007F on are XML's
-    const bool is_xml = first_not_utf8(text) == text.npos &&
-                        text.find("\xEF\xBF\xBE") == text.npos &&
-                        text.find("\xEF\xBF\xBF") == text.npos;
-    if ((is_xml && Plan::load_as_library(text)) || !Plan::parse_annotated(text)) {
+    if ((is_xml(text) && Plan::load_as_library(text)) || !Plan::parse_annotated(text)) {
         return std::nullopt;
     }
     const std::string cleaned = sanitize_xml(text);

@@ -24,6 +24,14 @@ std::optional<std::string> without_reports(const std::string &text,
                                            const std::vector<std::size_t> &numbers,
                                            const std::string &mark);
 
+// The same, of the text's elements that have these tags.
+std::string without_reports_in(const std::string &text, const std::vector<Tag> &tags,
+                               const std::vector<std::size_t> &numbers, const std::string &mark);
+
+// Whether it has only characters that XML has, or at least not all that sanitize_xml()
+// replaces: control characters from U+007F on are XML's.
+bool is_xml(const std::string &text);
+
 // A text that is whole but does not load, or has characters that are none in XML, with an empty
 // value for attributes that have none, and with invalid characters made visible; nullopt for any
 // other text.

@@ -12,6 +12,7 @@
 
 #include <chrono>
 #include <cstddef>
+#include <memory>
 #include <optional>
 #include <string>
 #include <sys/stat.h>
@@ -42,7 +43,8 @@ class ReportReader
     enum class When { as_time_allows, at_once };
     void poll(When when = When::as_time_allows);
 
-    void read(const std::optional<Plan> &plan);
+    // Null if it is not whole.
+    void read(const std::shared_ptr<const Plan> &plan);
 
     // The age of the change that poll() read last.
     std::chrono::nanoseconds since_change() const;

@@ -473,7 +473,7 @@ void Runner::move_on(const LibraryProcess::Event &event)
     active.moved_on_at = on_run_clock(event.time);
     active.reporting.expected = true;
     reader_.read(event.kind == LibraryProcess::Event::Kind::returned
-                     ? Plan::parse_annotated(library_.read_back())
+                     ? ParsedPlan(library_.read_back()).annotated()
                      : whole_stored_plan().annotated);
     // One that gathers once was still ending when the library took it for the gatherer, and
     // started none. With other items in its command, these would run twice.

@@ -181,15 +181,15 @@ class Judge
         if (reporting_.lost) {
             return fmt::format("what it reported is lost: the stored plan {}", kPlanLost);
         }
-        const std::string text = read_stored_plan().value_or("");
-        if (text.empty()) {
+        const ParsedPlan &plan = parse_stored_plan();
+        if (plan.text().empty()) {
             return "no report could be written: the stored plan is gone";
         }
-        if (!Plan::parse_annotated(text)) {
+        if (!plan.annotated()) {
             return "no report could be written: the stored plan is damaged";
         }
         std::string why;
-        if (!Plan::load_as_library(text, &why)) {
+        if (!plan.is_sound() && !Plan::load_as_library(plan.text(), &why)) {
             return fmt::format(
                 "no report can be written any more: the stored plan does not load ({})",
                 one_line(why));

@@ -122,6 +122,12 @@ std::u32string characters(std::string_view text)
 
 std::string sanitize_utf8(std::string_view bytes)
 {
+    const auto is_plain = [](char byte) {
+        return (byte >= ' ' && byte <= '~') || byte == '\t' || byte == '\n' || byte == '\r';
+    };
+    if (std::ranges::all_of(bytes, is_plain)) { // as most are, and this is fast
+        return std::string(bytes);
+    }
     return cleaned(bytes, [](char32_t code) {
         return code == '\t' || code == '\n' || code == '\r' ? code : visible(code);
     });
@@ -168,7 +174,8 @@ std::string replaced(std::string_view text, std::span<const Replacement> list)
 
 std::size_t first_not_utf8(std::string_view bytes)
 {
-    return utf8::find_invalid(bytes);
+    const auto is_ascii = [](char byte) { return static_cast<unsigned char>(byte) < 0x80; };
+    return std::ranges::all_of(bytes, is_ascii) ? bytes.npos : utf8::find_invalid(bytes);
 }
 
 std::size_t display_width(std::string_view text)

@@ -2,6 +2,7 @@
 // SPDX-License-Identifier: Apache-2.0
 
 // What items report within moments that a run seldom meets.
+#include "plan/parsed_plan.h"
 #include "run/report_reader.h"
 
 #include <gtest/gtest.h>
@@ -13,11 +14,12 @@ namespace
 
 constexpr int kGatherer = 2; // its element, after the XML declaration's and the group's
 
-std::optional<Plan> plan_with(const std::string &report)
+std::shared_ptr<const Plan> plan_with(const std::string &report)
 {
-    return Plan::parse_annotated("<?xml version=\"1.0\"?><CmdGroup name=\"G\">"
-                                 "<Cmd name=\"SensorProbe\" " +
-                                 report + "/></CmdGroup>");
+    return ParsedPlan("<?xml version=\"1.0\"?><CmdGroup name=\"G\">"
+                      "<Cmd name=\"SensorProbe\" " +
+                      report + "/></CmdGroup>")
+        .annotated();
 }
 
 TEST(ReportReader, KeepsAGatherersReportOfProgress100WhateverItReportsNext)
