@@ -7,10 +7,10 @@
 
 cache=$(realpath -m -- "${XDG_CACHE_HOME:-${HOME:-/root}/.cache}/quillmark")
 
-# the devices and fptest; what tests run; the engines
+# the devices and fptest; what tests run; the engines, and what those fetch tests with
 packages=(bubblewrap mksh toybox libmxml1 libexpat1 libfmt9 adb parallel
 	openssh-server openssh-client python3-pytest python3-pytest-xdist
-	python3-labgrid lava-dispatcher)
+	python3-labgrid lava-dispatcher git)
 
 # What these depend on for boards that they boot, flash or draw, half of all packages: to apt
 # they are installed already.
@@ -105,7 +105,8 @@ make_root()
 {
 	local root=$cache/$1 wanted
 
-	wanted=$(printf '%s\n' "${packages[@]}" "${@:2}" && cat /etc/os-release tests/lab/root.bash)
+	wanted=$(printf '%s\n' "${packages[@]}" "${@:2}" && list_left_out &&
+		declare -f bootstrap install_in && cat /etc/os-release)
 	mkdir -p -- "$cache"
 	exec {making}>"$cache/$1.lock"
 	flock "$making"
@@ -118,7 +119,7 @@ make_root()
 		rm -rf -- "$cache/archives"
 		cat >"$root/wanted" <<<"$wanted"
 	fi
-	flock --unlock "$making"
+	flock --shared "$making" # as long as this script runs
 }
 
 # Runs "${@:2}" in the tree, with root $1, which like the tree is read-only.
@@ -126,4 +127,16 @@ in_root()
 {
 	box "$cache/$1" --tmpfs /root --tmpfs /var/tmp --tmpfs /var/lib/lava --bind "$PWD" "$PWD" \
 		--chdir "$PWD" --remount-ro / --remount-ro "$PWD" -- "${@:2}"
+}
+
+# As in_root, but what is written to the root is so in memory, and lost with the end.
+in_scratch()
+{
+	export -f box
+	export cache
+	# shellcheck disable=SC2016 # for that bash
+	unshare --mount bash -euc 'mount -t tmpfs lab /mnt
+		mkdir /mnt/upper /mnt/work /mnt/root
+		mount -t overlay lab -o "lowerdir=$cache/$0,upperdir=/mnt/upper,workdir=/mnt/work" /mnt/root
+		box /mnt/root --bind "$PWD" "$PWD" --chdir "$PWD" --remount-ro "$PWD" -- "$@"' "$@"
 }

@@ -39,13 +39,13 @@ class Device:
         self.process = process
         self.directory = directory
         self.stack = stack
+        self.inside = first_inside(process.pid)
         self.listen()
 
     def listen(self):
         """Starts its sshd, whose every session enters the device."""
-        inside = first_inside(self.process.pid)
         configuration = self.directory / f"sshd-{self.number}"
-        enter = (f"nsenter --target {inside} --user --mount --pid --net --ipc --uts "
+        enter = (f"nsenter --target {self.inside} --user --mount --pid --net --ipc --uts "
                  "--preserve-credentials --wdns=/data/local/tmp -- /usr/bin/env "
                  "PATH=/system/bin TMPDIR=/tmp HOME=/data/local/tmp "
                  '/system/bin/sh ${SSH_ORIGINAL_COMMAND:+-c "$SSH_ORIGINAL_COMMAND"}')
@@ -67,6 +67,10 @@ ForceCommand exec {enter}
         assert eventually(lambda: "listening on" in content(
             self.directory / f"sshd-{self.number}.log"))
 
+    def make_root_writable(self):
+        output_of("nsenter", "--target", str(self.inside), "--user", "--mount",
+                  "--preserve-credentials", "mount", "-o", "remount,rw", "/")
+
     def ssh(self, *words):
         """The words of a client."""
         return ("ssh", "-F", "none", "-p", str(self.port), "-i", self.key,
@@ -86,8 +90,9 @@ ForceCommand exec {enter}
 
 
 @contextlib.contextmanager
-def devices(directory, count):
-    """That many devices, up meanwhile, each with another vendor selector."""
+def devices(directory, count, *options):
+    """That many devices, up meanwhile, with another vendor selector each; the options are those
+    of device/run."""
     with contextlib.ExitStack() as stack:
         output_of("ssh-keygen", "-q", "-t", "ed25519", "-N", "", "-f", directory / "key")
         processes, logs = [], []
@@ -95,7 +100,7 @@ def devices(directory, count):
             logs.append(directory / f"device-{number}.log")
             processes.append(stack.enter_context(started(
                 DEVICE_RUN, "--vendor", str(number % 3), "--adb", str(FIRST_ADB + number),
-                stderr=logs[-1].open("wb"))))
+                *options, stderr=logs[-1].open("wb"))))
         assert all(eventually(lambda log=log: "ready for adb" in content(log), 30)
                    for log in logs)
         yield [Device(directory, number, process, stack)
