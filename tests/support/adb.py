@@ -15,13 +15,15 @@ CLONE_NEWUSER, CLONE_NEWNET = 0x10000000, 0x40000000
 SIOCSIFFLAGS, IFF_UP = 0x8914, 1
 
 
-def take_a_network_of_its_own():
-    """Moves this process where its ports are nobody else's, if that is allowed."""
+def take_a_network_of_its_own(as_root=False):
+    """Moves this process where its ports are nobody else's, if that is allowed.
+
+    Root there has no rights to anything else, unless this is to be as root."""
     user, group = os.getuid(), os.getgid()
-    if ctypes.CDLL(None).unshare(CLONE_NEWUSER | CLONE_NEWNET) != 0:
+    if ctypes.CDLL(None).unshare(CLONE_NEWNET | (0 if as_root else CLONE_NEWUSER)) != 0:
         return
-    for file, text in {"setgroups": "deny", "uid_map": f"0 {user} 1",
-                       "gid_map": f"0 {group} 1"}.items():
+    maps = {"setgroups": "deny", "uid_map": f"0 {user} 1", "gid_map": f"0 {group} 1"}
+    for file, text in () if as_root else maps.items():
         pathlib.Path("/proc/self", file).write_text(text)
     with socket.socket() as some:
         fcntl.ioctl(some, SIOCSIFFLAGS, struct.pack("16sH14x", b"lo", IFF_UP))
