@@ -10,6 +10,7 @@
 #include "cli/run_options.h"
 #include "cli/selection.h"
 #include "module/device_lock.h"
+#include "module/item_output.h"
 #include "module/library_process.h"
 #include "module/log_file.h"
 #include "module/own_ps.h"
@@ -102,11 +103,22 @@ std::vector<std::string> names_of(const RoundPlan &round)
 }
 
 // Why a gatherer that runs is ended before this plan is stored; empty if it may go on. It may
-// save an earlier plan with its next report, or still work for a run that was killed.
-std::string why_gatherer_is_ended(const std::string &text, int vendor)
+// save an earlier plan with its next report, or still work for a run that was killed; and only
+// the run that started it knows what it prints, and gave it a directory.
+std::string why_gatherer_is_ended(const RunOptions &options, const RoundPlan &round,
+                                  const std::string &text, int vendor)
 {
-    if (ChildProcesses(getpid(), getpid(), vendor).of_gatherer().empty()) {
+    const std::vector<Leftover> running = ChildProcesses(getpid(), getpid(), vendor).of_gatherer();
+    if (running.empty()) {
         return {};
+    }
+    if ((options.judge_limits || !options.files.empty()) &&
+        std::ranges::any_of(names_of(round),
+                            [vendor](const auto &name) { return is_gatherer(name, vendor); })) {
+        return "its measurements and files would be the run's that started it";
+    }
+    if (std::ranges::any_of(running, ItemOutput::is_filling, &Leftover::process)) {
+        return "it has printed more than can be kept for it";
     }
     const std::string earlier = read_stored_plan().value_or("");
     if (!earlier.empty() && (has_marks(earlier) || !is_same_plan(earlier, text))) {
@@ -296,7 +308,7 @@ Exit run(RunOptions options)
     const bool is_placed = !is_sent && !options.plan.empty();
     Runner::Options for_runner = runner_options(options);
     const std::string why_ended =
-        why_gatherer_is_ended(is_sent ? checked.stored : checked.text, vendor);
+        why_gatherer_is_ended(options, round, is_sent ? checked.stored : checked.text, vendor);
     for_runner.ends_gatherer = !why_ended.empty();
     if (!options.quiet) {
         report_other_gatherer(round, plan, vendor, why_ended);

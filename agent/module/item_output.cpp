@@ -9,6 +9,9 @@
 #include <array>
 #include <cerrno>
 #include <fcntl.h>
+#include <filesystem>
+#include <fmt/core.h>
+#include <fstream>
 #include <string>
 #include <sys/mman.h>
 #include <sys/stat.h>
@@ -22,10 +25,11 @@ namespace
 
 constexpr off_t kPiece = off_t{64} * 1024;
 constexpr off_t kRoomLeft = off_t{1024} * 1024;
+constexpr char kName[] = "/memfd:fptest-output"; // as /proc has it
 
 } // namespace
 
-ItemOutput::ItemOutput() : file_(memory_file("fptest-output", MFD_ALLOW_SEALING))
+ItemOutput::ItemOutput() : file_(memory_file(kName + sizeof("/memfd:") - 1, MFD_ALLOW_SEALING))
 {
     if (!file_.is_open()) {
         throw std::system_error(errno, std::generic_category(), "no memory for what items print");
@@ -54,6 +58,20 @@ void ItemOutput::leave()
     lseek(file_.get(), end, SEEK_SET);
     static_cast<void>(ftruncate(file_.get(), end + kRoomLeft));
     fcntl(file_.get(), F_ADD_SEALS, F_SEAL_GROW);
+}
+
+bool ItemOutput::is_filling(pid_t process)
+{
+    const std::string file = fmt::format("/proc/{}/fd/1", process);
+    std::ifstream about(fmt::format("/proc/{}/fdinfo/1", process));
+    std::error_code unknown;
+    struct stat status {
+    };
+    std::string name;
+    off_t used = 0;
+    return std::filesystem::read_symlink(file, unknown).string().starts_with(kName) &&
+           stat(file.c_str(), &status) == 0 && about >> name >> used && // "pos: 4096"
+           status.st_size - used < kRoomLeft / 2;
 }
 
 // An item that opens /dev/stderr anew ("> /dev/stderr") truncates the file. What was taken

@@ -37,8 +37,11 @@ class ItemOutput
     void rewind();
 
     // A gatherer that stays keeps it to print into: its writes must neither fail from now
-    // on nor fill the memory.
+    // on, unless it prints more than 1 MiB, nor fill the memory.
     void leave();
+
+    // Whether so much of that has been used by the process that the next run may fail by it.
+    static bool is_filling(pid_t process);
 
   private:
     void note_truncation(off_t end);

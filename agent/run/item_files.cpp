@@ -121,6 +121,11 @@ void ItemFiles::settle(ItemRun &item, bool gathers) const
     std::error_code error;
     std::size_t visited = 0;
     fs::recursive_directory_iterator entry(item.directory, error);
+    if (error == std::errc::no_such_file_or_directory) {
+        add_warning(item, "its directory for files was removed");
+        item.directory.clear();
+        return;
+    }
     for (; !error && entry != fs::end(entry); entry.increment(error)) {
         if (++visited > kMostVisited || item.files.size() == kMostNamed) {
             add_warning(item, "not all of its files are named");

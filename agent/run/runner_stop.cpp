@@ -42,6 +42,11 @@ std::string described(const std::vector<Leftover> &processes)
     return join_and(all);
 }
 
+std::string interrupted_by(int signal)
+{
+    return fmt::format("interrupted by {}", name_for_people(signal));
+}
+
 // Those that do not end at once.
 template <typename Find> std::vector<Leftover> still_found(const Find &find)
 {
@@ -70,6 +75,10 @@ void Runner::read_signals()
         // pending, SIGHUP is taken before the Ctrl-C that came first
         if (signal_ != 0 && (signal == SIGTERM || signal_ == SIGHUP) &&
             now() - signal_taken_at_ < 1s) {
+            if (signal == SIGINT && run_.why_unfinished == interrupted_by(signal_)) {
+                signal_ = signal;
+                run_.why_unfinished = interrupted_by(signal);
+            }
             continue;
         }
         if (signal_ != 0) {
@@ -77,7 +86,7 @@ void Runner::read_signals()
         }
         signal_ = signal;
         signal_taken_at_ = now();
-        give_up(fmt::format("interrupted by {}", name_for_people(signal)));
+        give_up(interrupted_by(signal));
         stop_items();
     }
     look_at_limit();

@@ -149,13 +149,16 @@ for gathering in range(9):
 """
 
 
-def gather(bench, *options):
-    make_program(bench.bin / "SensorProbe", GATHERER)
+def gather(bench, *options, runs=1, prints=0):
+    make_program(bench.bin / "SensorProbe",
+                 GATHERER.replace("64", f"64\\n{'x' * prints}", 1))
     (bench.out / "plan.xml").write_text('<?xml version="1.0"?><P><CmdGroup name="G">'
                                         '<Cmd name="SensorProbe" args="-"/></CmdGroup></P>')
-    ended = on_device("fptest", "run", "--plan", "plan.xml", "--json", "json", *options, "P/G",
+    run = ["fptest", "run", "--plan", "plan.xml", "--json", "json", *options, "P/G"]
+    ended = on_device("sh", "-ec", ";".join([" ".join(run)] * runs),
                       options=("--bin", bench.bin, "--out", bench.out), cwd=bench.out)
     assert ended.status == 0, ended
+    return ended.err.splitlines()
 
 
 def test_a_gatherer_measures_before_it_reports(bench):
@@ -176,6 +179,22 @@ def test_an_empty_directory_of_the_gatherer_is_removed_in_the_end(bench):
     gather(bench, "--files", "files")
 
     assert bench.tree() == []
+
+
+@pytest.mark.parametrize("options", [["--judge-limits"], ["--files", "files"]])
+def test_a_gatherer_of_an_earlier_run_is_ended_first(bench, options):
+    assert gather(bench, *options, runs=2) == [
+        "fptest: the running gatherer is ended first: "
+        "its measurements and files would be the run's that started it"]
+
+    assert len(bench.end()["measurements"]) == 1
+
+
+def test_a_gatherer_that_has_printed_much_is_ended_before_its_next_run(bench):
+    said = gather(bench, runs=6, prints=300_000)
+
+    assert said == ["fptest: the running gatherer is ended first: "
+                    "it has printed more than can be kept for it"]
 
 
 # ---- fptest measure ----------------------------------------------------------------------
@@ -326,6 +345,13 @@ def test_a_directory_that_is_lost_with_the_device_is_told(bench):
     outcome = bench.run({"Item": "exit"}, "--files", "/tmp")
 
     assert "--files /tmp is lost when the virtual device ends" in outcome.err
+
+
+def test_an_item_may_remove_its_directory(bench):
+    bench.run({"Item": "rm -r $FPTEST_ITEM_DIR"}, "--files", "files")
+
+    assert (bench.end()["directory"], bench.end()["files"]) == (None, [])
+    assert bench.end()["warning"] == "its directory for files was removed"
 
 
 def test_an_item_whose_directory_cannot_be_made_has_a_warning(bench):
