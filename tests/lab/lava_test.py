@@ -6,7 +6,7 @@ import contextlib
 import pytest
 
 from support import lava, ssh
-from support.outside import content, eventually, output_of, status_of
+from support.outside import content, eventually, output_of, run, status_of
 
 ITEMS = {"Bringup/SpiCheck": "pass", "Bringup/DeadPixel": "fail", "Bringup/FingerWait": "fail",
          "Bringup/Volts": "pass", "Bringup/QuietRun": "fail"}
@@ -87,3 +87,18 @@ def test_two_of_three_are_lost(rack, repository, tmp_path):
     assert "0_signals/run" not in recorded[1]
     assert recorded[2]["0_signals/Bringup/SpiCheck"][0] == "pass"
     assert recorded[2]["0_signals/run"][0] == "fail"
+
+
+def test_a_cancelled_job_leaves_nothing_running(rack, repository, tmp_path):
+    def running_there():
+        return [run(*device.ssh("fptest status")).out.count("Endurance/BurnIn")
+                for device in rack]
+
+    with contextlib.ExitStack() as stack:
+        processes = jobs_on(rack, tmp_path, lambda kind: lava.job(
+            kind, repository, ("signals",), ARGUMENTS="demo/Endurance"), stack)
+        assert eventually(lambda: running_there() == [1, 1, 1], 60)
+        for process in processes:
+            process.terminate()
+        assert [status_of(process, 60) for process in processes] == [1, 1, 1]
+        assert eventually(lambda: running_there() == [0, 0, 0], 30)

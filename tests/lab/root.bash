@@ -122,6 +122,12 @@ make_root()
 	flock --shared "$making" # as long as this script runs
 }
 
+# Of those that really are in directory $1.
+count_packages()
+{
+	dpkg-query --admindir="$1/var/lib/dpkg" --show --showformat='${Version}\n' | grep -cvx 9999
+}
+
 # Runs "${@:2}" in the tree, with root $1, which like the tree is read-only.
 in_root()
 {

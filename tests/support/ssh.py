@@ -84,8 +84,8 @@ ForceCommand exec {enter}
 
     def lose(self):
         """The device and its sshd are gone."""
-        self.sshd.kill()
         self.lose_connections()
+        self.sshd.kill()
         self.process.kill()
 
 
