@@ -63,8 +63,9 @@ std::vector<std::string> words_after_mark(std::string_view line)
 
 bool is_name(const std::string &word)
 {
-    const auto is_letter_or_digit = [](unsigned char c) {
-        return c < 0x80 && std::isalnum(c) != 0;
+    const auto is_letter_or_digit = [](char c) {
+        const auto byte = static_cast<unsigned char>(c);
+        return byte < 0x80 && std::isalnum(byte) != 0;
     };
     return !word.empty() && word.size() <= kLongestName &&
            (is_letter_or_digit(word.front()) || word.front() == '_') &&
