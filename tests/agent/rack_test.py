@@ -180,18 +180,56 @@ def test_a_device_that_is_not_ready_is_named_and_lost(tmp_path):
         DEVICES[0] + ": Bringup/SpiCheck": [], "127.0.0.1:5700: no report/device": ["error"]}
 
 
-def test_ctrl_c_ends_the_runs_of_all(tmp_path):
-    status, out, err = on_rack("bash", "-c", """
-        timeout --preserve-status -s INT 2 "$@"; echo $?
-        for device in 127.0.0.1:5601 127.0.0.1:5602; do
-            until adb -s $device shell cat /data/local/tmp/fptest/r.jsonl | grep '"finish"'; do
-                sleep 0.05
-            done
-        done""", "bash", ADB_ALL, PLAN, "demo/Endurance", devices=2, cwd=tmp_path)
+def interrupted(tmp_path, script, devices):
+    """Where an earlier run has left a good all.xml."""
+    (tmp_path / "results").mkdir()
+    (tmp_path / "results/all.xml").write_text("<testsuites/>")
+    return on_rack("bash", "-c", script, "bash", ADB_ALL, PLAN, "demo/Endurance",
+                   devices=devices, cwd=tmp_path)
 
-    assert out.startswith("130\n")
-    assert out.count('"finished":false,"reason":"interrupted by SIGHUP"') == 2
-    assert (status, err) == (0, "")
+
+# of its group, as a terminal does, and of itself alone
+@pytest.mark.parametrize("end", ["timeout --preserve-status -s INT 3",
+                                 "timeout --preserve-status -s HUP 3",
+                                 "timeout --preserve-status --foreground -s TERM 3"])
+def test_an_interruption_ends_the_runs_and_pulls_their_reports(tmp_path, end):
+    status, out, _ = interrupted(tmp_path, f'exec {end} "$@"', 2)
+
+    assert status == 130
+    assert [line.partition("; ")[0] for line in sorted(out.splitlines())] == [
+        device + ": interrupted" for device in DEVICES[:2]]
+    of_all = cases(tmp_path / "results/all.xml")
+    for device in DEVICES[:2]:
+        assert '"finished":false,"reason":"interrupted by SIGHUP"' in content(
+            tmp_path / f"results/{device}.jsonl")
+        assert of_all[device + ": Endurance/BurnIn"] == ["error"]
+    assert not (tmp_path / "results/jobs").exists()
+
+
+FREEZE_AND_INTERRUPT = """
+    setsid "$@" & until grep -q BurnIn results/127.0.0.1:5602.log; do sleep 0.05; done
+    adb -s 127.0.0.1:5602 shell 'kill -STOP $(pgrep -f device/adbd)' & sleep 0.5
+    kill -TERM %1
+"""
+
+
+def test_an_interruption_does_not_wait_long_for_a_device(tmp_path):
+    status, out, _ = interrupted(tmp_path, FREEZE_AND_INTERRUPT + "wait %1", 2)
+
+    assert status == 130
+    assert out.count(": interrupted; last heard: ") == 2
+    of_all = cases(tmp_path / "results/all.xml")
+    assert of_all[DEVICES[0] + ": Endurance/BurnIn"] == ["error"]
+    assert of_all[DEVICES[1] + ": no report/device"] == ["error"]
+
+
+def test_a_second_ctrl_c_ends_it_at_once(tmp_path):
+    status, out, _ = interrupted(tmp_path, FREEZE_AND_INTERRUPT + """
+        sleep 2; kill -TERM %1; SECONDS=0; wait %1; echo $? $((SECONDS < 3))
+        ! ps -C bash -o args | grep '[r]un_on' """, 2)
+
+    assert (status, out.splitlines()[-1]) == (0, "130 1"), out
+    assert not (tmp_path / "results/all.xml").exists()
 
 
 @pytest.mark.parametrize("words, patience, complaint", [
@@ -213,11 +251,14 @@ def test_reports_that_cannot_be_written_are_no_success(directory):
 
 
 def test_without_a_device_it_says_so(tmp_path):
+    (tmp_path / "results").mkdir()
+    (tmp_path / "results/all.xml").write_text("of an earlier run")
     outcome = on_rack("sh", "-c", 'adb disconnect >&2; exec "$@"', "sh", ADB_ALL, PLAN,
                       "demo/Bringup", devices=1, cwd=tmp_path)
 
     assert outcome.status == 3
     assert outcome.err.endswith("lab/adb-all: adb lists no device\n")
+    assert not list((tmp_path / "results").iterdir())
 
 
 def test_what_devices_cost_is_measured():
