@@ -223,15 +223,6 @@ def test_an_interruption_does_not_wait_long_for_a_device(tmp_path):
     assert of_all[DEVICES[1] + ": no report/device"] == ["error"]
 
 
-def test_a_second_ctrl_c_ends_it_at_once(tmp_path):
-    status, out, _ = interrupted(tmp_path, FREEZE_AND_INTERRUPT + """
-        sleep 2; kill -TERM %1; SECONDS=0; wait %1; echo $? $((SECONDS < 3))
-        ! ps -C bash -o args | grep '[r]un_on' """, 2)
-
-    assert (status, out.splitlines()[-1]) == (0, "130 1"), out
-    assert not (tmp_path / "results/all.xml").exists()
-
-
 @pytest.mark.parametrize("words, patience, complaint", [
     ((), None, "it takes a plan, then paths and options of fptest run"),
     (("nowhere.xml", "demo/Bringup"), None, "nowhere.xml: no such plan"),

@@ -8,7 +8,7 @@
 cache=$(realpath -m -- "${XDG_CACHE_HOME:-${HOME:-/root}/.cache}/quillmark")
 
 # the devices and fptest; what tests run; the engines, and what those fetch tests with
-packages=(bubblewrap mksh toybox libmxml1 libexpat1 libfmt9 adb
+packages=(bubblewrap mksh toybox libmxml1 libexpat1 libfmt9 adb parallel
 	openssh-server openssh-client python3-pytest python3-pytest-xdist
 	python3-labgrid lava-dispatcher git)
 
@@ -21,7 +21,9 @@ left_out=(
 	mdadm mtools netpbm ntfs-3g osinfo-db parted pciutils qemu-system-x86 qemu-utils scrub
 	sleuthkit squashfs-tools supermin syslinux uuid-runtime zerofree
 	# of containers with devices, of SNMP and of graphs
-	bpftool graphviz linux-headers-amd64 python3-bpfcc python3-pysnmp4-mibs)
+	bpftool graphviz linux-headers-amd64 python3-bpfcc python3-pysnmp4-mibs
+	# of parallel
+	libdate-manip-perl sysstat)
 
 list_left_out()
 {
