@@ -35,7 +35,7 @@ std::string advice_on(const OtherRun &other)
         return "wait, or see what runs with ps";
     }
     return state_of(other.process()) == 'T'
-               ? fmt::format("it is suspended: resume it with kill -CONT {}", other.process())
+               ? fmt::format("resume it with kill -CONT {}", other.process())
                : fmt::format("wait longer, or end it with kill -KILL {}", other.process());
 }
 

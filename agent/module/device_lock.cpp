@@ -4,6 +4,7 @@
 #include "module/device_lock.h"
 
 #include "module/preflight.h"
+#include "module/processes.h"
 #include "plan/library_rules.h"
 #include "util/failure.h"
 #include "util/file_lock.h"
@@ -44,8 +45,9 @@ std::string text_of_note(const RunNote &note)
     for (const std::string &line : {note.plan, note.labels, note.tally, note.item}) {
         text += ellipsize(one_line(line), kColumns) + "\n";
     }
-    return text + fmt::format("{} {}\n", note.begun.time_since_epoch().count(),
-                              note.item_begun.time_since_epoch().count());
+    const auto count = [](RunNote::TimePoint time) { return time.time_since_epoch().count(); };
+    return text + fmt::format("{} {} {}\n", count(note.begun), count(note.item_begun),
+                              note.suspended ? count(*note.suspended) : 0);
 }
 
 std::optional<RunNote> read_as_note(const std::string &text)
@@ -57,11 +59,18 @@ std::optional<RunNote> read_as_note(const std::string &text)
     }
     RunNote::TimePoint::rep begun = 0;
     RunNote::TimePoint::rep item_begun = 0;
-    if (!(lines >> begun >> item_begun)) {
+    RunNote::TimePoint::rep suspended = 0;
+    if (!(lines >> begun >> item_begun >> suspended)) {
         return std::nullopt;
     }
-    note.begun = RunNote::TimePoint(RunNote::TimePoint::duration(begun));
-    note.item_begun = RunNote::TimePoint(RunNote::TimePoint::duration(item_begun));
+    const auto time = [](RunNote::TimePoint::rep count) {
+        return RunNote::TimePoint(RunNote::TimePoint::duration(count));
+    };
+    note.begun = time(begun);
+    note.item_begun = time(item_begun);
+    if (suspended != 0) {
+        note.suspended = time(suspended);
+    }
     return note;
 }
 
@@ -101,9 +110,9 @@ bool is_free(const Descriptor &directory)
     return !is_taken;
 }
 
-std::string time_since(RunNote::TimePoint time)
+std::string time_since(RunNote::TimePoint time, const RunNote &note)
 {
-    const auto now = std::chrono::steady_clock::now();
+    const auto now = note.suspended.value_or(std::chrono::steady_clock::now());
     return duration(std::max(0.0, std::chrono::duration<double>(now - time).count()));
 }
 
@@ -196,11 +205,13 @@ std::string OtherRun::described() const
                : note_ ? note_->plan + (note_->item.empty() ? "" : ", at " + note_->item)
                        : "";
     }
-    std::string text = fmt::format("process {}", process_);
+    std::string text =
+        fmt::format("process {}{}", process_, state_of(process_) == 'T' ? ", suspended" : "");
     if (note_) {
-        text += fmt::format(", {} for {}", note_->plan, time_since(note_->begun));
+        text += fmt::format(", {} for {}", note_->plan, time_since(note_->begun, *note_));
         if (!note_->item.empty()) {
-            text += fmt::format(", at {} for {}", note_->item, time_since(note_->item_begun));
+            text +=
+                fmt::format(", at {} for {}", note_->item, time_since(note_->item_begun, *note_));
         }
     }
     return text;

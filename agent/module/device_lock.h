@@ -26,6 +26,7 @@ struct RunNote {
     std::string item;   // that runs, "Bringup/SpiCheck (round 2)"; empty if none does
     TimePoint begun = std::chrono::steady_clock::now();
     TimePoint item_begun = begun;
+    std::optional<TimePoint> suspended; // since then, by Ctrl-Z
 };
 
 class DeviceLock
@@ -64,8 +65,9 @@ class OtherRun
     {
         return runs_;
     }
-    // "process 812, plans/demo.xml for 12.0 s, at Bringup/BurnIn for 3.2 s"; of one that was
-    // killed "plans/demo.xml, at Bringup/BurnIn", or empty if there is none.
+    // "process 812, plans/demo.xml for 12.0 s, at Bringup/BurnIn for 3.2 s", by the run's clock;
+    // "process 812, suspended, plans/..." of one that could go on; of one that was killed
+    // "plans/demo.xml, at Bringup/BurnIn", or empty if there is none.
     std::string described() const;
     // 0 if nobody knows.
     pid_t process() const

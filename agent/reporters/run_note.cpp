@@ -47,6 +47,21 @@ class NoteReporter : public Reporter
         ended(run, place);
     }
 
+    void paused(const Run &run) override
+    {
+        note_.suspended = std::chrono::steady_clock::now();
+        tell(run, note_.item);
+    }
+
+    void resumed(const Run &run) override
+    {
+        const auto away = std::chrono::steady_clock::now() - *note_.suspended;
+        note_.begun += away;
+        note_.item_begun += away;
+        note_.suspended.reset();
+        tell(run, note_.item);
+    }
+
     void finish(const Run &run) override
     {
         tell(run, "");

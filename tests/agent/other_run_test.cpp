@@ -5,11 +5,13 @@
 // second run.
 #include "run_test.h"
 
+#include <chrono>
 #include <csignal>
 #include <fcntl.h>
 #include <filesystem>
 #include <string>
 #include <sys/stat.h>
+#include <thread>
 #include <unistd.h>
 
 namespace fs = std::filesystem;
@@ -107,6 +109,31 @@ TEST_F(OtherRun, StatusNamesProcessItemTimesAndLabels)
     EXPECT_EQ(after.status, 0);
     EXPECT_EQ(after.out, "nothing runs\n");
     EXPECT_FALSE(fs::exists(kNote));
+}
+
+TEST_F(OtherRun, StatusSaysThatARunIsSuspendedAndDoesNotCountThatTime)
+{
+    const auto begin = std::chrono::steady_clock::now();
+    const Start start{.arguments = of_a_run(), .prepare = in_own_group};
+    FptestProcess fptest(start);
+    ASSERT_TRUE(wait_for_item("G/Other"));
+    fptest.signal(SIGTSTP);
+    ASSERT_TRUE(
+        eventually([] { return status().out.find(", suspended, ") != std::string::npos; }, 20));
+    const std::string seen = status().out;
+    std::this_thread::sleep_for(std::chrono::seconds(2));
+    EXPECT_EQ(status().out, seen);
+    fptest.signal(SIGCONT);
+    ASSERT_TRUE(eventually([&] { return status().out != seen; }));
+    const std::string after = status().out;
+    const std::chrono::duration<double> passed = std::chrono::steady_clock::now() - begin;
+    EXPECT_THAT(after, Not(HasSubstr("suspended")));
+    for (const std::string before : {"plan.xml for ", "at G/Other for "}) {
+        EXPECT_LT(std::stod(after.substr(after.find(before) + before.size())),
+                  passed.count() - 1.5);
+    }
+    fptest.signal(SIGINT);
+    fptest.wait();
 }
 
 TEST_F(OtherRun, StatusSaysWhatIsTriedAgain)
@@ -222,8 +249,7 @@ TEST_F(OtherRun, StopSaysThatARunIsSuspended)
     ASSERT_TRUE(wait_for_item("G/Other"));
     fptest.signal(SIGSTOP);
     EXPECT_THAT(stop({"--wait", "0.1"}).err,
-                HasSubstr("; it is suspended: resume it with kill -CONT " +
-                          std::to_string(fptest.pid()) + "\n"));
+                HasSubstr("; resume it with kill -CONT " + std::to_string(fptest.pid()) + "\n"));
     fptest.signal(SIGCONT);
     EXPECT_EQ(fptest.wait().status, 130); // it had been asked
 }
@@ -258,7 +284,7 @@ TEST_F(OtherRun, ItemsOfOneThatWasKilledAreWaitedFor)
 TEST_F(OtherRun, NoteThatNobodyHoldsIsBelievedInNothing)
 {
     const support::Process innocent({.arguments = {"sleep", "60"}});
-    device::write_file(kNote, "plan\n\n\nG/I\n" + std::to_string(innocent.pid()) + " 1\n");
+    device::write_file(kNote, "plan\n\n\nG/I\n" + std::to_string(innocent.pid()) + " 1 0\n");
     EXPECT_EQ(status().status, 0);
     EXPECT_EQ(stop().status, 0);
     device::write_file(kNote, "");
