@@ -118,6 +118,9 @@ def words_of(options):
     if "--quiet" in words:
         raise pytest.UsageError("--fptest-options: leave out --quiet: a device that says nothing "
                                 f"for {SILENCE} s is taken for lost")
+    if any(word.partition("=")[0] == "--hangup" for word in words):
+        raise pytest.UsageError("--fptest-options: leave out --hangup: what a lost device still "
+                                "runs is ended when it is connected again")
     return words
 
 

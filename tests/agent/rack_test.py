@@ -6,7 +6,7 @@ import xml.etree.ElementTree
 
 import pytest
 
-from support.outside import TREE, content, make_program, output_of, run
+from support.outside import BUILD, TREE, content, make_program, output_of, run
 
 pytestmark = pytest.mark.usefixtures("namespaces")
 
@@ -178,6 +178,9 @@ def test_a_device_that_is_not_ready_is_named_and_lost(tmp_path):
     assert status == 3
     assert cases(tmp_path / "results/all.xml") == {
         DEVICES[0] + ": Bringup/SpiCheck": [], "127.0.0.1:5700: no report/device": ["error"]}
+    assert 'message="adb lists it as unauthorized"' in content(tmp_path / "results/all.xml")
+    page = run(BUILD / "agent/fptest", "html", *sorted((tmp_path / "results").glob("*.jsonl"))).out
+    assert "127.0.0.1:5700" in page
 
 
 def interrupted(tmp_path, script, devices):
@@ -239,6 +242,19 @@ def test_reports_that_cannot_be_written_are_no_success(directory):
     assert run(ADB_ALL, PLAN, env={"RESULTS": directory}) == (
         3, "", f"lab/adb-all: {directory}: no reports can be written there; name another "
         "directory by RESULTS\n")
+
+
+def test_its_help_is_its_head():
+    outcome = run(ADB_ALL, "--help")
+
+    assert (outcome.status, outcome.err) == (0, "")
+    assert outcome.out.startswith("usage: lab/adb-all PLAN [ARGUMENT...]\n")
+
+
+def test_what_is_quiet_has_passed(tmp_path):
+    outcome = on_rack(ADB_ALL, PLAN, "demo/Bringup/SpiCheck", "--quiet", devices=1, cwd=tmp_path)
+
+    assert (outcome.status, outcome.out) == (0, DEVICES[0] + ": all passed\n")
 
 
 def test_without_a_device_it_says_so(tmp_path):

@@ -332,7 +332,9 @@ def test_a_bad_environment_is_named_in_one_line(tmp_path, parts, environment, co
     ({"results": pathlib.Path("/proc/no")}, "/proc/no: No such file or directory"),
     ({"options": "'"}, "--fptest-options: No closing quotation"),
     ({"options": "--quiet"}, "--fptest-options: leave out --quiet: a device that says nothing for "
-                             "60 s is taken for lost")])
+                             "60 s is taken for lost"),
+    ({"options": "--hangup=go-on"}, "--fptest-options: leave out --hangup: what a lost device "
+                                    "still runs is ended when it is connected again")])
 def test_a_bad_option_is_named_in_one_line(tmp_path, parts, options, complaint):
     (tmp_path / "rack.yaml").write_text(PLAN + TARGET)
 
