@@ -2,6 +2,7 @@
 // SPDX-License-Identifier: Apache-2.0
 
 // fptest run --resume: one whole report of a run that was cut off and went on.
+#include "gatherer.h"
 #include "run_test.h"
 
 #include <csignal>
@@ -93,6 +94,34 @@ TEST_F(ResumedRun, GoesOnAfterTheDeviceHasGoneDown)
     const Tap tap = parse_tap(ended.out);
     EXPECT_EQ(tap.points.at(0).inside.size(), 3U);
     EXPECT_THAT(tap.comments, ::testing::Contains("resumed from " + before));
+}
+
+// What is known of the run is not lost with the one that was to complete it.
+TEST_F(ResumedRun, HasTheEarlierResultsBeforeAnythingElse)
+{
+    const Items &items = kThreeOfWhichOneSleeps;
+    cut_off(items, SIGKILL);
+    const Gatherer gatherer("ignore-stop gather"); // which is ended first
+    FptestProcess fptest(with_json({"--resume", work("before"), "--plan", plan(group_of(items)),
+                                    "--grace", "1", "--junit", work("junit")}));
+    EXPECT_TRUE(wait_for_events("end", 1));
+    EXPECT_FALSE(processes_named(device::kProbe).empty());
+    fptest.signal(SIGINT);
+    EXPECT_EQ(fptest.wait(10).status, 130);
+    EXPECT_THAT(outcomes(), ElementsAre("Item: failed", "Other: not run", "Third: not run"));
+    EXPECT_EQ(parse_xml(junit()).all("testsuite").at(0).attributes.at("failures"), "1");
+    EXPECT_THAT(paths_run(), IsEmpty());
+}
+
+TEST_F(ResumedRun, HasTheEarlierResultsWhereAnotherFileCannotBegin)
+{
+    cut_off(kThreeOfWhichOneSleeps, SIGINT);
+    const Ended ended = run_fptest({"run", "--resume", work("before"), "--plan",
+                                    plan(group_of(kThreeOfWhichOneSleeps)), "--json", "/dev/full",
+                                    "--junit", work("junit")});
+    EXPECT_EQ(ended.status, 3);
+    EXPECT_THAT(ended.err, HasSubstr("/dev/full: No space left on device; nothing was run\n"));
+    EXPECT_EQ(parse_xml(junit()).all("testsuite").at(0).attributes.at("failures"), "1");
 }
 
 TEST_F(ResumedRun, GoesOnInTheRoundThatWasCutOff)
