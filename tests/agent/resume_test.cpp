@@ -150,6 +150,25 @@ TEST_F(ResumedRun, GoesOnInTheRoundThatWasCutOff)
     EXPECT_EQ(events("finish").at(0).at("summary").at(0).at("run"), 3);
 }
 
+// Under --as-group items may run after the one that ends the run.
+TEST_F(ResumedRun, KeepsWhatRanAfterTheFailureThatEndsIt)
+{
+    const Items items = {{"Item", "report G 100 1 bad"},
+                         {"Third", kPasses},
+                         {"Other", kSleepsOnce},
+                         {"Fourth", kPasses}};
+    for (const Lines &rule : {Lines{"--until-fail"}, Lines{"--stop-after", "1"}}) {
+        Lines options = rule;
+        options.emplace_back("--as-group");
+        cut_off(items, SIGKILL, options);
+        EXPECT_EQ(resume(items).status, 1);
+        EXPECT_THAT(outcomes(), ElementsAre("Item: failed", "Third: passed", "Other: not run",
+                                            "Fourth: not run"));
+        EXPECT_THAT(paths_run(), IsEmpty());
+        std::filesystem::remove(work("slept"));
+    }
+}
+
 TEST_F(ResumedRun, KeepsAttemptsAndWhatWasExpected)
 {
     const Items items = {{"Item", "report G 100 1 bad"},
