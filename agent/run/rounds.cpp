@@ -255,13 +255,6 @@ bool flush(const std::vector<Reporter *> &reporters, Signals &signals, bool is_i
 
 void finish(Run &run, const std::vector<Reporter *> &reporters)
 {
-    for (Suite &suite : run.suites) {
-        for (ItemRun &item : suite.items) {
-            if (is_between_attempts(item)) {
-                take_back_attempt(item);
-            }
-        }
-    }
     summarize(run);
     for (Reporter *reporter : reporters) {
         reporter->finish(run);
