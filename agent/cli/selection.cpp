@@ -10,6 +10,8 @@
 #include "util/text.h"
 #include "util/write.h"
 
+#include <algorithm>
+#include <cstddef>
 #include <map>
 #include <random>
 #include <set>
@@ -85,12 +87,32 @@ std::vector<Path> paths_of(const EarlierRun &earlier, const Plan &plan,
     return paths;
 }
 
-// For a list: what is to be run in the round, if that is known.
+// Whether it had come to its end, by the failures that it was to end after.
+bool is_over_by_failures(const EarlierRun &earlier)
+{
+    const auto failed = std::ranges::count_if(earlier.ended, [&](std::size_t index) {
+        return !is_success(earlier.attempts.at(index).outcome);
+    });
+    const Run &run = earlier.run;
+    return (run.until_fail && failed > 0) || (run.stop_after && failed >= *run.stop_after);
+}
+
+// For a list: what has not ended in each of its rounds, as far as their number is known.
 void leave_out_ended(RoundPlan &round, const EarlierRun &earlier)
 {
     std::vector<Job> jobs;
-    for (std::size_t at = 0; at < round.jobs.size(); ++at) {
-        if (earlier.run.rounds != 1 || !earlier.ended.contains(at)) {
+    const std::size_t all = round.jobs.size();
+    const auto &told = earlier.attempts;
+    const std::size_t begun = told.empty() || all == 0 ? 1 : told.rbegin()->first / all + 1;
+    const Run &run = earlier.run;
+    const bool has_more = (!run.rounds || begun < static_cast<std::size_t>(*run.rounds)) &&
+                          (!run.time_limit || run.seconds < *run.time_limit);
+    for (std::size_t at = 0; at < all && !is_over_by_failures(earlier); ++at) {
+        std::size_t times = 0;
+        while (times < begun && earlier.ended.contains(times * all + at)) {
+            ++times;
+        }
+        if (has_more || times < begun) {
             jobs.push_back(round.jobs[at]);
         }
     }

@@ -201,6 +201,39 @@ TEST_F(ResumedRun, HasTheOrderOfTheRunAndListsWhatIsLeft)
     EXPECT_EQ(events("run").at(0).at("seed"), 3);
 }
 
+TEST_F(ResumedRun, ListsWhatIsLeftOfSeveralRounds)
+{
+    const Items items = {{"Item", kPasses}, {"Other", "report G 100 1 bad"}, {"Third", kPasses}};
+    const auto listed_after = [&](std::size_t ends) {
+        std::string text;
+        std::size_t ended = 0;
+        for (const std::string &line : lines_of(json())) {
+            if (ended < ends && !line.starts_with("{\"event\":\"finish\"")) {
+                text += line + "\n";
+            }
+            ended += line.starts_with("{\"event\":\"end\"") ? 1 : 0;
+        }
+        Lines paths;
+        const Ended list = run_fptest({"run", "--list", "--resume", file("before", text)});
+        for (const std::string &line : lines_of(list.out)) {
+            paths.push_back(line.substr(0, line.find(' ')));
+        }
+        return paths;
+    };
+    run_group(items, {"--repeat", "2"});
+    EXPECT_EQ(listed_after(2).size(), 3U);
+    EXPECT_EQ(listed_after(3).size(), 3U);
+    EXPECT_THAT(listed_after(4), ElementsAre("P/G/Other", "P/G/Third"));
+    EXPECT_THAT(listed_after(5), ElementsAre("P/G/Third"));
+    EXPECT_THAT(listed_after(6), IsEmpty());
+    run_group(items, {"--for", "0.001", "--stop-after", "3"});
+    EXPECT_THAT(listed_after(2), ElementsAre("P/G/Third"));
+    EXPECT_THAT(listed_after(3), IsEmpty()) << "as the time is over";
+    run_group(items, {"--until-fail"});
+    EXPECT_EQ(listed_after(1).size(), 3U) << "as further rounds may begin";
+    EXPECT_THAT(listed_after(2), IsEmpty());
+}
+
 TEST_F(ResumedRun, RefusesAnotherPlanOrDevice)
 {
     const std::string before = cut_off(kThreeOfWhichOneSleeps, SIGKILL);
