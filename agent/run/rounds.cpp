@@ -97,6 +97,12 @@ class TakenOver
         if (is_over) {
             tell_again(place, last, &Reporter::ended);
         }
+        const auto [begin, end] = earlier_->late.equal_range(index);
+        for (auto late = begin; late != end; ++late) {
+            for (Reporter *reporter : reporters_) {
+                reporter->late(run_, place, late->second);
+            }
+        }
     }
 
     void tell_again(Place place, ItemRun attempt, void (Reporter::*how)(const Run &, Place))

@@ -150,6 +150,23 @@ TEST_F(ResumedRun, GoesOnInTheRoundThatWasCutOff)
     EXPECT_EQ(events("finish").at(0).at("summary").at(0).at("run"), 3);
 }
 
+TEST_F(ResumedRun, KeepsLateReports)
+{
+    const Items items = {{"Item", "report G 100 0 ok; (sleep 0.3; exec /system/bin/Item report G "
+                                  "100 1 late) &amp;"},
+                         {"Third", "sleep 0.7 report G 100 0 fine"},
+                         {"Other", kSleepsOnce}};
+    const std::string before = cut_off(items, SIGINT);
+    ASSERT_EQ(support::events_of(read_file(before), "late").size(), 1U);
+    const Ended ended = resume(items, {"--junit", work("junit")});
+    EXPECT_EQ(ended.status, 0);
+    EXPECT_THAT(ended.out, HasSubstr("\nG/Item: late report"));
+    ASSERT_EQ(events("late").size(), 1U);
+    EXPECT_EQ(events("late").at(0).at("description"), "late");
+    EXPECT_THAT(junit(), HasSubstr("<property name=\"late_report\""));
+    EXPECT_THAT(outcomes(), ElementsAre("Item: passed", "Third: passed", "Other: passed"));
+}
+
 // Under --as-group items may run after the one that ends the run.
 TEST_F(ResumedRun, KeepsWhatRanAfterTheFailureThatEndsIt)
 {
