@@ -10,6 +10,8 @@
 #include "util/text.h"
 #include "util/write.h"
 
+#include <algorithm>
+#include <cstddef>
 #include <map>
 #include <random>
 #include <set>
@@ -85,16 +87,69 @@ std::vector<Path> paths_of(const EarlierRun &earlier, const Plan &plan,
     return paths;
 }
 
-// For a list: what is to be run in the round, if that is known.
+// Whether it had come to its end, by the failures that it was to end after.
+bool is_over_by_failures(const EarlierRun &earlier)
+{
+    const auto failed = std::ranges::count_if(earlier.ended, [&](std::size_t index) {
+        return !is_success(earlier.attempts.at(index).outcome);
+    });
+    const Run &run = earlier.run;
+    return (run.until_fail && failed > 0) || (run.stop_after && failed >= *run.stop_after);
+}
+
+bool has_known_rounds(const Run &run)
+{
+    return run.rounds && !run.time_limit;
+}
+
+// What has not ended in each of its rounds, by the indices in a round.
+std::vector<std::size_t> left_of(const EarlierRun &earlier, bool begins_unknown_rounds)
+{
+    std::vector<std::size_t> left;
+    const std::size_t all = earlier.items.size();
+    const auto &told = earlier.attempts;
+    const std::size_t begun = told.empty() || all == 0 ? 1 : told.rbegin()->first / all + 1;
+    const Run &run = earlier.run;
+    const bool has_more = (!run.rounds || begun < static_cast<std::size_t>(*run.rounds)) &&
+                          (!run.time_limit || run.seconds < *run.time_limit) &&
+                          (has_known_rounds(run) || begins_unknown_rounds);
+    for (std::size_t at = 0; at < all; ++at) {
+        std::size_t times = 0;
+        while (times < begun && earlier.ended.contains(times * all + at)) {
+            ++times;
+        }
+        if (has_more || times < begun) {
+            left.push_back(at);
+        }
+    }
+    return left;
+}
+
+// For a list.
 void leave_out_ended(RoundPlan &round, const EarlierRun &earlier)
 {
     std::vector<Job> jobs;
-    for (std::size_t at = 0; at < round.jobs.size(); ++at) {
-        if (earlier.run.rounds != 1 || !earlier.ended.contains(at)) {
+    if (!is_over_by_failures(earlier)) {
+        for (const std::size_t at : left_of(earlier, true)) {
             jobs.push_back(round.jobs[at]);
         }
     }
     round.jobs = jobs;
+}
+
+// For --failed-of: what did not pass, and what the run did not come to.
+std::set<EarlierRun::Name> failed_or_left(const EarlierRun &earlier)
+{
+    std::set<EarlierRun::Name> items = earlier.failed;
+    if (!earlier.run.finished) {
+        for (const std::size_t at : left_of(earlier, false)) {
+            items.insert(earlier.items[at]);
+        }
+        for (const auto &[index, item] : earlier.unended) {
+            items.emplace(item.group, item.name);
+        }
+    }
+    return items;
 }
 
 } // namespace
@@ -110,6 +165,11 @@ std::optional<EarlierRun> read_earlier_run(RunOptions &options)
     if (earlier.is_cut) {
         say("{}: its last line is cut, and left out", earlier.file);
     }
+    const bool has_end = earlier.run.finished || !earlier.run.why_unfinished.empty();
+    if (options.resume.empty() && !has_end && !has_known_rounds(earlier.run)) {
+        say("{}: that run has no end: nobody knows whether it was to begin further rounds",
+            earlier.file);
+    }
     if (!options.resume.empty()) {
         options.repeat = earlier.run.rounds;
         options.time_limit = earlier.run.time_limit;
@@ -124,7 +184,7 @@ std::optional<EarlierRun> read_earlier_run(RunOptions &options)
 bool leaves_nothing(const RunOptions &options, const EarlierRun &earlier)
 {
     const bool is_resumed = !options.resume.empty();
-    const bool is_done = is_resumed ? earlier.run.finished : earlier.failed.empty();
+    const bool is_done = is_resumed ? earlier.run.finished : failed_or_left(earlier).empty();
     if (is_done) {
         say("{}: {}: nothing to do", earlier.file,
             is_resumed ? "that run has finished" : "no item of that run failed");
@@ -180,8 +240,8 @@ RoundPlan chosen_round(const RunOptions &options, const CheckedPlan &checked,
     Choice choice{options.paths, options.skips, options.as_group, options.force};
     const bool is_resumed = !options.resume.empty();
     if (earlier && !is_resumed) {
-        require_items(*earlier, earlier->failed, plan, checked.name);
-        choice.only = earlier->failed;
+        choice.only = failed_or_left(*earlier);
+        require_items(*earlier, *choice.only, plan, checked.name);
     }
     const std::vector<Path> paths =
         is_resumed ? paths_of(*earlier, plan, checked.name) : choose(choice, plan, checked.name);

@@ -209,8 +209,10 @@ std::string test_case(const Run &run, const ItemRun &item)
     const Value outcome = is_flaky || !item.expected.empty() ? Value(word(item.outcome)) : Value();
     const Value reason = is_flaky ? Value(item.reason) : Value();
     const Value expected = item.expected.empty() ? Value() : Value(item.expected);
-    const Value attempts =
-        run.retries > 0 ? Value(std::to_string(item.earlier.size() + 1)) : Value();
+    const bool has_begun = item.outcome != Outcome::not_run || item.start.has_value();
+    const Value attempts = run.retries > 0
+                               ? Value(std::to_string(item.earlier.size() + (has_begun ? 1 : 0)))
+                               : Value();
     const Value left = item.left_running.empty() ? Value() : Value(left_running(item));
     std::string inside =
         property(indent, "outcome", outcome) + property(indent, "reason", reason) +

@@ -196,6 +196,7 @@ class EarlierRunReader
                 earlier_.late.emplace(index_of(object), report_of(object));
             } else if (event == "retry") {
                 add_attempt(object);
+                running_.insert(index_of(object)); // it is to begin again
             } else if (event == "end") {
                 end(object);
             } else if (event == "finish") {
@@ -295,13 +296,9 @@ class EarlierRunReader
         const std::size_t index = index_of(object);
         ItemRun item = item_of(object);
         ItemRun &last = earlier_.attempts[index];
-        // one that was to be tried again may be told of twice
-        const auto before = value_or_none<std::size_t>(object, "attempt").value_or(1) - 1;
         if (!last.name.empty()) {
             item.earlier = std::exchange(last.earlier, {});
-            if (item.earlier.size() < before) {
-                item.earlier.push_back(std::move(last));
-            }
+            item.earlier.push_back(std::move(last));
         }
         last = std::move(item);
         running_.erase(index);
@@ -340,7 +337,7 @@ class EarlierRunReader
     EarlierRun earlier_;
     std::size_t number_ = 0; // of the line
     bool has_begun_ = false;
-    std::set<std::size_t> running_;
+    std::set<std::size_t> running_; // or are to begin again
 };
 
 } // namespace

@@ -39,14 +39,6 @@ void begin_attempt(ItemRun &item)
     item = std::move(next);
 }
 
-void take_back_attempt(ItemRun &item)
-{
-    std::vector<ItemRun> earlier = std::exchange(item.earlier, {});
-    item = std::move(earlier.back());
-    earlier.pop_back();
-    item.earlier = std::move(earlier);
-}
-
 Counts count(const std::vector<ItemRun> &items)
 {
     Counts counts;

@@ -58,10 +58,9 @@ struct ItemRun {
 
 // Whether the run is none the worse for it: it passed, if not at once, or failed as expected.
 bool is_success(Outcome outcome);
-// It is to be tried again: what it has been becomes an earlier attempt.
+// It is to be tried again: what it has been becomes an earlier attempt. If the run ends before
+// that, it has not been run.
 void begin_attempt(ItemRun &item);
-// What it is again where the run has ended before that.
-void take_back_attempt(ItemRun &item);
 
 // Items of one group that run in a row.
 struct Suite {

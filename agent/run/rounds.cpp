@@ -26,12 +26,110 @@ bool is_between_attempts(const ItemRun &item)
     return item.outcome == Outcome::not_run && !item.earlier.empty();
 }
 
+// What an earlier run came to, which the results of this one have as well.
+class TakenOver
+{
+  public:
+    TakenOver(Run &run, const std::vector<Reporter *> &reporters, const RoundPlan &plan,
+              const EarlierRun *earlier)
+        : run_(run), reporters_(reporters), plan_(plan), earlier_(earlier)
+    {
+        take_over_round();
+        while (has_more() && std::ranges::find(is_over_, false) == is_over_.end()) {
+            begin_next();
+        }
+    }
+
+    // Whether this job of the round has ended by that.
+    bool is_over(std::size_t at) const
+    {
+        return is_over_[at];
+    }
+
+    // Of rounds to come.
+    bool has_more() const
+    {
+        return earlier_ != nullptr && !earlier_->attempts.empty() &&
+               earlier_->attempts.rbegin()->first >=
+                   static_cast<std::size_t>(run_.round) * plan_.jobs.size();
+    }
+
+    void begin_next()
+    {
+        summarize(run_);
+        for (Reporter *reporter : reporters_) {
+            reporter->round_over(run_);
+        }
+        for (const Suite &suite : run_.suites) {
+            run_.before += count(suite.items);
+        }
+        run_.suites = plan_.suites;
+        ++run_.round;
+        take_over_round();
+    }
+
+  private:
+    void take_over_round()
+    {
+        is_over_.assign(plan_.jobs.size(), false);
+        const std::size_t first = (static_cast<std::size_t>(run_.round) - 1) * plan_.jobs.size();
+        for (std::size_t at = 0; earlier_ != nullptr && at < plan_.jobs.size(); ++at) {
+            if (earlier_->attempts.contains(first + at)) {
+                take_over(plan_.jobs[at], first + at);
+                is_over_[at] = earlier_->ended.contains(first + at);
+            }
+        }
+    }
+
+    void take_over(const Job &job, std::size_t index)
+    {
+        const Place place{job.suite, job.targets.front()->item};
+        ItemRun last = earlier_->attempts.at(index);
+        std::vector<ItemRun> attempts = std::exchange(last.earlier, {});
+        const bool is_over = earlier_->ended.contains(index);
+        if (!is_over) {
+            attempts.push_back(last);
+        }
+        for (const ItemRun &attempt : attempts) {
+            tell_again(place, attempt, &Reporter::retried);
+            begin_attempt(item_at(run_, place));
+        }
+        if (is_over) {
+            tell_again(place, last, &Reporter::ended);
+        }
+        const auto [begin, end] = earlier_->late.equal_range(index);
+        for (auto late = begin; late != end; ++late) {
+            for (Reporter *reporter : reporters_) {
+                reporter->late(run_, place, late->second);
+            }
+        }
+    }
+
+    void tell_again(Place place, ItemRun attempt, void (Reporter::*how)(const Run &, Place))
+    {
+        ItemRun &item = item_at(run_, place);
+        attempt.group = item.group; // as the plan has them
+        attempt.name = item.name;
+        attempt.earlier = std::move(item.earlier);
+        item = std::move(attempt);
+        for (Reporter *reporter : reporters_) {
+            reporter->started(run_, place);
+            (reporter->*how)(run_, place);
+        }
+    }
+
+    Run &run_;
+    const std::vector<Reporter *> &reporters_;
+    const RoundPlan &plan_;
+    const EarlierRun *earlier_;
+    std::vector<bool> is_over_; // each job of the round
+};
+
 class Rounds
 {
   public:
-    Rounds(Runner &runner, Run &run, const std::vector<Reporter *> &reporters,
-           const RoundPlan &plan, const EarlierRun *earlier)
-        : runner_(runner), run_(run), reporters_(reporters), plan_(plan), earlier_(earlier)
+    Rounds(Runner &runner, Run &run, const RoundPlan &plan, TakenOver &taken_over)
+        : runner_(runner), run_(run), plan_(plan), taken_over_(taken_over)
     {
     }
 
@@ -46,7 +144,7 @@ class Rounds
             if (is_last()) {
                 return true;
             }
-            begin_next();
+            taken_over_.begin_next();
         }
         if (!runner_.broken()) {
             runner_.end_round();
@@ -60,7 +158,7 @@ class Rounds
     {
         for (std::size_t at = 0; at < plan_.jobs.size(); ++at) {
             Job job = plan_.jobs[at];
-            bool is_over = take_over(job, at);
+            bool is_over = taken_over_.is_over(at);
             while (!is_over) {
                 runner_.make_way_for(job);
                 job.mark = clear_reports(job.elements());
@@ -79,14 +177,7 @@ class Rounds
     bool is_last() const
     {
         return !run_.why_ended.empty() || run_.round == run_.rounds ||
-               (run_.time_limit && run_.seconds >= *run_.time_limit && !has_more_to_take_over());
-    }
-
-    bool has_more_to_take_over() const
-    {
-        return earlier_ != nullptr && !earlier_->attempts.empty() &&
-               earlier_->attempts.rbegin()->first >=
-                   static_cast<std::size_t>(run_.round) * plan_.jobs.size();
+               (run_.time_limit && run_.seconds >= *run_.time_limit && !taken_over_.has_more());
     }
 
     bool has_failed(const Job &job)
@@ -100,44 +191,6 @@ class Rounds
         const ItemRun &item = item_at(run_, {job.suite, (*failed)->item});
         run_.why_ended = one_line(title(run_, item)) + " did not pass (--until-fail)";
         return true;
-    }
-
-    // What the earlier run came to. False if the item has not ended by that.
-    bool take_over(const Job &job, std::size_t at)
-    {
-        const std::size_t index =
-            (static_cast<std::size_t>(run_.round) - 1) * plan_.jobs.size() + at;
-        if (earlier_ == nullptr || !earlier_->attempts.contains(index)) {
-            return false;
-        }
-        const Place place{job.suite, job.targets.front()->item};
-        ItemRun last = earlier_->attempts.at(index);
-        std::vector<ItemRun> attempts = std::exchange(last.earlier, {});
-        const bool is_over = earlier_->ended.contains(index);
-        if (!is_over) {
-            attempts.push_back(last);
-        }
-        for (const ItemRun &attempt : attempts) {
-            tell_again(place, attempt, &Reporter::retried);
-            begin_attempt(item_at(run_, place));
-        }
-        if (is_over) {
-            tell_again(place, last, &Reporter::ended);
-        }
-        return is_over;
-    }
-
-    void tell_again(Place place, ItemRun attempt, void (Reporter::*how)(const Run &, Place))
-    {
-        ItemRun &item = item_at(run_, place);
-        attempt.group = item.group; // as the plan has them
-        attempt.name = item.name;
-        attempt.earlier = std::move(item.earlier);
-        item = std::move(attempt);
-        for (Reporter *reporter : reporters_) {
-            reporter->started(run_, place);
-            (reporter->*how)(run_, place);
-        }
     }
 
     bool is_tried_again(const Job &job) const
@@ -158,24 +211,10 @@ class Rounds
         return true;
     }
 
-    void begin_next()
-    {
-        summarize(run_);
-        for (Reporter *reporter : reporters_) {
-            reporter->round_over(run_);
-        }
-        for (const Suite &suite : run_.suites) {
-            run_.before += count(suite.items);
-        }
-        run_.suites = plan_.suites;
-        ++run_.round;
-    }
-
     Runner &runner_;
     Run &run_;
-    const std::vector<Reporter *> &reporters_;
     const RoundPlan &plan_;
-    const EarlierRun *earlier_;
+    TakenOver &taken_over_;
 };
 
 std::string failures(const std::vector<Reporter *> &reporters)
@@ -222,13 +261,6 @@ bool flush(const std::vector<Reporter *> &reporters, Signals &signals, bool is_i
 
 void finish(Run &run, const std::vector<Reporter *> &reporters)
 {
-    for (Suite &suite : run.suites) {
-        for (ItemRun &item : suite.items) {
-            if (is_between_attempts(item)) {
-                take_back_attempt(item);
-            }
-        }
-    }
     summarize(run);
     for (Reporter *reporter : reporters) {
         reporter->finish(run);
@@ -251,18 +283,19 @@ bool is_interrupted(const Signals &signals)
     throw Failure(Cause::device, "{}", why);
 }
 
-// The view first, as it overwrites nothing. If one fails, those that have begun say so.
-void begin(Run &run, const std::vector<Reporter *> &reporters, Signals &signals)
+// The view first, as it overwrites nothing. If one fails, those that have begun are to say so.
+std::string begin(Run &run, const std::vector<Reporter *> &reporters, Signals &signals,
+                  std::vector<Reporter *> &begun)
 {
-    std::vector<Reporter *> begun;
     for (Reporter *reporter : std::vector(reporters.rbegin(), reporters.rend())) {
         reporter->begin(run);
         begun.push_back(reporter);
         const std::string failure = reporter->failure();
         if (!failure.empty() && reporter->is_needed && !is_interrupted(signals)) {
-            run_nothing(fmt::format("{}; nothing was run", failure), run, begun, signals);
+            return failure;
         }
     }
+    return {};
 }
 
 } // namespace
@@ -273,7 +306,13 @@ bool run_rounds(const std::vector<Reporter *> &reporters, const Runner::Options 
 {
     run.suites = plan.suites;
     run.start = std::chrono::system_clock::now();
-    begin(run, reporters, signals);
+    std::vector<Reporter *> begun;
+    const std::string not_begun = begin(run, reporters, signals, begun);
+    // before all that takes time, and may be interrupted
+    TakenOver taken_over(run, not_begun.empty() ? reporters : std::as_const(begun), plan, earlier);
+    if (!not_begun.empty()) {
+        run_nothing(fmt::format("{}; nothing was run", not_begun), run, begun, signals);
+    }
     Runner runner(library, signals, run, reporters, options);
     runner.begin(read_stored_plan().value_or(""));
     const bool goes_on = !options.ends_gatherer || runner.goes_on();
@@ -292,7 +331,7 @@ bool run_rounds(const std::vector<Reporter *> &reporters, const Runner::Options 
         }
         if (goes_on) {
             clear_reports(all);
-            run.finished = Rounds(runner, run, reporters, plan, earlier).run_all();
+            run.finished = Rounds(runner, run, plan, taken_over).run_all();
         }
         if (!runner.broken()) {
             remove_marks();

@@ -91,6 +91,52 @@ TEST_F(FailedOf, UsesARunThatWasKilledAsFarAsItGoes)
     EXPECT_THAT(outcomes(), ElementsAre("Item: passed", "Other: failed"));
 }
 
+// It may have been killed between two items.
+TEST_F(FailedOf, RunsWhatTheRunDidNotComeTo)
+{
+    const Items items = {{"Item", kPasses}, {"Other", kPasses}, {"Third", kPasses}};
+    const auto cut_after = [](const std::string &kind, const std::string &text) {
+        return file("before",
+                    text.substr(0, text.find('\n', text.find("{\"event\":\"" + kind)) + 1));
+    };
+    run_group(items);
+    const std::string before = cut_after("end", json());
+    Ended ended = run_group(items, {"--failed-of", before});
+    EXPECT_EQ(ended.status, 0);
+    EXPECT_EQ(ended.err, "");
+    EXPECT_THAT(outcomes(), ElementsAre("Other: passed", "Third: passed"));
+    run_group(items, {"--repeat", "2"});
+    cut_after("end", json());
+    run_group(items, {"--failed-of", before});
+    EXPECT_EQ(events("end").size(), 3U) << "of the second round";
+    std::filesystem::remove(work("json"));
+    FptestProcess fptest(with_group({{"Item", kPasses}, {"Other", kSleeps}, {"Third", kPasses}}));
+    ASSERT_TRUE(wait_for_events("start", 2));
+    fptest.signal(SIGINT);
+    EXPECT_EQ(fptest.wait(10).status, 130);
+    file("before", json());
+    run_group(items, {"--failed-of", before});
+    EXPECT_THAT(outcomes(), ElementsAre("Other: passed", "Third: passed"));
+    // not what a run that has finished left out
+    run_group(kFour, {"--stop-after", "1"});
+    file("before", json());
+    run_group(kFour, {"--failed-of", before});
+    EXPECT_THAT(outcomes(), ElementsAre("Other: failed"));
+}
+
+TEST_F(FailedOf, SaysThatTheRunHasNoEnd)
+{
+    std::string text = read_file(left_by({{"Item", kPasses}}, {"--for", "0.001"}));
+    text.resize(text.find("{\"event\":\"finish\""));
+    const std::string before = file("before", text);
+    const Ended ended = run_group(kFour, {"--failed-of", before});
+    EXPECT_EQ(ended.status, 0);
+    EXPECT_EQ(ended.err, "fptest: " + before +
+                             ": that run has no end: nobody knows whether it was to begin further "
+                             "rounds\nfptest: " +
+                             before + ": no item of that run failed: nothing to do\n");
+}
+
 TEST_F(FailedOf, RefusesAnotherPlan)
 {
     const std::string before =

@@ -2,6 +2,7 @@
 // SPDX-License-Identifier: Apache-2.0
 
 // fptest run --resume: one whole report of a run that was cut off and went on.
+#include "gatherer.h"
 #include "run_test.h"
 
 #include <csignal>
@@ -95,6 +96,34 @@ TEST_F(ResumedRun, GoesOnAfterTheDeviceHasGoneDown)
     EXPECT_THAT(tap.comments, ::testing::Contains("resumed from " + before));
 }
 
+// What is known of the run is not lost with the one that was to complete it.
+TEST_F(ResumedRun, HasTheEarlierResultsBeforeAnythingElse)
+{
+    const Items &items = kThreeOfWhichOneSleeps;
+    cut_off(items, SIGKILL);
+    const Gatherer gatherer("ignore-stop gather"); // which is ended first
+    FptestProcess fptest(with_json({"--resume", work("before"), "--plan", plan(group_of(items)),
+                                    "--grace", "1", "--junit", work("junit")}));
+    EXPECT_TRUE(wait_for_events("end", 1));
+    EXPECT_FALSE(processes_named(device::kProbe).empty());
+    fptest.signal(SIGINT);
+    EXPECT_EQ(fptest.wait(10).status, 130);
+    EXPECT_THAT(outcomes(), ElementsAre("Item: failed", "Other: not run", "Third: not run"));
+    EXPECT_EQ(parse_xml(junit()).all("testsuite").at(0).attributes.at("failures"), "1");
+    EXPECT_THAT(paths_run(), IsEmpty());
+}
+
+TEST_F(ResumedRun, HasTheEarlierResultsWhereAnotherFileCannotBegin)
+{
+    cut_off(kThreeOfWhichOneSleeps, SIGINT);
+    const Ended ended = run_fptest({"run", "--resume", work("before"), "--plan",
+                                    plan(group_of(kThreeOfWhichOneSleeps)), "--json", "/dev/full",
+                                    "--junit", work("junit")});
+    EXPECT_EQ(ended.status, 3);
+    EXPECT_THAT(ended.err, HasSubstr("/dev/full: No space left on device; nothing was run\n"));
+    EXPECT_EQ(parse_xml(junit()).all("testsuite").at(0).attributes.at("failures"), "1");
+}
+
 TEST_F(ResumedRun, GoesOnInTheRoundThatWasCutOff)
 {
     const Items items = {{"Item", kPasses}, {"Other", "report G 100 0 ok await /tmp/scene/go"}};
@@ -119,6 +148,42 @@ TEST_F(ResumedRun, GoesOnInTheRoundThatWasCutOff)
     EXPECT_EQ(events("run").at(0).at("stop_after"), 9);
     EXPECT_EQ(events("finish").at(0).at("passed"), 6);
     EXPECT_EQ(events("finish").at(0).at("summary").at(0).at("run"), 3);
+}
+
+TEST_F(ResumedRun, KeepsLateReports)
+{
+    const Items items = {{"Item", "report G 100 0 ok; (sleep 0.3; exec /system/bin/Item report G "
+                                  "100 1 late) &amp;"},
+                         {"Third", "sleep 0.7 report G 100 0 fine"},
+                         {"Other", kSleepsOnce}};
+    const std::string before = cut_off(items, SIGINT);
+    ASSERT_EQ(support::events_of(read_file(before), "late").size(), 1U);
+    const Ended ended = resume(items, {"--junit", work("junit")});
+    EXPECT_EQ(ended.status, 0);
+    EXPECT_THAT(ended.out, HasSubstr("\nG/Item: late report"));
+    ASSERT_EQ(events("late").size(), 1U);
+    EXPECT_EQ(events("late").at(0).at("description"), "late");
+    EXPECT_THAT(junit(), HasSubstr("<property name=\"late_report\""));
+    EXPECT_THAT(outcomes(), ElementsAre("Item: passed", "Third: passed", "Other: passed"));
+}
+
+// Under --as-group items may run after the one that ends the run.
+TEST_F(ResumedRun, KeepsWhatRanAfterTheFailureThatEndsIt)
+{
+    const Items items = {{"Item", "report G 100 1 bad"},
+                         {"Third", kPasses},
+                         {"Other", kSleepsOnce},
+                         {"Fourth", kPasses}};
+    for (const Lines &rule : {Lines{"--until-fail"}, Lines{"--stop-after", "1"}}) {
+        Lines options = rule;
+        options.emplace_back("--as-group");
+        cut_off(items, SIGKILL, options);
+        EXPECT_EQ(resume(items).status, 1);
+        EXPECT_THAT(outcomes(), ElementsAre("Item: failed", "Third: passed", "Other: not run",
+                                            "Fourth: not run"));
+        EXPECT_THAT(paths_run(), IsEmpty());
+        std::filesystem::remove(work("slept"));
+    }
 }
 
 TEST_F(ResumedRun, KeepsAttemptsAndWhatWasExpected)
@@ -151,6 +216,39 @@ TEST_F(ResumedRun, HasTheOrderOfTheRunAndListsWhatIsLeft)
     resume(kThreeOfWhichOneSleeps);
     EXPECT_EQ(events("run").at(0).at("items"), items);
     EXPECT_EQ(events("run").at(0).at("seed"), 3);
+}
+
+TEST_F(ResumedRun, ListsWhatIsLeftOfSeveralRounds)
+{
+    const Items items = {{"Item", kPasses}, {"Other", "report G 100 1 bad"}, {"Third", kPasses}};
+    const auto listed_after = [&](std::size_t ends) {
+        std::string text;
+        std::size_t ended = 0;
+        for (const std::string &line : lines_of(json())) {
+            if (ended < ends && !line.starts_with("{\"event\":\"finish\"")) {
+                text += line + "\n";
+            }
+            ended += line.starts_with("{\"event\":\"end\"") ? 1 : 0;
+        }
+        Lines paths;
+        const Ended list = run_fptest({"run", "--list", "--resume", file("before", text)});
+        for (const std::string &line : lines_of(list.out)) {
+            paths.push_back(line.substr(0, line.find(' ')));
+        }
+        return paths;
+    };
+    run_group(items, {"--repeat", "2"});
+    EXPECT_EQ(listed_after(2).size(), 3U);
+    EXPECT_EQ(listed_after(3).size(), 3U);
+    EXPECT_THAT(listed_after(4), ElementsAre("P/G/Other", "P/G/Third"));
+    EXPECT_THAT(listed_after(5), ElementsAre("P/G/Third"));
+    EXPECT_THAT(listed_after(6), IsEmpty());
+    run_group(items, {"--for", "0.001", "--stop-after", "3"});
+    EXPECT_THAT(listed_after(2), ElementsAre("P/G/Third"));
+    EXPECT_THAT(listed_after(3), IsEmpty()) << "as the time is over";
+    run_group(items, {"--until-fail"});
+    EXPECT_EQ(listed_after(1).size(), 3U) << "as further rounds may begin";
+    EXPECT_THAT(listed_after(2), IsEmpty());
 }
 
 TEST_F(ResumedRun, RefusesAnotherPlanOrDevice)

@@ -5,6 +5,7 @@
 #include "run_test.h"
 
 #include <csignal>
+#include <filesystem>
 
 namespace
 {
@@ -154,6 +155,39 @@ TEST_F(RetriedRun, StopsAtAnInterruptInAnAttempt)
                                         "Item 4 failed", "Other 1 stopped"));
     EXPECT_EQ(events("finish").at(0).at("finished"), false);
     expect_items_to_end();
+}
+
+// An item that is to be tried again has not ended: what is interrupted is its next attempt.
+TEST_F(RetriedRun, HasNotEndedWhereItIsInterruptedBetweenAttempts)
+{
+    // what it leaves running is ended before the next attempt, and takes its time
+    const std::string leaves = "; /system/bin/Third ignore-stop sleep 60 &amp;";
+    const std::string text = plan(group_of({{"Other", kFlaky + leaves}}));
+    const Lines options = {"--plan", text, "--grace", "0.5"};
+    Lines first = with_json(options);
+    first.insert(first.end(), {"--retry", "2", "--junit", work("junit")});
+    FptestProcess fptest(first);
+    ASSERT_TRUE(wait_for_events("retry", 1));
+    fptest.signal(SIGINT);
+    const Ended ended = fptest.wait(10);
+    EXPECT_EQ(ended.status, 130);
+    EXPECT_THAT(without_times(ended.out),
+                HasSubstr("\n0 passed, 0 failed, 0 flaky, 1 retry, 1 not run, T s\n"));
+    EXPECT_THAT(attempts(), ElementsAre("Other 1 failed", "Other 2 not run"));
+    EXPECT_THAT(reasons(), ElementsAre("interrupted by Ctrl-C"));
+    EXPECT_EQ(events("finish").at(0).at("retries"), 1);
+    const Element only = parse_xml(junit()).all("testsuite").at(0).all("testcase").at(0);
+    EXPECT_EQ(only.all("error").at(0).attributes.at("type"), "not run");
+    EXPECT_EQ(only.all("rerunFailure").size(), 1U);
+    EXPECT_EQ(only.properties().at("attempts"), "1");
+
+    std::filesystem::rename(work("json"), work("before"));
+    const Ended listed = run_fptest({"run", "--list", "--failed-of", work("before")});
+    EXPECT_THAT(listed.out, StartsWith("P/G/Other  "));
+    Lines second = options;
+    second.insert(second.end(), {"--resume", work("before")});
+    EXPECT_EQ(run(second).status, 0);
+    EXPECT_THAT(attempts(), ElementsAre("Other 1 failed", "Other 2 flaky"));
 }
 
 TEST_F(RetriedRun, RefusesWhatRunsAsOneCommand)
