@@ -279,6 +279,12 @@ Exit run(RunOptions options)
     }
     const std::optional<EarlierRun> earlier = read_earlier_run(options);
     if (earlier && leaves_nothing(options, *earlier)) {
+        if (!options.resume.empty() && !options.plan.empty()) {
+            const CheckedPlan checked = open_plan(options);
+            require_same_plan(*earlier, digest_of(*checked.loaded.plan), checked.name);
+        }
+        say("{}: {}: nothing to do", earlier->file,
+            options.resume.empty() ? "no item of that run failed" : "that run has finished");
         return Exit::success;
     }
     Identity identity = identity_of(options.labels);

@@ -183,13 +183,18 @@ std::optional<EarlierRun> read_earlier_run(RunOptions &options)
 
 bool leaves_nothing(const RunOptions &options, const EarlierRun &earlier)
 {
-    const bool is_resumed = !options.resume.empty();
-    const bool is_done = is_resumed ? earlier.run.finished : failed_or_left(earlier).empty();
-    if (is_done) {
-        say("{}: {}: nothing to do", earlier.file,
-            is_resumed ? "that run has finished" : "no item of that run failed");
+    return options.resume.empty() ? failed_or_left(earlier).empty() : earlier.run.finished;
+}
+
+void require_same_plan(const EarlierRun &earlier, const std::string &digest,
+                       const std::string &plan)
+{
+    const std::string &was = earlier.run.identity.plan_digest;
+    if (!was.empty() && was != digest) {
+        throw Failure(Cause::input,
+                      "{} is of another plan: {} has other items, or other args; run it anew",
+                      earlier.file, one_line(plan));
     }
-    return is_done;
 }
 
 const EarlierRun *take_up(Run &run, const RunOptions &options,
@@ -204,12 +209,7 @@ const EarlierRun *take_up(Run &run, const RunOptions &options,
                       "{} is of vendor {}, and this device's is {}: their items are other programs",
                       earlier.file, earlier.run.vendor, run.vendor);
     }
-    const std::string &digest = earlier.run.identity.plan_digest;
-    if (!digest.empty() && digest != run.identity.plan_digest) {
-        throw Failure(Cause::input,
-                      "{} is of another plan: {} has other items, or other args; run it anew",
-                      earlier.file, one_line(run.plan));
-    }
+    require_same_plan(earlier, run.identity.plan_digest, run.plan);
     run.seed = earlier.run.seed;
     run.resumed = earlier.file;
     run.seconds_before = earlier.run.seconds;

@@ -22,8 +22,11 @@ void add_selection(CLI::App &command, RunOptions &options);
 // options are made to say. Says if its file is cut.
 std::optional<EarlierRun> read_earlier_run(RunOptions &options);
 
-// Says so.
 bool leaves_nothing(const RunOptions &options, const EarlierRun &earlier);
+
+// Throws a Failure if the run was one of a plan with another digest than that of the one so named.
+void require_same_plan(const EarlierRun &earlier, const std::string &digest,
+                       const std::string &plan);
 
 // The run that this one goes on with, or null. Throws a Failure if it is of another device.
 const EarlierRun *take_up(Run &run, const RunOptions &options,

@@ -80,6 +80,9 @@ TEST_F(ResumedRun, HasOneWholeReportAfterAnInterruption)
     EXPECT_EQ(again.err, "fptest: " + before + ": that run has finished: nothing to do\n");
     EXPECT_EQ(again.out, "");
     EXPECT_FALSE(is_there("json"));
+    expect_refused(before + " is of another plan: /tmp/scene/plan.xml has other items, or other "
+                            "args; run it anew",
+                   {}, {{"Item", kPasses}});
 }
 
 TEST_F(ResumedRun, GoesOnAfterTheDeviceHasGoneDown)
