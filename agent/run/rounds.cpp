@@ -284,7 +284,7 @@ bool is_interrupted(const Signals &signals)
 }
 
 // The view first, as it overwrites nothing. If one fails, those that have begun are to say so.
-std::string begin(Run &run, const std::vector<Reporter *> &reporters, Signals &signals,
+std::string begin(const Run &run, const std::vector<Reporter *> &reporters, const Signals &signals,
                   std::vector<Reporter *> &begun)
 {
     for (Reporter *reporter : std::vector(reporters.rbegin(), reporters.rend())) {
