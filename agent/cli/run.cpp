@@ -262,6 +262,16 @@ void report_no_vendor(const RunOptions &options)
     }
 }
 
+void say_nothing_to_do(const RunOptions &options, const EarlierRun &earlier)
+{
+    if (!options.resume.empty() && !options.plan.empty()) {
+        const CheckedPlan checked = open_plan(options);
+        require_same_plan(earlier, digest_of(*checked.loaded.plan), checked.name);
+    }
+    say("{}: {}: nothing to do", earlier.file,
+        options.resume.empty() ? "no item of that run failed" : "that run has finished");
+}
+
 Exit run(RunOptions options)
 {
     refuse_list_with_results(options);
@@ -279,12 +289,7 @@ Exit run(RunOptions options)
     }
     const std::optional<EarlierRun> earlier = read_earlier_run(options);
     if (earlier && leaves_nothing(options, *earlier)) {
-        if (!options.resume.empty() && !options.plan.empty()) {
-            const CheckedPlan checked = open_plan(options);
-            require_same_plan(*earlier, digest_of(*checked.loaded.plan), checked.name);
-        }
-        say("{}: {}: nothing to do", earlier->file,
-            options.resume.empty() ? "no item of that run failed" : "that run has finished");
+        say_nothing_to_do(options, *earlier);
         return Exit::success;
     }
     Identity identity = identity_of(options.labels);

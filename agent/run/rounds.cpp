@@ -290,7 +290,7 @@ std::string begin(const Run &run, const std::vector<Reporter *> &reporters, cons
     for (Reporter *reporter : std::vector(reporters.rbegin(), reporters.rend())) {
         reporter->begin(run);
         begun.push_back(reporter);
-        const std::string failure = reporter->failure();
+        std::string failure = reporter->failure();
         if (!failure.empty() && reporter->is_needed && !is_interrupted(signals)) {
             return failure;
         }
