@@ -521,7 +521,7 @@ void Runner::finish(RunningItem &active, TimePoint end)
     if (active.gathers && is_last) {
         result.left_running = note_left_running(active.element);
     }
-    if (is_last && (active.gathers || (running_.job.targets.size() > 1 && !gatherers_.empty()))) {
+    if (is_last && (active.gathers || running_.job.targets.size() > 1)) {
         for (const Leftover &one : left_by_gatherer()) {
             if (std::ranges::find(result.left_running, one.process, &Leftover::process) ==
                 result.left_running.end()) {

@@ -276,10 +276,10 @@ bool Runner::note_gatherer()
 {
     std::erase_if(gatherers_, [](const Leftover &one) { return !lives(one); });
     const std::vector<Leftover> found = library_.processes().of_gatherer();
-    for (const Leftover &one : found) {
-        if (std::ranges::find(gatherers_, one.process, &Leftover::process) == gatherers_.end()) {
-            gatherers_.push_back(one);
-        }
+    for (const Leftover &one : found) { // its shell may have become another program
+        std::erase_if(gatherers_,
+                      [&one](const Leftover &known) { return known.process == one.process; });
+        gatherers_.push_back(one);
     }
     return !found.empty();
 }
@@ -382,7 +382,7 @@ void Runner::end_round()
         require_plan();
     }
     // what no trigger reaches would wait for the next one beside the gatherer that it starts
-    if (gatherer_may_report_late_ || (!gatherers_.empty() && !left_by_gatherer().empty())) {
+    if (gatherer_may_report_late_ || !left_by_gatherer().empty()) {
         end_gatherer();
     }
     reader_.poll(ReportReader::When::at_once);
