@@ -149,16 +149,19 @@ def test_a_device_that_takes_no_plan_in_time_is_lost(tmp_path):
     assert (status, out) == (3, f"{DEVICES[0]}: lost; last heard: no answer within 1 s\n")
 
 
-# It wants a key that it never takes.
+# It wants a key that it never takes. A token more than adb asked for would make it begin anew.
 ASKS_FOR_A_KEY = """
 import socket, struct
 with socket.create_server(("127.0.0.1", 5700)) as listening:
     client, _ = listening.accept()
-    number = int.from_bytes(b"AUTH", "little")
-    while struct.pack("<2I", number, 3) not in client.recv(65536):
-        client.sendall(struct.pack("<6I", number, 1, 0, 20, 0, number ^ 0xffffffff) + bytes(20))
-    while client.recv(65536):
-        pass
+    packets = client.makefile("rb")
+    auth, token, public_key, kind = int.from_bytes(b"AUTH", "little"), 1, 3, 0
+    while kind != public_key:
+        _, kind, _, size, _, _ = struct.unpack("<6I", packets.read(24))
+        packets.read(size)
+        if kind != public_key:
+            client.sendall(struct.pack("<6I", auth, token, 0, 20, 0, auth ^ 0xffffffff) + bytes(20))
+    packets.read()
 """
 
 

@@ -90,7 +90,7 @@ class Rack:
         return self.devices[name].shell("fptest status").out.startswith("nothing runs")
 
 
-@pytest.fixture(scope="session")
+@pytest.fixture(scope="module")
 def devices(tmp_path_factory):
     names = [line.split(":")[0].strip() for line in content("/proc/net/dev").splitlines()[2:]]
     if names != ["lo"] or os.getuid() != 0:

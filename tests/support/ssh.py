@@ -2,6 +2,7 @@
 # SPDX-License-Identifier: Apache-2.0
 """Virtual devices that ssh, scp and adb reach, where all of the network is the tests' own."""
 import contextlib
+import fcntl
 import os
 import pathlib
 import signal
@@ -92,8 +93,9 @@ ForceCommand exec {enter}
 @contextlib.contextmanager
 def devices(directory, count, *options):
     """That many devices, up meanwhile, with another vendor selector each; the options are those
-    of device/run."""
+    of device/run. One after the other, as their ports, and adb's, are the same for all tests."""
     with contextlib.ExitStack() as stack:
+        fcntl.flock(stack.enter_context(open(__file__, encoding="utf-8")), fcntl.LOCK_EX)
         output_of("ssh-keygen", "-q", "-t", "ed25519", "-N", "", "-f", directory / "key")
         processes, logs = [], []
         for number in range(count):
