@@ -19,6 +19,7 @@
 #include <sys/stat.h>
 #include <sys/statvfs.h>
 #include <thread>
+#include <utility>
 
 namespace fptest
 {
@@ -42,19 +43,17 @@ ParsedPlan &parsed(const std::string &text)
 }
 
 // Leaves the plan as it is if the disk is full.
-template <typename Make> void replace_if_possible(const Make &make)
+void replace_if_possible(const MakePlan &make)
 {
-    const Descriptor lock = lock_stored_plan();
     std::string text;
-    const auto made = made_of_stored_plan(text, make);
     try {
-        if (made && *made != text) {
-            replace_stored_plan(*made);
-        }
+        remake_stored_plan(text, make);
     } catch (const Failure &) {
         return;
     }
 }
+
+constexpr int kRemakes = 10; // of one that is saved all the time
 
 } // namespace
 
@@ -135,10 +134,11 @@ void mend_stored_plan()
         plan.is_sound() || !made_loadable(plan.text())) {
         return;
     }
-    const Descriptor lock = lock_stored_plan();
-    if (const auto text = made_loadable(whole_stored_plan().text)) {
-        replace_stored_plan(*text);
-    }
+    std::string text;
+    remake_stored_plan(text, [](const std::string &saved) {
+        auto mended = made_loadable(saved);
+        return mended || !Plan::parse_annotated(saved) ? mended : std::optional(saved);
+    });
 }
 
 Descriptor lock_stored_plan()
@@ -177,6 +177,30 @@ void replace_stored_plan(const std::string &text)
     }
 }
 
+std::optional<std::string> remake_stored_plan(std::string &text, const MakePlan &make)
+{
+    Descriptor lock = lock_stored_plan();
+    auto made = made_of_stored_plan(text, make);
+    std::string replaced = text;
+    for (int tries = 0; tries < kRemakes && made && *made != replaced; ++tries) {
+        replace_stored_plan(*made);
+        const std::string old_file = fmt::format("/proc/self/fd/{}", lock.get());
+        const auto read = [&old_file] { return read_file(old_file); };
+        if (read() == replaced) {
+            break;
+        }
+        std::string saved;
+        auto remade = made_of_stored_plan(saved, make, kForWholePlan, read);
+        lock = lock_stored_plan();
+        if (!remade || read_stored_plan() != made) { // or it was saved in its new place since
+            break;
+        }
+        replaced = *std::exchange(made, std::move(remade));
+        text = saved;
+    }
+    return made;
+}
+
 void store_as_file(const std::string &text)
 {
     const Descriptor lock = lock_stored_plan();
@@ -202,24 +226,27 @@ void require_stored(const std::string &found, const std::string &wanted)
 std::string clear_reports(const std::vector<std::size_t> &elements)
 {
     std::string mark = new_mark();
-    const Descriptor lock = lock_stored_plan();
     std::string text;
-    const auto cleared = made_of_stored_plan(
-        text, [&](const std::string &plan) { return parsed(plan).clear(elements, mark); });
-    if (!cleared && Plan::load_as_library(text)) {
-        return {}; // run with --force: nothing has reported into it
-    }
-    if (!cleared) {
-        throw Failure(Cause::device, "{} {}: store it again", kStoredPlan, kPlanLost);
-    }
+    std::optional<std::string> cleared;
     try {
-        require_room(cleared->size());
-        replace_stored_plan(*cleared);
+        cleared = remake_stored_plan(text, [&](const std::string &plan) {
+            cleared = parsed(plan).clear(elements, mark);
+            if (cleared) {
+                require_room(cleared->size());
+            }
+            return cleared;
+        });
     } catch (const Failure &) {
         if (without_marks(*cleared) == without_marks(text)) {
             return {};
         }
         throw;
+    }
+    if (!cleared && Plan::load_as_library(text)) {
+        return {}; // run with --force: nothing has reported into it
+    }
+    if (!cleared) {
+        throw Failure(Cause::device, "{} {}: store it again", kStoredPlan, kPlanLost);
     }
     return mark;
 }

@@ -9,6 +9,7 @@
 #include "plan/plan.h"
 
 #include <chrono>
+#include <functional>
 #include <memory>
 #include <optional>
 #include <string>
@@ -41,15 +42,16 @@ void require_room(std::size_t bytes);
 // How long a text that is not whole is read again: somebody may be writing it.
 inline constexpr std::chrono::milliseconds kForWholePlan{500};
 
-// What make() returns for its text. As long as that is empty, the text is read again.
-template <typename Make>
+// What make() returns for the text that read() does. As long as that is empty, it is read again.
+template <typename Make, typename Read = decltype(&read_stored_plan)>
 auto made_of_stored_plan(std::string &text, const Make &make,
-                         std::chrono::milliseconds patience = kForWholePlan)
+                         std::chrono::milliseconds patience = kForWholePlan,
+                         const Read &read = read_stored_plan)
 {
     using Clock = std::chrono::steady_clock;
     const auto begin = Clock::now();
     for (int tries = 1;; ++tries) {
-        text = read_stored_plan().value_or("");
+        text = read().value_or("");
         auto made = make(text);
         // each try takes long if the plan is large and damaged
         if (made || (tries > 1 && Clock::now() - begin > patience)) {
@@ -86,7 +88,14 @@ Descriptor lock_stored_plan();
 // lock. Throws a Failure if it cannot.
 void replace_stored_plan(const std::string &text);
 
-// The same, under the lock: for a plan that is longer than what a command stores.
+// Puts in the stored plan's place what make() makes of it, under the lock, and returns that; the
+// text it was made of goes to the first argument. The library takes no lock: where an item has
+// saved the file that was replaced, its text is made anew. As made_of_stored_plan(); throws as
+// replace_stored_plan().
+using MakePlan = std::function<std::optional<std::string>(const std::string &)>;
+std::optional<std::string> remake_stored_plan(std::string &text, const MakePlan &make);
+
+// The text in its place, under the lock: for a plan that is longer than what a command stores.
 void store_as_file(const std::string &text);
 
 // Throws a Failure if the library has not stored the text.
