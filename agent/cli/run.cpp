@@ -117,12 +117,12 @@ std::string why_gatherer_is_ended(const RunOptions &options, const RoundPlan &ro
                             [vendor](const auto &name) { return is_gatherer(name, vendor); })) {
         return "its measurements and files would be the run's that started it";
     }
-    if (std::ranges::any_of(running, ItemOutput::is_filling, &Leftover::process)) {
-        return "it has printed more than can be kept for it";
-    }
     const std::string earlier = read_stored_plan().value_or("");
     if (!earlier.empty() && (has_marks(earlier) || !is_same_plan(earlier, text))) {
         return "it may have kept an earlier plan, and would write it back";
+    }
+    if (std::ranges::any_of(running, ItemOutput::is_filling, &Leftover::process)) {
+        return "it has printed more than can be kept for it";
     }
     return is_gatherer_outdated() ? "its program has been replaced since it started" : "";
 }

@@ -125,6 +125,25 @@ def test_a_device_whose_report_is_cut_on_its_way_is_lost(tmp_path):
     assert list(cases(tmp_path / "results/all.xml").values()) == [["error"]]
 
 
+def test_a_device_that_runs_for_another_is_left_to_it(tmp_path):
+    twice = """
+        RESULTS=first "$@" >out & until grep SpiCheck first/127.0.0.1:5601.log; do sleep 0.05; done >&2
+        "$@"; status=$?
+        wait $! || cat out
+        exit $status"""
+
+    status, out, _ = on_rack("bash", "-c", twice, "bash", ADB_ALL, PLAN, "demo/Bringup",
+                             devices=1, cwd=tmp_path)
+
+    assert status == 4
+    second, first = out.splitlines()
+    assert second.startswith(DEVICES[0] + ": another fptest uses it: ")
+    assert first.startswith(DEVICES[0] + ": 1 passed, 3 failed, ")
+    assert list(cases(tmp_path / "results/all.xml").values()) == [["error"]]
+    assert len(cases(tmp_path / "first/all.xml")) == 4
+    assert not (tmp_path / f"results/{DEVICES[0]}.jsonl").exists()
+
+
 def test_a_device_with_nothing_to_do_is_not_lost(tmp_path):
     twice = """
         "$@" demo/Bringup/SpiCheck >&2
