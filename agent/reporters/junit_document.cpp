@@ -159,6 +159,19 @@ std::string failure(const ItemRun &item, const char *if_failed, const char *othe
         xml_escaped(text));
 }
 
+// As Jenkins and GitLab find files.
+std::string attachments(const ItemRun &item)
+{
+    std::string lines;
+    for (const std::string &file : item.files) {
+        lines += fmt::format(
+            "{}[[ATTACHMENT|{}]]\n",
+            lines.empty() && !item.output.empty() && !item.output.ends_with('\n') ? "\n" : "",
+            one_line(item.directory + "/" + file));
+    }
+    return lines;
+}
+
 // With the elements that Surefire has for attempts before the last one.
 std::string verdict(const Run &run, const ItemRun &item)
 {
@@ -171,10 +184,10 @@ std::string verdict(const Run &run, const ItemRun &item)
         text = failure(item, "failure", "error", details(item));
     }
     for (const ItemRun &one : item.earlier) {
-        const std::string output = one.output.empty() ? "" : "output:\n" + one.output;
-        text += item.outcome == Outcome::flaky
-                    ? failure(one, "flakyFailure", "flakyError", details(one) + output)
-                    : failure(one, "rerunFailure", "rerunError", details(one) + output);
+        const std::string known =
+            details(one) + (one.output.empty() ? "" : "output:\n" + one.output) + attachments(one);
+        text += item.outcome == Outcome::flaky ? failure(one, "flakyFailure", "flakyError", known)
+                                               : failure(one, "rerunFailure", "rerunError", known);
     }
     return text;
 }
@@ -182,19 +195,6 @@ std::string verdict(const Run &run, const ItemRun &item)
 std::optional<std::string> value_of(const std::string &text)
 {
     return text.empty() ? std::nullopt : std::optional(text);
-}
-
-// As Jenkins and GitLab find files.
-std::string attachments(const ItemRun &item)
-{
-    std::string lines;
-    for (const std::string &file : item.files) {
-        lines += fmt::format(
-            "{}[[ATTACHMENT|{}]]\n",
-            lines.empty() && !item.output.empty() && !item.output.ends_with('\n') ? "\n" : "",
-            one_line(item.directory + "/" + file));
-    }
-    return lines;
 }
 
 std::string test_case(const Run &run, const ItemRun &item)

@@ -2,6 +2,7 @@
 # SPDX-License-Identifier: Apache-2.0
 """What items measure and leave in files, as runs tell it."""
 import json
+import re
 import xml.etree.ElementTree as ET
 
 import pytest
@@ -253,6 +254,18 @@ def test_files_are_kept_and_named_in_all_reports(bench):
     assert case.find("system-out").text.endswith(
         "\n[[ATTACHMENT|files/G/Item/dump]]\n[[ATTACHMENT|files/G/Item/sub/x]]\n")
     assert other.find("system-out") is None
+
+
+def test_files_of_every_attempt_are_named_in_junit(bench):
+    bench.run({"Item": LEAVES + "; exit 1"}, "--files", "files", "--junit", "junit",
+              "--exit-status", "--retry", "1")
+
+    case, = ET.parse(bench.out / "junit").iter("testcase")
+    named = [re.findall(r"\[\[ATTACHMENT\|(.*)\]\]", case.find(element).text)
+             for element in ("rerunError", "system-out")]
+    assert [len(files) for files in named] == [2, 2]
+    assert not set(named[0]) & set(named[1])
+    assert all((bench.out / file).exists() for files in named for file in files)
 
 
 def test_files_are_named_in_tap(bench):
