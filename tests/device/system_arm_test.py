@@ -8,7 +8,7 @@ import shutil
 
 import pytest
 
-from support.device_copy import system, with_system
+from support.device_copy import with_system
 from support.outside import make_program, output_of
 
 # since 6.7 the kernel has emulators of a user namespace's own

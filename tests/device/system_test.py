@@ -6,7 +6,7 @@ import shutil
 
 import pytest
 
-from support.device_copy import SHELL, elf_head, system, with_system
+from support.device_copy import elf_head, with_system
 from support.outside import make_program
 
 pytestmark = pytest.mark.usefixtures("namespaces")

@@ -5,8 +5,6 @@ import platform
 import shutil
 import struct
 
-import pytest
-
 from support.outside import make_program, on_device
 
 BITS64 = {"x86_64": 62, "aarch64": 183}
@@ -17,10 +15,8 @@ def elf_head(machine, is_64=True):
     return struct.pack("<4sBBB9xHH", b"\x7fELF", 2 if is_64 else 1, 1, 1, 3, machine)
 
 
-@pytest.fixture
-def system(tmp_path):
+def make_system(made):
     """A copy of a device's /system, in which nothing lacks."""
-    made = tmp_path / "pulled/system"
     for directory in ("bin", "lib64", "etc"):
         (made / directory).mkdir(parents=True)
     shutil.copy(SHELL, made / "bin/mksh")
@@ -31,7 +27,6 @@ def system(tmp_path):
     shutil.copy(shutil.which("toybox"), made / "bin/toybox")
     (made / "bin/grep").symlink_to("toybox")
     make_program(made / "bin/ps", "#!/system/bin/sh\necho the ps of the device\n")
-    return made
 
 
 def with_system(system, *command, options=(), **others):
