@@ -300,6 +300,7 @@ class EarlierRunReader
             item.earlier = std::exchange(last.earlier, {});
             item.earlier.push_back(std::move(last));
         }
+        earlier_.run.seconds += item.seconds.value_or(0);
         last = std::move(item);
         running_.erase(index);
         earlier_.unended.erase(index);
@@ -314,13 +315,13 @@ class EarlierRunReader
             running_.insert(index); // it has to begin again
         }
         if (outcome == Outcome::stopped || outcome == Outcome::not_run) {
-            unended(object) = item_of(object);
+            ItemRun &item = unended(object);
+            item = item_of(object);
+            earlier_.run.seconds += item.seconds.value_or(0);
             return;
         }
         add_attempt(object);
         earlier_.ended.insert(index);
-        earlier_.run.seconds +=
-            object.at("seconds").is_null() ? 0 : object.at("seconds").get<double>();
         if (!is_success(outcome)) {
             earlier_.failed.insert(name_at(index));
         }

@@ -192,11 +192,11 @@ TEST_F(ResumedRun, KeepsWhatRanAfterTheFailureThatEndsIt)
 TEST_F(ResumedRun, KeepsAttemptsAndWhatWasExpected)
 {
     const Items items = {{"Item", "report G 100 1 bad"},
-                         {"Third", "report G 100 1 worse"},
+                         {"Third", "sleep 0.4 report G 100 1 worse"},
                          {"Fourth", "report G 100 0 ok once /tmp/scene/once report G 100 1 loose"},
                          {"Other", "report G 100 0 ok once /tmp/scene/slept sleep 60"}};
     const std::string expect = file("known", "P/G/Item QM-7\n");
-    cut_off(items, SIGINT, {"--retry", "1", "--expect", expect});
+    cut_off(items, SIGKILL, {"--retry", "1", "--expect", expect});
     const Ended ended = resume(items);
     EXPECT_EQ(ended.status, 1);
     EXPECT_THAT(outcomes(),
@@ -205,6 +205,7 @@ TEST_F(ResumedRun, KeepsAttemptsAndWhatWasExpected)
     const Json finish = events("finish").at(0);
     EXPECT_EQ(finish.at("retries"), 2);
     EXPECT_EQ(finish.at("expected"), 1);
+    EXPECT_GE(finish.at("seconds"), 0.8) << "what every attempt took";
     EXPECT_THAT(paths_run(), ElementsAre("P/G/Other"));
 }
 
