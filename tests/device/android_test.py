@@ -197,7 +197,7 @@ def test_toolbox_has_more_columns_when_asked(release, options, added):
 
 
 def test_toolbox_of_7_selects_by_parent():
-    assert names(answer(7, "sleep 9 & ps --ppid $$")[1]) == ["sleep", "ps"]
+    assert names(answer(7, "sleep 9 & sleep 0.3; ps --ppid $$")[1]) == ["sleep", "ps"]
 
 
 # Debian's own toybox, told to show what Android's shows by itself.
