@@ -214,6 +214,7 @@ void ReportReader::begin_gathering()
     }
     const ItemReport report = report_of(*plan, active.element);
     if (active.starts_gatherer) {
+        gathered_.clear(); // a new process has no copy of them
         item_at(run_, active.place).report = {};
         active.reporting.seen.clear();
         active.reporting.taken_back.reset();

@@ -436,6 +436,7 @@ void Runner::end_item(const LibraryProcess::Event &event)
             ? note_left_running(is_watched ? running_.items.back().element : kNoElement)
             : std::vector<Leftover>();
     if (is_watched) {
+        take_output(); // also of a tee or the like, which ends a little later
         RunningItem &active = running_.items.back();
         ItemRun &result = item_at(run_, active.place);
         active.moved_on = true;
@@ -547,13 +548,15 @@ void Runner::notify_ended()
     }
 }
 
-// An item that is tried again has not ended.
+// An item that is tried again has not ended, even where that is left to a run that completes
+// this one.
 void Runner::notify_end_of(Place place)
 {
     ItemRun &item = item_at(run_, place);
     judge_by_the_run(item);
     const bool is_tried_again = !is_success(item.outcome) && item.outcome != Outcome::stopped &&
-                                item.expected.empty() && run_.why_unfinished.empty() &&
+                                item.expected.empty() &&
+                                (run_.why_unfinished.empty() || is_stopping()) &&
                                 item.earlier.size() < static_cast<std::size_t>(run_.retries);
     for (Reporter *reporter : reporters_) {
         is_tried_again ? reporter->retried(run_, place) : reporter->ended(run_, place);

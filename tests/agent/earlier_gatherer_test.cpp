@@ -123,4 +123,17 @@ TEST_F(EarlierGatherer, HasNoResultFromWhatItsCopyOfThePlanSaysOfAnEarlierRun)
     EXPECT_THAT(outcomes(), ElementsAre("SensorProbe: failed", "Item: passed"));
 }
 
+// What they say is the same in every run, and each saves its own copy of the plan.
+TEST_F(EarlierGatherer, IsNotTakenForTheOneAfterIt)
+{
+    const Items items = {{"Item", kPasses},
+                         {"SensorProbe", "--help; exec -a /system/bin/SensorProbe /system/bin/Item "
+                                         "gather report-here G SensorProbe 100 1 bad "
+                                         "gather report-here G SensorProbe 100 0 good sleep 60"}};
+    for (int run = 1; run <= 3; ++run) {
+        run_group(items, {"--judge-limits", "--retry", "1", "--timeout", "3"});
+        EXPECT_THAT(outcomes(), ElementsAre("Item: passed", "SensorProbe: flaky")) << run;
+    }
+}
+
 } // namespace

@@ -70,6 +70,18 @@ def test_a_line_of_the_output_measures(bench):
     assert "    measured vcore 1.213 V (1.15 to 1.25)\n" in outcome.out
 
 
+# as a tee or another filter of its output does
+PRINTS_AT_ITS_END = "(while kill -0 $$; do :; done 2>/dev/null; echo '#measure v 5 V 0 1') &"
+
+
+def test_what_an_items_child_prints_at_its_end_is_the_items(bench):
+    assert bench.run({"Item": PRINTS_AT_ITS_END, "Next": ":"}, "--judge-limits").status == 1
+    item, following = bench.ends()
+    assert (item["outcome"], item["left_running"]) == ("failed", [])
+    assert item["output"] == "#measure v 5 V 0 1\n"
+    assert (following["outcome"], following["output"]) == ("passed", "")
+
+
 def test_what_is_measured_outlives_the_kept_output(bench):
     bench.run({"Item": "echo '#measure first 1'; /usr/bin/seq 500000; "
                        "echo '#measure last 2'"})

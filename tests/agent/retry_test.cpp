@@ -202,4 +202,19 @@ TEST_F(RetriedRun, RefusesWhatRunsAsOneCommand)
         {"run", "--retry", "0"});
 }
 
+// Or a run that completes this one would take its first failure for the last.
+TEST_F(RetriedRun, LeavesARetryToDoWhereAFailureMeetsAnInterruption)
+{
+    for (int tries = 0; tries < 10; ++tries) {
+        std::filesystem::remove(work("pid"));
+        FptestProcess fptest(with_group({{"Item", "await /tmp/scene/pid report G 100 1 bad; "
+                                                  "kill -INT $(cat /tmp/scene/pid)"}},
+                                        {"--retry", "1"}));
+        support::write_file(work("new"), std::to_string(fptest.pid()));
+        std::filesystem::rename(work("new"), work("pid"));
+        EXPECT_EQ(fptest.wait().status, 130);
+        EXPECT_THAT(attempts().back(), Not("Item 1 failed"));
+    }
+}
+
 } // namespace
