@@ -71,7 +71,7 @@ def test_the_manuals_line_runs_a_group(there, tmp_path):
 @contextlib.contextmanager
 def endurance_at_a_terminal(there):
     """A run at a terminal, as soon as its view shows the item."""
-    words = there.words("shell", "-t", f"fptest run --plan {PLACE}/demo.xml {REPORTS} "
+    words = there.words("shell", "-t", f"TERM=xterm fptest run --plan {PLACE}/demo.xml {REPORTS} "
                                        "demo/Endurance demo/Bringup")
     with at_a_terminal(*words) as (process, terminal):
         shown = b""

@@ -30,6 +30,12 @@ def cases(path):
         for suite in suites(path) for case in suite.iter("testcase")}
 
 
+def errors(path):
+    """What the report of several devices says of those without a report."""
+    return {suite.get("name").removesuffix(": no report"): suite.find("testcase/error").get("message")
+            for suite in suites(path) if suite.get("name").endswith(": no report")}
+
+
 def test_three_devices_run_a_group_and_their_reports_are_joined(tmp_path):
     status, out, _ = on_rack(ADB_ALL, PLAN, "demo/Bringup", "--timeout", "30", cwd=tmp_path)
 
@@ -91,9 +97,8 @@ def test_a_device_that_is_lost_is_named_and_the_others_go_on(tmp_path):
     assert lines[1].startswith(DEVICES[1] + ": lost; last heard: Bringup/")
     assert lines[2].startswith(DEVICES[2] + ": 1 passed, 3 failed, ")
     assert status == 3
-    of_all = cases(tmp_path / "results/all.xml")
-    assert len(of_all) == 4 + 1 + 4
-    assert of_all[DEVICES[1] + ": no report/device"] == ["error"]
+    assert len(cases(tmp_path / "results/all.xml")) == 4 + 1 + 4
+    assert errors(tmp_path / "results/all.xml") == dict([lines[1].split(": ", 1)])
 
 
 def test_a_device_that_no_longer_answers_is_lost(tmp_path):
@@ -109,7 +114,7 @@ def test_a_device_that_no_longer_answers_is_lost(tmp_path):
     assert lines[0].startswith(DEVICES[0] + ": 1 passed, 3 failed, ")
     assert lines[1].startswith(DEVICES[1] + ": lost, it does not answer; last heard: Bringup/")
     assert status == 3
-    assert cases(tmp_path / "results/all.xml")[DEVICES[1] + ": no report/device"] == ["error"]
+    assert errors(tmp_path / "results/all.xml") == dict([lines[1].split(": ", 1)])
 
 
 def test_a_device_whose_report_is_cut_on_its_way_is_lost(tmp_path):
@@ -122,7 +127,7 @@ def test_a_device_whose_report_is_cut_on_its_way_is_lost(tmp_path):
 
     assert status == 3
     assert out.startswith(DEVICES[0] + ": lost with its report; last heard: status 0 ")
-    assert list(cases(tmp_path / "results/all.xml").values()) == [["error"]]
+    assert errors(tmp_path / "results/all.xml") == dict([out.rstrip().split(": ", 1)])
 
 
 def test_a_device_that_runs_for_another_is_left_to_it(tmp_path):
@@ -139,21 +144,91 @@ def test_a_device_that_runs_for_another_is_left_to_it(tmp_path):
     second, first = out.splitlines()
     assert second.startswith(DEVICES[0] + ": another fptest uses it: ")
     assert first.startswith(DEVICES[0] + ": 1 passed, 3 failed, ")
-    assert list(cases(tmp_path / "results/all.xml").values()) == [["error"]]
+    assert errors(tmp_path / "results/all.xml") == dict([second.split(": ", 1)])
     assert len(cases(tmp_path / "first/all.xml")) == 4
     assert not (tmp_path / f"results/{DEVICES[0]}.jsonl").exists()
+
+
+def test_calls_at_once_have_each_their_own_reports(tmp_path):
+    make_program(tmp_path / "adb", """#!/bin/sh
+        case $* in *pull*) touch pulls; until [ -e over ]; do sleep 0.05; done;; esac
+        exec /usr/bin/adb "$@" """)
+    twice = """
+        RESULTS=first PATH=$PWD:$PATH "$@" demo/Bringup/SpiCheck >&2 &
+        until [ -e pulls ]; do sleep 0.05; done
+        "$@" demo/Gather/SensorProbe >&2 && touch over && wait $! && adb shell ls /data/local/tmp"""
+
+    status, out, err = on_rack("bash", "-c", twice, "bash", ADB_ALL, PLAN, devices=1, cwd=tmp_path)
+
+    assert status == 0, err
+    assert cases(tmp_path / "first/all.xml") == {DEVICES[0] + ": Bringup/SpiCheck": []}
+    assert cases(tmp_path / "results/all.xml") == {DEVICES[0] + ": Gather/SensorProbe": []}
+    assert '"SpiCheck"' in content(tmp_path / f"first/{DEVICES[0]}.jsonl")
+    assert out == ""
+
+
+def test_a_device_that_lacks_a_program_says_so_in_its_report(tmp_path):
+    (tmp_path / "plan.xml").write_text('<P><CmdGroup name="G"><Cmd name="Nowhere" args=""/>'
+                                       '</CmdGroup></P>')
+
+    status, out, _ = on_rack(ADB_ALL, "plan.xml", devices=1, cwd=tmp_path)
+
+    assert status == 3
+    assert "Nowhere" in out
+    assert errors(tmp_path / "results/all.xml") == dict([out.rstrip().split(": ", 1)])
+
+
+def test_a_device_without_fptest_is_broken_and_not_busy(tmp_path):
+    make_program(tmp_path / "adb", """#!/bin/bash
+        exec /usr/bin/adb "${@/fptest status/no-such-fptest status}" """)
+
+    status, out, _ = on_rack("bash", "-c", 'PATH=$PWD:$PATH "$@"', "bash", ADB_ALL, PLAN,
+                             devices=1, cwd=tmp_path)
+
+    assert status == 3
+    assert "no-such-fptest" in out and "another" not in out
+    assert errors(tmp_path / "results/all.xml") == dict([out.strip().split(": ", 1)])
+
+
+def test_a_report_whose_pull_is_interrupted_is_pulled_again(tmp_path):
+    make_program(tmp_path / "adb", """#!/bin/bash
+        case $* in *pull*r.xml*) test -e pulled || { : >pulled; exit 1; } ;; esac
+        exec /usr/bin/adb "$@" """)
+
+    status, out, _ = on_rack("bash", "-c", 'PATH=$PWD:$PATH "$@"', "bash", ADB_ALL, PLAN,
+                             "demo/Bringup/SpiCheck", devices=1, cwd=tmp_path)
+
+    assert (status, cases(tmp_path / "results/all.xml")) == (
+        0, {DEVICES[0] + ": Bringup/SpiCheck": []}), out
+
+
+def test_a_reader_that_leaves_early_costs_nothing(tmp_path):
+    make_program(tmp_path / "adb", """#!/bin/sh
+        case $* in *:5602*"fptest run"*) until [ -e read ]; do sleep 0.05; done;; esac
+        exec /usr/bin/adb "$@" """)
+    script = """
+        PATH=$PWD:$PATH timeout 20 "$@" | { head -n 1; exec <&-; touch read; }
+        exit "${PIPESTATUS[0]}" """
+
+    status, out, err = on_rack("bash", "-c", script, "bash", ADB_ALL, PLAN, "demo/Bringup/DeadPixel",
+                               devices=2, cwd=tmp_path)
+
+    assert (status, out.count("\n"), err) == (1, 1, "")
+    assert cases(tmp_path / "results/all.xml") == {
+        device + ": Bringup/DeadPixel": ["failure"] for device in DEVICES[:2]}
 
 
 def test_a_device_with_nothing_to_do_is_not_lost(tmp_path):
     twice = """
         "$@" demo/Bringup/SpiCheck >&2
-        adb shell mv /data/local/tmp/fptest/r.jsonl /data/local/tmp/fptest/before.jsonl
-        exec "$@" --resume before.jsonl"""
+        adb push results/127.0.0.1:5601.jsonl /data/local/tmp/before.jsonl >&2
+        exec "$@" --resume /data/local/tmp/before.jsonl"""
 
     status, out, _ = on_rack("bash", "-c", twice, "bash", ADB_ALL, PLAN, devices=1, cwd=tmp_path)
 
     assert (status, out) == (
-        0, DEVICES[0] + ": fptest: before.jsonl: that run has finished: nothing to do\n")
+        0, DEVICES[0] + ": fptest: /data/local/tmp/before.jsonl: that run has finished: nothing "
+        "to do\n")
     assert not cases(tmp_path / "results/all.xml")
 
 
@@ -200,7 +275,7 @@ def test_a_device_that_is_not_ready_is_named_and_lost(tmp_path):
     assert status == 3
     assert cases(tmp_path / "results/all.xml") == {
         DEVICES[0] + ": Bringup/SpiCheck": [], "127.0.0.1:5700: no report/device": ["error"]}
-    assert 'message="adb lists it as unauthorized"' in content(tmp_path / "results/all.xml")
+    assert errors(tmp_path / "results/all.xml") == dict([lines[1].split(": ", 1)])
     page = run(BUILD / "agent/fptest", "html", *sorted((tmp_path / "results").glob("*.jsonl"))).out
     assert "127.0.0.1:5700" in page
 
@@ -231,6 +306,63 @@ def test_an_interruption_ends_the_runs_and_pulls_their_reports(tmp_path, end):
     assert not (tmp_path / "results/jobs").exists()
 
 
+@pytest.mark.parametrize("first, said, reason", [
+    (":", "interrupted; ", '"reason":"interrupted by fptest stop"'),
+    ("adb shell 'kill -STOP $(pgrep -x fptest)'", "interrupted, its run may go on; ",
+     '"event":"start"'),
+])
+def test_an_interruption_ends_a_run_that_outlives_its_connection(tmp_path, first, said, reason):
+    script = """
+        "$@" --hangup go-on &
+        until adb shell fptest status | grep BurnIn; do sleep 0.05; done >&2
+        %s >&2; kill %%1; wait %%1; status=$?
+        adb shell fptest status >&2; echo $?; exit $status""" % first
+
+    status, out, _ = interrupted(tmp_path, script, 1)
+
+    line, running = out.splitlines()
+    assert status == 130
+    assert line.startswith(f"{DEVICES[0]}: {said}last heard: ")
+    assert running == ("4" if "may go on" in said else "0")
+    assert reason in content(tmp_path / f"results/{DEVICES[0]}.jsonl")
+    assert cases(tmp_path / "results/all.xml") == {DEVICES[0] + ": Endurance/BurnIn": ["error"]}
+
+
+def test_an_interruption_takes_nothing_of_others(tmp_path):
+    make_program(tmp_path / "adb", """#!/bin/sh
+        case $* in *"fptest run"*) kill $(cat pid); exec sleep 9;; esac
+        exec /usr/bin/adb "$@" """)
+    script = f"""
+        adb push {PLAN} /data/local/tmp/fptest/plan.xml >&2
+        adb shell 'cd /data/local/tmp/fptest; fptest run --plan plan.xml --junit r.xml \\
+            --json r.jsonl demo/Endurance' >&2 &
+        until adb shell fptest status | grep BurnIn; do sleep 0.05; done >&2
+        PATH=$PWD:$PATH "$@" & echo $! >pid; wait $!; status=$?
+        adb shell 'fptest status >&2; echo $?; ls /data/local/tmp'; exit $status"""
+
+    status, out, _ = interrupted(tmp_path, script, 1)
+
+    assert status == 130
+    assert out.splitlines() == [
+        DEVICES[0] + ": interrupted; last heard: nothing", "4", "fptest"]
+    assert content(tmp_path / f"results/{DEVICES[0]}.jsonl") == ""
+    assert errors(tmp_path / "results/all.xml") == {DEVICES[0]: "interrupted; last heard: nothing"}
+
+
+def test_an_interruption_before_the_first_run_leaves_no_earlier_report(tmp_path):
+    make_program(tmp_path / "parallel", "#!/bin/sh\nkill $PPID; exec sleep 0.5\n")
+    (tmp_path / "results").mkdir()
+    (tmp_path / f"results/{DEVICES[0]}.xml").write_text("<?xml?>\n<testsuites>\n</testsuites>\n")
+    (tmp_path / f"results/{DEVICES[0]}.jsonl").write_text("of an earlier run")
+
+    assert on_rack("sh", "-c", 'PATH=$PWD:$PATH; exec "$@"', "sh", ADB_ALL, PLAN, devices=2,
+                   cwd=tmp_path) == (130, "", "")
+
+    assert errors(tmp_path / "results/all.xml") == dict.fromkeys(
+        DEVICES[:2], "interrupted before it began")
+    assert content(tmp_path / f"results/{DEVICES[0]}.jsonl") == ""
+
+
 FREEZE_AND_INTERRUPT = """
     setsid "$@" & until grep -q BurnIn results/127.0.0.1:5602.log; do sleep 0.05; done
     adb -s 127.0.0.1:5602 shell 'kill -STOP $(pgrep -f device/adbd)' & sleep 0.5
@@ -242,10 +374,10 @@ def test_an_interruption_does_not_wait_long_for_a_device(tmp_path):
     status, out, _ = interrupted(tmp_path, FREEZE_AND_INTERRUPT + "wait %1", 2)
 
     assert status == 130
-    assert out.count(": interrupted; last heard: ") == 2
-    of_all = cases(tmp_path / "results/all.xml")
-    assert of_all[DEVICES[0] + ": Endurance/BurnIn"] == ["error"]
-    assert of_all[DEVICES[1] + ": no report/device"] == ["error"]
+    assert f"{DEVICES[0]}: interrupted; last heard: " in out
+    assert f"{DEVICES[1]}: interrupted, its run may go on; last heard: " in out
+    assert cases(tmp_path / "results/all.xml")[DEVICES[0] + ": Endurance/BurnIn"] == ["error"]
+    assert errors(tmp_path / "results/all.xml")[DEVICES[1]].startswith("interrupted, its run may")
 
 
 @pytest.mark.parametrize("words, patience, complaint", [
