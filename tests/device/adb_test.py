@@ -135,10 +135,16 @@ def test_without_a_command_there_is_a_prompt(there):
 
 
 def test_ctrl_c_ends_the_command_at_a_terminal(there):
-    with at_a_terminal(*there.words("shell", "-t", "echo ready; sleep 60; echo $?")) as (
+    mark = unique_length()
+
+    def press():
+        # before its child has begun the shell takes a signal to its own, and waits for it
+        assert eventually(lambda: is_running(mark))
+        terminal.write(b"\x03")
+
+    with at_a_terminal(*there.words("shell", "-t", f"echo ready; sleep {mark}; echo $?")) as (
             process, terminal):
-        shown, status = shown_by(process, terminal,
-                                 (b"ready", lambda: terminal.write(b"\x03")))
+        shown, status = shown_by(process, terminal, (b"ready", press))
 
     assert shown.startswith("ready\n^C")
     assert status == 130

@@ -86,6 +86,11 @@ class Rack:
         for device in self.devices.values():
             device.shell("rm -f /data/local/tmp/hold /data/local/tmp/tried")
 
+    def is_held(self, directory, name):
+        """Its item runs, and all that it said before has arrived."""
+        return ("G/Known: " in content(directory / f"results/{name}.log")
+                and " G/Held " in self.devices[name].shell("fptest status").out)
+
     def nothing_runs(self, name):
         return self.devices[name].shell("fptest status").out.startswith("nothing runs")
 
@@ -132,10 +137,6 @@ def results(directory):
 
 def properties(case):
     return [(one.get("name"), one.get("value")) for one in case.iter("property")]
-
-
-def is_held(directory, name):
-    return "G/Known: " in content(directory / f"results/{name}.log")
 
 
 # ---- results ---------------------------------------------------------------------------
@@ -207,7 +208,7 @@ LOST = RESULTS | {"Held": "error", "Last": "error"}
 def test_a_device_that_is_lost_is_connected_again_and_can_be_run_again(rack, tmp_path):
     rack.hold("bench-2")
     with rack.start(tmp_path, *AT_ONCE, RETRIED) as process:
-        assert eventually(lambda: is_held(tmp_path, "bench-2"), 60), content(tmp_path / "out")
+        assert eventually(lambda: rack.is_held(tmp_path, "bench-2"), 60), content(tmp_path / "out")
         device = rack.by_ssh["bench-2"]
         device.lose_connections()
         device.sshd.kill()
@@ -233,7 +234,7 @@ def test_a_device_that_is_lost_is_connected_again_and_can_be_run_again(rack, tmp
 def test_over_adb_too(rack, tmp_path):
     rack.hold("bench-3")
     with rack.start(tmp_path, *AT_ONCE, RETRIED, environment="adb.yaml") as process:
-        assert eventually(lambda: is_held(tmp_path, "bench-3"), 60), content(tmp_path / "out")
+        assert eventually(lambda: rack.is_held(tmp_path, "bench-3"), 60), content(tmp_path / "out")
         rack.devices["bench-3"].output_of("disconnect", "127.0.0.1:5603")
         assert status_of(process, 120) == 1
 
@@ -257,7 +258,7 @@ def test_a_device_that_stays_away_costs_its_own_items_only(rack, tmp_path):
 def test_a_busy_device_is_let_alone(rack, tmp_path):
     rack.hold("bench-1")
     with rack.start(tmp_path, "-k", "bench-1") as process:
-        assert eventually(lambda: is_held(tmp_path, "bench-1"), 60)
+        assert eventually(lambda: rack.is_held(tmp_path, "bench-1"), 60)
         (tmp_path / "other").mkdir()
         rack.run(tmp_path / "other", "-k", "bench-1 and Last")
         rack.let_go()
@@ -282,7 +283,7 @@ def test_the_runs_on_the_devices_end_with_pytest(rack, tmp_path, environment, op
     names = BENCHES if options == AT_ONCE else BENCHES[:1]
     rack.hold(*names)
     with rack.start(tmp_path, *options, RETRIED, environment=environment) as process:
-        assert eventually(lambda: all(is_held(tmp_path, name) for name in names), 60)
+        assert eventually(lambda: all(rack.is_held(tmp_path, name) for name in names), 60)
         end(process.pid, number)
         assert status_of(process) == (137 if number == signal.SIGKILL else
                                       pytest.ExitCode.INTERRUPTED)

@@ -81,7 +81,8 @@ ForceCommand exec {enter}
     def lose_connections(self):
         """Ends its sshd's sessions; the device goes on, and new ones are let in."""
         for session in children(self.sshd.pid):
-            os.kill(session, signal.SIGKILL)
+            with contextlib.suppress(ProcessLookupError):  # it has just ended by itself
+                os.kill(session, signal.SIGKILL)
 
     def lose(self):
         """The device and its sshd are gone."""
