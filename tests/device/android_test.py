@@ -65,9 +65,7 @@ def answer(release, script, *options, **others):
     of the script alone."""
     outcome = shell(script, options=("--android", str(release), *options),
                     start_new_session=True, **others)
-    errors = [line for line in outcome.err.splitlines(keepends=True)
-              if not line.startswith("device/run: in place: ")]
-    return outcome.status, outcome.out, "".join(errors)
+    return tuple(outcome)
 
 
 def names(out):
