@@ -4,7 +4,7 @@
 # add_pytest(FILE LABEL [PREFIX prefix] [TIMEOUT seconds] [ENVIRONMENT variable=value...])
 #
 # Makes one test of a pytest file: X_test.py is PREFIX.X, or else LABEL.X. It is made where
-# the tests of test programs are, as ctest begins: one_container.cmake finds it in the list
+# the tests of test programs are, as ctest begins: side_by_side.cmake finds it in the list
 # pytests_TESTS. The python is Debian's, as its package of pytest is for that one.
 function(add_pytest file label)
   cmake_parse_arguments(PARSE_ARGV 2 arg "" "PREFIX;TIMEOUT" "ENVIRONMENT")
