@@ -66,7 +66,7 @@ class FormChecker
         }
         report_values(text_.size());
         report_encoding();
-        report_dropped_character();
+        report_look_alikes();
         report_cut_declaration();
         const bool endless = report_endless_comments();
         std::optional<Loaded> repaired;
@@ -252,19 +252,52 @@ class FormChecker
         }
     }
 
-    // Mini-XML takes U+FEFF for a byte order mark anywhere.
-    void report_dropped_character()
+    // What web pages and word processors put in place of what a shell reads; each once.
+    void report_look_alikes()
+    {
+        constexpr auto quote = "a typographic quote, is a letter to the shell; write ' or &quot;";
+        constexpr auto dash = "a dash, begins no option; write -";
+        constexpr std::array<std::array<const char *, 3>, 11> look_alikes{{
+            {"\u2018", "2018", quote},
+            {"\u2019", "2019", quote},
+            {"\u201C", "201C", quote},
+            {"\u201D", "201D", quote},
+            {"\u201E", "201E", quote},
+            {"\u2013", "2013", dash},
+            {"\u2014", "2014", dash},
+            {"\u00A0", "00A0", "a no-break space, separates no words; write a space"},
+            {"\u202F", "202F", "a no-break space, separates no words; write a space"},
+            {"\u200B", "200B", "which nobody sees, is a letter here; leave it out"},
+            // Mini-XML takes it for a byte order mark anywhere
+            {"\uFEFF", "FEFF",
+             "a byte order mark, would be dropped; leave it out, or write &#xFEFF;"},
+        }};
+        for (const auto &[character, number, text] : look_alikes) {
+            const std::size_t at = first_in_a_value(character);
+            if (at != kNone) {
+                findings_.warning(at, "U+{}, {}", number, text);
+            }
+        }
+    }
+
+    [[nodiscard]] std::size_t first_in_a_value(std::string_view character) const
     {
         for (const Tag &tag : tags_) {
             for (const Attribute &attribute : tag.attributes) {
-                const std::size_t at = text_.find("\xEF\xBB\xBF", attribute.value_begin);
-                if (attribute.has_value && at < attribute.value_end) {
-                    findings_.warning(at, "the library would drop the character U+FEFF here; leave "
-                                          "it out, or write &#xFEFF;");
-                    return;
+                if (!attribute.has_value ||
+                    (attribute.name != "name" && attribute.name != "args")) {
+                    continue;
+                }
+                const std::size_t at =
+                    std::string_view(text_)
+                        .substr(attribute.value_begin, attribute.value_end - attribute.value_begin)
+                        .find(character);
+                if (at != std::string_view::npos) {
+                    return attribute.value_begin + at;
                 }
             }
         }
+        return kNone;
     }
 
     // Mini-XML ends a declaration at its first '>', and takes the rest for text.

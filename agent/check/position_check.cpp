@@ -153,6 +153,15 @@ void check_positions(const CheckContext &context, const Group &group)
             place,
             "{} in group {}, which shifts the positions: {}; keep all but items out of the group",
             kinds, quoted_name(group.name), some_of(effects));
+    } else if (!said && group.items.empty() &&
+               std::ranges::any_of(group.others, [](mxml_node_t *other) {
+                   return kind_of(other).starts_with('<');
+               })) {
+        context.findings.error(
+            place,
+            "{} in group {}, which has no item: {} would run nothing; write <Cmd> "
+            "for each item",
+            kinds, quoted_name(group.name), path_of(group.name));
     } else if (!said) {
         context.findings.warning(place,
                                  "{} in group {}: {} would look for more items than there are, and "
