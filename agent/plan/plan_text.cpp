@@ -117,11 +117,19 @@ bool is_same_plan(const std::string &one, const std::string &other)
 
 std::string digest_of(const Plan &plan)
 {
+    // Mini-XML has elements for these as well
+    const auto is_comment_or_declaration = [](mxml_node_t *node) {
+        const char first = *mxmlGetElement(node);
+        return first == '!' || first == '?';
+    };
     std::string text; // a zero byte ends each part, as no name or value has one
     for (mxml_node_t *node : plan.elements()) {
+        if (is_comment_or_declaration(node)) {
+            continue;
+        }
         for (mxml_node_t *above = mxmlGetParent(node); above != nullptr;
              above = mxmlGetParent(above)) {
-            text += '/';
+            text += is_comment_or_declaration(above) ? "" : "/";
         }
         text.append(mxmlGetElement(node)) += '\0';
         for (const char *name : {"name", "args"}) {

@@ -48,6 +48,8 @@ TEST(DigestOfAPlan, DependsOnWhatRunsOnly)
     EXPECT_EQ(plan,
               digest("<P>\n  <CmdGroup name='G'>\n    <Cmd args=\"1\" name=\"I\" result=\"0\" "
                      "fptest-run=\"x\" ></Cmd>\n</CmdGroup></P>\n"));
+    EXPECT_EQ(plan, digest("<?xml version=\"1.0\"?>\n<!-- a --><P><CmdGroup name=\"G\"><!-- b -->"
+                           "<Cmd name=\"I\" args=\"1\"/></CmdGroup></P>"));
     for (const char *other :
          {"<P><CmdGroup name=\"G\"><Cmd name=\"I\" args=\"2\"/></CmdGroup></P>",
           "<P><CmdGroup name=\"G\"><Cmd name=\"J\" args=\"1\"/></CmdGroup></P>",
