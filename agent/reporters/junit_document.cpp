@@ -252,6 +252,15 @@ std::string summary_properties(const Run &run, const std::string &indent)
     return text;
 }
 
+std::string identity_properties(const Run &run, const std::string &indent)
+{
+    std::string text;
+    for (const auto &[name, value] : named_identity(run)) {
+        text += property(indent, name.c_str(), value);
+    }
+    return text;
+}
+
 std::string test_suite(const Run &run, std::size_t number, const std::vector<LateReport> &late)
 {
     const Suite &suite = run.suites[number];
@@ -281,10 +290,7 @@ std::string test_suite(const Run &run, std::size_t number, const std::vector<Lat
     if (run.has_expectations) {
         inside += property(indent, "expected", std::to_string(count(suite.items).expected));
     }
-    inside += kStateGoesHere;
-    for (const auto &[name, value] : named_identity(run)) {
-        inside += property(indent, name.c_str(), value);
-    }
+    inside += kStateGoesHere + identity_properties(run, indent);
     for (const LateReport &one : late) {
         if (one.suite == number) {
             inside += property(indent, "late_report", one.text);
@@ -307,9 +313,10 @@ std::string test_suite(const Run &run, std::size_t number, const std::vector<Lat
 
 bool is_property_of_junit(const std::string &name)
 {
-    constexpr std::array kNames{"plan",        "vendor",         "pass_code",
-                                "plan_digest", "fptest_version", "library_version",
-                                "finished",    "reason",         "late_report"};
+    constexpr std::array kNames{"plan",        "vendor",         "pass_code",       "seed",
+                                "resumed",     "flaky",          "retries",         "expected",
+                                "plan_digest", "fptest_version", "library_version", "finished",
+                                "reason",      "late_report"};
     return std::ranges::find(kNames, name) != kNames.end();
 }
 
@@ -393,10 +400,13 @@ std::string junit_tail(const Run &run)
     TestCounts tests;
     tests.all = 1;
     tests.errors = 1;
-    return fmt::format("  <testsuite name=\"{0}\"{1}{2}{3}>\n    <testcase classname=\"rounds\" "
-                       "name=\"{0}\"{2}>\n{4}    </testcase>\n  </testsuite>\n</testsuites>\n",
+    const std::string inside = junit_state(run) + identity_properties(run, std::string(6, ' '));
+    return fmt::format("  <testsuite name=\"{0}\"{1}{2}{3}{4}>\n{5}    <testcase "
+                       "classname=\"rounds\" name=\"{0}\"{2}>\n{6}    </testcase>\n"
+                       "  </testsuite>\n</testsuites>\n",
                        name_of_rest(run), attributes(tests), time_attribute(0),
-                       timestamp_attribute(run.start), not_run(run, false));
+                       timestamp_attribute(run.start), hostname_attribute(run),
+                       properties("    ", inside), not_run(run, false));
 }
 
 } // namespace fptest

@@ -72,6 +72,8 @@ TEST_F(Usage, IsExplainedInOneLine)
         {{"run", "--label=", "P/G"}, "--label: its value is empty; see fptest run --help"},
         {{"run", "--label", "plan=x", "P/G"},
          "--label: 'plan' is written by fptest itself: choose another key; see fptest run --help"},
+        {{"run", "--label", "seed=7", "P/G"},
+         "--label: 'seed' is written by fptest itself: choose another key; see fptest run --help"},
         {{"run", "--label", "job=1", "--label", "job=2", "P/G"},
          "--label job is given twice: give it once"},
         {{"run", "P/G", "--label"},
