@@ -4,6 +4,7 @@
 #include "cli/log_option.h"
 
 #include "cli/options.h"
+#include "module/device_lock.h"
 #include "plan/plan.h"
 #include "util/failure.h"
 #include "util/files.h"
@@ -58,6 +59,7 @@ bool is_standard_output(const std::string &file)
 void require_different(std::vector<NamedFile> files)
 {
     files.emplace_back("the library", kStoredPlan);
+    files.emplace_back("fptest itself", kRunNote);
     for (std::size_t one = 0; one < files.size(); ++one) {
         for (std::size_t other = one + 1; other < files.size(); ++other) {
             const auto &[option, file] = files[one];

@@ -272,7 +272,8 @@ void say_nothing_to_do(const RunOptions &options, const EarlierRun &earlier)
         options.resume.empty() ? "no item of that run failed" : "that run has finished");
 }
 
-Exit run(RunOptions options)
+/// Refuses what the options can't have together, and settles where results go.
+void resolve_outputs(RunOptions &options)
 {
     refuse_list_with_results(options);
     resolve_output_conflicts(options);
@@ -281,12 +282,17 @@ Exit run(RunOptions options)
     }
     if (options.list) {
         require_standard_output("--list");
-    } else {
-        warn_of_lost_outputs({{"--json", options.json},
-                              {"--junit", options.junit},
-                              {"--files", options.files},
-                              {"--log", options.log}});
+        return;
     }
+    warn_of_lost_outputs({{"--json", options.json},
+                          {"--junit", options.junit},
+                          {"--files", options.files},
+                          {"--log", options.log}});
+}
+
+Exit run(RunOptions options)
+{
+    resolve_outputs(options);
     const std::optional<EarlierRun> earlier = read_earlier_run(options);
     if (earlier && leaves_nothing(options, *earlier)) {
         say_nothing_to_do(options, *earlier);

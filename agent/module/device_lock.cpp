@@ -32,7 +32,6 @@ namespace
 
 using namespace std::chrono_literals;
 
-constexpr char kNote[] = "/data/vorlane/fptest.run";
 constexpr auto kBetweenTries = 20ms;
 constexpr std::size_t kColumns = 300; // of a text in it
 constexpr std::size_t kMostOfNote = 8192;
@@ -95,7 +94,7 @@ pid_t holder_of(const Descriptor &note)
 
 Descriptor open_note()
 {
-    return Descriptor(open(kNote, O_RDONLY | O_NONBLOCK | O_NOFOLLOW | O_CLOEXEC));
+    return Descriptor(open(kRunNote, O_RDONLY | O_NONBLOCK | O_NOFOLLOW | O_CLOEXEC));
 }
 
 Descriptor open_data(int flags = 0)
@@ -137,8 +136,8 @@ DeviceLock::DeviceLock(const RunNote &note) : directory_(open_data())
         }
         std::this_thread::sleep_for(kBetweenTries);
     }
-    unlink(kNote); // of one that was killed
-    note_ = Descriptor(open(kNote, O_RDWR | O_CREAT | O_EXCL | O_CLOEXEC, 0666));
+    unlink(kRunNote); // of one that was killed
+    note_ = Descriptor(open(kRunNote, O_RDWR | O_CREAT | O_EXCL | O_CLOEXEC, 0666));
     if (note_.is_open()) {
         lock_file(note_.get());
         tell(note);
@@ -148,7 +147,7 @@ DeviceLock::DeviceLock(const RunNote &note) : directory_(open_data())
 DeviceLock::~DeviceLock()
 {
     if (note_.is_open()) {
-        unlink(kNote);
+        unlink(kRunNote);
     }
 }
 
@@ -228,7 +227,7 @@ void OtherRun::ask_to_stop() const
     if (!note.is_open() || ftruncate(note.get(), kAsksToStop) != 0) {
         throw Failure(Cause::device,
                       "process {} cannot be asked to stop: {}: {}; do it as its user", process_,
-                      kNote, std::strerror(errno));
+                      kRunNote, std::strerror(errno));
     }
 }
 

@@ -16,7 +16,9 @@
 namespace fptest
 {
 
-// What an fptest says of itself; its texts are single lines.
+inline constexpr char kRunNote[] = "/data/vorlane/fptest.run";
+
+// What an fptest says of itself there; its texts are single lines.
 struct RunNote {
     using TimePoint = std::chrono::steady_clock::time_point;
 

@@ -324,6 +324,10 @@ TEST_F(Output, LogIsNeverTheStoredPlan)
                            "them files of their own");
     }
     EXPECT_EQ(read_file(device::kPlanFile), kLoud);
+    const std::string note = "/data/vorlane/fptest.run";
+    EXPECT_EQ(run_fptest({"run", "--json", note, "P/G"}).err,
+              "fptest: --json and fptest itself both want the file " + note +
+                  ": give them files of their own\n");
 }
 
 TEST_F(Output, LogThatCannotBeWrittenIsRefusedWhoeverNamesIt)
