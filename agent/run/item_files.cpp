@@ -42,6 +42,12 @@ std::string file_name_of(std::string_view name)
     return safe;
 }
 
+// Whether what is in it can be seen, as in another user's it may not.
+bool may_list(const std::string &directory)
+{
+    return access(directory.c_str(), R_OK | X_OK) == 0;
+}
+
 // Makes a directory of that name, or of that name and a number. Returns the error.
 int make_new(const std::string &above, const std::string &name, std::string &made)
 {
@@ -120,7 +126,9 @@ void ItemFiles::settle(ItemRun &item, bool gathers) const
     item.files.clear();
     std::error_code error;
     std::size_t visited = 0;
-    fs::recursive_directory_iterator entry(item.directory, error);
+    bool is_whole = may_list(item.directory);
+    fs::recursive_directory_iterator entry(item.directory,
+                                           fs::directory_options::skip_permission_denied, error);
     if (error == std::errc::no_such_file_or_directory) {
         add_warning(item, "its directory for files was removed");
         item.directory.clear();
@@ -128,19 +136,25 @@ void ItemFiles::settle(ItemRun &item, bool gathers) const
     }
     for (; !error && entry != fs::end(entry); entry.increment(error)) {
         if (++visited > kMostVisited || item.files.size() == kMostNamed) {
-            add_warning(item, "not all of its files are named");
+            is_whole = false;
             break;
         }
         std::error_code unknown;
         if (!entry->is_directory(unknown) || entry->is_symlink(unknown)) {
             item.files.push_back(entry->path().string().substr(item.directory.size() + 1));
+        } else {
+            is_whole = may_list(entry->path()) && is_whole;
         }
+    }
+    if (error || !is_whole) {
+        add_warning(item, "not all of its files are named");
     }
     std::ranges::sort(item.files);
     if (!gathers) {
         remove_empty(item.directory);
     }
-    if (visited == 0 && !error) {
+    std::error_code unknown;
+    if ((visited == 0 && !error && is_whole) || !fs::exists(item.directory, unknown)) {
         item.directory.clear();
     }
 }
