@@ -72,6 +72,9 @@ class CommandLine
         try {
             app_.parse(std::move(words));
         } catch (const CLI::ParseError &error) {
+            if (error.get_exit_code() != 0 && app_.got_subcommand("measure")) {
+                fptest::print_refused_measurement("its arguments are no measurement");
+            }
             return app_.exit(error) == 0 ? Exit::success : Exit::usage;
         }
         return chosen_();

@@ -4,6 +4,7 @@
 #include "cli/options.h"
 #include "run/measurements.h"
 #include "util/files.h"
+#include "util/text.h"
 #include "util/write.h"
 
 #include <cstdio>
@@ -43,6 +44,7 @@ Exit measure(const MeasureOptions &options)
     }
     std::string why;
     if (!measurement_of(words, why)) {
+        print_refused_measurement(why);
         throw Failure(Cause::input, "{}; see fptest measure --help", why);
     }
     require_standard_output("fptest measure");
@@ -55,6 +57,11 @@ Exit measure(const MeasureOptions &options)
 }
 
 } // namespace
+
+void print_refused_measurement(const std::string &why)
+{
+    print_to(stdout, "#measure {} {}\n", kRefused, one_line(why));
+}
 
 void add_measure(CLI::App &app, Action &chosen)
 {

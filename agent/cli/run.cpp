@@ -400,8 +400,8 @@ void add_run(CLI::App &app, Action &chosen)
                      "an item that ends with a status other than\n"
                      "0 has failed");
     command.add_flag("--judge-limits", options->judge_limits,
-                     "an item that measures out of limits has\n"
-                     "failed");
+                     "an item that measures out of limits, or what\n"
+                     "cannot be judged, has failed");
     command.add_flag("--list", options->list, "print what would be run and start nothing");
     command
         .add_option("--junit", options->junit,

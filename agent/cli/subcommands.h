@@ -33,6 +33,8 @@ void add_show(CLI::App &app, Action &chosen);
 void add_html(CLI::App &app, Action &chosen);
 void add_report(CLI::App &app, Action &chosen);
 void add_measure(CLI::App &app, Action &chosen);
+// A line of output that is malformed, lest a script that goes on pass without a word.
+void print_refused_measurement(const std::string &why);
 void add_send(CLI::App &app, Action &chosen);
 void add_doctor(CLI::App &app, Action &chosen);
 void add_status(CLI::App &app, Action &chosen);

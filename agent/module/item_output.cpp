@@ -14,16 +14,20 @@
 #include <fstream>
 #include <string>
 #include <sys/mman.h>
+#include <sys/resource.h>
 #include <sys/stat.h>
 #include <system_error>
 #include <unistd.h>
+#include <utility>
 
 namespace fptest
 {
 namespace
 {
 
+constexpr off_t kMuch = off_t{64} * 1024;
 constexpr off_t kPiece = off_t{64} * 1024;
+constexpr off_t kFront = 16; // which nothing is printed into: a file without was truncated
 constexpr off_t kRoomLeft = off_t{1024} * 1024;
 constexpr char kName[] = "/memfd:fptest-output"; // as /proc has it
 
@@ -34,7 +38,7 @@ ItemOutput::ItemOutput() : file_(memory_file(kName + sizeof("/memfd:") - 1, MFD_
     if (!file_.is_open()) {
         throw std::system_error(errno, std::generic_category(), "no memory for what items print");
     }
-    fcntl(file_.get(), F_SETFL, O_APPEND);
+    rewind();
 }
 
 off_t ItemOutput::size() const
@@ -46,9 +50,15 @@ off_t ItemOutput::size() const
 
 void ItemOutput::rewind()
 {
-    if (size() == taken_ && ftruncate(file_.get(), 0) == 0) {
-        taken_ = 0;
+    rlimit limit{};
+    const bool is_limited = getrlimit(RLIMIT_FSIZE, &limit) == 0 && limit.rlim_cur != RLIM_INFINITY;
+    if ((is_limited || taken_ < kFront || taken_ > kMuch) && size() == taken_) {
+        fallocate(file_.get(), FALLOC_FL_PUNCH_HOLE | FALLOC_FL_KEEP_SIZE, 0, kFront);
+        taken_ = ftruncate(file_.get(), kFront) == 0 ? kFront : taken_;
     }
+    // an item may have changed these, for all others too
+    fcntl(file_.get(), F_SETFL, O_APPEND);
+    lseek(file_.get(), 0, SEEK_END);
 }
 
 void ItemOutput::leave()
@@ -75,18 +85,21 @@ bool ItemOutput::is_filling(pid_t process)
 }
 
 // An item that opens /dev/stderr anew ("> /dev/stderr") truncates the file. What was taken
-// is a hole: data in its place is new.
+// is a hole: data in its place is new. No lseek() here, as the items' position is the same.
 void ItemOutput::note_truncation(off_t end)
 {
     std::array<char, 4096> bytes{};
-    const off_t data = taken_ > 0 ? lseek(file_.get(), 0, SEEK_DATA) : -1;
-    if (data >= 0 && data < taken_) {
-        const auto size = std::min(bytes.size(), static_cast<std::size_t>(taken_ - data));
-        static_cast<void>(pread(file_.get(), bytes.data(), size, data));
-    }
+    const auto size = std::min(bytes.size(), static_cast<std::size_t>(taken_));
+    static_cast<void>(pread(file_.get(), bytes.data(), size, 0));
     if (end < taken_ || std::ranges::any_of(bytes, [](char byte) { return byte != 0; })) {
         taken_ = 0;
+        was_truncated_ = true;
     }
+}
+
+bool ItemOutput::was_truncated()
+{
+    return std::exchange(was_truncated_, false);
 }
 
 bool ItemOutput::take(off_t end, const Use &use, off_t most)

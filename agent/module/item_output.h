@@ -32,8 +32,13 @@ class ItemOutput
     static constexpr off_t kNoLimit = std::numeric_limits<off_t>::max();
     bool take(off_t end, const Use &use, off_t most = kNoLimit);
 
-    // Begins anew if all of it was taken: a limit on a file's size counts whatever was
-    // printed before. A process that was left running may lose what it prints right now.
+    // Whether somebody has truncated it, as found by take() since the last call.
+    bool was_truncated();
+
+    // Begins anew if all of it was taken, and it is much or the size of files is limited, which
+    // counts whatever was printed before. A process that was left running may lose what it
+    // prints in that very moment. An item may have changed where and how the next one writes;
+    // that is undone.
     void rewind();
 
     // A gatherer that stays keeps it to print into: its writes must neither fail from now
@@ -48,6 +53,7 @@ class ItemOutput
 
     Descriptor file_;
     off_t taken_ = 0;
+    bool was_truncated_ = false;
 };
 
 } // namespace fptest

@@ -112,8 +112,8 @@ class Server
     }
 
     // The library's own stdout, "vendor = N" for each item that it reaches, goes to the
-    // agent as a message: that is when the item begins, and what was printed before is not
-    // its output. Items print to descriptor 1, which stays.
+    // agent as a message: that is when the item begins. Items print to descriptor 1, which
+    // stays.
     static void intercept_library_output(Server &server)
     {
         std::fflush(stdout);

@@ -22,12 +22,17 @@ constexpr std::string_view kMeasureMark = "#measure";
 constexpr std::size_t kLongestLine = 512;
 constexpr std::size_t kLongestName = 64;
 constexpr std::size_t kLongestUnit = 16;
-constexpr std::size_t kMostJudged = 10'000; // beyond, a program goes wild
-constexpr std::size_t kShownColumns = 80;   // of a malformed line
+constexpr std::size_t kMostJudged = 1'000'000; // beyond, a program goes wild
+constexpr std::size_t kShownColumns = 80;      // of a malformed line
 
 bool is_blank(char c)
 {
     return c == ' ' || c == '\t';
+}
+
+bool is_line_end(char c)
+{
+    return c == '\n' || c == '\r'; // a bar of progress is written over
 }
 
 // What has been read of a line may become "#measure", or "#measure" and a blank.
@@ -112,6 +117,9 @@ std::optional<Measurement> measurement_of(const std::vector<std::string> &words,
         why = std::move(text);
         return std::nullopt;
     };
+    if (!words.empty() && words.front() == kRefused) {
+        return refuse("fptest measure has refused it");
+    }
     if (words.size() < 2) {
         return refuse("it needs a name and a value");
     }
@@ -119,7 +127,7 @@ std::optional<Measurement> measurement_of(const std::vector<std::string> &words,
     one.name = words[0];
     if (!is_name(one.name)) {
         return refuse(in_quotes(one.name) + " is not a name: letters, digits, '_', '.' and '-', "
-                                            "at most 64");
+                                            "at most 64, no '.' or '-' first");
     }
     std::vector<std::optional<double>> numbers;
     for (const std::size_t at : {1U, 3U, 4U}) {
@@ -185,20 +193,36 @@ std::string what_is_out(const Measured &measured)
                        measured.first_out, measured.out > 1 ? " ..." : "");
 }
 
+std::string what_is_lost(const Measured &measured)
+{
+    Measured lost = measured;
+    lost.left_out = 0; // but judged
+    return warning_of(lost);
+}
+
 std::string warning_of(const Measured &measured)
 {
     std::string text;
+    const auto add = [&text](const std::string &part) {
+        text += (text.empty() ? "" : "; ") + part;
+    };
     if (measured.malformed > 0) {
-        text = fmt::format("{}: {}", plural(measured.malformed, "malformed #measure line"),
-                           measured.first_malformed);
+        add(fmt::format("{}: {}", plural(measured.malformed, "malformed #measure line"),
+                        measured.first_malformed));
     }
     if (measured.left_out > 0) {
-        text += fmt::format("{}{} after the first {} left out", text.empty() ? "" : "; ",
-                            plural(measured.left_out, "measurement"), Measured::kMost);
+        add(fmt::format("{} after the first {} left out", plural(measured.left_out, "measurement"),
+                        Measured::kMost));
+    }
+    if (measured.not_judged > 0) {
+        add(fmt::format("{} after {} not judged", measured.not_judged, kMostJudged));
+    }
+    if (measured.is_cut) {
+        add("it has opened its output anew, as '> /dev/stderr' does, and what it had just printed "
+            "may be lost: write '>&2'");
     }
     if (!measured.is_read) {
-        text += fmt::format("{}it printed too fast to be read for measurements",
-                            text.empty() ? "" : "; ");
+        add("it printed too fast to be read for measurements");
     }
     return text;
 }
@@ -213,18 +237,23 @@ bool is_measurement(std::string_view line)
 namespace
 {
 
-void take_line(const std::string &line, Measured &measured)
+// From its mark on. What stands before that may be a line that another print began.
+void take_line(const std::string &line, bool is_whole, Measured &measured)
 {
-    if (!is_about_one(line)) {
+    if (!is_about_one(line) || (!is_whole && !is_measurement(line))) {
         return;
     }
-    if (measured.left_out + measured.malformed > kMostJudged) {
-        ++measured.left_out;
+    if (measured.kept.size() + measured.left_out + measured.malformed >= kMostJudged) {
+        ++measured.not_judged;
         return;
     }
     std::string why;
     auto one =
         line.size() <= kLongestLine ? measurement_of(words_after_mark(line), why) : std::nullopt;
+    if (!is_whole) {
+        one.reset();
+        why = "it is not at the start of its line";
+    }
     if (!one) {
         if (++measured.malformed == 1) {
             measured.first_malformed =
@@ -243,52 +272,38 @@ void take_line(const std::string &line, Measured &measured)
     }
 }
 
-// Where the next line may be about a measurement, or npos: not line by line, as a program
-// that prints without end has many.
-std::size_t next_mark(std::string_view text)
-{
-    for (std::size_t at = text.find(kMeasureMark.front()); at != text.npos;
-         at = text.find(kMeasureMark.front(), at + 1)) {
-        if ((at == 0 || text[at - 1] == '\n') &&
-            may_be_about_one(text.substr(at, kMeasureMark.size()))) {
-            return at;
-        }
-    }
-    return text.npos;
-}
-
 } // namespace
 
 void MeasureReader::read(std::string_view text, Measured &measured)
 {
     while (!text.empty()) {
-        const std::size_t end = text.find('\n');
-        const std::string_view piece = text.substr(0, end);
-        if (!is_other_ && line_.size() <= kLongestLine) {
-            line_ += piece.substr(0, kLongestLine + 1 - line_.size());
-            is_other_ = !may_be_about_one(line_);
+        // not byte by byte, as a program that prints without end has many
+        const std::size_t skipped = line_.empty() ? text.find(kMeasureMark.front()) : 0;
+        if (skipped > 0) {
+            const std::string_view other = text.substr(0, skipped);
+            is_at_start_ = is_line_end(other.back());
+            text.remove_prefix(other.size());
+            continue;
         }
-        if (end == text.npos) {
-            return;
+        const char c = text.front();
+        if (is_line_end(c)) {
+            end(measured);
+        } else if (line_.size() <= kLongestLine) {
+            line_ += c;
         }
-        this->end(measured);
-        text.remove_prefix(end + 1);
-        const std::size_t next = next_mark(text);
-        if (next == text.npos && !text.empty()) {
-            is_other_ = !text.ends_with('\n');
-            return;
+        text.remove_prefix(1);
+        if (!may_be_about_one(line_)) { // but this byte may begin another
+            line_ = c == kMeasureMark.front() ? std::string(1, c) : "";
+            is_at_start_ = false;
         }
-        text.remove_prefix(std::min(next, text.size()));
     }
 }
 
 void MeasureReader::end(Measured &measured)
 {
-    if (!is_other_) {
-        take_line(line_, measured);
-    }
+    take_line(line_, is_at_start_, measured);
     line_.clear();
-    is_other_ = false;
+    is_at_start_ = true;
 }
 
 } // namespace fptest

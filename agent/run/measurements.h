@@ -22,6 +22,9 @@ struct Measurement {
     std::optional<double> high = {};
 };
 
+// Follows "#measure" where fptest measure has printed why it refuses one.
+inline constexpr char kRefused[] = "refused:";
+
 // The measurement that the words after "#measure" say; nullopt, and why, if they say none.
 std::optional<Measurement> measurement_of(const std::vector<std::string> &words, std::string &why);
 
@@ -38,16 +41,20 @@ struct Measured {
     static constexpr std::size_t kMost = 256;
 
     std::vector<Measurement> kept = {};
-    std::size_t left_out = 0; // beyond kMost
-    std::size_t out = 0;      // of their limits, also of those left out
+    std::size_t left_out = 0;   // beyond kMost
+    std::size_t not_judged = 0; // beyond a million
+    std::size_t out = 0;        // of their limits, also of those left out
     std::string first_out = {};
     std::size_t malformed = 0; // lines
     std::string first_malformed = {};
     bool is_read = true; // all of the output
+    bool is_cut = false; // the item has truncated its output
 };
 
 // "2 measurements out of limits: vcore 1.4 V (1.1 to 1.3) ..."
 std::string what_is_out(const Measured &measured);
+// Why limits cannot be judged of all that it measured; empty if they can.
+std::string what_is_lost(const Measured &measured);
 // What is wrong with its lines; may be empty.
 std::string warning_of(const Measured &measured);
 
@@ -63,8 +70,8 @@ class MeasureReader
     void end(Measured &measured);
 
   private:
-    std::string line_;      // as far as it was read, unless
-    bool is_other_ = false; // it is not about a measurement
+    std::string line_; // from what may be its mark on, as far as it was read
+    bool is_at_start_ = true;
 };
 
 } // namespace fptest

@@ -339,12 +339,11 @@ void Runner::poll_gatherer(RunningItem &active)
     }
 }
 
-// What is printed is the current item's. All of it is read for measurements, unless it
-// comes faster than that.
+// What is printed is the current item's, or else the next one's. All of it is read for
+// measurements, unless it comes faster than that.
 void Runner::take_output(off_t end)
 {
     if (running_.items.empty()) {
-        library_.output().take(end, {}, 0);
         return;
     }
     RunningItem &active = running_.items.back();
@@ -356,12 +355,25 @@ void Runner::take_output(off_t end)
     if (!library_.output().take(end, use, kMostWaiting)) {
         result.measured.is_read = false;
     }
+    if (library_.output().was_truncated()) {
+        result.measured.is_cut = true;
+    }
 }
 
 void Runner::take_output()
 {
     if (const auto size = library_.output_size()) {
         take_output(*size);
+    }
+}
+
+// Between two items.
+void Runner::drop_output()
+{
+    const auto size = library_.output_size();
+    if (running_.items.empty() && size) {
+        library_.output().take(*size, {}, 0);
+        library_.output().was_truncated();
     }
 }
 

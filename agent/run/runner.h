@@ -124,6 +124,7 @@ class Runner
     void notify_ended();
     void take_output(off_t end);
     void take_output();
+    void drop_output();
     void notify_end_of(Place place);
     void tick();
 

@@ -334,6 +334,7 @@ template <typename Find> void Runner::end_all(const Find &find)
         std::erase_if(left, [&](const Leftover &one) { return !asked.insert(one.process).second; });
         ask_to_end(left);
         std::this_thread::sleep_for(kTurn);
+        drop_output(); // what is being ended prints for no later item
         read_signals();
         reader_.poll();
         tick();
@@ -364,8 +365,19 @@ void Runner::make_way_for(const Job &job)
             return left;
         });
         reader_.note_gathered(read_stored_plan().value_or(""), vendor_);
+        // or what it has measured out of limits, or not to be judged, would not be measured again
+        const auto measures_again = [&](const auto &target) {
+            if (!target) {
+                return false;
+            }
+            const std::vector<ItemRun> &earlier = item_at(run_, {job.suite, target->item}).earlier;
+            return options_.judge_limits && !earlier.empty() &&
+                   (earlier.back().measured.out > 0 ||
+                    !what_is_lost(earlier.back().measured).empty());
+        };
         // the library does not see one under another name, and would start another beside it
-        if (gatherer_may_report_late_ || !left_by_gatherer().empty()) {
+        if (gatherer_may_report_late_ || std::ranges::any_of(job.targets, measures_again) ||
+            !left_by_gatherer().empty()) {
             end_gatherer();
         }
         gatherer_runs_ = note_gatherer();

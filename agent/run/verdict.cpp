@@ -118,6 +118,11 @@ class Judge
         if (context_.judge_limits && item_.measured.out > 0) {
             return {Outcome::failed, what_is_out(item_.measured) + though_reported(), true};
         }
+        if (const std::string lost = what_is_lost(item_.measured);
+            context_.judge_limits && !lost.empty()) {
+            return {Outcome::failed, "limits cannot be judged" + though_reported() + ": " + lost,
+                    true};
+        }
         return {Outcome::passed};
     }
 

@@ -42,8 +42,7 @@ std::vector<std::string> texts(const std::string &output, std::size_t size = std
 TEST(Measurements, AreLinesOfTheOutput)
 {
     const std::string output = "#measure a 1\n"
-                               "text #measure b 2\n"
-                               " #measure c 3\n"
+                               "text #measure b\n"
                                "#measured d 4\n"
                                "#measure\te\t 5  mV \t -1 2.50\r\n"
                                "#meas\n"
@@ -55,6 +54,22 @@ TEST(Measurements, AreLinesOfTheOutput)
                     ElementsAre("a 1", "e 5 mV -1 2.5", "a 6 % - 7", "last 8 - 9 -"));
         EXPECT_EQ(warning_of(measured(output, size)), "");
     }
+}
+
+// An earlier print may have left the line without an end.
+TEST(Measurements, StandAtTheStartOfALineOrAfterACarriageReturn)
+{
+    const std::string output = "10%\r#measure a 1\rdone\n"
+                               ".#measure b 2\n"
+                               "use: #measure NAME VALUE\n"
+                               "#measure#measure c 3\n"
+                               "#measure d 4";
+    for (const std::size_t size : {std::string::npos, std::size_t{1}, std::size_t{7}}) {
+        EXPECT_THAT(texts(output, size), ElementsAre("a 1", "d 4"));
+        EXPECT_EQ(warning_of(measured(output, size)),
+                  "2 malformed #measure lines: '#measure b 2': it is not at the start of its line");
+    }
+    EXPECT_EQ(measured("x #measure a 3 V 0 2\n").out, 0U);
 }
 
 TEST(Measurements, HaveDecimalNumbers)
@@ -136,6 +151,19 @@ TEST(Measurements, AreKeptUpToANumberAndJudgedBeyond)
     EXPECT_EQ(result.kept.size(), Measured::kMost);
     EXPECT_EQ(warning_of(result), "2 measurements after the first 256 left out");
     EXPECT_EQ(what_is_out(result), "1 measurement out of limits: a 3 V (0 to 2)");
+}
+
+TEST(Measurements, OfAProgramThatGoesWildAreSaidToBeNotJudged)
+{
+    constexpr std::size_t kMost = 1'000'000;
+    std::string output;
+    for (std::size_t at = 0; at < kMost - 1; ++at) {
+        output += "#measure a 1\n";
+    }
+    const Measured result = measured(output + "#measure z 3 V 0 2\n#measure z 4 V 0 2\n");
+    EXPECT_EQ(result.out, 1U);
+    EXPECT_EQ(warning_of(result), "999744 measurements after the first 256 left out; 1 after "
+                                  "1000000 not judged");
 }
 
 TEST(Measurements, MayBeEqualToTheirLimits)
