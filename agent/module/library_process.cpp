@@ -9,14 +9,18 @@
 #include "plan/library_rules.h"
 #include "util/failure.h"
 
+#include <algorithm>
 #include <array>
 #include <cerrno>
 #include <csignal>
 #include <cstdio>
 #include <cstdlib>
+#include <filesystem>
 #include <fmt/core.h>
+#include <iterator>
 #include <poll.h>
 #include <sys/prctl.h>
+#include <sys/resource.h>
 #include <sys/socket.h>
 #include <sys/wait.h>
 #include <system_error>
@@ -77,11 +81,17 @@ void LibraryProcess::start()
 LibraryProcess::~LibraryProcess()
 {
     output_.leave();
+    quit();
+}
+
+void LibraryProcess::quit()
+{
     shutdown(control_.get(), SHUT_RDWR);
     if (pid_ > 0) {
         kill(pid_, SIGCONT); // an item may have suspended it
         while (waitpid(pid_, nullptr, 0) < 0 && errno == EINTR) {
         }
+        pid_ = -1;
     }
 }
 
@@ -130,12 +140,30 @@ ChildProcesses LibraryProcess::processes() const
 
 void LibraryProcess::restart()
 {
+    // what an earlier process of it had started
+    siginfo_t ended{};
+    while (waitid(P_ALL, 0, &ended, WEXITED | WNOHANG | WNOWAIT) == 0 && ended.si_pid != 0 &&
+           ended.si_pid != pid_) {
+        waitpid(ended.si_pid, nullptr, WNOHANG);
+        ended = {};
+    }
     if (pid_ < 0) {
         start();
         if (hold_requested_) {
             hold_at_ends();
         }
     }
+}
+
+bool LibraryProcess::has_many_descriptors() const
+{
+    rlimit limit{};
+    getrlimit(RLIMIT_NOFILE, &limit);
+    // from 128 on, Android's shell makes no pipe
+    const rlim_t many = std::min<rlim_t>(64, limit.rlim_max / 2);
+    std::error_code gone;
+    const std::filesystem::directory_iterator all(fmt::format("/proc/{}/fd", pid_), gone);
+    return static_cast<rlim_t>(std::distance(begin(all), end(all))) > many;
 }
 
 void LibraryProcess::kill_library() const

@@ -71,6 +71,12 @@ class LibraryProcess
     // What runs for the library, or was left by a process of it that has ended.
     ChildProcesses processes() const;
 
+    // Whether the library has left so many open that programs which it starts may fail: it
+    // leaves one with each trigger and stop, and they inherit them.
+    bool has_many_descriptors() const;
+
+    // Ends the library's process and what its items left running. Only between commands.
+    void quit();
     // Starts another process if the library's has ended.
     void restart();
 

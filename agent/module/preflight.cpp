@@ -97,7 +97,7 @@ void require_trigger_port()
         bind(probe.get(), reinterpret_cast<const sockaddr *>(&address), sizeof address) != 0) {
         throw Failure(Cause::device,
                       "port {} is not available: {}; the gatherer's run would never end: stop what "
-                      "listens there (netstat -ltnp names it)",
+                      "uses it (netstat -tanp names it)",
                       kTriggerPort, std::strerror(errno));
     }
 }

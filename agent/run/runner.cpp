@@ -151,7 +151,11 @@ void Runner::run_command(const Job &job)
         }
     }
     drain_events();
-    library_.restart(); // if something ended it since the last job
+    if (library_.has_many_descriptors() && item_processes().empty() && left_.empty()) {
+        library_.quit();
+        stop_asked_ = false; // it answers no more
+    }
+    library_.restart(); // also if something ended it since the last job
     library_.give_directories(make_directories(job));
     // the library loads the plan until it reaches the first item, and a process that
     // reports meanwhile, such as a gatherer, truncates the plan before it writes it

@@ -251,7 +251,7 @@ TEST_F(Refusal, WhereTheGatherersPortIsTaken)
         plan(group_of({{"Item", "note /tmp/scene/order"}, {"SensorProbe", "--group G"}}));
     const std::string line = "fptest: port 34952 is not available: Address already in use; the "
                              "gatherer's run would never "
-                             "end: stop what listens there (netstat -ltnp names it); see fptest "
+                             "end: stop what uses it (netstat -tanp names it); see fptest "
                              "doctor";
     expect(3, line, {"--plan", path, "P/G"});
     expect(3, line, {"--plan", path, "P/G/SensorProbe"});
