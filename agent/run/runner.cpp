@@ -14,6 +14,7 @@
 #include <csignal>
 #include <fmt/core.h>
 #include <sys/wait.h>
+#include <thread>
 #include <unistd.h>
 #include <utility>
 
@@ -39,6 +40,7 @@ constexpr off_t kMostWaiting = off_t{64} << 20U; // of output
 // A gatherer that is just starting may not be visible yet.
 constexpr auto kBeforeMissed = 500ms;
 constexpr auto kBetweenPolls = 250ms;
+constexpr auto kToPrint = 100ms; // of a gatherer that has reported
 
 // Long enough for a save that is under way as an item ends, and not for the next report of
 // what it left running.
@@ -511,9 +513,15 @@ void Runner::finish(RunningItem &active, TimePoint end)
     if (active.done) {
         return;
     }
+    // the library may be at the command's next item already, which is not left running; what
+    // the gatherer leaves is named with the last one then
+    const bool is_last = running_.items.size() == 1 && running_.next >= running_.job.targets.size();
     if (active.gathers) {
         reader_.poll(ReportReader::When::at_once);
-        take_output(); // which it has printed before its report
+        if (is_last && active.gatherer_end.empty() && !active.stop) {
+            std::this_thread::sleep_for(kToPrint);
+        }
+        take_output(); // with its report
     }
     active.done = true;
     ItemRun &result = item_at(run_, active.place);
@@ -532,9 +540,6 @@ void Runner::finish(RunningItem &active, TimePoint end)
     result.outcome = verdict.outcome;
     result.reason = verdict.reason;
     result.overruled = verdict.overruled;
-    // the library may be at the command's next item already, which is not left running; what
-    // the gatherer leaves is named with the last one then
-    const bool is_last = running_.items.size() == 1 && running_.next >= running_.job.targets.size();
     if (active.gathers && is_last) {
         result.left_running = note_left_running(active.element);
     }

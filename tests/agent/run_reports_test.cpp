@@ -176,6 +176,19 @@ TEST_F(RunCommand, KeepsWhatIsPrintedAfterAnItemHasTruncatedItsOutput)
     EXPECT_EQ(output(1), "before\nchecking\nafter\n");
     EXPECT_EQ(output(2), "other\nagain\n");
     EXPECT_THAT(output(3), StartsWith("line 1\nline 2\n"));
+    EXPECT_THAT(end_of(1).at("warning").get<std::string>(),
+                StartsWith("it has opened its output anew"));
+    EXPECT_EQ(end_of(2).at("warning"), nullptr);
+}
+
+TEST_F(RunCommand, TakesWhatAGathererPrintsJustAfterItsReportForItsOwn)
+{
+    run_group({{"SensorProbe", "--help; exec /system/bin/Item gather report-here G SensorProbe 100 "
+                               "0 fine sleep 0.02 say '#measure v 5 V 0 1' sleep 60"},
+               {"Item", kPasses}},
+              {"--judge-limits"});
+    EXPECT_THAT(outcomes(), ElementsAre("SensorProbe: failed", "Item: passed"));
+    EXPECT_THAT(output(0), EndsWith("#measure v 5 V 0 1\n"));
 }
 
 TEST_F(RunCommand, KeepsTheEndOfALongOutput)
