@@ -17,6 +17,7 @@
 #include <optional>
 #include <string>
 #include <sys/types.h>
+#include <utility>
 #include <vector>
 
 namespace fptest
@@ -117,6 +118,7 @@ class Runner
     std::vector<Leftover> gatherer_processes();
     std::vector<Leftover> left_by_gatherer();
     std::vector<Leftover> note_left_running(std::size_t element);
+    std::vector<Leftover> left_by_others(const Job &job) const;
     void end_left_running();
     void end_gatherer();
     template <typename Find> void end_all(const Find &find);
@@ -136,9 +138,8 @@ class Runner
     RunningJob running_;
     ReportReader reader_;
     ItemFiles files_;
-    std::vector<Leftover> left_;             // by items of this round
-    std::vector<Leftover> gatherers_;        // also helpers that outlive the gatherer
-    std::vector<std::size_t> left_elements_; // the items' elements
+    std::vector<std::pair<std::size_t, Leftover>> left_; // in this round, by an element's item
+    std::vector<Leftover> gatherers_;                    // also helpers that outlive the gatherer
     SteadyClock::duration suspended_{};
     TimePoint last_suspension_;
     SteadyClock::duration last_suspended_{};

@@ -268,7 +268,7 @@ void Runner::cannot_stop(RunningItem &active)
 // Without those that earlier items left running.
 std::vector<Leftover> Runner::item_processes() const
 {
-    return library_.processes().of_items(left_);
+    return library_.processes().of_items(left_by_others({}));
 }
 
 // Whether the gatherer runs. What comes of it is known from then on.
@@ -305,11 +305,21 @@ std::vector<Leftover> Runner::processes_of(const RunningItem &active)
 std::vector<Leftover> Runner::note_left_running(std::size_t element)
 {
     std::vector<Leftover> found = still_found([this] { return item_processes(); });
-    if (!found.empty()) {
-        left_.insert(left_.end(), found.begin(), found.end());
-        left_elements_.push_back(element);
+    for (const Leftover &one : found) {
+        left_.emplace_back(element, one);
     }
     return found;
+}
+
+std::vector<Leftover> Runner::left_by_others(const Job &job) const
+{
+    std::vector<Leftover> all;
+    for (const auto &[element, process] : left_) {
+        if (!job.has(element)) {
+            all.push_back(process);
+        }
+    }
+    return all;
 }
 
 // Ends the processes found, until none is left.
@@ -351,9 +361,10 @@ void Runner::begin(const std::string &earlier_plan)
 
 void Runner::make_way_for(const Job &job)
 {
-    if (std::ranges::any_of(left_elements_,
-                            [&job](std::size_t element) { return job.has(element); })) {
-        end_left_running();
+    const std::vector<Leftover> others = left_by_others(job);
+    if (others.size() < left_.size()) {
+        end_all([&] { return library_.processes().of_items(others); });
+        std::erase_if(left_, [&job](const auto &one) { return job.has(one.first); });
     }
     const auto is_gatherers = [&](const auto &target) {
         return target && is_gatherer(run_.suites[job.suite].items[target->item].name, vendor_);
@@ -405,7 +416,6 @@ void Runner::end_left_running()
 {
     end_all([this] { return library_.processes().of_items(); });
     left_.clear();
-    left_elements_.clear();
 }
 
 void Runner::end_gatherer()

@@ -11,6 +11,7 @@
 //   complain TEXT   on standard error
 //   complain-file FILE  the text of that file
 //   sleep SECONDS
+//   sleep-on SECONDS  in another thread, while the first one ends
 //   ignore-stop     from here on SIGTERM does nothing
 //   tell-signal FILE  from here on SIGTERM and SIGINT write their name there and
 //                   end the program
@@ -32,6 +33,7 @@
 #include <filesystem>
 #include <fstream>
 #include <netinet/in.h>
+#include <pthread.h>
 #include <string>
 #include <string_view>
 #include <sys/socket.h>
@@ -106,11 +108,14 @@ void wait_for_word_to_gather()
         char byte = 0;
         sockaddr_in own{};
         socklen_t size = sizeof own;
-        // while nobody listens, it may get that port and meet itself
         if (connect(connection, reinterpret_cast<sockaddr *>(&address), sizeof address) == 0 &&
-            getsockname(connection, reinterpret_cast<sockaddr *>(&own), &size) == 0 &&
-            own.sin_port != address.sin_port) {
-            got = read(connection, &byte, 1) == 1 ? 1 : 0;
+            getsockname(connection, reinterpret_cast<sockaddr *>(&own), &size) == 0) {
+            if (own.sin_port != address.sin_port) {
+                got = read(connection, &byte, 1) == 1 ? 1 : 0;
+            } else { // it got that port as nobody listens, met itself, and would hold the port
+                const linger reset{1, 0};
+                setsockopt(connection, SOL_SOCKET, SO_LINGER, &reset, sizeof reset);
+            }
         }
         close(connection);
         std::this_thread::sleep_for(std::chrono::milliseconds(10));
@@ -151,6 +156,10 @@ int main(int argc, char **argv)
         } else if (word == "sleep") {
             std::this_thread::sleep_for(Seconds(std::stod(next(1))));
             at += 2;
+        } else if (word == "sleep-on") {
+            const Seconds time(std::stod(next(1)));
+            std::thread([time] { std::this_thread::sleep_for(time); }).detach();
+            pthread_exit(nullptr);
         } else if (word == "ignore-stop") {
             std::signal(SIGTERM, SIG_IGN);
             at += 1;

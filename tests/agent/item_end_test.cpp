@@ -1,8 +1,7 @@
 // SPDX-FileCopyrightText: 2026 The Quillmark authors
 // SPDX-License-Identifier: Apache-2.0
 
-// How items end, and what they leave: time limits, exit statuses and signals, items
-// that do not stop, processes left running, reports that come late.
+// How items end: time limits, exit statuses and signals, items that do not stop.
 #include "run_test.h"
 
 #include <algorithm>
@@ -130,7 +129,7 @@ TEST_F(ItemEnd, LibrarysProcessThatEndsBetweenTwoRoundsCostsNothing)
     FptestProcess fptest(
         with_group({{"Item", "report G 100 0 fine; /system/bin/Third ignore-stop sleep 60 &amp;"}},
                    {"--grace", "1.5", "--repeat", "2"}));
-    for (const std::size_t round : {1, 2}) {
+    for (const std::size_t round : {1U, 2U}) {
         ASSERT_TRUE(eventually([&] { return events("end").size() == round; }));
         std::this_thread::sleep_for(std::chrono::milliseconds(500));
         kill(fptest.library(), SIGKILL);
@@ -161,6 +160,30 @@ TEST_F(ItemEnd, LeftoverThatDestroysThePlanAtTheEndIsTold)
           "report G 100 0 fine; (trap true TERM; sleep 60; rm /data/vorlane/src1.xml) &amp;"}});
     EXPECT_EQ(ended.status, 3);
     EXPECT_THAT(ended.err, HasSubstr("src1.xml is gone"));
+}
+
+// It is in the middle of a save when it is stopped.
+TEST_F(ItemEnd, ReportThatAStopCutsShortIsUndone)
+{
+    for (const std::string kept : {"0", "40"}) {
+        const std::string cuts =
+            "trap &quot;head -c " + kept +
+            " $p >$p.cut; cat $p.cut >$p; exit&quot; TERM; sleep 60 &amp; wait";
+        const std::string plan_file = "p=/data/vorlane/src1.xml; ";
+        const Ended ended =
+            run_group({{"Item", kPasses},
+                       {"Script", script(plan_file + cuts)},
+                       {"Other", "report G 100 0 fine; " + plan_file + "(" + cuts + ") &amp;"},
+                       {"Third", kPasses}},
+                      {"--timeout", "0.5", "--repeat", "2"});
+        EXPECT_EQ(ended.status, 1) << ended.err;
+        EXPECT_THAT(outcomes(), ElementsAre("Item: passed", "Script: timed out", "Other: passed",
+                                            "Third: passed", "Item: passed", "Script: timed out",
+                                            "Other: passed", "Third: passed"));
+        const std::string stored = read_file(device::kPlanFile);
+        EXPECT_THAT(stored, EndsWith("</P>\n"));
+        EXPECT_THAT(stored, Not(HasSubstr("fptest-run")));
+    }
 }
 
 TEST_F(ItemEnd, RunIsOverWhenAllThatItLeftRunningHasEnded)
@@ -260,156 +283,6 @@ TEST_F(ItemEnd, ItemThatSignalsItsProcessGroupEndsAlone)
     EXPECT_EQ(reason(0), "died by SIGTERM, though it reported the result 0");
 }
 
-// --- what is left running -----------------------------------------------------------------
-
-// A script that leaves this to a child of its own the first time that it runs.
-std::string leaving(const std::string &text)
-{
-    return script("if ! test -e /tmp/scene/left; then (" + text +
-                  ") &amp; fi; echo x >/tmp/scene/left; sleep 0.3");
-}
-
-TEST_F(ItemEnd, ChildOfAnEarlierRoundReportsIntoNoLaterOne)
-{
-    const std::string late = "sleep 0.6; " + script_report("0", "of round 1");
-    const Ended ended =
-        run_group({{"Script", leaving(late)}, {"Item", kPasses}}, {"--repeat", "3"});
-    EXPECT_EQ(ended.status, 1);
-    EXPECT_THAT(outcomes(), ElementsAre("Script: no result", "Item: passed", "Script: no result",
-                                        "Item: passed", "Script: no result", "Item: passed"));
-}
-
-TEST_F(ItemEnd, WhatIsLeftRunningIsNamed)
-{
-    const Ended ended = run_group(
-        {{"Script", script("/system/bin/Third sleep 60 &amp; " + script_report("0", "fine"))},
-         {"Item", kPasses}});
-    const Json left = end_of(0).at("left_running");
-    ASSERT_EQ(left.size(), 1U);
-    EXPECT_EQ(left.at(0).at("name"), "Third");
-    EXPECT_THAT(ended.out, HasSubstr("    left running: Third (pid " +
-                                     std::to_string(left.at(0).at("pid").get<int>()) + ")\n"));
-    EXPECT_THAT(end_of(1).at("left_running"), IsEmpty());
-}
-
-TEST_F(ItemEnd, ChildOnlyJustEndingIsNotLeftRunning)
-{
-    run_group({{"Script", script("sleep 0.05 &amp; " + script_report("0", "fine"))}});
-    EXPECT_THAT(end_of(0).at("left_running"), IsEmpty());
-}
-
-TEST_F(ItemEnd, ReportAfterTheItemsEndIsToldAndChangesNothing)
-{
-    const Ended ended =
-        run_group({{"Script", leaving("sleep 0.6; " + script_report("0", "too late"))},
-                   {"Item", "sleep 1 report G 100 0 fine"}});
-    EXPECT_EQ(ended.status, 1);
-    EXPECT_THAT(outcomes(), ElementsAre("Script: no result", "Item: passed"));
-    const auto late = events("late");
-    ASSERT_EQ(late.size(), 1U);
-    EXPECT_EQ(late.at(0).at("item"), "Script");
-    EXPECT_EQ(late.at(0).at("description"), "too late");
-    EXPECT_THAT(ended.out, HasSubstr("G/Script: late report, result 0: too late; it changes "
-                                     "nothing\n"));
-}
-
-TEST_F(ItemEnd, LateReportIsToldAlsoOfLessProgressOrInTheMomentOfTheEnd)
-{
-    // that child ends before it would count as left running
-    for (const std::string late : {"0.3; fptest report G Script --progress 90",
-                                   "0.05; fptest report G Script --progress 100"}) {
-        const Ended ended =
-            run_group({{"Script", "'(sleep " + late +
-                                      " --result 1 --description late) &amp; fptest report G "
-                                      "Script --progress 100 --result 0'"},
-                       {"Item", "sleep 0.8 report G 100 0 fine"}});
-        EXPECT_THAT(outcomes(), ElementsAre("Script: passed", "Item: passed"));
-        EXPECT_THAT(ended.out,
-                    HasSubstr("G/Script: late report, result 1: late; it changes nothing\n"));
-    }
-}
-
-TEST_F(ItemEnd, WhatIsLeftRunningIsEndedBeforeTheNextRoundAndAtTheEnd)
-{
-    const Items items = {
-        {"Script", script("/system/bin/Third note /tmp/scene/order sleep 60 &amp; " +
-                          script_report("0", "fine"))},
-        {"Item", "await /tmp/scene/order sleep 0.2 report G 100 0 fine"}};
-    EXPECT_EQ(run_group(items, {"--repeat", "2"}).status, 0);
-    EXPECT_EQ(read_file(work("order")), "Third\nThird\n");
-    EXPECT_THAT(running_items(), IsEmpty());
-}
-
-TEST_F(ItemEnd, ChildOfAnItemReportsIntoNoSecondRunOfItInTheSameRound)
-{
-    const std::string late = "sleep 0.6; " + script_report("0", "of the first");
-    EXPECT_EQ(run_group({{"Script", leaving(late)}}, {"P/G/Script"}).status, 1);
-    EXPECT_THAT(outcomes(), ElementsAre("Script: no result", "Script: no result"));
-}
-
-TEST_F(ItemEnd, WhatIsLeftRunningIsGoneWhenTheNextRoundBegins)
-{
-    run_group({{"Script", script("ps Third >>/tmp/scene/seen; " + script_report("0", "fine"))},
-               {"Item", "report G 100 0 fine; /system/bin/Third sleep 60 &amp;"}},
-              {"--repeat", "2"});
-    EXPECT_THAT(end_of(1).at("left_running").size(), 1U);
-    EXPECT_THAT(read_file(work("seen")), AllOf(HasSubstr("USER"), Not(HasSubstr("Third"))));
-}
-
-TEST_F(ItemEnd, WhatIsLeftRunningServesTheRestOfItsRound)
-{
-    const Items items = {
-        {"Script", script("/system/bin/Third await /tmp/scene/asked note /tmp/scene/answered "
-                          "sleep 60 &amp; " +
-                          script_report("0", "fine"))},
-        {"Item", "note /tmp/scene/asked await /tmp/scene/answered report G 100 0 fine"}};
-    EXPECT_EQ(run_group(items, {"--timeout", "20"}).status, 0);
-}
-
-TEST_F(ItemEnd, WhatIsLeftRunningIsKilledWhereItDoesNotEnd)
-{
-    const Ended ended =
-        run_group({{"Script", script("/system/bin/Third ignore-stop sleep 60 &amp; sleep 0.2; " +
-                                     script_report("0", "fine"))}},
-                  {"--grace", "0.5", "--repeat", "2"});
-    EXPECT_EQ(ended.status, 0);
-    EXPECT_THAT(running_items(), IsEmpty());
-}
-
-TEST_F(ItemEnd, WhatIsLeftRunningOutlivesTheTimeOutOfAnotherItem)
-{
-    run_group({{"Item", "report G 100 0 fine; /system/bin/Third sleep 60 &amp;"},
-               {"Script", script("sleep 60")},
-               {"Other", "report G 100 0 $(ps Third | grep -c Third)"}},
-              {"--timeout", "0.5"});
-    EXPECT_THAT(outcomes(), ElementsAre("Item: passed", "Script: timed out", "Other: passed"));
-    EXPECT_EQ(end_of(2).at("description"), "1");
-}
-
-TEST_F(ItemEnd, WhatIsLeftRunningIsNotTheNextItemsWhateverItStarts)
-{
-    run_group({{"Item", "report G 100 0 fine; while true; do sleep 0.05; done &amp;"},
-               {"Other", "sleep 0.3 report G 100 0 fine"}});
-    EXPECT_THAT(end_of(0).at("left_running").size(), Ge(1U));
-    EXPECT_THAT(end_of(1).at("left_running"), IsEmpty());
-}
-
-TEST_F(ItemEnd, WhatIsLeftRunningInASessionOfItsOwnIsFound)
-{
-    run_group({{"Item", "report G 100 0 fine; setsid /system/bin/Third sleep 60 &amp;"}});
-    EXPECT_THAT(end_of(0).at("left_running").size(), 1U);
-    EXPECT_THAT(running_items(), IsEmpty());
-}
-
-TEST_F(ItemEnd, WhatIsLeftRunningEndsWithARunThatBreaksOff)
-{
-    const Ended ended =
-        run_group({{"Item", "/system/bin/Third sleep 60 &amp; rm /data/vorlane/src1.xml"},
-                   {"Other", kPasses}});
-    EXPECT_EQ(ended.status, 3);
-    EXPECT_THAT(running_items(), IsEmpty());
-}
-
 // --- a plan that a report has spoiled ------------------------------------------------
 
 TEST_F(ItemEnd, DescriptionThatNoPlanCanHoldCostsNoOtherItem)
@@ -476,6 +349,19 @@ TEST_F(ItemEnd, LibrarysProcessThatIsSuspendedIsReplaced)
 }
 
 // --- the gatherer ------------------------------------------------------------------------
+
+TEST_F(ItemEnd, GathererIsNoZombieThoughTheProcessThatStartedItIsGone)
+{
+    const std::string end_library = "report G 100 0 x; kill -KILL $PPID; sleep 5";
+    const Ended ended = run_group(
+        {{"SensorProbe", "--group G --seconds 0"},
+         {"Item", end_library},
+         {"Script", script("kill -KILL $(ps | grep /SensorProbe | (read a b c; echo $b))")},
+         {"Third", end_library},
+         {"Other", "report G 100 0 zombies-$(grep -l '^State.*Z' /proc/*/status | grep -c .)"}});
+    EXPECT_THAT(device::processes_named(device::kProbe), IsEmpty()) << ended.out;
+    EXPECT_EQ(end_of(4).at("description"), "zombies-0") << ended.err;
+}
 
 TEST_F(ItemEnd, GathererThatEndsAtItsStartHoldsUpNoRun)
 {
