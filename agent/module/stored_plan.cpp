@@ -33,11 +33,17 @@ std::string new_mark()
     return fmt::format("{:x}-{:x}", now, ++count);
 }
 
+// The text before the one that was parsed last, if it was whole.
+std::string whole_before;
+
 // Parses only what differs from the last text, byte for byte: two saves may leave a file of the
 // same time and size.
 ParsedPlan &parsed(const std::string &text)
 {
     static ParsedPlan last{""};
+    if (last.annotated() && last.text() != text) {
+        whole_before = last.text();
+    }
     last.read(text);
     return last;
 }
@@ -139,6 +145,25 @@ void mend_stored_plan()
         auto mended = made_loadable(saved);
         return mended || !Plan::parse_annotated(saved) ? mended : std::optional(saved);
     });
+}
+
+bool restore_stored_plan()
+{
+    constexpr std::size_t kCompared = 16;
+    std::string text;
+    const auto make = [](const std::string &saved) {
+        const bool is_cut = !whole_before.empty() &&
+                            whole_before.starts_with(saved.substr(0, kCompared)) &&
+                            stored_plan_status();
+        return Plan::parse_annotated(saved) ? std::optional(saved)
+               : is_cut                     ? std::optional(whole_before)
+                                            : std::nullopt;
+    };
+    try {
+        return remake_stored_plan(text, make).has_value();
+    } catch (const Failure &) {
+        return false; // the disk is full
+    }
 }
 
 Descriptor lock_stored_plan()

@@ -79,6 +79,10 @@ StoredPlan whole_stored_plan(std::chrono::milliseconds patience = kForWholePlan)
 // and keeps control characters and invalid UTF-8. Throws a Failure if it cannot be written.
 void mend_stored_plan();
 
+// Undoes a save that was cut short: puts back what was read before it. False if the plan is not
+// cut but gone or another text, or cannot be written.
+bool restore_stored_plan();
+
 // The lock that fptest and the sample items take on the stored plan, so that no report of
 // theirs undoes another; the library itself takes none. Goes on without it after 10 seconds, or if
 // there is no plan.

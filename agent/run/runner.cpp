@@ -234,9 +234,15 @@ void Runner::require_all_started()
 // Without a stored plan no later item can report.
 void Runner::require_plan()
 {
-    if (!whole_stored_plan().is_usable) {
+    if (!whole_stored_plan().is_usable && !restore_plan()) {
         break_off(fmt::format("the stored plan {} {}: store it again", kStoredPlan, kPlanLost));
     }
+}
+
+// A stop may come in the middle of a report, which leaves no plan to report into.
+bool Runner::restore_plan()
+{
+    return std::exchange(has_signalled_, false) && restore_stored_plan();
 }
 
 void Runner::handle(const LibraryProcess::Event &event)
@@ -447,7 +453,7 @@ void Runner::end_item(const LibraryProcess::Event &event)
         const auto plan =
             whole_stored_plan(is_beside_others ? kForPlanBesideOthers : kForWholePlan).annotated;
         reader_.read(plan);
-        running_.items.back().reporting.lost = !plan;
+        running_.items.back().reporting.lost = !plan && !restore_plan();
     }
     const std::vector<Leftover> left =
         event.left_running
@@ -553,6 +559,7 @@ void Runner::finish(RunningItem &active, TimePoint end)
     }
     if (active.gathers && !has_finished(result.report)) {
         gatherer_may_report_late_ = true;
+        has_signalled_ = true;
         signal_each(gatherer_processes(), SIGTERM);
     }
     reader_.watch_for_late_reports(active);

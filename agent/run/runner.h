@@ -94,6 +94,7 @@ class Runner
     void settle_directories();
     void require_all_started();
     void require_plan();
+    bool restore_plan();
     void poll_gatherers();
     void poll_gatherer(RunningItem &active);
     void read_signals();
@@ -151,6 +152,7 @@ class Runner
     bool over_limit_ = false;
     TimePoint stopping_since_;              // a signal, or the limit
     bool stop_asked_ = false;               // and not yet answered
+    bool has_signalled_ = false;            // processes that may have been reporting
     bool gatherer_runs_ = false;            // before the job's next item
     bool gatherer_may_report_late_ = false; // it was triggered and has not reported
     std::string library_gone_;              // why, if its process ended in this job

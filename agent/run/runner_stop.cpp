@@ -182,6 +182,7 @@ void Runner::try_stop(RunningItem &active)
         return;
     }
     active.stop_tried_at = now();
+    has_signalled_ = true;
     // once: a second SIGTERM would restart its clean-up
     if (!stop_asked_ && !active.was_stopped) {
         const auto met = met_by_stop(item_at(run_, active.place).name);
@@ -225,6 +226,7 @@ void Runner::stop_gatherer(RunningItem &active)
         release_command();
     }
     const std::vector<Leftover> left = gatherer_processes();
+    has_signalled_ = true;
     if (!is_last && !active.was_stopped && ask_to_end(left)) {
         active.was_stopped = true;
     }
@@ -333,6 +335,7 @@ template <typename Find> void Runner::end_all(const Find &find)
     std::set<pid_t> asked;
     for (auto left = find_all(); !left.empty(); left = find_all()) {
         const auto waited = now() - begin;
+        has_signalled_ = true;
         if (waited > options_.grace + kBeforeGivingUp) {
             break_off(fmt::format("{} cannot be killed, and might still report", described(left)));
             return;
@@ -393,6 +396,9 @@ void Runner::make_way_for(const Job &job)
         }
         gatherer_runs_ = note_gatherer();
         require_trigger_port(); // an item may have taken it
+    }
+    if (has_signalled_) {
+        require_plan();
     }
     reader_.poll(ReportReader::When::at_once);
     reader_.forget(job);
