@@ -323,16 +323,15 @@ Exit run(RunOptions options)
     require_programs(names_of(round), vendor, options.force);
     const bool is_sent = checked.storing != Storing::as_file;
     const bool is_placed = !is_sent && !options.plan.empty();
+    const std::string &to_store = is_sent ? checked.stored : checked.text;
     Runner::Options for_runner = runner_options(options);
-    const std::string why_ended =
-        why_gatherer_is_ended(options, round, is_sent ? checked.stored : checked.text, vendor);
+    const std::string why_ended = why_gatherer_is_ended(options, round, to_store, vendor);
     for_runner.ends_gatherer = !why_ended.empty();
     if (!options.quiet) {
         report_other_gatherer(round, plan, vendor, why_ended);
     }
     if (is_sent || is_placed) {
-        const std::string &stored = is_sent ? checked.stored : checked.text;
-        refer_to_doctor([&stored] { require_room(stored.size()); });
+        refer_to_doctor([&to_store] { require_room(to_store.size()); });
     }
     if (is_placed && !options.quiet) {
         say("{}: its {} bytes are more than the {} that a command stores, so it is placed as the "
@@ -340,6 +339,10 @@ Exit run(RunOptions options)
             one_line(checked.name), checked.text.size(), kPlanLimit, kStoredPlan);
     }
     const auto store_plan = [&] {
+        const auto stored = Plan::load_as_library(read_stored_plan().value_or(""));
+        if (!options.resume.empty() && stored && digest_of(*stored) == digest_of(plan)) {
+            return; // it may have the reports that are taken over
+        }
         if (is_sent) {
             send_and_wait(*library, "XMLFile::" + checked.text);
             require_stored(library->read_back(), checked.stored);

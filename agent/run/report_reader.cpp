@@ -26,7 +26,8 @@ constexpr std::size_t kSeen = 100; // reports kept for an item
 constexpr std::string_view kPlanName =
     std::string_view(kStoredPlan).substr(std::string_view(kStoredPlan).rfind('/') + 1);
 
-// As mend_stored_plan() leaves it, but with a result that has no value told from none.
+} // namespace
+
 ItemReport report_of(const Plan &plan, std::size_t number)
 {
     ItemReport report = plan.report(number);
@@ -40,13 +41,15 @@ ItemReport report_of(const Plan &plan, std::size_t number)
     return report;
 }
 
-// mend_stored_plan() leaves an empty description for one without a value.
 bool is_same(const ItemReport &one, const ItemReport &other)
 {
     return one.progress == other.progress && one.result == other.result &&
            one.result_without_value == other.result_without_value &&
            one.description.value_or("") == other.description.value_or("");
 }
+
+namespace
+{
 
 // Then whoever has saved the plan has reported for this element.
 bool is_only_report(const Plan &plan, std::size_t number)

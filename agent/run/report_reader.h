@@ -21,6 +21,12 @@
 namespace fptest
 {
 
+// As mend_stored_plan() leaves it, but with a result that has no value told from none.
+ItemReport report_of(const Plan &plan, std::size_t number);
+
+// mend_stored_plan() leaves an empty description for one without a value.
+bool is_same(const ItemReport &one, const ItemReport &other);
+
 class ReportReader
 {
   public:

@@ -4,12 +4,14 @@
 #include "run/rounds.h"
 
 #include "module/stored_plan.h"
+#include "run/report_reader.h"
 #include "util/text.h"
 #include "util/write.h"
 
 #include <algorithm>
 #include <chrono>
 #include <fmt/core.h>
+#include <optional>
 #include <poll.h>
 #include <unistd.h>
 #include <utility>
@@ -32,7 +34,8 @@ class TakenOver
   public:
     TakenOver(Run &run, const std::vector<Reporter *> &reporters, const RoundPlan &plan,
               const EarlierRun *earlier)
-        : run_(run), reporters_(reporters), plan_(plan), earlier_(earlier)
+        : run_(run), reporters_(reporters), plan_(plan), earlier_(earlier),
+          reports_(plan.jobs.size())
     {
         take_over_round();
         while (has_more() && std::ranges::find(is_over_, false) == is_over_.end()) {
@@ -44,6 +47,12 @@ class TakenOver
     bool is_over(std::size_t at) const
     {
         return is_over_[at];
+    }
+
+    // What it reported when it last ended by that, in any round.
+    const std::optional<ItemReport> &report(std::size_t at) const
+    {
+        return reports_[at];
     }
 
     // Of rounds to come.
@@ -77,6 +86,9 @@ class TakenOver
             if (earlier_->attempts.contains(first + at)) {
                 take_over(plan_.jobs[at], first + at);
                 is_over_[at] = earlier_->ended.contains(first + at);
+            }
+            if (is_over_[at]) {
+                reports_[at] = earlier_->attempts.at(first + at).report;
             }
         }
     }
@@ -122,7 +134,8 @@ class TakenOver
     const std::vector<Reporter *> &reporters_;
     const RoundPlan &plan_;
     const EarlierRun *earlier_;
-    std::vector<bool> is_over_; // each job of the round
+    std::vector<bool> is_over_;                      // each job of the round
+    std::vector<std::optional<ItemReport>> reports_; // of each job
 };
 
 class Rounds
@@ -298,6 +311,22 @@ std::string begin(const Run &run, const std::vector<Reporter *> &reporters, cons
     return {};
 }
 
+// Those whose reports in the stored plan are not this run's, also if it will not reach them.
+std::vector<std::size_t> elements_of_others(const RoundPlan &plan, const TakenOver &taken_over)
+{
+    const auto stored = parse_stored_plan().annotated();
+    std::vector<std::size_t> all;
+    for (std::size_t at = 0; at < plan.jobs.size(); ++at) {
+        for (const std::size_t element : plan.jobs[at].elements()) {
+            if (!stored || !taken_over.report(at) ||
+                !is_same(report_of(*stored, element), *taken_over.report(at))) {
+                all.push_back(element);
+            }
+        }
+    }
+    return all;
+}
+
 } // namespace
 
 bool run_rounds(const std::vector<Reporter *> &reporters, const Runner::Options &options,
@@ -324,13 +353,8 @@ bool run_rounds(const std::vector<Reporter *> &reporters, const Runner::Options 
         run_nothing(failure.what(), run, reporters, signals);
     }
     try {
-        std::vector<std::size_t> all; // also of those that will not be reached
-        for (const Job &job : plan.jobs) {
-            const auto elements = job.elements();
-            all.insert(all.end(), elements.begin(), elements.end());
-        }
         if (goes_on) {
-            clear_reports(all);
+            clear_reports(elements_of_others(plan, taken_over));
             run.finished = Rounds(runner, run, plan, taken_over).run_all();
         }
         if (!runner.broken()) {

@@ -85,6 +85,42 @@ TEST_F(ResumedRun, HasOneWholeReportAfterAnInterruption)
                    {}, {{"Item", kPasses}});
 }
 
+TEST_F(ResumedRun, LeavesItsOwnReportsInTheStoredPlan)
+{
+    const Items items = {
+        {"Item", "say first report G 100 1 bad"}, {"Third", kPasses}, {"Other", kSleepsOnce}};
+    for (const Lines &options : {Lines{}, Lines{"--plan", work("plan.xml")}}) {
+        SCOPED_TRACE(PrintToString(options));
+        std::filesystem::remove(work("slept"));
+        Lines words = {"--resume", cut_off(items, SIGKILL)};
+        run_fptest({"report", "G", "Third", "--progress", "7", "--result", "0"});
+        words.insert(words.end(), options.begin(), options.end());
+        EXPECT_EQ(run(words).status, 1);
+        EXPECT_EQ(run_fptest({"show"}).out, "GROUP  ITEM   PROGRESS  RESULT  DESCRIPTION\n"
+                                            "G      Item        100       1  bad\n"
+                                            "G      Third         -       -  -\n"
+                                            "G      Other       100       0  ok\n");
+    }
+}
+
+TEST_F(ResumedRun, LeavesItsReportsOfEarlierRoundsInTheStoredPlan)
+{
+    const Items items = {{"Item", kPasses},
+                         {"Script", script("test -e /tmp/scene/first &amp;&amp; touch "
+                                           "/tmp/scene/slept &amp;&amp; exec sleep 60; touch "
+                                           "/tmp/scene/first; " +
+                                           script_report("0", "ok"))},
+                         {"Third", kPasses}};
+    FptestProcess fptest(with_json({"--resume", cut_off(items, SIGINT, {"--repeat", "2"})}));
+    ASSERT_TRUE(wait_for_events("start", 5));
+    EXPECT_EQ(run_fptest({"show"}).out, "GROUP  ITEM    PROGRESS  RESULT  DESCRIPTION\n"
+                                        "G      Item         100       0  fine\n"
+                                        "G      Script         -       -  -\n"
+                                        "G      Third        100       0  fine\n");
+    fptest.signal(SIGINT);
+    fptest.wait();
+}
+
 TEST_F(ResumedRun, GoesOnAfterTheDeviceHasGoneDown)
 {
     const std::string before = cut_off(kThreeOfWhichOneSleeps, SIGKILL);
