@@ -109,8 +109,8 @@ void summarize(Run &run)
             for (const ItemRun &attempt : item.earlier) {
                 summary.times.add(attempt.seconds.value_or(0));
             }
-            if (item.outcome != Outcome::not_run) {
-                summary.times.add(item.seconds.value_or(0));
+            if (item.seconds) {
+                summary.times.add(*item.seconds);
             }
         }
     }

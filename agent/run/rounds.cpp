@@ -272,8 +272,35 @@ bool flush(const std::vector<Reporter *> &reporters, Signals &signals, bool is_i
     return true;
 }
 
+// One that has failed, and is not tried again as the run has ended, counts as stopped.
+void stop_between_attempts(Run &run, const std::vector<Reporter *> &reporters)
+{
+    for (std::size_t suite = 0; suite < run.suites.size(); ++suite) {
+        for (std::size_t at = 0; at < run.suites[suite].items.size(); ++at) {
+            const Place place{suite, at};
+            ItemRun &item = item_at(run, place);
+            if (!is_between_attempts(item)) {
+                continue;
+            }
+            item.start = std::chrono::system_clock::now();
+            for (Reporter *reporter : reporters) {
+                reporter->started(run, place);
+            }
+            item.seconds = 0;
+            item.outcome = Outcome::stopped;
+            item.reason =
+                fmt::format("{}, before attempt {}", run.why_unfinished, item.earlier.size() + 1);
+            for (Reporter *reporter : reporters) {
+                reporter->ended(run, place);
+            }
+            item.seconds.reset(); // no attempt that a summary would count
+        }
+    }
+}
+
 void finish(Run &run, const std::vector<Reporter *> &reporters)
 {
+    stop_between_attempts(run, reporters);
     summarize(run);
     for (Reporter *reporter : reporters) {
         reporter->finish(run);

@@ -172,14 +172,15 @@ TEST_F(RetriedRun, HasNotEndedWhereItIsInterruptedBetweenAttempts)
     const Ended ended = fptest.wait(10);
     EXPECT_EQ(ended.status, 130);
     EXPECT_THAT(without_times(ended.out),
-                HasSubstr("\n0 passed, 0 failed, 0 flaky, 1 retry, 1 not run, T s\n"));
-    EXPECT_THAT(attempts(), ElementsAre("Other 1 failed", "Other 2 not run"));
-    EXPECT_THAT(reasons(), ElementsAre("interrupted by Ctrl-C"));
+                HasSubstr("\n0 passed, 1 failed, 0 flaky, 1 retry, 0 not run, T s\n"));
+    EXPECT_THAT(attempts(), ElementsAre("Other 1 failed", "Other 2 stopped"));
+    EXPECT_THAT(reasons(), ElementsAre("interrupted by Ctrl-C, before attempt 2"));
     EXPECT_EQ(events("finish").at(0).at("retries"), 1);
+    EXPECT_EQ(events("finish").at(0).at("summary").at(0).at("run"), 1);
     const Element only = parse_xml(junit()).all("testsuite").at(0).all("testcase").at(0);
-    EXPECT_EQ(only.all("error").at(0).attributes.at("type"), "not run");
+    EXPECT_EQ(only.all("error").at(0).attributes.at("type"), "stopped");
     EXPECT_EQ(only.all("rerunFailure").size(), 1U);
-    EXPECT_EQ(only.properties().at("attempts"), "1");
+    EXPECT_EQ(only.properties().at("attempts"), "2");
 
     std::filesystem::rename(work("json"), work("before"));
     const Ended listed = run_fptest({"run", "--list", "--failed-of", work("before")});
