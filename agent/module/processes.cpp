@@ -13,10 +13,12 @@
 #include <csignal>
 #include <cstdlib>
 #include <cstring>
+#include <ctime>
 #include <filesystem>
 #include <fmt/core.h>
 #include <map>
 #include <optional>
+#include <sys/stat.h>
 #include <system_error>
 #include <unistd.h>
 
@@ -28,17 +30,20 @@ namespace
 struct Process {
     pid_t parent = 0;
     pid_t group = 0;
-    unsigned long long born = 0;
+    unsigned long long threads = 0;
+    unsigned long long born = 0; // in ticks since the system's start
     char state = '?';
     std::string program;   // argv[0], or the kernel's name for it
     std::string name;      // without the path
     std::string script;    // what an interpreter runs
     std::string listed_as; // by quillmark-ps: its program, or the script
+    std::string arguments; // each with its NUL
     bool gathers = false;
 };
 
 using Processes = std::map<pid_t, Process>;
 
+constexpr int kMostLists = 4;
 constexpr std::size_t kKernelsName = 15; // characters; of a script it is the script's
 
 std::string last_part(const std::string &path)
@@ -60,9 +65,11 @@ std::optional<Process> read_process(const std::filesystem::path &directory)
     process.parent = static_cast<pid_t>(std::strtol(stat.c_str() + close + 3, &end, 10));
     process.group = static_cast<pid_t>(std::strtol(end, &end, 10));
     for (int field = 5; field < 22; ++field) {
+        process.threads = field == 20 ? process.born : process.threads;
         process.born = std::strtoull(end, &end, 10);
     }
-    const std::string arguments = read_file(directory / "cmdline").value_or("");
+    process.arguments = read_file(directory / "cmdline").value_or("");
+    const std::string &arguments = process.arguments;
     const std::string command = arguments.c_str();
     process.program = command.empty() ? stat.substr(open + 1, close - open - 1) : command;
     process.name = last_part(process.program);
@@ -82,27 +89,85 @@ std::optional<Process> read_process(const std::filesystem::path &directory)
     return process;
 }
 
-Processes read_processes()
+// False if all that are listed were read before.
+bool add_unread(Processes &processes)
 {
-    Processes processes;
+    const std::size_t before = processes.size();
     std::error_code gone;
     for (const auto &entry : std::filesystem::directory_iterator("/proc", gone)) {
         const std::string name = entry.path().filename();
         pid_t pid = 0;
         const auto [end, error] = std::from_chars(name.data(), name.data() + name.size(), pid);
-        if (error != std::errc{} || end != name.data() + name.size()) {
+        if (error != std::errc{} || end != name.data() + name.size() || processes.contains(pid)) {
             continue;
         }
         if (auto process = read_process(entry.path())) {
             processes.emplace(pid, std::move(*process));
         }
     }
+    return processes.size() > before;
+}
+
+Processes read_processes()
+{
+    Processes processes;
+    // One that forks and ends after it was listed, as a daemon does, has a child that was not.
+    for (int lists = 0; lists < kMostLists && add_unread(processes); ++lists) {
+    }
     return processes;
 }
 
+// One whose first thread has ended lives on in the others.
 bool lives(const Process &process)
 {
-    return process.state != 'Z' && process.state != 'X';
+    return process.threads > 1 || (process.state != 'Z' && process.state != 'X');
+}
+
+double seconds_of(const timespec &time)
+{
+    return static_cast<double>(time.tv_sec) + static_cast<double>(time.tv_nsec) / 1e9;
+}
+
+double seconds_by(clockid_t clock)
+{
+    timespec now{};
+    clock_gettime(clock, &now);
+    return seconds_of(now);
+}
+
+double started_at(const Process &process)
+{
+    const auto ticks = static_cast<double>(sysconf(_SC_CLK_TCK));
+    const double age = seconds_by(CLOCK_BOOTTIME) - static_cast<double>(process.born) / ticks;
+    return seconds_by(CLOCK_REALTIME) - age;
+}
+
+// Whether the file, or a link on the way to it, is newer than that.
+bool has_changed_since(double start, const std::filesystem::path &file, int links = 0)
+{
+    constexpr double kCoarse = 0.02; // the kernel's times are
+    constexpr int kMostLinks = 40;
+    std::filesystem::path way;
+    struct stat status {
+    };
+    for (const std::filesystem::path &part : file) {
+        way /= part;
+        if (lstat(way.c_str(), &status) != 0 || links > kMostLinks) {
+            return false;
+        }
+        const double changed = seconds_of(status.st_ctim);
+        if (!S_ISDIR(status.st_mode) && changed > start + kCoarse &&
+            changed <= seconds_by(CLOCK_REALTIME)) {
+            return true;
+        }
+        std::error_code unknown;
+        if (S_ISLNK(status.st_mode) &&
+            has_changed_since(
+                start, way.parent_path() / std::filesystem::read_symlink(way, unknown), ++links)) {
+            return true;
+        }
+    }
+    return false;
 }
 
 // Whether the predicate holds for the process or one of its ancestors.
@@ -259,17 +324,24 @@ std::optional<std::pair<std::string, pid_t>> found_as_gatherer()
     return std::nullopt;
 }
 
-// What runs under another name, as a script's shell does, cannot be compared.
 bool is_gatherer_outdated()
 {
     const auto found = found_as_gatherer();
-    const std::string file = found ? fmt::format("/proc/{}/exe", found->second) : "";
+    const std::string process = found ? fmt::format("/proc/{}", found->second) : "";
+    const auto read = found ? read_process(process) : std::nullopt;
+    if (!read) {
+        return false;
+    }
+    if (has_changed_since(started_at(*read), found->first)) {
+        return true;
+    }
+    // Or another one is mounted there. What runs under another name, as a script's shell does,
+    // cannot be compared.
+    const std::string file = process + "/exe";
     std::error_code unknown;
-    return found &&
-           std::filesystem::read_symlink(file, unknown)
-               .filename()
-               .string()
-               .starts_with(kGatherer) &&
+    const std::string program = std::filesystem::read_symlink(file, unknown).filename();
+    const std::string name = last_part(found->first);
+    return (program == name || program == name + " (deleted)") &&
            !std::filesystem::equivalent(found->first, file, unknown) && !unknown;
 }
 

@@ -102,6 +102,16 @@ TEST_F(EarlierGatherer, IsEndedWhereItsProgramIsAnotherFileNow)
     EXPECT_EQ(run_fptest(group).err, "");
 }
 
+TEST_F(EarlierGatherer, IsNotTakenForReplacedWhereItsWrapperGivesItsOwnName)
+{
+    ASSERT_TRUE(fs::copy_file("/system/bin/Item", work("SensorProbe.real")));
+    const Lines group = with_group(
+        {{"SensorProbe", "--help; exec -a " + std::string(kProbe) + " " + work("SensorProbe.real") +
+                             " gather report G 100 0 one gather report G 100 0 two sleep 60"}});
+    EXPECT_EQ(run_fptest(group).status, 0);
+    EXPECT_THAT(run_fptest(group).err, Not(HasSubstr("replaced")));
+}
+
 TEST_F(EarlierGatherer, MayKeepItsCopyWhileThePlanIsStoredAnew)
 {
     const Gatherer gatherer("gather report-here G SensorProbe 100 0 one gather report-here G "
