@@ -357,9 +357,13 @@ std::vector<Leftover> ChildProcesses::of_items(const std::vector<Leftover> &left
 std::vector<Leftover> ChildProcesses::of_gatherer() const
 {
     const Processes processes = read_family(ancestor_, vendor_);
+    const auto library = processes.find(library_);
     return leftovers(processes, library_, [&](pid_t pid, const Process &process) {
+        // or an item's, just before its own group and program
+        const bool is_copy = library != processes.end() && process.parent == library_ &&
+                             process.arguments == library->second.arguments;
         return comes_of_gatherer(processes, pid) ||
-               (process.group == library_ && is_below(processes, pid, ancestor_));
+               (process.group == library_ && is_below(processes, pid, ancestor_) && !is_copy);
     });
 }
 
