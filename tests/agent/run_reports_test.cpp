@@ -310,30 +310,18 @@ TEST_F(RunCommand, NamesEveryReportThatFailsThoughTheRunIsInterrupted)
     }
 }
 
-// The run of the plan, with these options, where no file may be longer than so many
-// blocks of 512 bytes.
-Ended run_with_limit(int blocks, const std::string &options)
-{
-    support::Start start;
-    start.arguments = {"/system/bin/sh", "-c",
-                       "ulimit -f " + std::to_string(blocks) + "; exec fptest run --quiet " +
-                           options + " --plan /tmp/scene/plan.xml P/G"};
-    start.environment = {{"VR_LOG_FILE", std::nullopt}}; // items write to it
-    return support::run(start);
-}
-
 TEST_F(RunCommand, CountsNoOutputOfEarlierItemsAgainstTheLimitOfFiles)
 {
-    plan(device::plan_of({{"G",
-                           {{"Script", "'head -c 12000 /dev/zero; fptest report G Script "
-                                       "--progress 100 --result 0'"}}}}));
-    EXPECT_EQ(run_with_limit(60, "--repeat 4").status, 0);
+    const Items items = {{"Script", "'head -c 12000 /dev/zero; fptest report G Script "
+                                    "--progress 100 --result 0'"}};
+    const std::string path = plan(group_of(items));
+    EXPECT_EQ(run_limited("-f 60", {"run", "--repeat", "4", "--plan", path, "P/G"}).status, 0);
 }
 
 TEST_F(RunCommand, GoesOnWhereAReportIsTooLongForTheLimitOfFiles)
 {
-    plan(kOnePasses);
-    const Ended ended = run_with_limit(2, "--repeat 20 --json /tmp/scene/json");
+    const Ended ended =
+        run_limited("-f 2", with_group({{"Item", kPasses}}, {"--repeat", "20", "--quiet"}));
     EXPECT_EQ(ended.status, 3);
     EXPECT_THAT(ended.err, EndsWith("fptest: /tmp/scene/json: File too large; the run "
                                     "went on all the same\n"));

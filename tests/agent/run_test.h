@@ -8,8 +8,11 @@
 #include "fptest_runner.h"
 #include "support/reports.h"
 
+#include <algorithm>
 #include <cstddef>
+#include <iterator>
 #include <nlohmann/json.hpp>
+#include <optional>
 #include <string>
 #include <utility>
 #include <vector>
@@ -76,6 +79,16 @@ class RunCommand : public FptestTest
     static Ended run_group(const Items &items, Lines options = {})
     {
         return fptest_runner::run_fptest(with_group(items, std::move(options)));
+    }
+    // With that limit, as "-n 64", which the shell sets.
+    static Ended run_limited(const std::string &limit, Lines arguments)
+    {
+        support::Start start;
+        start.arguments = {"/system/bin/sh", "-c", "ulimit " + limit + "; exec \"$0\" \"$@\"",
+                           "fptest"};
+        std::ranges::move(arguments, back_inserter(start.arguments));
+        start.environment = {{"VR_LOG_FILE", std::nullopt}}; // items write to it
+        return support::run(start);
     }
 
     static std::string json()
