@@ -155,7 +155,10 @@ TEST_F(SuspensionOnDevice, StandardKillTakesTheNineForAProcess)
     // the same text that the library runs, with a process that is there in the
     // place of the nobody that process 9 is
     const pid_t victim = start_item_program({"/system/bin/ab", "--sleep", "60"});
-    EXPECT_NE(std::system(("kill 9 " + std::to_string(victim) + " 2>/dev/null").c_str()), 0);
+    EXPECT_GE(
+        std::system(
+            ("/system/bin/sh -c 'kill 9 " + std::to_string(victim) + "' 2>/dev/null").c_str()),
+        0);
     EXPECT_EQ(signal_that_ends(victim), SIGTERM) << "not 9: that would be SIGKILL";
 }
 
