@@ -88,8 +88,8 @@ def eventually(condition, seconds=10):
     return True
 
 
-# Words of a COMMAND that says "ready" and what signals it gets, and ends with 7 half a
-# second after the last one.
+# Words of a COMMAND that says "ready" and what signals it gets, and ends with 7 a
+# quarter of a second after the last one.
 SIGNAL_SAYER = ("/usr/bin/python3", TREE / "tests/support/say_signals.py")
 
 

@@ -1,6 +1,6 @@
 # SPDX-FileCopyrightText: 2026 The Quillmark authors
 # SPDX-License-Identifier: Apache-2.0
-"""Says "ready" and what signals it gets, and ends with 7 half a second after the last."""
+"""Says "ready" and what signals it gets, and ends with 7 a quarter of a second after the last."""
 import signal
 import sys
 
@@ -11,5 +11,5 @@ print("ready", flush=True)
 patience = 30
 while got := signal.sigtimedwait(SIGNALS, patience):
     print(signal.Signals(got.si_signo).name.removeprefix("SIG"), flush=True)
-    patience = 0.5
+    patience = 0.25
 sys.exit(7)
