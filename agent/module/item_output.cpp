@@ -102,16 +102,19 @@ bool ItemOutput::was_truncated()
     return std::exchange(was_truncated_, false);
 }
 
-bool ItemOutput::take(off_t end, const Use &use, off_t most)
+bool ItemOutput::skip(off_t end, off_t most)
 {
     note_truncation(end);
-    const bool is_all = end - taken_ <= most;
-    taken_ = is_all ? taken_ : end - most;
-    for (std::string text;;) {
-        fallocate(file_.get(), FALLOC_FL_PUNCH_HOLE | FALLOC_FL_KEEP_SIZE, 0, taken_);
-        if (taken_ >= end) {
-            return is_all;
-        }
+    const bool is_more = end - taken_ > most;
+    taken_ = is_more ? end - std::min(most, kPiece) : taken_;
+    release();
+    return is_more;
+}
+
+void ItemOutput::take(off_t end, const Use &use, TimePoint until)
+{
+    note_truncation(end);
+    for (std::string text; taken_ < end && std::chrono::steady_clock::now() < until; release()) {
         text.resize(static_cast<std::size_t>(std::min(end - taken_, kPiece)));
         const ssize_t got = pread(file_.get(), text.data(), text.size(), taken_);
         taken_ = got > 0 ? taken_ + got : end;
@@ -119,6 +122,11 @@ bool ItemOutput::take(off_t end, const Use &use, off_t most)
             use(std::string_view(text).substr(0, static_cast<std::size_t>(got)));
         }
     }
+}
+
+void ItemOutput::release()
+{
+    fallocate(file_.get(), FALLOC_FL_PUNCH_HOLE | FALLOC_FL_KEEP_SIZE, 0, taken_);
 }
 
 } // namespace fptest

@@ -6,8 +6,8 @@
 
 #include "common/descriptor.h"
 
+#include <chrono>
 #include <functional>
-#include <limits>
 #include <string_view>
 #include <sys/types.h>
 
@@ -26,13 +26,16 @@ class ItemOutput
     }
     off_t size() const;
 
-    // Hands on what was printed since the last call, up to that size, in pieces; only the end
-    // of it, and returns false, if there is more than that.
+    // Whether more than so many bytes, of those up to that size, were not taken: only their
+    // last 64 KiB then are, or as many as may be.
+    bool skip(off_t end, off_t most = 0);
+    // Hands on what was printed since the last call, up to that size, in pieces. What is left
+    // at that time is for the next call.
     using Use = std::function<void(std::string_view)>;
-    static constexpr off_t kNoLimit = std::numeric_limits<off_t>::max();
-    bool take(off_t end, const Use &use, off_t most = kNoLimit);
+    using TimePoint = std::chrono::steady_clock::time_point;
+    void take(off_t end, const Use &use, TimePoint until = TimePoint::max());
 
-    // Whether somebody has truncated it, as found by take() since the last call.
+    // Whether somebody has truncated it, as found since the last call.
     bool was_truncated();
 
     // Begins anew if all of it was taken, and it is much or the size of files is limited, which
@@ -50,6 +53,8 @@ class ItemOutput
 
   private:
     void note_truncation(off_t end);
+
+    void release(); // the memory of what was taken
 
     Descriptor file_;
     off_t taken_ = 0;

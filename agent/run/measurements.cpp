@@ -276,6 +276,11 @@ void take_line(const std::string &line, bool is_whole, Measured &measured)
 
 void MeasureReader::read(std::string_view text, Measured &measured)
 {
+    if (is_skipping_) {
+        const std::size_t end = text.find_first_of("\n\r");
+        is_skipping_ = end == text.npos;
+        text.remove_prefix(is_skipping_ ? text.size() : end + 1);
+    }
     while (!text.empty()) {
         // not byte by byte, as a program that prints without end has many
         const std::size_t skipped = line_.empty() ? text.find(kMeasureMark.front()) : 0;
@@ -285,10 +290,22 @@ void MeasureReader::read(std::string_view text, Measured &measured)
             text.remove_prefix(other.size());
             continue;
         }
+        if (line_.empty() && text.size() >= kMeasureMark.size() &&
+            !text.starts_with(kMeasureMark)) {
+            is_at_start_ = false;
+            text.remove_prefix(1);
+            continue;
+        }
+        if (line_.size() > kMeasureMark.size() && !is_line_end(text.front())) {
+            const std::string_view rest = text.substr(0, text.find_first_of("\n\r"));
+            line_ += rest.substr(0, kLongestLine + 1 - std::min(line_.size(), kLongestLine + 1));
+            text.remove_prefix(rest.size());
+            continue;
+        }
         const char c = text.front();
         if (is_line_end(c)) {
             end(measured);
-        } else if (line_.size() <= kLongestLine) {
+        } else {
             line_ += c;
         }
         text.remove_prefix(1);
@@ -297,6 +314,13 @@ void MeasureReader::read(std::string_view text, Measured &measured)
             is_at_start_ = false;
         }
     }
+}
+
+void MeasureReader::skip()
+{
+    line_.clear();
+    is_skipping_ = true;
+    is_at_start_ = true;
 }
 
 void MeasureReader::end(Measured &measured)

@@ -66,12 +66,15 @@ class MeasureReader
 {
   public:
     void read(std::string_view text, Measured &measured);
+    // Some of the output is left out: what follows may be in the middle of a line.
+    void skip();
     // The last line may have no line feed.
     void end(Measured &measured);
 
   private:
     std::string line_; // from what may be its mark on, as far as it was read
     bool is_at_start_ = true;
+    bool is_skipping_ = false; // the rest of a line
 };
 
 } // namespace fptest

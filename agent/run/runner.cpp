@@ -40,7 +40,8 @@ constexpr off_t kMostWaiting = off_t{64} << 20U; // of output
 // A gatherer that is just starting may not be visible yet.
 constexpr auto kBeforeMissed = 500ms;
 constexpr auto kBetweenPolls = 250ms;
-constexpr auto kToPrint = 100ms; // of a gatherer that has reported
+constexpr auto kToPrint = 100ms;    // of a gatherer that has reported
+constexpr auto kForReading = 100ms; // of output, while nothing else is looked at
 
 // Long enough for a save that is under way as an item ends, and not for the next report of
 // what it left running.
@@ -353,7 +354,7 @@ void Runner::poll_gatherer(RunningItem &active)
 
 // What is printed is the current item's, or else the next one's. All of it is read for
 // measurements, unless it comes faster than that.
-void Runner::take_output(off_t end)
+void Runner::take_output(off_t end, TimePoint until)
 {
     if (running_.items.empty()) {
         return;
@@ -364,18 +365,20 @@ void Runner::take_output(off_t end)
         append_output(result.output, text);
         active.measuring.read(text, result.measured);
     };
-    if (!library_.output().take(end, use, kMostWaiting)) {
+    if (library_.output().skip(end, kMostWaiting)) {
         result.measured.is_read = false;
+        active.measuring.skip();
     }
+    library_.output().take(end, use, until);
     if (library_.output().was_truncated()) {
         result.measured.is_cut = true;
     }
 }
 
-void Runner::take_output()
+void Runner::take_output(TimePoint until)
 {
     if (const auto size = library_.output_size()) {
-        take_output(*size);
+        take_output(*size, until);
     }
 }
 
@@ -384,7 +387,7 @@ void Runner::drop_output()
 {
     const auto size = library_.output_size();
     if (running_.items.empty() && size) {
-        library_.output().take(*size, {}, 0);
+        library_.output().skip(*size);
         library_.output().was_truncated();
     }
 }
@@ -392,7 +395,7 @@ void Runner::drop_output()
 void Runner::tick()
 {
     run_.seconds = run_.seconds_before + Seconds(now() - began_).count();
-    take_output();
+    take_output(SteadyClock::now() + kForReading);
     for (const RunningItem &active : running_.items) {
         item_at(run_, active.place).running = std::max(0.0, Seconds(now() - active.start).count());
         item_at(run_, active.place).stopping = active.stop.has_value();
@@ -445,7 +448,7 @@ void Runner::end_item(const LibraryProcess::Event &event)
     if (is_watched) {
         take_output(event.output);
     } else {
-        library_.output().take(event.output, {}, 0);
+        library_.output().skip(event.output);
     }
     if (is_watched) {
         // before anything that it left running can report again

@@ -125,8 +125,8 @@ class Runner
     template <typename Find> void end_all(const Find &find);
     void finish(RunningItem &active, TimePoint end);
     void notify_ended();
-    void take_output(off_t end);
-    void take_output();
+    void take_output(off_t end, TimePoint until = TimePoint::max());
+    void take_output(TimePoint until = TimePoint::max());
     void drop_output();
     void notify_end_of(Place place);
     void tick();

@@ -106,6 +106,7 @@ def test_an_item_that_prints_without_end_is_stopped_in_time(bench, line):
 
     assert bench.end()["outcome"] == "timed out"
     assert bench.end()["seconds"] < 6
+    assert "malformed" not in (bench.end()["warning"] or "")
 
 
 @pytest.mark.parametrize("options, status, outcome", [

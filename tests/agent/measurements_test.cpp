@@ -56,6 +56,21 @@ TEST(Measurements, AreLinesOfTheOutput)
     }
 }
 
+// Where a program prints faster than that is read.
+TEST(Measurements, AreNotMadeOfLinesOfWhichAPieceIsLeftOut)
+{
+    Measured result;
+    MeasureReader reader;
+    reader.read("#measure a 1\n#measure b 1", result);
+    reader.skip();
+    reader.read("5\n#measure c 2\n#measure d 3", result);
+    reader.skip();
+    reader.read("#measure e", result);
+    reader.read(" 4\r#measure f 5\n", result);
+    EXPECT_THAT(texts(result), ElementsAre("a 1", "c 2", "f 5"));
+    EXPECT_EQ(warning_of(result), "");
+}
+
 // An earlier print may have left the line without an end.
 TEST(Measurements, StandAtTheStartOfALineOrAfterACarriageReturn)
 {
