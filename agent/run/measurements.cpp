@@ -237,10 +237,22 @@ bool is_measurement(std::string_view line)
 namespace
 {
 
+// Not a sentence about "#measure NAME VALUE".
+bool is_meant_for_one(std::string_view line)
+{
+    const std::vector<std::string> words = words_after_mark(line);
+    const auto has_number = [](const std::string &word) {
+        const std::size_t at = word.find_first_not_of("+-.");
+        return at != word.npos && std::isdigit(static_cast<unsigned char>(word[at])) != 0;
+    };
+    return !words.empty() &&
+           (words.front() == kRefused || std::any_of(words.begin() + 1, words.end(), has_number));
+}
+
 // From its mark on. What stands before that may be a line that another print began.
 void take_line(const std::string &line, bool is_whole, Measured &measured)
 {
-    if (!is_about_one(line) || (!is_whole && !is_measurement(line))) {
+    if (!is_about_one(line) || (!is_whole && !is_meant_for_one(line))) {
         return;
     }
     if (measured.kept.size() + measured.left_out + measured.malformed >= kMostJudged) {

@@ -85,6 +85,10 @@ TEST(Measurements, StandAtTheStartOfALineOrAfterACarriageReturn)
                   "2 malformed #measure lines: '#measure b 2': it is not at the start of its line");
     }
     EXPECT_EQ(measured("x #measure a 3 V 0 2\n").out, 0U);
+    for (const std::string lost : {"x 1,5", "x uV 1 2", "x -.5V", "refused: '' is not a number",
+                                   "a 1 V 0 2 #measure b 9 V 0 2", "a 1 V 0 2#measure b 9 V 0 2"}) {
+        EXPECT_EQ(measured("reading... #measure " + lost).malformed, 1U) << lost;
+    }
 }
 
 TEST(Measurements, HaveDecimalNumbers)
