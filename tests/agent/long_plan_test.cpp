@@ -200,7 +200,8 @@ TEST_F(LongPlan, HasAThousandFindingsShownAndNoWarningInAnErrorsPlace)
 {
     std::string items;
     for (int number = 0; number < 1001; ++number) {
-        items += "<Cmd name=\"i" + std::to_string(number) + "\" args=\"a; b\"/>";
+        // too long for some releases' ps; the shell, which has 5 s for all, is asked of none
+        items += "<Cmd name=\"ItemOfManyLetters" + std::to_string(number) + "\" args=\"a\"/>";
     }
     items += "<Cmd name=\"last\"/>";
     const Ended ended = run_fptest({"check", "--for", "file", "-"},
