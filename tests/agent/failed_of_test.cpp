@@ -211,23 +211,29 @@ TEST_F(FailedOf, HasNoPartInWhatCannotBe)
                    file("before", whole + whole));
 }
 
-TEST_F(FailedOf, IsNoPlaceToWaitOrReadWithoutEnd)
+TEST_F(FailedOf, IsNotReadWithoutEnd)
 {
     expect_refused("/dev/zero:1: this line is longer than the 64 MiB that fptest reads",
                    "/dev/zero");
-    ASSERT_EQ(mkfifo(work("pipe").c_str(), 0600), 0);
-    expect_refused(work("pipe") + ": nobody writes to this pipe within 5 s", work("pipe"));
 }
 
 // As from <(zcat earlier.jsonl.gz), also where that takes long.
-TEST_F(FailedOf, MayComeThroughAPipe)
+TEST_F(FailedOf, MayComeThroughAPipeToWhichSomebodyWrites)
 {
     const std::string before = left_by({{"Item", ""}});
-    ASSERT_EQ(mkfifo(work("pipe").c_str(), 0600), 0);
+    for (const std::string name : {"pipe", "nobodys"}) {
+        ASSERT_EQ(mkfifo(work(name).c_str(), 0600), 0);
+    }
+    FptestProcess refused({"run", "--failed-of", work("nobodys"), "--plan",
+                           file("other.xml", group_of(kFour))});
     const support::Process writer({.arguments = {"sh", "-c", "exec >\"$1\"; sleep 6; cat \"$2\"",
                                                  "sh", work("pipe"), before}});
     EXPECT_EQ(run_group({{"Item", kPasses}}, {"--failed-of", work("pipe")}).status, 0);
     EXPECT_THAT(outcomes(), ElementsAre("Item: passed"));
+    const Ended ended = refused.wait();
+    EXPECT_EQ(ended.status, 2);
+    EXPECT_EQ(ended.err,
+              "fptest: " + work("nobodys") + ": nobody writes to this pipe within 5 s\n");
 }
 
 TEST_F(FailedOf, IsNotOverwritten)

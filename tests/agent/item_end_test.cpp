@@ -75,9 +75,9 @@ TEST_F(ItemEnd, GraceIsAsLongAsItIsSaidToBe)
     run_group({{"Item", "ignore-stop sleep 1 report G 100 0 fine"}},
               {"--timeout", "0.2", "--grace", "0.3"});
     EXPECT_THAT(reason(0), StartsWith("killed after 0."));
-    run_group({{"Item", "ignore-stop sleep 3 report G 100 0 fine"}},
+    run_group({{"Item", "ignore-stop sleep 2.5 report G 100 0 fine"}},
               {"--timeout", "0.2", "--grace", "20"});
-    EXPECT_THAT(reason(0), StartsWith("stopped after 3."));
+    EXPECT_THAT(reason(0), StartsWith("stopped after 2."));
 }
 
 TEST_F(ItemEnd, ScriptAndItsChildrenAreKilledTogether)
@@ -115,7 +115,7 @@ TEST_F(ItemEnd, InterruptionBetweenTwoRoundsBeginsNoOtherRound)
 {
     FptestProcess fptest(
         with_group({{"Item", "report G 100 0 fine; /system/bin/Third ignore-stop sleep 60 &amp;"}},
-                   {"--grace", "1.5", "--repeat", "2"}));
+                   {"--grace", "0.9", "--repeat", "2"}));
     ASSERT_TRUE(eventually([] { return events("end").size() == 1; }));
     std::this_thread::sleep_for(std::chrono::milliseconds(300));
     fptest.signal(SIGTERM);
@@ -128,10 +128,10 @@ TEST_F(ItemEnd, LibrarysProcessThatEndsBetweenTwoRoundsCostsNothing)
 {
     FptestProcess fptest(
         with_group({{"Item", "report G 100 0 fine; /system/bin/Third ignore-stop sleep 60 &amp;"}},
-                   {"--grace", "1.5", "--repeat", "2"}));
+                   {"--grace", "0.9", "--repeat", "2"}));
     for (const std::size_t round : {1U, 2U}) {
         ASSERT_TRUE(eventually([&] { return events("end").size() == round; }));
-        std::this_thread::sleep_for(std::chrono::milliseconds(500));
+        std::this_thread::sleep_for(std::chrono::milliseconds(300));
         kill(fptest.library(), SIGKILL);
     }
     EXPECT_EQ(fptest.wait().status, 0);
@@ -175,7 +175,7 @@ TEST_F(ItemEnd, ReportThatAStopCutsShortIsUndone)
                        {"Script", script(plan_file + cuts)},
                        {"Other", "report G 100 0 fine; " + plan_file + "(" + cuts + ") &amp;"},
                        {"Third", kPasses}},
-                      {"--timeout", "0.5", "--repeat", "2"});
+                      {"--timeout", "0.3", "--repeat", "2"});
         EXPECT_EQ(ended.status, 1) << ended.err;
         EXPECT_THAT(outcomes(), ElementsAre("Item: passed", "Script: timed out", "Other: passed",
                                             "Third: passed", "Item: passed", "Script: timed out",
@@ -190,7 +190,7 @@ TEST_F(ItemEnd, RunIsOverWhenAllThatItLeftRunningHasEnded)
 {
     FptestProcess fptest(
         with_group({{"Item", "report G 100 0 fine; /system/bin/Third ignore-stop sleep 60 &amp;"}},
-                   {"--grace", "3", "--tap", "--junit", work("junit")}));
+                   {"--grace", "2.2", "--tap", "--junit", work("junit")}));
     ASSERT_TRUE(eventually([] { return events("end").size() == 1; }));
     std::this_thread::sleep_for(std::chrono::milliseconds(1300)); // until JUnit is written again
     EXPECT_THAT(junit(), HasSubstr("<testsuites name=\"fptest\" tests=\"2\" failures=\"0\" "
@@ -394,11 +394,11 @@ TEST_F(ItemEnd, GathererThatEndsWithoutAReportIsNotWaitedFor)
 TEST_F(ItemEnd, GathererThatDidNotReportInTimeReportsIntoNothingLater)
 {
     const Items items = {{"SensorProbe", "--group G --seconds 1"},
-                         {"Item", "sleep 1.2 report G 100 0 fine"}};
+                         {"Item", "sleep 0.9 report G 100 0 fine"}};
     for (const std::string way : {"--quiet", "--as-group"}) {
         SCOPED_TRACE(way);
         run_group(items,
-                  {way, "--timeout", "0.5", "--grace", "0.3", "P/G/SensorProbe", "--repeat", "2"});
+                  {way, "--timeout", "0.4", "--grace", "0.2", "P/G/SensorProbe", "--repeat", "2"});
         for (const Json &end : events("end")) {
             EXPECT_EQ(end.at("outcome"), "timed out");
         }
@@ -409,7 +409,7 @@ TEST_F(ItemEnd, GathererThatDidNotReportInTimeReportsIntoNothingLater)
 TEST_F(ItemEnd, GathererThatIsSuspendedIsKilled)
 {
     FptestProcess fptest(with_group({{"SensorProbe", "--group G --seconds 60"}},
-                                    {"--timeout", "1", "--grace", "0.5"}));
+                                    {"--timeout", "0.6", "--grace", "0.3"}));
     ASSERT_TRUE(eventually([] { return processes_named(kProbe).size() == 1; }, 20));
     for (const device::Process &process : processes_named(kProbe)) {
         kill(process.pid, SIGSTOP);
@@ -424,8 +424,8 @@ TEST_F(ItemEnd, GathererThatIsSuspendedIsKilled)
 TEST_F(ItemEnd, SuspendedRunSuspendsItsItemsAndNoTimePasses)
 {
     const Start start{
-        .arguments = with_group({{"Item", "note /tmp/scene/begun sleep 1.5 report G 100 0 fine"}},
-                                {"--timeout", "2.5"}),
+        .arguments = with_group({{"Item", "note /tmp/scene/begun sleep 0.8 report G 100 0 fine"}},
+                                {"--timeout", "1.4"}),
         .prepare = in_own_group};
     FptestProcess fptest(start);
     ASSERT_TRUE(wait_for_file("begun"));
@@ -434,7 +434,7 @@ TEST_F(ItemEnd, SuspendedRunSuspendsItsItemsAndNoTimePasses)
     for (const device::Process &process : processes_named("/system/bin/Item")) {
         EXPECT_TRUE(eventually([&] { return is_suspended(process.pid); }, 20));
     }
-    std::this_thread::sleep_for(std::chrono::seconds(3));
+    std::this_thread::sleep_for(std::chrono::milliseconds(1500));
     fptest.signal(SIGCONT);
     EXPECT_EQ(fptest.wait().status, 0);
     EXPECT_THAT(outcomes(), ElementsAre("Item: passed"));
@@ -443,7 +443,7 @@ TEST_F(ItemEnd, SuspendedRunSuspendsItsItemsAndNoTimePasses)
 TEST_F(ItemEnd, SuspendedRunSuspendsTheGatherer)
 {
     const Start start{
-        .arguments = with_group({{"SensorProbe", "--group G --seconds 1.5"}}, {"--timeout", "10"}),
+        .arguments = with_group({{"SensorProbe", "--group G --seconds 1"}}, {"--timeout", "10"}),
         .prepare = in_own_group};
     FptestProcess fptest(start);
     ASSERT_TRUE(eventually([] { return processes_named(kProbe).size() == 1; }, 20));

@@ -121,7 +121,7 @@ TEST_F(OtherRun, StatusSaysThatARunIsSuspendedAndDoesNotCountThatTime)
     ASSERT_TRUE(
         eventually([] { return status().out.find(", suspended, ") != std::string::npos; }, 20));
     const std::string seen = status().out;
-    std::this_thread::sleep_for(std::chrono::seconds(2));
+    std::this_thread::sleep_for(std::chrono::milliseconds(1200));
     EXPECT_EQ(status().out, seen);
     fptest.signal(SIGCONT);
     ASSERT_TRUE(eventually([&] { return status().out != seen; }));
@@ -130,7 +130,7 @@ TEST_F(OtherRun, StatusSaysThatARunIsSuspendedAndDoesNotCountThatTime)
     EXPECT_THAT(after, Not(HasSubstr("suspended")));
     for (const std::string before : {"plan.xml for ", "at G/Other for "}) {
         EXPECT_LT(std::stod(after.substr(after.find(before) + before.size())),
-                  passed.count() - 1.5);
+                  passed.count() - 1.0);
     }
     fptest.signal(SIGINT);
     fptest.wait();
@@ -230,7 +230,7 @@ TEST_F(OtherRun, StopOfNothingSucceeds)
 TEST_F(OtherRun, StopGivesUpAtItsLimitAndSaysWhatToDo)
 {
     FptestProcess fptest(
-        with_group({{"Stubborn", "ignore-stop note /tmp/scene/begun sleep 60"}}, {"--grace", "3"}));
+        with_group({{"Stubborn", "ignore-stop note /tmp/scene/begun sleep 60"}}, {"--grace", "1.2"}));
     ASSERT_TRUE(wait_for_file("begun"));
     const std::string pid = std::to_string(fptest.pid());
     const Ended ended = stop({"--wait", "0.1"});

@@ -88,7 +88,7 @@ class Output : public FptestTest
 
 TEST_F(Output, TerminalThatIsStoppedHoldsUpNothing)
 {
-    TerminalSession session({FPTEST_PROGRAM, "run", "--timeout", "1", "--json", work("json"),
+    TerminalSession session({FPTEST_PROGRAM, "run", "--timeout", "0.6", "--json", work("json"),
                              "--plan", plan(kTwoItems), "P/G"},
                             80, 24);
     ASSERT_TRUE(session.wait_for_text("running"));
@@ -128,7 +128,7 @@ TEST_F(Output, PipeThatIsFullHoldsUpNothingAndLosesNothing)
 TEST_F(Output, FifoWithoutAReaderHoldsUpNothing)
 {
     ASSERT_EQ(mkfifo(work("fifo").c_str(), 0600), 0);
-    FptestProcess fptest({"run", "--timeout", "1", "--json", work("fifo"), "--junit", work("junit"),
+    FptestProcess fptest({"run", "--timeout", "0.5", "--json", work("fifo"), "--junit", work("junit"),
                           "--plan", plan(kTwoItems), "P/G"});
     EXPECT_TRUE(eventually(
         [&] { return fptest.out().find("1 passed, 1 failed") != std::string::npos; }, 20))

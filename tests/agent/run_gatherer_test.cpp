@@ -126,7 +126,7 @@ TEST_F(RunGatherer, DoesNotCountTheNextItemOfItsGroupAsLeftRunning)
 {
     EXPECT_EQ(
         run_group({{"SensorProbe", "--help"}, {"Item", "ignore-stop sleep 30"}, {"Other", kPasses}},
-                  {"--as-group", "--timeout", "1", "--grace", "0.3"})
+                  {"--as-group", "--timeout", "0.6", "--grace", "0.3"})
             .status,
         1);
     EXPECT_THAT(outcomes(),
@@ -169,7 +169,7 @@ TEST_F(RunGatherer, GoesOnWhereItNeverConnects)
 {
     for (const std::string way : {"--quiet", "--as-group"}) {
         SCOPED_TRACE(way);
-        EXPECT_EQ(run_group(kGathererThatNeverComes, {way, "--timeout", "1"}).status, 1);
+        EXPECT_EQ(run_group(kGathererThatNeverComes, {way, "--timeout", "0.6"}).status, 1);
         EXPECT_THAT(outcomes(), ElementsAre("SensorProbe: timed out", "Other: passed"));
         EXPECT_THAT(reasons(), ElementsAre(StartsWith("stopped after 1."), ""));
     }
@@ -180,7 +180,7 @@ TEST_F(RunGatherer, GoesOnWhereARunningOneHangs)
     EXPECT_EQ(run_group({{"SensorProbe", "--group G --seconds 0.1"}, {"Other", kPasses}}).status,
               0);
     signal_gatherer(SIGSTOP);
-    EXPECT_EQ(run({"--timeout", "1", "P/G"}).status, 1);
+    EXPECT_EQ(run({"--timeout", "0.5", "P/G"}).status, 1);
     EXPECT_THAT(outcomes(), ElementsAre("SensorProbe: timed out", "Other: passed"));
     signal_gatherer(SIGCONT);
 }
@@ -220,7 +220,7 @@ TEST_F(RunGatherer, MayReportFromACopyOfThePlanThatItKeeps)
         SCOPED_TRACE(way);
         const std::string reports = "gather report-here G SensorProbe 100 0 ";
         const Gatherer gatherer(reports + "one " + reports + "two " + reports + "three sleep 60");
-        run_group({{"SensorProbe", ""}, {"Item", "sleep 0.3 report G 100 0 fine"}},
+        run_group({{"SensorProbe", ""}, {"Item", "sleep 0.2 report G 100 0 fine"}},
                   {way, "--repeat", "3"});
         EXPECT_THAT(outcomes(), AllOf(SizeIs(6), Each(EndsWith(": passed"))));
     }
@@ -230,10 +230,10 @@ TEST_F(RunGatherer, MaySayTheSameAgainFromItsCopy)
 {
     for (const std::string way : {"--quiet", "--as-group"}) {
         SCOPED_TRACE(way);
-        const std::string reports = "gather report-here G SensorProbe 100 0 done sleep 0.3 "
+        const std::string reports = "gather report-here G SensorProbe 100 0 done sleep 0.2 "
                                     "report-here G SensorProbe 100 1 late ";
         const Gatherer gatherer(reports + reports + reports + "sleep 60");
-        run_group({{"SensorProbe", ""}, {"Item", "sleep 0.5 report G 100 0 fine"}},
+        run_group({{"SensorProbe", ""}, {"Item", "sleep 0.35 report G 100 0 fine"}},
                   {way, "--repeat", "3", "--timeout", "3"});
         EXPECT_THAT(outcomes(), AllOf(SizeIs(6), Each(EndsWith(": passed"))));
         EXPECT_THAT(events("late"), SizeIs(3));
@@ -253,8 +253,8 @@ TEST_F(RunGatherer, HasNoResultWhereItOnlySaysTheSameOfAnotherItemAgain)
         const std::string other = "gather report-here G Item 50 0 x sleep 0.2 ";
         const Gatherer gatherer(other + "report-here G SensorProbe 100 0 done " + other +
                                 "sleep 60");
-        run_group({{"SensorProbe", ""}, {"Item", "sleep 0.5 report G 100 0 fine"}},
-                  {way, "--repeat", "2", "--timeout", "1.2"});
+        run_group({{"SensorProbe", ""}, {"Item", "sleep 0.4 report G 100 0 fine"}},
+                  {way, "--repeat", "2", "--timeout", "0.8"});
         EXPECT_EQ(outcomes().at(0), "SensorProbe: passed");
         EXPECT_EQ(outcomes().at(2), "SensorProbe: timed out");
     }
@@ -399,7 +399,7 @@ TEST_F(RunGatherer, MayRunAnotherProgramInItsOwnPlace)
 {
     const std::string gatherer = "--help; exec -a " + std::string(kProbe) +
                                  ".real /system/bin/Item gather report-here G SensorProbe 100 0 "
-                                 "one gather sleep 1 report-here G SensorProbe 100 0 two sleep 60";
+                                 "one gather sleep 0.6 report-here G SensorProbe 100 0 two sleep 60";
     std::string told;
     for (const char *description : {"one", "two"}) {
         told = run_group({{"SensorProbe", gatherer}}, {"--timeout", "5"}).err;
@@ -432,8 +432,8 @@ TEST_F(RunGatherer, HasTheLateReportsShownOfEachRound)
 {
     const Gatherer gatherer(
         "gather report-here G SensorProbe 100 0 one gather report-here G SensorProbe 100 0 two "
-        "sleep 0.3 report-here G SensorProbe 100 1 'two, later' sleep 60");
-    run_group({{"SensorProbe", ""}, {"Item", "sleep 0.8 report G 100 0 fine"}}, {"--repeat", "2"});
+        "sleep 0.2 report-here G SensorProbe 100 1 'two, later' sleep 60");
+    run_group({{"SensorProbe", ""}, {"Item", "sleep 0.5 report G 100 0 fine"}}, {"--repeat", "2"});
     EXPECT_THAT(outcomes(), Each(EndsWith(": passed")));
     ASSERT_THAT(events("late"), SizeIs(1));
     EXPECT_EQ(events("late")[0].at("description"), "two, later");
@@ -504,9 +504,9 @@ TEST_F(RunGatherer, IsKilledInAGroupsCommandWhereItIgnoresTheStop)
     run_group({{"SensorProbe",
                 "--help >/dev/null; exec /system/bin/Stubborn ignore-stop gather sleep 60"},
                {"Item", "sleep 4 report G 100 0 fine"}},
-              {"--as-group", "--timeout", "1", "--grace", "0.5"});
+              {"--as-group", "--timeout", "0.5", "--grace", "0.2"});
     EXPECT_THAT(outcomes(), ElementsAre("SensorProbe: timed out", "Item: timed out"));
-    EXPECT_THAT(reasons().at(0), StartsWith("killed after 1."));
+    EXPECT_THAT(reasons().at(0), StartsWith("killed after 0."));
     EXPECT_THAT(processes_named("/system/bin/Stubborn"), IsEmpty());
 }
 

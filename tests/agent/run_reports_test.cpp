@@ -27,7 +27,7 @@ TEST_F(RunCommand, TellsTheSameCountsInEveryReport)
         {{"A #1", {{"Item", "report 'A #1' 100 0 fine"}, {"Other", "report 'A #1' 100 1 bad"}}},
          {"B",
           {{"Third", "say nothing"}, {"Stubborn", "sleep 60"}, {"Fourth", "report B 100 0 x"}}}});
-    const Ended ended = run({"--tap", "--junit", work("junit"), "--timeout", "1", "--plan",
+    const Ended ended = run({"--tap", "--junit", work("junit"), "--timeout", "0.6", "--plan",
                              plan(text), "P/A #1", "P/B"});
     EXPECT_EQ(ended.status, 1);
     EXPECT_EQ(ended.err, "");

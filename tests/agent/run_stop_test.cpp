@@ -44,8 +44,8 @@ TEST_F(RunCommand, AsksTheItemToStopWhereAnotherProcessHasItsName)
 {
     run_group({{"Other", "report G 100 0 fine; /system/bin/Item ignore-stop sleep 60 &amp;"},
                {"Item", kSleeps}},
-              {"--timeout", "1"});
-    EXPECT_THAT(reasons(), ElementsAre("", StartsWith("stopped after 1.")));
+              {"--timeout", "0.6", "--grace", "0.3"});
+    EXPECT_THAT(reasons(), ElementsAre("", StartsWith("stopped after 0.")));
     EXPECT_EQ(read_file(work("signal")), "SIGTERM\n");
 }
 
@@ -54,8 +54,8 @@ TEST_F(RunCommand, AsksTheItemToStopWhereAScriptsNameBeginsAsItsOwn)
     run_group({{"Script", script("trap true TERM; " + script_report("0", "fine") +
                                  "; while true; do sleep 0.1; done &amp;")},
                {"Scrip", kSleeps}},
-              {"--timeout", "1"});
-    EXPECT_THAT(reasons(), ElementsAre("", StartsWith("stopped after 1.")));
+              {"--timeout", "0.6", "--grace", "0.3"});
+    EXPECT_THAT(reasons(), ElementsAre("", StartsWith("stopped after 0.")));
     EXPECT_EQ(read_file(work("signal")), "SIGTERM\n");
 }
 
@@ -63,7 +63,7 @@ TEST_F(RunCommand, StopsItemsOfAGroupsCommandOneByOne)
 {
     const Ended ended =
         run_group({{"Item", kSleeps}, {"Other", kPasses}, {"Third", kSleeps}, {"Fourth", kPasses}},
-                  {"--as-group", "--timeout", "1"});
+                  {"--as-group", "--timeout", "0.6"});
     EXPECT_EQ(ended.status, 1);
     EXPECT_THAT(paths_run(), ElementsAre("P/G"));
     EXPECT_THAT(outcomes(), ElementsAre("Item: timed out", "Other: passed", "Third: timed out",
@@ -76,8 +76,8 @@ TEST_F(RunCommand, LeavesAnItemAloneThatIsWithinItsTime)
     // a limit for each item and not for all of them
     for (const std::string way : {"--quiet", "--as-group"}) {
         EXPECT_EQ(
-            run_group({{"Item", "sleep 1 report G 100 0 a"}, {"Other", "sleep 1 report G 100 0 b"}},
-                      {way, "--timeout", "1.9"})
+            run_group({{"Item", "sleep 0.6 report G 100 0 a"}, {"Other", "sleep 0.6 report G 100 0 b"}},
+                      {way, "--timeout", "1.1"})
                 .status,
             0);
         EXPECT_THAT(processes_stopped(), IsEmpty());

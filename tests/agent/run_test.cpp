@@ -570,7 +570,7 @@ TEST_F(RunCommand, RunsTheVendorsPrograms)
 TEST_F(RunCommand, StopsTheVendorsPrograms)
 {
     set_vendor("2");
-    EXPECT_EQ(run_group({{"Item", kSleeps}, {"Other", kPasses}}, {"--timeout", "1"}).status, 1);
+    EXPECT_EQ(run_group({{"Item", kSleeps}, {"Other", kPasses}}, {"--timeout", "0.5"}).status, 1);
     EXPECT_THAT(outcomes(), ElementsAre("Item: timed out", "Other: passed"));
     EXPECT_EQ(read_file(work("signal")), "SIGTERM\n");
 }
