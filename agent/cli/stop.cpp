@@ -9,6 +9,7 @@
 #include "util/write.h"
 
 #include <chrono>
+#include <csignal>
 #include <cstdio>
 #include <fmt/core.h>
 #include <memory>
@@ -31,11 +32,8 @@ constexpr double kStopWait = 30; // seconds
 
 std::string advice_on(const OtherRun &other)
 {
-    if (other.process() == 0) {
-        return "wait, or see what runs with ps";
-    }
-    return state_of(other.process()) == 'T'
-               ? fmt::format("resume it with kill -CONT {}", other.process())
+    return other.process() == 0
+               ? "wait, or see what runs with ps"
                : fmt::format("wait longer, or end it with kill -KILL {}", other.process());
 }
 
@@ -55,6 +53,9 @@ Exit stop_other(double limit)
         if (Clock::now() - begin > std::chrono::duration<double>(limit)) {
             throw Failure(Cause::busy, "{}, has been asked to stop and goes on after {:g} s; {}",
                           text, limit, advice_on(other));
+        }
+        if (other.process() != 0 && state_of(other.process()) == 'T') {
+            kill(other.process(), SIGCONT); // suspended, it would not see that it is asked
         }
         std::this_thread::sleep_for(std::chrono::milliseconds(20));
     }

@@ -224,8 +224,8 @@ TEST_F(FailedOf, MayComeThroughAPipeToWhichSomebodyWrites)
     for (const std::string name : {"pipe", "nobodys"}) {
         ASSERT_EQ(mkfifo(work(name).c_str(), 0600), 0);
     }
-    FptestProcess refused({"run", "--failed-of", work("nobodys"), "--plan",
-                           file("other.xml", group_of(kFour))});
+    FptestProcess refused(
+        {"run", "--failed-of", work("nobodys"), "--plan", file("other.xml", group_of(kFour))});
     const support::Process writer({.arguments = {"sh", "-c", "exec >\"$1\"; sleep 6; cat \"$2\"",
                                                  "sh", work("pipe"), before}});
     EXPECT_EQ(run_group({{"Item", kPasses}}, {"--failed-of", work("pipe")}).status, 0);

@@ -229,8 +229,8 @@ TEST_F(OtherRun, StopOfNothingSucceeds)
 
 TEST_F(OtherRun, StopGivesUpAtItsLimitAndSaysWhatToDo)
 {
-    FptestProcess fptest(
-        with_group({{"Stubborn", "ignore-stop note /tmp/scene/begun sleep 60"}}, {"--grace", "1.2"}));
+    FptestProcess fptest(with_group({{"Stubborn", "ignore-stop note /tmp/scene/begun sleep 60"}},
+                                    {"--grace", "1.2"}));
     ASSERT_TRUE(wait_for_file("begun"));
     const std::string pid = std::to_string(fptest.pid());
     const Ended ended = stop({"--wait", "0.1"});
@@ -243,15 +243,19 @@ TEST_F(OtherRun, StopGivesUpAtItsLimitAndSaysWhatToDo)
     EXPECT_EQ(fptest.wait().status, 130);
 }
 
-TEST_F(OtherRun, StopSaysThatARunIsSuspended)
+TEST_F(OtherRun, StopResumesARunThatIsSuspended)
 {
-    FptestProcess fptest(of_a_run());
-    ASSERT_TRUE(wait_for_item("G/Other"));
-    fptest.signal(SIGSTOP);
-    EXPECT_THAT(stop({"--wait", "0.1"}).err,
-                HasSubstr("; resume it with kill -CONT " + std::to_string(fptest.pid()) + "\n"));
-    fptest.signal(SIGCONT);
-    EXPECT_EQ(fptest.wait().status, 130); // it had been asked
+    for (const int signal : {SIGTSTP, SIGSTOP}) {
+        const Start start{.arguments = of_a_run(), .prepare = in_own_group};
+        FptestProcess fptest(start);
+        ASSERT_TRUE(wait_for_item("G/Other"));
+        fptest.signal(signal);
+        ASSERT_TRUE(
+            eventually([] { return status().out.find(", suspended, ") != std::string::npos; }, 20));
+        EXPECT_EQ(stop().status, 0);
+        EXPECT_EQ(fptest.wait().status, 130);
+        EXPECT_THAT(running_items(), IsEmpty());
+    }
 }
 
 TEST_F(OtherRun, OneThatWasKilledIsNoRun)

@@ -128,8 +128,8 @@ TEST_F(Output, PipeThatIsFullHoldsUpNothingAndLosesNothing)
 TEST_F(Output, FifoWithoutAReaderHoldsUpNothing)
 {
     ASSERT_EQ(mkfifo(work("fifo").c_str(), 0600), 0);
-    FptestProcess fptest({"run", "--timeout", "0.5", "--json", work("fifo"), "--junit", work("junit"),
-                          "--plan", plan(kTwoItems), "P/G"});
+    FptestProcess fptest({"run", "--timeout", "0.5", "--json", work("fifo"), "--junit",
+                          work("junit"), "--plan", plan(kTwoItems), "P/G"});
     EXPECT_TRUE(eventually(
         [&] { return fptest.out().find("1 passed, 1 failed") != std::string::npos; }, 20))
         << fptest.out();

@@ -397,9 +397,10 @@ TEST_F(RunGatherer, IsStartedThoughAnItemLeftAProcessWhoseNameBeginsAsItsOwn)
 
 TEST_F(RunGatherer, MayRunAnotherProgramInItsOwnPlace)
 {
-    const std::string gatherer = "--help; exec -a " + std::string(kProbe) +
-                                 ".real /system/bin/Item gather report-here G SensorProbe 100 0 "
-                                 "one gather sleep 0.6 report-here G SensorProbe 100 0 two sleep 60";
+    const std::string gatherer =
+        "--help; exec -a " + std::string(kProbe) +
+        ".real /system/bin/Item gather report-here G SensorProbe 100 0 "
+        "one gather sleep 0.6 report-here G SensorProbe 100 0 two sleep 60";
     std::string told;
     for (const char *description : {"one", "two"}) {
         told = run_group({{"SensorProbe", gatherer}}, {"--timeout", "5"}).err;
