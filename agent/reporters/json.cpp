@@ -198,10 +198,10 @@ class JsonReporter : public Reporter
         write_end("retry", run, place);
     }
 
-    void late(const Run &run, Place place, const ItemReport &report) override
+    void late(const Run &run, Place place, const TimedReport &report) override
     {
         Json json = event_of("late", run, place);
-        json["time"] = now();
+        json["time"] = timestamp(report.time);
         add_report(json, report);
         write(json);
     }

@@ -175,7 +175,7 @@ class JunitReporter : public Reporter
         change(run);
     }
 
-    void late(const Run &run, Place place, const ItemReport &report) override
+    void late(const Run &run, Place place, const TimedReport &report) override
     {
         late_.push_back({place.suite, late_report(run, place, report)});
         changed_ = !direct_;

@@ -120,7 +120,7 @@ class LiveView : public Reporter
         ended(run, place);
     }
 
-    void late(const Run &run, Place place, const ItemReport &report) override
+    void late(const Run &run, Place place, const TimedReport &report) override
     {
         keep_text(late_report(run, place, report), Colour::yellow);
         draw(run);

@@ -75,7 +75,7 @@ class PlainView : public Reporter
         show_end(run, place, attempt_of(run, item_at(run, place)) + ": ");
     }
 
-    void late(const Run &run, Place place, const ItemReport &report) override
+    void late(const Run &run, Place place, const TimedReport &report) override
     {
         print(late_report(run, place, report));
     }

@@ -233,7 +233,7 @@ class TapReporter : public Reporter
                                   reported_result(item.report), said.empty() ? "" : ": " + said)));
     }
 
-    void late(const Run &run, Place place, const ItemReport &report) override
+    void late(const Run &run, Place place, const TimedReport &report) override
     {
         write((open_ ? kIndent : "") + comment(late_report(run, place, report)));
     }

@@ -193,7 +193,10 @@ class EarlierRunReader
             } else if (event == "progress") {
                 unended(object).report = report_of(object);
             } else if (event == "late") {
-                earlier_.late.emplace(index_of(object), report_of(object));
+                earlier_.late.emplace(
+                    index_of(object),
+                    TimedReport{report_of(object),
+                               time_of(text_of(object, "time")).value_or(earlier_.run.start)});
             } else if (event == "retry") {
                 add_attempt(object);
                 running_.insert(index_of(object)); // it is to begin again

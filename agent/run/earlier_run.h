@@ -36,7 +36,7 @@ struct EarlierRun {
     // line. The attempts are among its earlier ones.
     std::map<std::size_t, ItemRun> unended;
 
-    std::multimap<std::size_t, ItemReport> late; // reports after the end
+    std::multimap<std::size_t, TimedReport> late; // reports after the end
 };
 
 // The file ends before it says what was to be run.

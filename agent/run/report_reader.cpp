@@ -243,8 +243,9 @@ void ReportReader::report_late(const Place &place, bool gathers, int round,
         active.reporting.other_changed_at_poll = poll_count_;
     }
     const int now = std::exchange(run_.round, round);
+    const TimedReport late{report, std::chrono::system_clock::now()};
     for (Reporter *reporter : reporters_) {
-        reporter->late(run_, place, report);
+        reporter->late(run_, place, late);
     }
     run_.round = now;
     if (gathers) {

@@ -31,6 +31,11 @@ enum class Outcome {
     unexpected, // it passed, though it was known to fail
 };
 
+// With the time at which it was seen.
+struct TimedReport : ItemReport {
+    std::chrono::system_clock::time_point time;
+};
+
 // One item of a run.
 struct ItemRun {
     std::string group; // as the test plan names it
@@ -214,7 +219,7 @@ class Reporter
     }
 
     // An item reported after it was judged. Its outcome and its report in the run stay.
-    virtual void late(const Run & /* run */, Place /* place */, const ItemReport & /* report */)
+    virtual void late(const Run & /* run */, Place /* place */, const TimedReport & /* report */)
     {
     }
 

@@ -120,7 +120,7 @@ class Playback
     }
     void report_late(Place place, const ItemReport &report)
     {
-        reporter_.late(now_, place, report);
+        reporter_.late(now_, place, {report, std::chrono::system_clock::now()});
     }
     void run_item(Place place)
     {
