@@ -9,6 +9,7 @@
 #include <algorithm>
 #include <cctype>
 #include <cmath>
+#include <cstdlib>
 #include <fmt/core.h>
 #include <system_error>
 #include <utility>
@@ -96,6 +97,62 @@ std::optional<double> finite_number(const std::string &word)
                                                                          : std::nullopt;
 }
 
+// What a number says, however it is written: "-12 1" for -1.2e2.
+std::string digits_of(const std::string &word)
+{
+    std::string digits;
+    long power = 0;
+    const std::size_t end = std::min(word.find_first_of("eE"), word.size());
+    const std::size_t point = std::min(word.find('.'), end);
+    for (std::size_t at = 0; at < end; ++at) {
+        const char c = word[at];
+        power -= at > point ? 1 : 0;
+        digits += (c > '0' && c <= '9') || (c == '0' && !digits.empty()) ? std::string(1, c) : "";
+    }
+    for (; digits.ends_with('0'); ++power) {
+        digits.pop_back();
+    }
+    if (digits.empty()) {
+        return "0";
+    }
+    power += end < word.size() ? std::strtol(word.c_str() + end + 1, nullptr, 10) : 0;
+    return fmt::format("{}{} {}", word.starts_with('-') ? "-" : "", digits, power);
+}
+
+// Why a word is no number that can be kept; empty if it is one.
+std::string refused_number(const std::string &word, std::optional<double> number)
+{
+    if (!number) {
+        return in_quotes(word) + " is not a number such as -1.5 or 2e-6";
+    }
+    const bool is_whole = word.find_first_of(".eE") == word.npos;
+    return is_whole && digits_of(word) != digits_of(fmt::format("{}", *number))
+               ? in_quotes(word) + " has more digits than are kept"
+               : "";
+}
+
+// Reads them into a measurement; says why they cannot be, or nothing.
+std::string read_numbers(const std::vector<std::string> &words, Measurement &one)
+{
+    std::optional<double> value;
+    for (const auto &[at, number] :
+         {std::pair{1U, &value}, std::pair{3U, &one.low}, std::pair{4U, &one.high}}) {
+        if (at >= words.size() || (at > 1 && words[at] == "-")) {
+            continue;
+        }
+        *number = finite_number(words[at]);
+        if (std::string why = refused_number(words[at], *number); !why.empty()) {
+            return why;
+        }
+        if (*number == value && digits_of(words[at]) != digits_of(words[1])) {
+            return fmt::format("{} and {} differ in digits that are not kept", in_quotes(words[1]),
+                               in_quotes(words[at]));
+        }
+    }
+    one.value = *value;
+    return "";
+}
+
 bool is_below(const Measurement &one)
 {
     return one.low && one.value < *one.low;
@@ -129,17 +186,10 @@ std::optional<Measurement> measurement_of(const std::vector<std::string> &words,
         return refuse(in_quotes(one.name) + " is not a name: letters, digits, '_', '.' and '-', "
                                             "at most 64, no '.' or '-' first");
     }
-    std::vector<std::optional<double>> numbers;
-    for (const std::size_t at : {1U, 3U, 4U}) {
-        const bool is_none = at >= words.size() || (at > 1 && words[at] == "-");
-        numbers.push_back(is_none ? std::nullopt : finite_number(words[at]));
-        if (!is_none && !numbers.back()) {
-            return refuse(in_quotes(words[at]) + " is not a number such as -1.5 or 2e-6");
-        }
+    why = read_numbers(words, one);
+    if (!why.empty()) {
+        return std::nullopt;
     }
-    one.value = *numbers[0];
-    one.low = numbers[1];
-    one.high = numbers[2];
     if (words.size() > 2 && words[2] != "-") {
         one.unit = words[2];
         if (finite_number(one.unit)) {

@@ -113,6 +113,38 @@ TEST(Measurements, HaveDecimalNumbers)
     }
 }
 
+// A wrong chip's number is no right one, nor shown as another.
+TEST(Measurements, HaveTheDigitsThatAreKept)
+{
+    for (const std::string id :
+         {"9007199254740993", "-76561198012345678", "00012345678901234567", "36028797018963968"}) {
+        EXPECT_EQ(warning_of(measured("#measure x " + id)),
+                  "1 malformed #measure line: '#measure x " + id + "': '" + id +
+                      "' has more digits than are kept");
+        EXPECT_EQ(measured("#measure x 1 - - " + id).malformed, 1U);
+    }
+    for (const std::string id : {"9007199254740992", "-0009007199254740991", "123456789012345",
+                                 "10000000000000000000000", "0", "-0"}) {
+        EXPECT_EQ(measured("#measure x " + id + " - " + id + " " + id).kept.size(), 1U) << id;
+    }
+    for (const auto &[value, limit] : std::vector<std::pair<std::string, std::string>>{
+             {"0.30000000000000001", "0.3"}, {"9007199254740993.0", "9007199254740992"}}) {
+        for (const auto &limits : {limit + " -", "- " + limit}) {
+            EXPECT_EQ(warning_of(measured("#measure x " + value + " V " + limits)),
+                      "1 malformed #measure line: '#measure x " + value + " V " + limits + "': '" +
+                          value + "' and '" + limit + "' differ in digits that are not kept");
+        }
+    }
+    // as bc writes it; limits in other words
+    for (const std::string words :
+         {"x .33333333333333333333 - .3 .4", "x 1200 - 1.2e3 1200.00", "x -.5 - -0.50 -5e-1",
+          "x 0.0 - -0 0e-99999999999999999999", "x +7 - 7 7."}) {
+        const auto read = measured("#measure " + words);
+        EXPECT_EQ(warning_of(read), "");
+        EXPECT_EQ(read.out, 0U) << words;
+    }
+}
+
 TEST(Measurements, HaveNamesAndUnitsThatEveryFormatTakes)
 {
     const std::string name(64, 'n');
