@@ -19,7 +19,6 @@ namespace fptest
 namespace
 {
 
-constexpr char kDevice[] = "device";
 constexpr char kLetters[] = "abcdefghijklmnopqrstuvwxyzABCDEFGHIJKLMNOPQRSTUVWXYZ0123456789._-";
 
 std::string name_of_device()

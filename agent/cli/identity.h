@@ -14,6 +14,9 @@
 namespace fptest
 {
 
+// The label that says of which unit a run's results are.
+inline constexpr char kDevice[] = "device";
+
 void add_labels(CLI::App &command, std::vector<std::string> &labels);
 
 // Of labels KEY=VALUE. Throws a Failure if a key is given twice.

@@ -3,6 +3,7 @@
 
 #include "cli/selection.h"
 
+#include "cli/identity.h"
 #include "plan/plan.h"
 #include "run/choice.h"
 #include "run/known_failures.h"
@@ -152,6 +153,24 @@ std::set<EarlierRun::Name> failed_or_left(const EarlierRun &earlier)
     return items;
 }
 
+// One report is of one unit. Other labels are that run's where they are not given again.
+void take_labels(Identity &identity, const EarlierRun &earlier)
+{
+    for (const auto &label : earlier.run.identity.labels) {
+        const auto now = std::ranges::find_if(
+            identity.labels, [&](const auto &one) { return one.first == label.first; });
+        if (now == identity.labels.end()) {
+            identity.labels.push_back(label);
+        } else if (label.first == kDevice && now->second != label.second) {
+            throw Failure(Cause::input,
+                          "{} is of device {}, and this is {}: if it is that one all the same, say "
+                          "--label device={}",
+                          earlier.file, in_quotes(label.second), in_quotes(now->second),
+                          label.second);
+        }
+    }
+}
+
 } // namespace
 
 std::optional<EarlierRun> read_earlier_run(RunOptions &options)
@@ -210,6 +229,7 @@ const EarlierRun *take_up(Run &run, const RunOptions &options,
                       earlier.file, earlier.run.vendor, run.vendor);
     }
     require_same_plan(earlier, run.identity.plan_digest, run.plan);
+    take_labels(run.identity, earlier);
     run.seed = earlier.run.seed;
     run.resumed = earlier.file;
     run.seconds_before = earlier.run.seconds;

@@ -309,6 +309,25 @@ TEST_F(ResumedRun, RefusesAnotherPlanOrDevice)
     EXPECT_THAT(paths_run(), IsEmpty());
 }
 
+TEST_F(ResumedRun, IsOfTheSameDeviceWithItsLabels)
+{
+    const std::string before =
+        cut_off(kThreeOfWhichOneSleeps, SIGKILL, {"--label", "device=U5", "--label", "job=1"});
+    const Json labels = {{"device", "U5"}, {"job", "1"}};
+    const std::string is_of = before + " is of device 'U5', and this is ";
+    const std::string advice = ": if it is that one all the same, say --label device=U5";
+    expect_refused(is_of + "'U6'" + advice, {"--label", "device=U6"});
+    expect_refused(is_of + "'quillmark'" + advice);
+    EXPECT_THAT(paths_run(), IsEmpty());
+
+    resume(kThreeOfWhichOneSleeps, {"--label", "device=U5"});
+    EXPECT_EQ(events("run").at(0).at("labels"), labels);
+    EXPECT_THAT(outcomes(), ElementsAre("Item: failed", "Other: passed", "Third: passed"));
+    std::filesystem::remove(work("json"));
+    resume(kThreeOfWhichOneSleeps, {"--label", "job=2", "--label", "device=U5"});
+    EXPECT_EQ(events("run").at(0).at("labels"), Json({{"device", "U5"}, {"job", "2"}}));
+}
+
 TEST_F(ResumedRun, RefusesWhatTheRunBeganWith)
 {
     cut_off(kThreeOfWhichOneSleeps, SIGKILL);

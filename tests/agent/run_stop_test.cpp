@@ -75,11 +75,11 @@ TEST_F(RunCommand, LeavesAnItemAloneThatIsWithinItsTime)
 {
     // a limit for each item and not for all of them
     for (const std::string way : {"--quiet", "--as-group"}) {
-        EXPECT_EQ(
-            run_group({{"Item", "sleep 0.6 report G 100 0 a"}, {"Other", "sleep 0.6 report G 100 0 b"}},
-                      {way, "--timeout", "1.1"})
-                .status,
-            0);
+        EXPECT_EQ(run_group({{"Item", "sleep 0.6 report G 100 0 a"},
+                             {"Other", "sleep 0.6 report G 100 0 b"}},
+                            {way, "--timeout", "1.1"})
+                      .status,
+                  0);
         EXPECT_THAT(processes_stopped(), IsEmpty());
     }
 }
