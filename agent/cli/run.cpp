@@ -262,14 +262,17 @@ void report_no_vendor(const RunOptions &options)
     }
 }
 
-void say_nothing_to_do(const RunOptions &options, const EarlierRun &earlier)
+Exit do_nothing(const RunOptions &options, const EarlierRun &earlier)
 {
     if (!options.resume.empty() && !options.plan.empty()) {
         const CheckedPlan checked = open_plan(options);
         require_same_plan(earlier, digest_of(*checked.loaded.plan), checked.name);
     }
     say("{}: {}: nothing to do", earlier.file,
-        options.resume.empty() ? "no item of that run failed" : "that run has finished");
+        options.resume.empty()   ? "no item of that run failed"
+        : earlier.failed.empty() ? "that run has finished"
+                                 : "that run has finished, with failures");
+    return earlier.failed.empty() ? Exit::success : Exit::items_failed;
 }
 
 /// Refuses what the options can't have together, and settles where results go.
@@ -295,8 +298,7 @@ Exit run(RunOptions options)
     resolve_outputs(options);
     const std::optional<EarlierRun> earlier = read_earlier_run(options);
     if (earlier && leaves_nothing(options, *earlier)) {
-        say_nothing_to_do(options, *earlier);
-        return Exit::success;
+        return do_nothing(options, *earlier);
     }
     Identity identity = identity_of(options.labels);
     const RunNote note = note_for(options);
