@@ -39,14 +39,21 @@ std::vector<std::string> results_on_standard_output(const RunOptions &options)
 
 void resolve_output_conflicts(RunOptions &options)
 {
-    require_different({{"--plan", options.plan == "-" ? kStandardInput : options.plan},
-                       {"--expect", options.expect == "-" ? kStandardInput : options.expect},
-                       {"--failed-of", options.failed_of},
-                       {"--resume", options.resume},
-                       {"--json", options.json},
-                       {"--junit", options.junit},
-                       {"--files", options.files},
-                       log_file(options.log)});
+    const std::vector<NamedFile> files = {
+        {"--plan", options.plan == "-" ? kStandardInput : options.plan},
+        {"--expect", options.expect == "-" ? kStandardInput : options.expect},
+        {"--failed-of", options.failed_of},
+        {"--resume", options.resume},
+        {"--json", options.json},
+        {"--junit", options.junit},
+        {"--files", options.files},
+        log_file(options.log)};
+    require_different(files);
+    for (const NamedFile &file : files) {
+        if (is_closed_stream(file.second)) {
+            throw Failure(Cause::device, "{} is closed: open it, or name a file", label(file));
+        }
+    }
     const auto results = results_on_standard_output(options);
     if (results.size() > 1) {
         throw Failure(Cause::input, "{} each want standard output: give all but one a file",

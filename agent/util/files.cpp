@@ -20,13 +20,15 @@ namespace fptest
 namespace
 {
 
-bool standard_output_was_open = true;
+std::array<bool, 3> was_closed{}; // the standard streams
 
 } // namespace
 
 void fill_standard_descriptors()
 {
-    standard_output_was_open = fcntl(STDOUT_FILENO, F_GETFD) >= 0;
+    for (std::size_t stream = 0; stream < was_closed.size(); ++stream) {
+        was_closed.at(stream) = fcntl(static_cast<int>(stream), F_GETFD) < 0;
+    }
     int descriptor = 0;
     do {
         descriptor = open("/dev/null", O_RDWR | O_CLOEXEC);
@@ -38,9 +40,27 @@ void fill_standard_descriptors()
 
 void require_standard_output(const std::string &who)
 {
-    if (!standard_output_was_open) {
+    if (was_closed[STDOUT_FILENO]) {
         throw Failure(Cause::device, "{} needs standard output, which is closed: open it", who);
     }
+}
+
+bool is_closed_stream(const std::string &path)
+{
+    std::error_code none;
+    std::filesystem::path end = path;
+    for (int links = 0; links < 40; ++links) {
+        if (std::filesystem::equivalent(end.parent_path(), "/proc/self/fd", none)) {
+            const std::string stream = end.filename();
+            return stream.size() == 1 && stream >= "0" && stream <= "2" &&
+                   was_closed.at(static_cast<std::size_t>(stream[0] - '0'));
+        }
+        if (!std::filesystem::is_symlink(end, none)) {
+            break;
+        }
+        end = end.parent_path() / std::filesystem::read_symlink(end, none);
+    }
+    return false;
 }
 
 std::optional<std::string> read_file(const std::string &path, int flags)

@@ -20,6 +20,8 @@ namespace fptest
 void fill_standard_descriptors();
 // Throws a Failure if standard output was closed; it names who needs it.
 void require_standard_output(const std::string &who);
+// Whether a path, as /dev/stdout, leads to a standard stream that was closed.
+bool is_closed_stream(const std::string &path);
 
 // The whole file, "-" for standard input; nullopt if it cannot be read or is longer than
 // kFileLimit, with the reason in errno. Flags are those of open().

@@ -333,6 +333,16 @@ TEST_F(Fptest, SaysThatStandardOutputIsClosed)
         EXPECT_EQ(ended.out,
                   "fptest: " + who + " needs standard output, which is closed: open it\n");
     }
+    for (const std::string file : {"--json /dev/stdout", "--junit /proc/self/fd/1",
+                                   "--log /dev/fd/1", "--json /tmp/scene/link"}) {
+        std::filesystem::remove(work("link"));
+        std::filesystem::create_symlink("/dev/stdout", work("link"));
+        const Ended ended = run_program({"/system/bin/sh", "-c", "fptest run " + file + " >&-"});
+        EXPECT_EQ(ended.status, 3) << file;
+        EXPECT_EQ(ended.out, "fptest: " + file + " is closed: open it, or name a file\n");
+    }
+    EXPECT_EQ(run_program({"/system/bin/sh", "-c", "fptest run --expect /dev/stdin <&-"}).out,
+              "fptest: --expect /dev/stdin is closed: open it, or name a file\n");
     EXPECT_EQ(read_file(kPlanFile), before);
 }
 
