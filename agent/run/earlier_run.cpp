@@ -196,7 +196,7 @@ class EarlierRunReader
                 earlier_.late.emplace(
                     index_of(object),
                     TimedReport{report_of(object),
-                               time_of(text_of(object, "time")).value_or(earlier_.run.start)});
+                                time_of(text_of(object, "time")).value_or(earlier_.run.start)});
             } else if (event == "retry") {
                 add_attempt(object);
                 running_.insert(index_of(object)); // it is to begin again
