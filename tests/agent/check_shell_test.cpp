@@ -17,7 +17,6 @@
 #include <unistd.h>
 #include <vector>
 
-using fptest::check;
 using fptest::DeviceShell;
 using fptest::Finding;
 using fptest::read_shell_line;

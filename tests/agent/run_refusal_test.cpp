@@ -359,7 +359,8 @@ TEST_F(Refusal, BesideAScriptOfAnEarlierRunOrAnotherVendorsItem)
 {
     for (const Lines &words : {Lines{"/system/bin/Script", "kill -STOP $$"},
                                Lines{"/system/bin/Item_ca", "sleep", "60"}}) {
-        const support::Process left({.arguments = words});
+        const support::Start start{.arguments = words};
+        const support::Process left(start);
         const std::string command = "/proc/" + std::to_string(left.pid()) + "/cmdline";
         ASSERT_TRUE(support::eventually(
             [&] { return read_file(command).find(words[0]) != std::string::npos; }));
