@@ -51,8 +51,9 @@ Exit stop_other(double limit)
     other.ask_to_stop();
     while (!other.has_ended()) {
         if (Clock::now() - begin > std::chrono::duration<double>(limit)) {
-            throw Failure(Cause::busy, "{}, has been asked to stop and goes on after {:g} s; {}",
-                          text, limit, advice_on(other));
+            throw Failure(Cause::busy, "{},{} goes on after {:g} s; {}", text,
+                          other.process() == 0 ? "" : " has been asked to stop and", limit,
+                          advice_on(other));
         }
         if (other.process() != 0 && state_of(other.process()) == 'T') {
             kill(other.process(), SIGCONT); // suspended, it would not see that it is asked

@@ -243,6 +243,19 @@ TEST_F(OtherRun, StopGivesUpAtItsLimitAndSaysWhatToDo)
     EXPECT_EQ(fptest.wait().status, 130);
 }
 
+TEST_F(OtherRun, StopSaysNotThatItHasAskedOneWhoseNoteIsGone)
+{
+    FptestProcess fptest(of_a_run());
+    ASSERT_TRUE(wait_for_item("G/Other"));
+    fs::remove(kNote);
+    const Ended ended = stop({"--wait", "0.1"});
+    EXPECT_EQ(ended.status, kBusy);
+    EXPECT_EQ(without_times(ended.err), "fptest: one that could not say what it does, goes on "
+                                        "after T s; wait, or see what runs with ps\n");
+    fptest.signal(SIGINT);
+    EXPECT_EQ(fptest.wait().status, 130);
+}
+
 TEST_F(OtherRun, StopResumesARunThatIsSuspended)
 {
     for (const int signal : {SIGTSTP, SIGSTOP}) {
