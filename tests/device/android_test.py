@@ -100,8 +100,10 @@ def test_a_process_has_its_name_with_or_without_a_path(items, release, program, 
 
 @pytest.mark.parametrize("release", RELEASES)
 def test_a_zombie_has_the_kernels_name(release):
-    _, out, _ = answer(release, "(sleep 0 & echo $!; exec sleep 2) | { read -r pid; "
-                       "sleep 0.8; ps $pid; }")
+    _, out, _ = answer(release, "(sleep 0 & echo $!; exec sleep 30) | { read -r pid; "
+                       "status=/proc/$pid/status; "
+                       "until grep -q '^State:.Z' $status; do sleep 0.05; done; "
+                       "ps $pid; kill $(sed -n 's/^PPid:.//p' $status); }")
 
     assert names(out) == ["sleep" if release in TOOLBOX else "[sleep]"]
 
